@@ -1,0 +1,33 @@
+// Builds the platform from what this machine has. Only programs and tests include this.
+
+#pragma once
+
+#include "platform/Platform.h"
+
+#include <memory>
+#include <string>
+
+namespace welcomer {
+
+// A platform with everything it stands on.
+class PlatformOwner {
+  public:
+    virtual ~PlatformOwner() = default;
+
+    // Borrowed: lives as long as this object.
+    virtual const platform::Platform& platform() const = 0;
+};
+
+// What a program may choose.
+struct PlatformOptions {
+    // Every file of the system and the home folder are looked up below this folder.
+    std::string root = "/";
+
+    // Takes the records in place of the system log, or null. Borrowed: must outlive the platform.
+    platform::SystemLog* systemLog = nullptr;
+};
+
+// Builds the platform. Opens nothing and starts no thread: each service does its work when it is first asked.
+std::unique_ptr<PlatformOwner> buildPlatform(const PlatformOptions& options = {});
+
+} // namespace welcomer

@@ -1,0 +1,38 @@
+# What every target of the project is built with.
+
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+set(CMAKE_C_STANDARD 11)
+set(CMAKE_C_EXTENSIONS OFF)
+set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+set(CMAKE_CXX_VISIBILITY_PRESET hidden)
+set(CMAKE_C_VISIBILITY_PRESET hidden)
+set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
+set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
+set(CMAKE_RUNTIME_OUTPUT_DIRECTORY "${CMAKE_BINARY_DIR}/bin")
+
+if(NOT CMAKE_BUILD_TYPE AND NOT CMAKE_CONFIGURATION_TYPES)
+    set(CMAKE_BUILD_TYPE RelWithDebInfo CACHE STRING "" FORCE)
+endif()
+
+# A second build of the same sources costs little where ccache is installed.
+find_program(WELCOMER_CCACHE ccache)
+if(WELCOMER_CCACHE AND NOT CMAKE_CXX_COMPILER_LAUNCHER)
+    set(CMAKE_C_COMPILER_LAUNCHER "${WELCOMER_CCACHE}")
+    set(CMAKE_CXX_COMPILER_LAUNCHER "${WELCOMER_CCACHE}")
+endif()
+
+# PIE for programs, so that the libraries' position-independent code is worth its cost.
+include(CheckPIESupported)
+check_pie_supported(LANGUAGES CXX C)
+
+function(welcomer_configure_target target)
+    target_compile_options(${target} PRIVATE -Wall -Wextra -Wpedantic -Wconversion -Wshadow -Werror)
+    if(WELCOMER_SANITIZE)
+        target_compile_options(${target} PRIVATE -fsanitize=${WELCOMER_SANITIZE} -fno-omit-frame-pointer
+                                                 -fno-sanitize-recover=all)
+        target_link_options(${target} PUBLIC -fsanitize=${WELCOMER_SANITIZE})
+        target_compile_definitions(${target} PRIVATE WELCOMER_FLUSH_AT_EXIT=1)
+    endif()
+endfunction()

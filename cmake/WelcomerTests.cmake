@@ -1,0 +1,21 @@
+# How tests are declared. ctest runs each test case in a process of its own, so process-wide state needs no resetting.
+
+if(WELCOMER_BUILD_TESTS)
+    find_package(GTest REQUIRED)
+    include(GoogleTest)
+endif()
+
+# welcomer_add_test(NAME sources... [LIBRARIES ...] [LABELS ...])
+#   A GoogleTest program; each of its cases becomes a ctest test named NAME.Suite.Case.
+function(welcomer_add_test name)
+    cmake_parse_arguments(ARG "" "TIMEOUT" "LIBRARIES;LABELS" ${ARGN})
+    add_executable(${name} ${ARG_UNPARSED_ARGUMENTS})
+    welcomer_configure_target(${name})
+    target_link_libraries(${name} PRIVATE welcomer ${ARG_LIBRARIES} GTest::gtest GTest::gtest_main)
+    set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY "${CMAKE_BINARY_DIR}/tests")
+    if(NOT ARG_TIMEOUT)
+        set(ARG_TIMEOUT 120)
+    endif()
+    gtest_discover_tests(${name} TEST_PREFIX "${name}." DISCOVERY_TIMEOUT 60
+                         PROPERTIES TIMEOUT ${ARG_TIMEOUT} LABELS "${ARG_LABELS}")
+endfunction()

@@ -1,0 +1,28 @@
+#include "platform/CredentialStore.h"
+
+namespace welcomer::platform {
+
+std::string credentialStatusText(std::int32_t status) {
+    switch (status) {
+    case kCredentialSuccess:
+        return "success";
+    case kCredentialDuplicateItem:
+        return "an item with this service and account exists already";
+    case kCredentialItemNotFound:
+        return "no such item";
+    case kCredentialStoreDamaged:
+        return "the credential store is damaged";
+    case kCredentialStoreUnsafe:
+        return "the credential store is a symbolic link or not the user's own";
+    case kCredentialReadFailed:
+        return "the credential store cannot be read";
+    case kCredentialWriteFailed:
+        return "the credential store cannot be written";
+    case kCredentialInvalidPath:
+        return "a trusted application needs an absolute path";
+    default:
+        return "unknown credential store status " + std::to_string(status);
+    }
+}
+
+} // namespace welcomer::platform

@@ -1,0 +1,93 @@
+// Generic-password items: a secret with a service, an account and a label. At most one item exists for a
+// service and an account together.
+
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace welcomer::platform {
+
+// The store's result codes. Their numbers are this system's own; they appear in log lines.
+enum CredentialStatus : std::int32_t {
+    kCredentialSuccess = 0,       // the operation did what it says
+    kCredentialDuplicateItem = 1, // an item with this service and account exists already
+    kCredentialItemNotFound = 2,  // no store of the search list holds such an item
+    kCredentialStoreDamaged = 3,  // the store's content cannot be read as what it should be
+    kCredentialStoreUnsafe = 4,   // the store's file or folder is a symbolic link, or not the user's own
+    kCredentialReadFailed = 5,    // the system refused to open or read the store
+    kCredentialWriteFailed = 6,   // the system refused to write the store (a full disk, a read-only home)
+    kCredentialInvalidPath = 7,   // a trusted application's path that is empty or not absolute
+};
+
+// The text of a result code, for people. Any thread.
+std::string credentialStatusText(std::int32_t status);
+
+// A program that may read an item without a prompt.
+struct TrustedApplication {
+    std::string path;
+    friend bool operator==(const TrustedApplication&, const TrustedApplication&) = default;
+};
+
+// Who may read an item. The backend decides what it enforces, and says so in its header.
+struct CredentialAccess {
+    std::string description;
+    std::vector<TrustedApplication> trustedApplications;
+    friend bool operator==(const CredentialAccess&, const CredentialAccess&) = default;
+};
+
+// One item, as it lies in a store.
+struct CredentialItem {
+    std::string service;
+    std::string account;
+    std::string label;
+    std::optional<CredentialAccess> access; // none: the store's default access
+};
+
+// A found item. What it refers to may be gone when it is used; the operation then fails with
+// kCredentialItemNotFound.
+class CredentialItemReference {
+  public:
+    virtual ~CredentialItemReference() = default;
+};
+
+class CredentialStore {
+  public:
+    virtual ~CredentialStore() = default;
+
+    // Makes a reference to a trusted application from its path.
+    //  result  the status; `application` is written on success only
+    // Any thread.
+    virtual std::int32_t createTrustedApplication(const std::string& path,
+                                                  TrustedApplication& application) = 0;
+
+    // Makes an access object. `access` is written on success only. Any thread.
+    virtual std::int32_t createAccess(const std::string& description,
+                                      std::vector<TrustedApplication> trustedApplications,
+                                      CredentialAccess& access) = 0;
+
+    // Creates an item in the default store: all or nothing, also when the process is killed meanwhile. An
+    // existing item with the same service and account in any store of the search list is not replaced: the
+    // call then fails with kCredentialDuplicateItem.
+    //  data  the secret, any bytes, none included
+    // Any thread and any process; may block while another process changes the store.
+    virtual std::int32_t createItem(const CredentialItem& item, const std::string& data) = 0;
+
+    // Finds the item with this service and account in the search list.
+    //  data       where to put the secret, or null when it is not wanted
+    //  reference  where to put the reference to what was found, or null
+    // Both are written on success only. Any thread.
+    virtual std::int32_t findItem(const std::string& service, const std::string& account, std::string* data,
+                                  std::unique_ptr<CredentialItemReference>* reference) = 0;
+
+    // Reads everything of an item but its secret. `item` is written on success only. Any thread.
+    virtual std::int32_t readAttributes(const CredentialItemReference& reference, CredentialItem& item) = 0;
+
+    // Deletes an item. Any thread.
+    virtual std::int32_t deleteItem(const CredentialItemReference& reference) = 0;
+};
+
+} // namespace welcomer::platform

@@ -1,0 +1,39 @@
+// Files and folders. Every path is absolute and looked up below the platform's root folder.
+
+#pragma once
+
+#include "platform/Error.h"
+
+#include <optional>
+#include <string>
+#include <sys/types.h>
+#include <vector>
+
+namespace welcomer::platform {
+
+class FileSystem {
+  public:
+    virtual ~FileSystem() = default;
+
+    // Whether something exists at the path, a dangling symbolic link not counted. Any thread.
+    virtual bool exists(const std::string& path) = 0;
+
+    // Removes a file, a symbolic link (never what it points to) or a folder with all that is in it. Any
+    // thread.
+    virtual Outcome remove(const std::string& path) = 0;
+
+    // Creates one folder, not its parents.
+    //  mode  its permissions, whatever the process's mask
+    // Fails with EEXIST when anything is at the path. Any thread.
+    virtual Outcome createDirectory(const std::string& path, mode_t mode) = 0;
+
+    // Copies a file's content and permissions. Fails with EEXIST when anything is at the destination, which
+    // is then untouched; on any failure nothing of the copy is left behind. Any thread.
+    virtual Outcome copy(const std::string& source, const std::string& destination) = 0;
+
+    // The names of a folder's entries without "." and "..", in the file system's own order, or none when the
+    // folder is missing or unreadable. Any thread.
+    virtual std::optional<std::vector<std::string>> list(const std::string& path) = 0;
+};
+
+} // namespace welcomer::platform

@@ -1,0 +1,47 @@
+// All of the operating system's services in one place.
+
+#pragma once
+
+#include "platform/Clock.h"
+#include "platform/CredentialStore.h"
+#include "platform/DispatchQueue.h"
+#include "platform/FileSystem.h"
+#include "platform/PluginBundle.h"
+#include "platform/ProcessIdentity.h"
+#include "platform/ResourceBundle.h"
+#include "platform/RunLoop.h"
+#include "platform/SystemLog.h"
+
+namespace welcomer::platform {
+
+// References to the services that the system runs on; a backend owns them.
+struct Platform {
+    SystemLog& systemLog;
+    FileSystem& fileSystem;
+    ProcessIdentity& processIdentity;
+    CredentialStore& credentialStore;
+    PluginBundle& pluginBundle;
+    ResourceBundles& resourceBundles;
+    Clock& clock;
+    RunLoops& runLoops;
+    DispatchQueues& dispatchQueues;
+};
+
+// The installed platform. A program installs one at its start, before anything else of the system is called,
+// and keeps it until it ends. Any thread, once one is installed.
+const Platform& current();
+
+// Installs a platform for the lifetime of this object and puts back the one before. It borrows the platform,
+// which must outlive it and everything that still runs on other threads. Main thread.
+class ScopedPlatform {
+  public:
+    explicit ScopedPlatform(const Platform& platform);
+    ~ScopedPlatform();
+    ScopedPlatform(const ScopedPlatform&) = delete;
+    ScopedPlatform& operator=(const ScopedPlatform&) = delete;
+
+  private:
+    const Platform* _previous;
+};
+
+} // namespace welcomer::platform

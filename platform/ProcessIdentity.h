@@ -1,0 +1,31 @@
+// Who runs this process. Home and login name are the password database's; no environment variable is asked.
+
+#pragma once
+
+#include <string>
+#include <sys/types.h>
+#include <vector>
+
+namespace welcomer::platform {
+
+class ProcessIdentity {
+  public:
+    virtual ~ProcessIdentity() = default;
+
+    // Any thread.
+    virtual uid_t effectiveUserID() = 0;
+
+    // The login name of the effective user, or the user id in decimal when the password database has no
+    // entry. Any thread.
+    virtual std::string loginName() = 0;
+
+    // The home folder of the effective user, "/" when the password database has none. Any thread.
+    virtual std::string homeDirectory() = 0;
+
+    // The library folders in the user's domain, the first being the one to use; a leading "~" may stand for
+    // the home folder. The platform makes the folder where it is missing (mode 0700) and the home folder
+    // exists; when that fails the path is given all the same. Any thread.
+    virtual std::vector<std::string> userLibraryDirectories() = 0;
+};
+
+} // namespace welcomer::platform

@@ -1,0 +1,31 @@
+// An application's bundle of resources.
+
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+
+namespace welcomer::platform {
+
+class ResourceBundle {
+  public:
+    virtual ~ResourceBundle() = default;
+
+    // The path of a resource, below the platform's root as every path, or none when the bundle has no such
+    // resource.
+    //  name  the resource's name without its type
+    //  type  its type, the file name's extension without the dot; empty: the name stands alone
+    // Any thread.
+    virtual std::optional<std::string> pathForResource(const std::string& name, const std::string& type) = 0;
+};
+
+class ResourceBundles {
+  public:
+    virtual ~ResourceBundles() = default;
+
+    // Opens the bundle at a path. A bundle that does not exist has no resources. Any thread.
+    virtual std::unique_ptr<ResourceBundle> open(const std::string& path) = 0;
+};
+
+} // namespace welcomer::platform

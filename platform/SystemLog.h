@@ -1,0 +1,20 @@
+// The system log.
+
+#pragma once
+
+#include <string>
+
+namespace welcomer::platform {
+
+class SystemLog {
+  public:
+    virtual ~SystemLog() = default;
+
+    // Writes one record, or does nothing when there is no system log to write to. Never throws.
+    //  priority  facility in the upper bits, severity in the low three, as syslog(3) takes them
+    //  message   UTF-8; written as it stands, never as a format
+    // Any thread; concurrent records do not interleave within a line.
+    virtual void write(int priority, const std::string& message) = 0;
+};
+
+} // namespace welcomer::platform

@@ -1,0 +1,23 @@
+// Writing a property list in the XML format, version 1.0.
+
+#pragma once
+
+#include "propertylist/PropertyList.h"
+
+#include <optional>
+#include <string>
+
+namespace welcomer {
+
+// Serialises a value in the XML format, version 1.0. Reals read back to the same bits; a date is cut to whole
+// seconds.
+//  value   the value; only read during the call
+//  error   where to say why there is no result, or null
+//  result  the bytes, or none when the value cannot be written: a string that is no UTF-8 or holds a
+//  character that
+//          XML has no place for, a date out of the calendar's range, or nesting beyond
+//          kPropertyListMaximumDepth
+// Any thread.
+std::optional<std::string> writeXMLPropertyList(const PropertyList& value, std::string* error = nullptr);
+
+} // namespace welcomer

@@ -1,0 +1,137 @@
+#include "text/Describe.h"
+
+#include <array>
+#include <charconv>
+#include <chrono>
+#include <cmath>
+#include <cstdio>
+
+namespace welcomer::text {
+
+namespace {
+
+constexpr std::string_view kNone = "(null)";
+
+// Longest decimal 64-bit integer or shortest-form double: 24 characters.
+template <class Number>
+std::string toDecimal(Number value) {
+    std::array<char, 32> buffer{};
+    const auto end = std::to_chars(buffer.data(), buffer.data() + buffer.size(), value);
+    return {buffer.data(), end.ptr};
+}
+
+std::string describeData(const PropertyList::Data& data) {
+    static constexpr std::string_view digits = "0123456789abcdef";
+    std::string text = "<";
+    text.reserve(data.bytes.size() * 2 + 2);
+    for (const char c : data.bytes) {
+        const auto byte = static_cast<unsigned char>(c);
+        text += digits[byte >> 4];
+        text += digits[byte & 15];
+    }
+    return text += '>';
+}
+
+std::string describeDate(PropertyList::Date date) {
+    // Outside the years 0 to 9999 there is no ISO 8601 form to speak of; the number says more.
+    constexpr double yearZero = -62167219200.0;
+    constexpr double yearTenThousand = 253402300800.0;
+    if (!(date.secondsSince1970 >= yearZero && date.secondsSince1970 < yearTenThousand)) {
+        return toDecimal(date.secondsSince1970);
+    }
+    using namespace std::chrono;
+    const sys_seconds moment(seconds(static_cast<std::int64_t>(std::floor(date.secondsSince1970))));
+    const auto day = floor<days>(moment);
+    const year_month_day calendar(day);
+    const hh_mm_ss clock(moment - day);
+    std::array<char, 48> buffer{};
+    const int length =
+        std::snprintf(buffer.data(), buffer.size(), "%04d-%02u-%02uT%02d:%02d:%02dZ",
+                      static_cast<int>(calendar.year()), static_cast<unsigned>(calendar.month()),
+                      static_cast<unsigned>(calendar.day()), static_cast<int>(clock.hours().count()),
+                      static_cast<int>(clock.minutes().count()), static_cast<int>(clock.seconds().count()));
+    return {buffer.data(), static_cast<std::size_t>(length)};
+}
+
+std::string describeArray(const PropertyList::Array& array) {
+    std::string text = "(";
+    std::string_view separator;
+    for (const PropertyList& element : array) {
+        text.append(separator).append(describe(element));
+        separator = ", ";
+    }
+    return text += ')';
+}
+
+std::string describeDictionary(const PropertyList::Dictionary& dictionary) {
+    std::string text = "{";
+    std::string_view separator;
+    for (const auto& [key, value] : dictionary) {
+        text.append(separator).append(key).append(" = ").append(describe(value));
+        separator = "; ";
+    }
+    return text += '}';
+}
+
+} // namespace
+
+std::string describe(std::string_view value) {
+    return std::string(value);
+}
+
+std::string describe(const char* value) {
+    return std::string(value ? std::string_view(value) : kNone);
+}
+
+std::string describe(std::int64_t value) {
+    return toDecimal(value);
+}
+
+std::string describe(std::uint64_t value) {
+    return toDecimal(value);
+}
+
+std::string describe(double value) {
+    return toDecimal(value);
+}
+
+std::string describe(const std::exception& value) {
+    return value.what();
+}
+
+std::string describe(const std::exception_ptr& value) {
+    if (!value) {
+        return std::string(kNone);
+    }
+    try {
+        std::rethrow_exception(value);
+    } catch (const std::exception& exception) {
+        return describe(exception);
+    } catch (...) {
+        return "unknown exception";
+    }
+}
+
+std::string describe(const PropertyList& value) {
+    switch (value.type()) {
+    case PropertyList::Type::Dictionary:
+        return describeDictionary(*value.dictionary());
+    case PropertyList::Type::Array:
+        return describeArray(*value.array());
+    case PropertyList::Type::String:
+        return *value.string();
+    case PropertyList::Type::Integer:
+        return value.integer() ? describe(*value.integer()) : describe(*value.unsignedInteger());
+    case PropertyList::Type::Real:
+        return describe(*value.real());
+    case PropertyList::Type::Boolean:
+        return describe(*value.boolean());
+    case PropertyList::Type::Data:
+        return describeData(*value.data());
+    case PropertyList::Type::Date:
+        return describeDate(*value.date());
+    }
+    return {};
+}
+
+} // namespace welcomer::text
