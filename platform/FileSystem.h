@@ -4,9 +4,9 @@
 
 #include "platform/Error.h"
 
+#include <cstdint>
 #include <optional>
 #include <string>
-#include <sys/types.h>
 #include <vector>
 
 namespace welcomer::platform {
@@ -25,7 +25,7 @@ class FileSystem {
     // Creates one folder, not its parents.
     //  mode  its permissions, whatever the process's mask
     // Fails with EEXIST when anything is at the path. Any thread.
-    virtual Outcome createDirectory(const std::string& path, mode_t mode) = 0;
+    virtual Outcome createDirectory(const std::string& path, std::uint32_t mode) = 0;
 
     // Copies a file's content and permissions. Fails with EEXIST when anything is at the destination, which
     // is then untouched; on any failure nothing of the copy is left behind. Any thread.

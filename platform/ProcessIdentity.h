@@ -2,8 +2,8 @@
 
 #pragma once
 
+#include <cstdint>
 #include <string>
-#include <sys/types.h>
 #include <vector>
 
 namespace welcomer::platform {
@@ -13,7 +13,7 @@ class ProcessIdentity {
     virtual ~ProcessIdentity() = default;
 
     // Any thread.
-    virtual uid_t effectiveUserID() = 0;
+    virtual std::uint32_t effectiveUserID() = 0;
 
     // The login name of the effective user, or the user id in decimal when the password database has no
     // entry. Any thread.

@@ -1,0 +1,137 @@
+#!/usr/bin/env python3
+"""Checks that the folders of a source tree include only what is on lower floors, without cycles.
+
+usage: check-layers.py [TREE]
+
+Prints one line per finding and exits 1 when there is any. See the README's section on the floors.
+"""
+
+import re
+import sys
+from pathlib import Path
+
+FLOORS = {
+    "propertylist": 1,
+    "sdk": 1,
+    "text": 2,
+    "platform": 2,
+    "log": 3,
+    "handoff": 4,
+    "plugins": 4,
+    "network": 4,
+    "switch": 4,
+    "cloud": 5,
+    "state": 6,
+    "agent": 6,
+    "tools": 7,
+}
+# What the folders beside the floors may include, besides themselves.
+SIDES = {
+    "backends": {"platform", "propertylist"},
+    "examples": {"sdk"},
+}
+# Free to include everything: nothing includes them.
+TESTS = {"tests"}
+# The only files, besides tests and the backends themselves, that may choose a backend.
+PROGRAMS = re.compile(r"^(agent/main\.cpp|tools/[^/]+/main\.cpp)$")
+
+SOURCES = {".h", ".hpp", ".c", ".cpp"}
+INCLUDE = re.compile(r'^\s*#\s*include\s*([<"])([^>"]+)[>"]')
+# A header of the standard library: no folder, no ending. C's own have one, and the SDK's C header needs them.
+STANDARD = re.compile(r"^[a-z_0-9]+$")
+STANDARD_C = {"stdbool.h", "stddef.h", "stdint.h"}
+
+
+def source_files(tree):
+    for folder in sorted([*FLOORS, *SIDES, *TESTS]):
+        for path in sorted((tree / folder).rglob("*")):
+            if path.suffix in SOURCES and path.is_file():
+                yield path.relative_to(tree)
+
+
+def includes(path):
+    for number, line in enumerate(path.read_text(encoding="utf-8").splitlines(), 1):
+        match = INCLUDE.match(line)
+        if match:
+            yield number, match.group(1) == '"', match.group(2)
+
+
+def refusal(source, target, quoted, tree):
+    """Why this file may not include that one, or None."""
+    room = source.parts[0]
+    if not quoted:
+        sdk_own = room in ("sdk", "examples") and target.startswith("welcomer/")
+        if room in FLOORS and FLOORS[room] <= 6 and not sdk_own:
+            if not STANDARD.match(target) and not (room == "sdk" and target in STANDARD_C):
+                return "is on floors 1 to 6, which use the standard library alone"
+        return None
+    if not (tree / target).is_file():
+        if target.startswith("generated/"):
+            return None
+        return "names a file that is not in the tree (paths start at the root)"
+    aim = target.split("/")[0]
+    if aim in TESTS:
+        return "includes a test"
+    if aim == "backends" and room != "backends":
+        if target == "backends/Backends.h" and PROGRAMS.match(str(source)):
+            return None
+        return "chooses a backend; only a program's main.cpp does"
+    if aim == room:
+        return None
+    if room in SIDES:
+        return None if aim in SIDES[room] else f"{room}/ includes {', '.join(sorted(SIDES[room]))} only"
+    if FLOORS[aim] >= FLOORS[room]:
+        return f"{aim}/ (floor {FLOORS[aim]}) is not below {room}/ (floor {FLOORS[room]})"
+    return None
+
+
+def cycles(graph):
+    """Each include cycle once, as the list of its files."""
+    state, stack, found = {}, [], []
+
+    def visit(node):
+        state[node] = "open"
+        stack.append(node)
+        for target in graph.get(node, ()):
+            if state.get(target) == "open":
+                found.append(stack[stack.index(target) :] + [target])
+            elif target not in state:
+                visit(target)
+        stack.pop()
+        state[node] = "done"
+
+    for node in sorted(graph):
+        if node not in state:
+            visit(node)
+    return found
+
+
+def check(tree):
+    findings, graph, count = [], {}, 0
+    for source in source_files(tree):
+        count += 1
+        graph[str(source)] = []
+        for line, quoted, target in includes(tree / source):
+            if quoted and (tree / target).is_file():
+                graph[str(source)].append(target)
+            why = None if source.parts[0] in TESTS else refusal(source, target, quoted, tree)
+            if why:
+                findings.append(f"{source}:{line}: {target}: {why}")
+    findings += [f"include cycle: {' -> '.join(cycle)}" for cycle in cycles(graph)]
+    if count == 0:
+        findings.append(f"{tree}: no source files")
+    return findings, count
+
+
+def main():
+    tree = Path(sys.argv[1] if len(sys.argv) > 1 else Path(__file__).resolve().parents[2])
+    findings, count = check(tree)
+    for finding in findings:
+        print(finding)
+    if not findings:
+        print(f"{count} files, each includes only lower floors")
+    return 1 if findings else 0
+
+
+if __name__ == "__main__":
+    sys.exit(main())

@@ -1,0 +1,71 @@
+#!/usr/bin/env python3
+"""The layer check finds what it is there to find."""
+
+import importlib.util
+import tempfile
+import unittest
+from pathlib import Path
+
+HERE = Path(__file__).resolve().parent
+loader = importlib.util.spec_from_file_location("check_layers", HERE / "check-layers.py")
+check_layers = importlib.util.module_from_spec(loader)
+loader.loader.exec_module(check_layers)
+
+
+class CheckLayers(unittest.TestCase):
+    def findings(self, files):
+        with tempfile.TemporaryDirectory() as folder:
+            tree = Path(folder)
+            for name, text in files.items():
+                path = tree / name
+                path.parent.mkdir(parents=True, exist_ok=True)
+                path.write_text(text, encoding="utf-8")
+            return check_layers.check(tree)[0]
+
+    def assert_one(self, files, text):
+        findings = self.findings(files)
+        self.assertEqual(len(findings), 1, findings)
+        self.assertIn(text, findings[0])
+
+    def test_lower_floors_are_allowed(self):
+        self.assertEqual(
+            self.findings({
+                "log/A.cpp": '#include "text/B.h"\n#include <string>\n#include "log/A.h"\n',
+                "log/A.h": "",
+                "text/B.h": "",
+                "tests/T.cpp": '#include "log/A.h"\n#include <gtest/gtest.h>\n',
+            }), [])
+
+    def test_upwards_is_found(self):
+        self.assert_one({"text/A.h": '#include "log/B.h"\n', "log/B.h": ""}, "not below")
+
+    def test_sideways_is_found(self):
+        self.assert_one({"plugins/A.h": '#include "handoff/B.h"\n', "handoff/B.h": ""}, "not below")
+
+    def test_a_cycle_within_a_folder_is_found(self):
+        self.assert_one({"log/A.h": '#include "log/B.h"\n', "log/B.h": '#include "log/A.h"\n'}, "include cycle")
+
+    def test_a_backend_that_includes_the_system_is_found(self):
+        self.assert_one({"backends/local/A.h": '#include "log/B.h"\n', "log/B.h": ""}, "backends/ includes")
+
+    def test_only_a_program_chooses_a_backend(self):
+        backend = {"backends/Backends.h": ""}
+        use = '#include "backends/Backends.h"\n'
+        self.assertEqual(self.findings({**backend, "agent/main.cpp": use, "tools/welcomer/main.cpp": use}), [])
+        self.assert_one({**backend, "agent/Agent.cpp": use}, "chooses a backend")
+        self.assert_one({**backend, "tools/welcomer/TryCommand.cpp": use}, "chooses a backend")
+
+    def test_system_headers_on_the_inner_floors_are_found(self):
+        self.assert_one({"handoff/A.cpp": "#include <unistd.h>\n"}, "standard library alone")
+        self.assert_one({"agent/A.cpp": "#include <sys/stat.h>\n"}, "standard library alone")
+        self.assertEqual(self.findings({"backends/local/A.cpp": "#include <unistd.h>\n"}), [])
+
+    def test_a_missing_file_is_found(self):
+        self.assert_one({"log/A.cpp": '#include "A.h"\n'}, "not in the tree")
+
+    def test_an_empty_tree_is_found(self):
+        self.assert_one({}, "no source files")
+
+
+if __name__ == "__main__":
+    unittest.main()
