@@ -1,0 +1,149 @@
+#include "tests/fakes/FakeCredentialStore.h"
+
+#include <algorithm>
+#include <utility>
+
+namespace welcomer::fakes {
+
+namespace {
+
+class Reference final : public platform::CredentialItemReference {
+  public:
+    Reference(std::string service, std::string account)
+        : _service(std::move(service)),
+          _account(std::move(account)) {}
+
+    const std::string& service() const { return _service; }
+    const std::string& account() const { return _account; }
+
+  private:
+    std::string _service;
+    std::string _account;
+};
+
+} // namespace
+
+std::int32_t FakeCredentialStore::statusOf(Operation operation) const {
+    const auto found = _statuses.find(operation);
+    return found == _statuses.end() ? platform::kCredentialSuccess : found->second;
+}
+
+std::vector<FakeCredentialStore::StoredItem>::iterator FakeCredentialStore::find(const std::string& service,
+                                                                                 const std::string& account) {
+    return std::find_if(_items.begin(), _items.end(), [&](const StoredItem& stored) {
+        return stored.item.service == service && stored.item.account == account;
+    });
+}
+
+std::int32_t FakeCredentialStore::createTrustedApplication(const std::string& path,
+                                                           platform::TrustedApplication& application) {
+    _recorder.record("CredentialStore.createTrustedApplication " + path);
+    const std::lock_guard lock(_mutex);
+    if (const std::int32_t status = statusOf(Operation::CreateTrustedApplication)) {
+        return status;
+    }
+    if (!path.starts_with('/')) {
+        return platform::kCredentialInvalidPath;
+    }
+    application.path = path;
+    return platform::kCredentialSuccess;
+}
+
+std::int32_t FakeCredentialStore::createAccess(const std::string& description,
+                                               std::vector<platform::TrustedApplication> trustedApplications,
+                                               platform::CredentialAccess& access) {
+    _recorder.record("CredentialStore.createAccess " + description);
+    const std::lock_guard lock(_mutex);
+    if (const std::int32_t status = statusOf(Operation::CreateAccess)) {
+        return status;
+    }
+    access = {description, std::move(trustedApplications)};
+    return platform::kCredentialSuccess;
+}
+
+std::int32_t FakeCredentialStore::createItem(const platform::CredentialItem& item, const std::string& data) {
+    _recorder.record("CredentialStore.createItem " + item.service + ", " + item.account);
+    const std::lock_guard lock(_mutex);
+    if (const std::int32_t status = statusOf(Operation::CreateItem)) {
+        return status;
+    }
+    if (find(item.service, item.account) != _items.end()) {
+        return platform::kCredentialDuplicateItem;
+    }
+    _items.push_back({item, data});
+    return platform::kCredentialSuccess;
+}
+
+std::int32_t FakeCredentialStore::findItem(const std::string& service, const std::string& account,
+                                           std::string* data,
+                                           std::unique_ptr<platform::CredentialItemReference>* reference) {
+    _recorder.record("CredentialStore.findItem " + service + ", " + account);
+    const std::lock_guard lock(_mutex);
+    if (const std::int32_t status = statusOf(Operation::FindItem)) {
+        return status;
+    }
+    const auto found = find(service, account);
+    if (found == _items.end()) {
+        return platform::kCredentialItemNotFound;
+    }
+    if (data) {
+        *data = found->data;
+    }
+    if (reference) {
+        *reference = std::make_unique<Reference>(service, account);
+    }
+    return platform::kCredentialSuccess;
+}
+
+std::int32_t FakeCredentialStore::readAttributes(const platform::CredentialItemReference& reference,
+                                                 platform::CredentialItem& item) {
+    const auto& key = dynamic_cast<const Reference&>(reference);
+    _recorder.record("CredentialStore.readAttributes " + key.service() + ", " + key.account());
+    const std::lock_guard lock(_mutex);
+    if (const std::int32_t status = statusOf(Operation::ReadAttributes)) {
+        return status;
+    }
+    const auto found = find(key.service(), key.account());
+    if (found == _items.end()) {
+        return platform::kCredentialItemNotFound;
+    }
+    item = found->item;
+    return platform::kCredentialSuccess;
+}
+
+std::int32_t FakeCredentialStore::deleteItem(const platform::CredentialItemReference& reference) {
+    const auto& key = dynamic_cast<const Reference&>(reference);
+    _recorder.record("CredentialStore.deleteItem " + key.service() + ", " + key.account());
+    const std::lock_guard lock(_mutex);
+    if (const std::int32_t status = statusOf(Operation::DeleteItem)) {
+        return status;
+    }
+    const auto found = find(key.service(), key.account());
+    if (found == _items.end()) {
+        return platform::kCredentialItemNotFound;
+    }
+    _items.erase(found);
+    return platform::kCredentialSuccess;
+}
+
+std::vector<FakeCredentialStore::StoredItem> FakeCredentialStore::items() const {
+    const std::lock_guard lock(_mutex);
+    return _items;
+}
+
+void FakeCredentialStore::put(const platform::CredentialItem& item, const std::string& data) {
+    const std::lock_guard lock(_mutex);
+    const auto found = find(item.service, item.account);
+    if (found == _items.end()) {
+        _items.push_back({item, data});
+    } else {
+        *found = {item, data};
+    }
+}
+
+void FakeCredentialStore::setStatus(Operation operation, std::int32_t status) {
+    const std::lock_guard lock(_mutex);
+    _statuses[operation] = status;
+}
+
+} // namespace welcomer::fakes
