@@ -1,0 +1,315 @@
+#include "propertylist/TextPropertyListReader.h"
+
+#include "propertylist/PropertyListReadError.h"
+#include "propertylist/UTF8.h"
+
+#include <algorithm>
+
+namespace welcomer {
+
+namespace {
+
+constexpr bool isWhiteSpace(char character) {
+    return character == ' ' || (character >= '\t' && character <= '\r');
+}
+
+constexpr bool isWordCharacter(char character) {
+    return (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
+           (character >= '0' && character <= '9') ||
+           std::string_view("_$/:.-").find(character) != std::string_view::npos;
+}
+
+// The value of a hexadecimal digit, or 16 when the character is none.
+constexpr unsigned hexadecimalDigit(char character) {
+    if (character >= '0' && character <= '9') {
+        return static_cast<unsigned>(character - '0');
+    }
+    const char lower = static_cast<char>(character | 0x20);
+    return lower >= 'a' && lower <= 'f' ? static_cast<unsigned>(lower - 'a' + 10) : 16;
+}
+
+class TextPropertyListReader {
+  public:
+    explicit TextPropertyListReader(std::string_view bytes) : _bytes(bytes) {}
+
+    PropertyList readDocument() {
+        if (const std::size_t offset = findInvalidUTF8(_bytes); offset != std::string_view::npos) {
+            fail(offset, "invalid UTF-8");
+        }
+        skip("\xEF\xBB\xBF");
+        skipIgnorable();
+        if (isAtEnd()) {
+            fail(_offset, "there is no value");
+        }
+        const std::size_t start = _offset;
+        PropertyList value = readValue();
+        skipIgnorable();
+        if (value.isString() && isNext("=")) {
+            _offset = start;
+            ++_depth;
+            return readEntries("");
+        }
+        if (!isAtEnd()) {
+            fail(_offset, "unexpected content after the top-level value");
+        }
+        return value;
+    }
+
+  private:
+    [[noreturn]] static void fail(std::size_t offset, const std::string& what) {
+        throw PropertyListReadError(what, offset);
+    }
+
+    bool isAtEnd() const { return _offset == _bytes.size(); }
+    char current() const { return _bytes[_offset]; }
+    bool isNext(std::string_view text) const { return _bytes.substr(_offset).starts_with(text); }
+
+    bool skip(std::string_view text) {
+        const bool found = isNext(text);
+        if (found) {
+            _offset += text.size();
+        }
+        return found;
+    }
+
+    // Passes over white space and comments.
+    void skipIgnorable() {
+        while (!isAtEnd()) {
+            const std::size_t start = _offset;
+            if (isWhiteSpace(current())) {
+                ++_offset;
+            } else if (skip("//")) {
+                _offset = std::min(_bytes.find_first_of("\r\n", _offset), _bytes.size());
+            } else if (skip("/*")) {
+                const std::size_t end = _bytes.find("*/", _offset);
+                if (end == std::string_view::npos) {
+                    fail(start, "unterminated comment");
+                }
+                _offset = end + 2;
+            } else {
+                return;
+            }
+        }
+    }
+
+    void expect(std::string_view text) {
+        skipIgnorable();
+        if (!skip(text)) {
+            fail(_offset, "expected \"" + std::string(text) + "\", found " + describeNext());
+        }
+    }
+
+    std::string describeNext() const {
+        return isAtEnd() ? "the end" : "\"" + excerpt(_bytes.substr(_offset, 1)) + "\"";
+    }
+
+    void enter() {
+        if (++_depth > kPropertyListMaximumDepth) {
+            fail(_offset, "nested more than " + std::to_string(kPropertyListMaximumDepth) + " deep");
+        }
+    }
+
+    // Reads the value at the next place that is not to be ignored.
+    PropertyList readValue() {
+        skipIgnorable();
+        if (isNext("{")) {
+            enter();
+            ++_offset;
+            return readEntries("}");
+        }
+        if (isNext("(")) {
+            return readArray();
+        }
+        if (isNext("<")) {
+            return readData();
+        }
+        return readString();
+    }
+
+    // Reads the entries of a dictionary through its `end`, or to the end of the document if that is empty.
+    PropertyList readEntries(std::string_view end) {
+        PropertyList::Dictionary dictionary;
+        for (;;) {
+            skipIgnorable();
+            if (end.empty() ? isAtEnd() : skip(end)) {
+                --_depth;
+                return PropertyList(std::move(dictionary));
+            }
+            std::string key = readString();
+            expect("=");
+            PropertyList value = readValue();
+            expect(";");
+            dictionary.insert_or_assign(std::move(key), std::move(value));
+        }
+    }
+
+    PropertyList readArray() {
+        enter();
+        ++_offset;
+        PropertyList::Array array;
+        for (;;) {
+            skipIgnorable();
+            if (skip(")")) {
+                break;
+            }
+            array.push_back(readValue());
+            skipIgnorable();
+            if (!skip(",")) {
+                expect(")");
+                break;
+            }
+        }
+        --_depth;
+        return PropertyList(std::move(array));
+    }
+
+    PropertyList readData() {
+        const std::size_t start = _offset++;
+        PropertyList::Data data;
+        unsigned high = 16; // the first digit of a byte, 16 before it
+        for (; !isAtEnd(); ++_offset) {
+            if (isWhiteSpace(current())) {
+                continue;
+            }
+            if (current() == '>') {
+                if (high != 16) {
+                    fail(_offset, "data ends within a byte");
+                }
+                ++_offset;
+                return PropertyList(std::move(data));
+            }
+            const unsigned digit = hexadecimalDigit(current());
+            if (digit == 16) {
+                fail(_offset, "expected a hexadecimal digit, found " + describeNext());
+            }
+            if (high == 16) {
+                high = digit;
+            } else {
+                data.bytes += static_cast<char>(high << 4 | digit);
+                high = 16;
+            }
+        }
+        fail(start, "unterminated data");
+    }
+
+    // A quoted string or a word.
+    std::string readString() {
+        if (isNext("\"") || isNext("'")) {
+            return readQuotedString();
+        }
+        const std::size_t start = _offset;
+        // Slashes belong to the word, so that addresses need no quotes; an asterisk cannot.
+        while (!isAtEnd() && isWordCharacter(current()) && !isNext("/*")) {
+            ++_offset;
+        }
+        if (_offset == start) {
+            fail(start, "expected a value, found " + describeNext());
+        }
+        return std::string(_bytes.substr(start, _offset - start));
+    }
+
+    std::string readQuotedString() {
+        const std::size_t start = _offset;
+        const char quote = _bytes[_offset++];
+        const char endings[] = {quote, '\\'};
+        std::string text;
+        for (;;) {
+            const std::size_t end = _bytes.find_first_of({endings, 2}, _offset);
+            if (end == std::string_view::npos) {
+                fail(start, "unterminated string");
+            }
+            text += _bytes.substr(_offset, end - _offset);
+            _offset = end + 1;
+            if (_bytes[end] == quote) {
+                return text;
+            }
+            if (isAtEnd()) {
+                fail(start, "unterminated string");
+            }
+            readEscape(text, end);
+        }
+    }
+
+    // Reads what follows a backslash, which stands at `start`.
+    void readEscape(std::string& text, std::size_t start) {
+        const char character = current();
+        if (character >= '0' && character <= '7') {
+            appendUTF8(text, readDigits(3, 8, start));
+            return;
+        }
+        ++_offset;
+        switch (character) {
+        case 'a':
+            text += '\a';
+            break;
+        case 'b':
+            text += '\b';
+            break;
+        case 'f':
+            text += '\f';
+            break;
+        case 'n':
+            text += '\n';
+            break;
+        case 'r':
+            text += '\r';
+            break;
+        case 't':
+            text += '\t';
+            break;
+        case 'v':
+            text += '\v';
+            break;
+        case 'U':
+            appendUTF8(text, readUTF16(start));
+            break;
+        default:
+            text += character;
+            break;
+        }
+    }
+
+    // Reads at least one and at most `most` digits of an escape.
+    char32_t readDigits(int most, unsigned base, std::size_t start) {
+        char32_t value = 0;
+        int count = 0;
+        for (; count < most && !isAtEnd() && hexadecimalDigit(current()) < base; ++count, ++_offset) {
+            value = value * base + hexadecimalDigit(current());
+        }
+        if (count == 0) {
+            fail(start, "an escape without digits");
+        }
+        return value;
+    }
+
+    // Reads the unit of a \U escape and, when it is the first half of a pair, the escape after it.
+    char32_t readUTF16(std::size_t start) {
+        const char32_t unit = readDigits(4, 16, start);
+        if (isHighSurrogate(unit) && skip("\\U")) {
+            const char32_t low = readDigits(4, 16, start);
+            if (isLowSurrogate(low)) {
+                return joinSurrogates(unit, low);
+            }
+        }
+        if (isHighSurrogate(unit) || isLowSurrogate(unit)) {
+            fail(start, "half a surrogate pair");
+        }
+        return unit;
+    }
+
+    const std::string_view _bytes;
+    std::size_t _offset = 0;
+    int _depth = 0; // of dictionaries and arrays around the current place
+};
+
+} // namespace
+
+PropertyListReadResult readTextPropertyList(std::string_view bytes) {
+    try {
+        return {TextPropertyListReader(bytes).readDocument(), {}};
+    } catch (const PropertyListReadError& error) {
+        return failureAtLineAndColumn(bytes, error);
+    }
+}
+
+} // namespace welcomer
