@@ -1,0 +1,38 @@
+// The replay item: what the setup application leaves in the user's credential store for the agent of the next
+// login. At most one exists. WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup writes it.
+
+#pragma once
+
+#include "propertylist/PropertyList.h"
+
+#include <string>
+
+namespace welcomer {
+
+// The item's look-up key. Its label is the user's cloud account name, its data the replay object as an XML
+// property list.
+inline constexpr const char* kReplayItemService = "Welcomer Nimbus Replay Data";
+inline constexpr const char* kReplayItemAccount = "Welcomer";
+
+// What the agent reads from the replay object: under the first key a dictionary whose entry under the second
+// maps delegate identifiers to their responses, and two arrays of strings.
+inline constexpr const char* kReplayResponsesKey = "delegatesResponseDict";
+inline constexpr const char* kReplayDelegatesKey = "delegates";
+inline constexpr const char* kReplayVidlinkAliasesKey = "vlAliases";
+inline constexpr const char* kReplayChatterAliasesKey = "imAliases";
+
+// Reads the replay item.
+//  replayObject  where to put the replay object, or null: then nothing is deserialised. Any property-list
+//                format is accepted. Written as soon as it has been read, also when the account name then
+//                cannot be.
+//  accountName   where to put the cloud account name, or null: then it is not read. Written on success only.
+//  result        whether everything that was asked for was read; else one log line says why
+// The agent calls this on its main thread; may block while another process changes the credential store.
+bool WLGetNimbusReplayKeychainItem(PropertyList* replayObject, std::string* accountName);
+
+// Deletes the replay item.
+//  result  whether it was there and is gone now; else one log line with the credential store's status
+// The agent calls this on its main thread; may block while another process changes the credential store.
+bool WLDeleteNimbusReplayKeychainItem();
+
+} // namespace welcomer
