@@ -1,0 +1,73 @@
+#include "agent/wlnimbussetup.h"
+
+#include "agent/selfDestruct.h"
+#include "handoff/LaunchAgentFile.h"
+#include "handoff/ReplayItem.h"
+#include "log/PCLogManager.h"
+#include "platform/Platform.h"
+
+#include <chrono>
+#include <exception>
+#include <memory>
+#include <string>
+
+namespace welcomer {
+
+namespace {
+
+using namespace std::chrono_literals;
+
+// Carries out one step. What gets out of it, which only a lack of memory or of threads should, keeps no later
+// step from its work.
+template <class Step>
+void attempt(const Step& step) {
+    try {
+        step();
+    } catch (...) {
+        WL_LOG("exception in wlnimbussetup: %@", std::current_exception());
+    }
+}
+
+// The run loop's slices keep alive what plug-ins schedule on the main thread. There is no overall limit.
+void waitFor(platform::WorkGroup& group) {
+    while (!group.wait(100ms)) {
+        attempt([] { platform::current().runLoops.current()->run(1s); });
+    }
+}
+
+// For what plug-ins have started outside the group. The port keeps the run loop from returning at once.
+void linger() {
+    WL_LOG("delaying exit by two minutes");
+    const auto runLoop = platform::current().runLoops.current();
+    const auto port = runLoop->attachPort();
+    runLoop->run(120s);
+}
+
+void finishSetup(const std::string& label, const DelegatePluginSource& plugins) {
+    attempt([&] { selfDestruct(label); });
+    const std::shared_ptr<platform::WorkGroup> group = platform::current().dispatchQueues.createGroup();
+    PropertyList replayObject;
+    std::string accountName;
+    if (!WLGetNimbusReplayKeychainItem(&replayObject, &accountName)) {
+        return;
+    }
+    // Before any use of its contents, so that a crash never replays it twice.
+    attempt([] { WLDeleteNimbusReplayKeychainItem(); });
+    attempt([&] { wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, group, plugins); });
+    attempt([&] { waitFor(*group); });
+    attempt(linger);
+}
+
+} // namespace
+
+int wlnimbussetup(int argc, const char* const* argv, const DelegatePluginSource& plugins) {
+    try {
+        attempt([&] { finishSetup(argc >= 2 ? argv[1] : kLaunchAgentLabel, plugins); });
+        WL_LOG("exiting");
+    } catch (...) {
+        // What cannot even be logged does not change how the agent ends.
+    }
+    return 0;
+}
+
+} // namespace welcomer

@@ -1,0 +1,111 @@
+#include "agent/wlnimbussetup_RemainingDelegateSetup.h"
+
+#include "agent/DelegateCompletion.h"
+#include "handoff/ReplayItem.h"
+#include "log/PCLogManager.h"
+#include "platform/Platform.h"
+#include "plugins/DelegateIdentifiers.h"
+#include "text/Format.h"
+
+#include <map>
+#include <utility>
+#include <vector>
+
+namespace welcomer {
+
+namespace {
+
+using Aliases = std::optional<std::vector<std::string>>;
+
+// One delegate that has a response.
+struct DelegateWork {
+    std::shared_ptr<WLFirstRunDelegateConfiguration> plugin;
+    PropertyList response;
+};
+
+// None when there is no such array. What is no string in it is left out.
+Aliases aliasesFromReplayObject(const PropertyList& replayObject, const char* key) {
+    const PropertyList* entry = replayObject.find(key);
+    const PropertyList::Array* array = entry ? entry->array() : nullptr;
+    if (!array) {
+        return std::nullopt;
+    }
+    std::vector<std::string> aliases;
+    for (const PropertyList& element : *array) {
+        if (const std::string* alias = element.string()) {
+            aliases.push_back(*alias);
+        }
+    }
+    return aliases;
+}
+
+long count(const Aliases& aliases) {
+    return aliases ? static_cast<long>(aliases->size()) : 0;
+}
+
+const PropertyList* findResponse(const PropertyList& replayObject,
+                                 const std::optional<std::string>& identifier) {
+    const PropertyList* responses = replayObject.find(kReplayResponsesKey);
+    const PropertyList* delegates = responses ? responses->find(kReplayDelegatesKey) : nullptr;
+    return delegates && identifier ? delegates->find(*identifier) : nullptr;
+}
+
+} // namespace
+
+void wlnimbussetup_RemainingDelegateSetup(const PropertyList& replayObject,
+                                          [[maybe_unused]] const std::optional<std::string>& text,
+                                          const std::shared_ptr<platform::WorkGroup>& group,
+                                          const DelegatePluginSource& plugins) {
+    const Aliases vidlinkAliases = aliasesFromReplayObject(replayObject, kReplayVidlinkAliasesKey);
+    const Aliases chatterAliases = aliasesFromReplayObject(replayObject, kReplayChatterAliasesKey);
+    WL_LOG("Vidlink: %ld aliases", count(vidlinkAliases));
+    WL_LOG("Chatter: %ld aliases", count(chatterAliases));
+
+    std::map<std::string, DelegateWork> work;
+    for (const auto& plugin : plugins()) {
+        std::optional<std::string> identifier;
+        try {
+            identifier = plugin->delegateIdentifier();
+        } catch (...) {
+            WL_LOG("exception querying plugin %@ for id: %@", *plugin, std::current_exception());
+            continue;
+        }
+        if (const PropertyList* response = findResponse(replayObject, identifier)) {
+            work.insert_or_assign(*identifier, DelegateWork{plugin, *response});
+        } else {
+            WL_LOG("no cached response for %@", identifier);
+        }
+    }
+
+    platform::DispatchQueues& queues = platform::current().dispatchQueues;
+    const auto messagingQueue =
+        queues.createSerial("com.corvid.wlnimbussetup -- com.corvid.vidlink & com.corvid.chatter");
+    for (auto& [identifier, delegate] : work) {
+        const bool isVidlink = identifier == kVidlinkIdentifier;
+        const bool isMessaging = isVidlink || identifier == kChatterIdentifier;
+        const auto queue =
+            isMessaging ? messagingQueue
+                        : queues.createSerial(text::format("com.corvid.wlnimbussetup -- %@", identifier));
+        WL_LOG("setting up %@", identifier);
+        const auto completion = std::make_shared<DelegateCompletion>(identifier, group, queue);
+        std::function<void()> job;
+        if (isMessaging) {
+            job = [completion, delegate = std::move(delegate),
+                   aliases = isVidlink ? vidlinkAliases : chatterAliases] {
+                completion->completeWithAliases(*delegate.plugin, delegate.response, aliases);
+            };
+        } else {
+            job = [completion, delegate = std::move(delegate)] {
+                completion->complete(*delegate.plugin, delegate.response);
+            };
+        }
+        try {
+            queue->async(std::move(job));
+        } catch (...) {
+            // A queue without the means to take the job: the agent must not wait for it.
+            completion->raised(std::current_exception());
+        }
+    }
+}
+
+} // namespace welcomer
