@@ -1,0 +1,65 @@
+// The current user's preferences on any host, in named domains.
+
+#pragma once
+
+#include "propertylist/PropertyList.h"
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace welcomer::platform {
+
+// The domain of the application's standard defaults.
+inline constexpr char kStandardDefaultsDomain[] = "com.corvid.welcomer";
+
+// How a value reads where a boolean is wanted: a boolean as itself, a number as whether it differs from 0, a
+// string as whether it is "yes" or "true" in any case or a number that differs from 0. Anything else, and no
+// value, is false. Any thread.
+bool booleanReading(const std::optional<PropertyList>& value);
+
+// How a value reads where an integer is wanted: an integer as itself, a real truncated towards 0, a string
+// that is a decimal number from end to end as that number. What lies beyond 64 bits is the nearest end of
+// their range. Anything else, booleans among it, and no value is 0. Any thread.
+std::int64_t integerReading(const std::optional<PropertyList>& value);
+
+// What a store found in place of a domain: something that is no property list or holds no dictionary.
+struct DamagedPreferences {
+    std::string domain;
+    std::string reason;       // one line
+    std::string setAsidePath; // where the damaged content is now; empty while it is still in its place
+    friend bool operator==(const DamagedPreferences&, const DamagedPreferences&) = default;
+};
+
+// Changes are seen by this store at once and by others after `synchronise`; what others have changed is seen
+// after `synchronise`, and when a domain is first used. A domain that is damaged counts as empty; it is never
+// overwritten, but set aside. A domain's name is a reverse-domain name; one that is empty or holds a slash
+// names a domain that is always empty and never synchronises.
+class PreferenceStore {
+  public:
+    virtual ~PreferenceStore() = default;
+
+    // A copy of the value, or none when the domain has no such key. Any thread; may read a file.
+    virtual std::optional<PropertyList> copyValue(const std::string& key, const std::string& domain) = 0;
+
+    // Sets or removes a value. Any thread; changes no file.
+    virtual void setValue(const std::string& key, const PropertyList& value, const std::string& domain) = 0;
+    virtual void removeValue(const std::string& key, const std::string& domain) = 0;
+
+    // Brings a domain and this store in line: stores the keys that were changed here, and those alone, and
+    // then sees what others have stored. All or nothing, also when the process is killed meanwhile; without
+    // changes nothing is written.
+    //  result  false when the changes could not be stored; they are kept, and the next call tries again
+    // Any thread and any process; may block while another process synchronises.
+    virtual bool synchronise(const std::string& domain) = 0;
+
+    // The damage that this store has met so far, in order. Any thread.
+    virtual std::vector<DamagedPreferences> damagedPreferences() = 0;
+
+    // The application's standard defaults, read as `copyValue` reads. Any thread.
+    bool booleanDefault(const std::string& key);
+    std::int64_t integerDefault(const std::string& key);
+};
+
+} // namespace welcomer::platform
