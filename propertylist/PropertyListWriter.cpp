@@ -24,8 +24,8 @@ class WriteError : public std::runtime_error {
 // because a reader takes a bare one for a line feed.
 constexpr auto kNeedsEscape = [] {
     std::array<bool, 256> needsEscape{};
-    for (const unsigned char character : {'&', '<', '>', '\r'}) {
-        needsEscape[character] = true;
+    for (const char character : {'&', '<', '>', '\r'}) {
+        needsEscape[static_cast<unsigned char>(character)] = true;
     }
     return needsEscape;
 }();

@@ -1,0 +1,11 @@
+#include "propertylist/BinaryPropertyListReader.h"
+#include "tests/fuzz/Require.h"
+
+#include <cstddef>
+#include <cstdint>
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t size) {
+    welcomer::requireWellFormed(
+        welcomer::readBinaryPropertyList({reinterpret_cast<const char*>(bytes), size}));
+    return 0;
+}
