@@ -28,7 +28,7 @@ class WorkGroup {
   public:
     virtual ~WorkGroup() = default;
 
-    // Any thread. Each enter is matched by one leave.
+    // Any thread. Each enter is matched by one leave; a leave without its enter does nothing.
     virtual void enter() = 0;
     virtual void leave() = 0;
 

@@ -19,9 +19,10 @@ class RunLoop {
   public:
     virtual ~RunLoop() = default;
 
-    // Processes performed blocks and attached sources until the duration is over. Returns at once when
-    // nothing is attached and nothing is pending; a block that is pending is run even when the duration is 0.
-    // Only on the loop's own thread, also from within a block.
+    // Processes performed blocks and attached sources until the duration is over, or until nothing is
+    // attached and nothing is pending; with neither at the start it returns at once. Blocks that are pending
+    // at the start are run even when the duration is 0 or less. Only on the loop's own thread, also from
+    // within a block.
     virtual void run(std::chrono::nanoseconds duration) = 0;
 
     // Has the loop's thread run a block, in the order of the calls, and wakes the loop. Any thread. The block
