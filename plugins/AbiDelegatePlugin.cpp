@@ -1,0 +1,204 @@
+#include "plugins/AbiDelegatePlugin.h"
+
+#include "plugins/CompletionHandlers.h"
+#include "plugins/PluginText.h"
+#include "plugins/PropertyListHandles.h"
+#include "propertylist/UTF8.h"
+
+#include <cstddef>
+#include <exception>
+#include <string_view>
+#include <utility>
+
+namespace welcomer {
+
+namespace {
+
+// The sizes of the first version; members that are added later are looked at only where a plug-in has them.
+constexpr std::size_t kDescriptorSize =
+    offsetof(wl_delegate_plugin_descriptor, destroy) + sizeof(wl_delegate_plugin_descriptor::destroy);
+constexpr std::size_t kInstanceSize = offsetof(wl_delegate, messaging_aliases_from_response) +
+                                      sizeof(wl_delegate::messaging_aliases_from_response);
+
+// Calls into a plug-in: `call` gets the error slot. Whatever leaves the plug-in's function, also an exception
+// of another runtime, ends here as a raise.
+template <class Call>
+auto callPlugin(ErrorSlot& slot, Call call) -> decltype(call(slot.handle())) {
+    try {
+        return call(slot.handle());
+    } catch (const std::exception& exception) {
+        slot.raise(exception.what());
+    } catch (...) {
+        slot.raise("unknown exception");
+    }
+    return decltype(call(slot.handle()))();
+}
+
+void throwIfRaised(const ErrorSlot& slot) {
+    if (slot.raised()) {
+        throw DelegatePluginException(slot.message());
+    }
+}
+
+template <class Function>
+void throwIfMissing(Function* function, const char* operation) {
+    if (!function) {
+        throw DelegatePluginException(std::string(operation) + " is not implemented");
+    }
+}
+
+// Calls a completion operation, whose handler does nothing more once it has raised.
+template <class Call>
+void callCompletion(WLFirstRunDelegateConfiguration::CompletionHandler handler, Call call) {
+    const wl_completion_handler issued = issueCompletionHandler(std::move(handler));
+    ErrorSlot slot;
+    callPlugin(slot, [&](wl_error_slot* handle) { call(issued, handle); });
+    if (slot.raised()) {
+        revokeCompletionHandler(issued);
+        throw DelegatePluginException(slot.message());
+    }
+}
+
+} // namespace
+
+const wl_delegate_plugin_descriptor* AbiDelegatePlugin::principalClass(const void* symbol,
+                                                                       std::string& reason) {
+    const auto* descriptor = static_cast<const wl_delegate_plugin_descriptor*>(symbol);
+    if (!descriptor) {
+        reason = "no symbol " WL_DELEGATE_PLUGIN_SYMBOL;
+    } else if (descriptor->abi_version != WL_DELEGATE_PLUGIN_ABI_VERSION) {
+        reason = "ABI version " + std::to_string(descriptor->abi_version) + " instead of " +
+                 std::to_string(WL_DELEGATE_PLUGIN_ABI_VERSION);
+    } else if (descriptor->size < kDescriptorSize) {
+        reason = "the exported structure has " + std::to_string(descriptor->size) + " bytes instead of " +
+                 std::to_string(kDescriptorSize);
+    } else {
+        return descriptor;
+    }
+    return nullptr;
+}
+
+bool AbiDelegatePlugin::conformsToProtocol(const wl_delegate_plugin_descriptor& principalClass) {
+    return principalClass.protocol &&
+           std::string_view(principalClass.protocol) == WL_DELEGATE_PLUGIN_PROTOCOL;
+}
+
+std::shared_ptr<AbiDelegatePlugin>
+AbiDelegatePlugin::create(const wl_delegate_plugin_descriptor& principalClass) {
+    if (!principalClass.create) {
+        return nullptr;
+    }
+    ErrorSlot slot;
+    wl_delegate* const instance = callPlugin(
+        slot, [&](wl_error_slot* handle) { return principalClass.create(&delegatePluginHost(), handle); });
+    if (!instance) {
+        throwIfRaised(slot);
+        return nullptr;
+    }
+    // From here on the destructor gives the instance back.
+    const std::shared_ptr<AbiDelegatePlugin> plugin(new AbiDelegatePlugin(principalClass, instance));
+    throwIfRaised(slot);
+    if (instance->size < kInstanceSize) {
+        return nullptr;
+    }
+    return plugin;
+}
+
+AbiDelegatePlugin::~AbiDelegatePlugin() {
+    if (_principalClass.destroy) {
+        ErrorSlot slot; // nobody is left to hear of it
+        callPlugin(slot, [this](wl_error_slot*) { _principalClass.destroy(_instance); });
+    }
+}
+
+std::optional<std::string> AbiDelegatePlugin::delegateIdentifier() {
+    throwIfMissing(_instance->delegate_identifier, "delegateIdentifier");
+    ErrorSlot slot;
+    const char* const identifier = callPlugin(
+        slot, [this](wl_error_slot* handle) { return _instance->delegate_identifier(_instance, handle); });
+    throwIfRaised(slot);
+    if (!identifier) {
+        return std::nullopt;
+    }
+    if (findInvalidUTF8(identifier) != std::string_view::npos) {
+        throw DelegatePluginException("delegateIdentifier returned no UTF-8");
+    }
+    return identifier;
+}
+
+std::optional<PropertyList> AbiDelegatePlugin::delegateSetupRequest() {
+    throwIfMissing(_instance->delegate_setup_request, "delegateSetupRequest");
+    ErrorSlot slot;
+    auto request = takeHandle(callPlugin(slot, [this](wl_error_slot* handle) {
+        return _instance->delegate_setup_request(_instance, handle);
+    }));
+    throwIfRaised(slot);
+    if (request && !request->isDictionary()) {
+        throw DelegatePluginException("delegateSetupRequest returned no dictionary");
+    }
+    return request;
+}
+
+void AbiDelegatePlugin::completeSetupWithResponseHandler(const PropertyList& response,
+                                                         CompletionHandler handler) {
+    throwIfMissing(_instance->complete_setup_with_response, "completeSetupWithResponse:handler:");
+    callCompletion(std::move(handler), [&](wl_completion_handler issued, wl_error_slot* slot) {
+        _instance->complete_setup_with_response(_instance, borrowedHandle(response), issued, slot);
+    });
+}
+
+void AbiDelegatePlugin::terminateSetupCompletion() {
+    if (!_instance->terminate_setup_completion) {
+        return;
+    }
+    ErrorSlot slot;
+    callPlugin(slot,
+               [this](wl_error_slot* handle) { _instance->terminate_setup_completion(_instance, handle); });
+    throwIfRaised(slot);
+}
+
+void AbiDelegatePlugin::completeSetupWithResponseChosenAliasesHandler(
+    const PropertyList& response, const std::optional<std::vector<std::string>>& aliases,
+    CompletionHandler handler) {
+    throwIfMissing(_instance->complete_setup_with_response_chosen_aliases,
+                   "completeSetupWithResponse:chosenAliases:handler:");
+    std::optional<PropertyList> array;
+    if (aliases) {
+        array = PropertyList::Array(aliases->begin(), aliases->end());
+    }
+    callCompletion(std::move(handler), [&](wl_completion_handler issued, wl_error_slot* slot) {
+        _instance->complete_setup_with_response_chosen_aliases(
+            _instance, borrowedHandle(response), array ? borrowedHandle(*array) : nullptr, issued, slot);
+    });
+}
+
+std::optional<std::vector<std::string>>
+AbiDelegatePlugin::messagingAliasesFromResponse(const PropertyList& response) {
+    throwIfMissing(_instance->messaging_aliases_from_response, "messagingAliasesFromResponse:");
+    ErrorSlot slot;
+    auto aliases = takeHandle(callPlugin(slot, [&](wl_error_slot* handle) {
+        return _instance->messaging_aliases_from_response(_instance, borrowedHandle(response), handle);
+    }));
+    throwIfRaised(slot);
+    if (!aliases) {
+        return std::nullopt;
+    }
+    if (!aliases->isArray()) {
+        throw DelegatePluginException("messagingAliasesFromResponse: returned no array");
+    }
+    std::vector<std::string> texts;
+    for (PropertyList& alias : *aliases->array()) {
+        if (!alias.isString()) {
+            throw DelegatePluginException(
+                "messagingAliasesFromResponse: returned an alias that is no string");
+        }
+        texts.push_back(std::move(*alias.string()));
+    }
+    return texts;
+}
+
+std::string AbiDelegatePlugin::className() const {
+    return _principalClass.class_name ? pluginText(_principalClass.class_name) : "(unnamed)";
+}
+
+} // namespace welcomer

@@ -1,0 +1,20 @@
+#include "plugins/PluginText.h"
+
+#include "propertylist/UTF8.h"
+
+namespace welcomer {
+
+std::string pluginText(std::string_view text) {
+    std::string result;
+    for (;;) {
+        const std::size_t invalid = findInvalidUTF8(text);
+        result += text.substr(0, invalid);
+        if (invalid == std::string_view::npos) {
+            return result;
+        }
+        appendUTF8(result, U'\uFFFD');
+        text.remove_prefix(invalid + 1);
+    }
+}
+
+} // namespace welcomer

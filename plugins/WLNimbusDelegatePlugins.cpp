@@ -1,0 +1,125 @@
+#include "plugins/WLNimbusDelegatePlugins.h"
+
+#include "log/PCLogManager.h"
+#include "platform/Platform.h"
+#include "plugins/AbiDelegatePlugin.h"
+
+#include <exception>
+#include <string_view>
+#include <unordered_set>
+#include <utility>
+
+namespace welcomer {
+
+namespace {
+
+// The part behind the last point; a point that begins the name begins no extension.
+std::string_view pathExtension(std::string_view fileName) {
+    const std::size_t point = fileName.rfind('.');
+    return point == std::string_view::npos || point == 0 ? std::string_view() : fileName.substr(point + 1);
+}
+
+// Loading runs the library's own initialisers, which may throw.
+const wl_delegate_plugin_descriptor* loadPrincipalClass(const std::string& path, std::string& reason) {
+    try {
+        const platform::PluginSymbol symbol =
+            platform::current().pluginBundle.load(path, WL_DELEGATE_PLUGIN_SYMBOL);
+        if (symbol.address) {
+            return AbiDelegatePlugin::principalClass(symbol.address, reason);
+        }
+        reason = symbol.reason;
+    } catch (...) {
+        reason = text::describe(std::current_exception());
+    }
+    return nullptr;
+}
+
+// A new instance, or null; one that raises is none.
+std::shared_ptr<WLFirstRunDelegateConfiguration>
+makeInstance(const wl_delegate_plugin_descriptor& principalClass, std::string& reason) {
+    try {
+        auto plugin = AbiDelegatePlugin::create(principalClass);
+        if (!plugin) {
+            reason = "made no plug-in object";
+        }
+        return plugin;
+    } catch (...) {
+        reason = text::describe(std::current_exception());
+        return nullptr;
+    }
+}
+
+// Loads and checks one entry. On return either the plug-in and its identifier are set, or the reason.
+void loadEntry(PluginScanEntry& entry) {
+    const auto* principalClass =
+        loadPrincipalClass(std::string(kPluginDirectory) + "/" + entry.fileName, entry.reason);
+    if (!principalClass) {
+        WL_LOG("Nimbus Plugins: Failed to get principal class for %@", entry.fileName);
+        return;
+    }
+    if (!AbiDelegatePlugin::conformsToProtocol(*principalClass)) {
+        WL_LOG("Nimbus Plugins: Principal class for %@ does not conform to protocol", entry.fileName);
+        entry.reason = "does not conform to " WL_DELEGATE_PLUGIN_PROTOCOL;
+        return;
+    }
+    auto plugin = makeInstance(*principalClass, entry.reason);
+    if (!plugin) {
+        WL_LOG("Nimbus Plugins: Failed to init plugin object for %@", entry.fileName);
+        return;
+    }
+    try {
+        entry.identifier = plugin->delegateIdentifier();
+    } catch (...) {
+        const std::exception_ptr exception = std::current_exception();
+        WL_LOG("Nimbus Plugins: Exception querying '%@' for id on load: %@", entry.fileName, exception);
+        entry.reason = text::describe(exception);
+        return;
+    }
+    if (!entry.identifier) {
+        WL_LOG("Nimbus Plugins: '%@' does not specify a plugin identifier", entry.fileName);
+        entry.reason = "has no identifier";
+        return;
+    }
+    entry.plugin = std::move(plugin);
+}
+
+DelegatePluginArray loadDelegatePlugins() {
+    DelegatePluginArray plugins;
+    for (PluginScanEntry& entry : scanDelegatePlugins()) {
+        if (entry.plugin) {
+            plugins.push_back(std::move(entry.plugin));
+        }
+    }
+    return plugins;
+}
+
+} // namespace
+
+std::vector<PluginScanEntry> scanDelegatePlugins() {
+    std::vector<PluginScanEntry> entries;
+    std::unordered_set<std::string> identifiers;
+    const auto fileNames = platform::current().fileSystem.list(kPluginDirectory);
+    for (const std::string& fileName : fileNames.value_or(std::vector<std::string>())) {
+        if (pathExtension(fileName) != kPluginExtension) {
+            continue;
+        }
+        PluginScanEntry& entry = entries.emplace_back();
+        entry.fileName = fileName;
+        loadEntry(entry);
+        if (entry.plugin && !identifiers.insert(*entry.identifier).second) {
+            WL_LOG("Nimbus Plugins: duplicate plugins with id '%@', only one will be used",
+                   *entry.identifier);
+            entry.plugin.reset();
+            entry.reason = "another plug-in has the same identifier";
+        }
+    }
+    return entries;
+}
+
+const DelegatePluginArray& WLNimbusDelegatePlugins() {
+    // Never destroyed: completions may still run while the process ends.
+    static const auto* const plugins = new DelegatePluginArray(loadDelegatePlugins());
+    return *plugins;
+}
+
+} // namespace welcomer
