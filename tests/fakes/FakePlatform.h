@@ -1,0 +1,41 @@
+// All of the platform in memory, on simulated time.
+
+#pragma once
+
+#include "backends/simulated/VirtualTime.h"
+#include "platform/Platform.h"
+#include "tests/fakes/CallRecorder.h"
+#include "tests/fakes/FakeCredentialStore.h"
+#include "tests/fakes/FakeFileSystem.h"
+#include "tests/fakes/FakePluginBundle.h"
+#include "tests/fakes/FakeProcessIdentity.h"
+#include "tests/fakes/FakeResourceBundles.h"
+#include "tests/fakes/FakeSystemLog.h"
+
+namespace welcomer::fakes {
+
+// A test makes one, sets up its members and installs it:
+//     FakePlatform fake;
+//     const platform::ScopedPlatform installed(fake.platform());
+class FakePlatform {
+  public:
+    // Every call to any of the fakes, in order.
+    CallRecorder recorder;
+
+    FakeSystemLog systemLog{recorder};
+    FakeFileSystem fileSystem{recorder};
+    FakeProcessIdentity processIdentity{recorder, fileSystem};
+    FakeCredentialStore credentialStore{recorder};
+    FakePluginBundle pluginBundle{recorder};
+    FakeResourceBundles resourceBundles{recorder};
+    simulated::VirtualTime virtualTime; // the clock, the run loops and the queues
+
+    // Borrowed: lives as long as this object.
+    const platform::Platform& platform() const { return _platform; }
+
+  private:
+    platform::Platform _platform{systemLog,       fileSystem,  processIdentity, credentialStore, pluginBundle,
+                                 resourceBundles, virtualTime, virtualTime,     virtualTime};
+};
+
+} // namespace welcomer::fakes
