@@ -25,6 +25,16 @@ DelegateCompletion::DelegateCompletion(std::string identifier, std::shared_ptr<p
     _group->enter();
 }
 
+void DelegateCompletion::queue(std::function<void()> job) {
+    // A hold of its own, since the outcome may release the queue at any moment from here on.
+    const auto queue = _queue;
+    try {
+        queue->async(std::move(job));
+    } catch (...) {
+        raised(std::current_exception());
+    }
+}
+
 void DelegateCompletion::complete(WLFirstRunDelegateConfiguration& plugin, const PropertyList& response) {
     const auto handler = [self = shared_from_this()](bool succeeded,
                                                      const std::optional<platform::Error>& error) {

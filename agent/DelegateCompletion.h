@@ -8,6 +8,7 @@
 #include <atomic>
 #include <chrono>
 #include <exception>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -24,6 +25,10 @@ class DelegateCompletion : public std::enable_shared_from_this<DelegateCompletio
     // Main thread.
     DelegateCompletion(std::string identifier, std::shared_ptr<platform::WorkGroup> group,
                        std::shared_ptr<platform::DispatchQueue> queue);
+
+    // Puts the job that completes the delegate on the queue. A queue without the means to take it counts as
+    // an exception of the plug-in: nobody must wait for that job. Main thread.
+    void queue(std::function<void()> job);
 
     // Calls the plug-in with the response alone, or with the aliases that the user chose as well. Nothing
     // that the plug-in throws gets out. On the delegate's queue.

@@ -88,22 +88,15 @@ void wlnimbussetup_RemainingDelegateSetup(const PropertyList& replayObject,
                         : queues.createSerial(text::format("com.corvid.wlnimbussetup -- %@", identifier));
         WL_LOG("setting up %@", identifier);
         const auto completion = std::make_shared<DelegateCompletion>(identifier, group, queue);
-        std::function<void()> job;
         if (isMessaging) {
-            job = [completion, delegate = std::move(delegate),
-                   aliases = isVidlink ? vidlinkAliases : chatterAliases] {
+            completion->queue([completion, delegate = std::move(delegate),
+                               aliases = isVidlink ? vidlinkAliases : chatterAliases] {
                 completion->completeWithAliases(*delegate.plugin, delegate.response, aliases);
-            };
+            });
         } else {
-            job = [completion, delegate = std::move(delegate)] {
+            completion->queue([completion, delegate = std::move(delegate)] {
                 completion->complete(*delegate.plugin, delegate.response);
-            };
-        }
-        try {
-            queue->async(std::move(job));
-        } catch (...) {
-            // A queue without the means to take the job: the agent must not wait for it.
-            completion->raised(std::current_exception());
+            });
         }
     }
 }
