@@ -1,0 +1,207 @@
+#include "agent/DelegateCompletion.h"
+
+#include "log/PCLogManager.h"
+#include "tests/fakes/FakePlatform.h"
+#include "tests/unit/agent/TestDelegate.h"
+
+#include <gtest/gtest.h>
+#include <memory>
+#include <stdexcept>
+#include <string>
+#include <system_error>
+#include <utility>
+#include <vector>
+
+namespace welcomer {
+namespace {
+
+using namespace std::chrono_literals;
+using Lines = std::vector<std::string>;
+
+// Counts, so that a test sees every enter and leave.
+class CountingGroup final : public platform::WorkGroup {
+  public:
+    int entered = 0;
+    int left = 0;
+
+    void enter() override { ++entered; }
+    void leave() override { ++left; }
+    bool wait(std::chrono::nanoseconds) override { return entered == left; }
+};
+
+class DirectQueue final : public platform::DispatchQueue {
+  public:
+    void async(std::function<void()> block) override { block(); }
+    void asyncAfter(std::chrono::nanoseconds, std::function<void()> block) override { block(); }
+};
+
+class FullQueue final : public platform::DispatchQueue {
+  public:
+    void async(std::function<void()>) override {
+        throw std::system_error(std::make_error_code(std::errc::resource_unavailable_try_again), "no thread");
+    }
+    void asyncAfter(std::chrono::nanoseconds, std::function<void()> block) override {
+        async(std::move(block));
+    }
+};
+
+class DelegateCompletionTest : public testing::Test {
+  protected:
+    fakes::FakePlatform fake;
+    const platform::ScopedPlatform installed{fake.platform()};
+    std::shared_ptr<CountingGroup> group = std::make_shared<CountingGroup>();
+    std::shared_ptr<platform::DispatchQueue> queue = std::make_shared<DirectQueue>();
+    std::shared_ptr<DelegateCompletion> completion = std::make_shared<DelegateCompletion>("d", group, queue);
+    TestDelegate plugin{"d"};
+};
+
+TEST_F(DelegateCompletionTest, EntersTheGroupWhenMadeAndLeavesItOnceWithItsOutcome) {
+    EXPECT_EQ(group->entered, 1);
+    EXPECT_EQ(group->left, 0);
+    completion->complete(plugin, "response");
+    EXPECT_EQ(group->entered, 1);
+    EXPECT_EQ(group->left, 1);
+}
+
+TEST_F(DelegateCompletionTest, TheLineIsLoggedBeforeTheGroupIsLeft) {
+    PCLogManager::sharedManager().setObserver(
+        [this](const PCLogManager::Call&) { EXPECT_EQ(group->left, 0); });
+    completion->complete(plugin, "response");
+    PCLogManager::sharedManager().setObserver({});
+    EXPECT_EQ(group->left, 1);
+    EXPECT_EQ(fake.systemLog.lines(), (Lines{"d setup: completed (0.000 seconds)"}));
+}
+
+TEST_F(DelegateCompletionTest, HoldsItsQueueUntilTheOutcome) {
+    const std::weak_ptr<platform::DispatchQueue> watched = std::exchange(queue, nullptr);
+    CompletionHandler kept;
+    plugin.complete = [&](const CompletionHandler& handler) {
+        kept = handler;
+    };
+    completion->complete(plugin, "response");
+    EXPECT_FALSE(watched.expired());
+    kept(true, std::nullopt);
+    EXPECT_TRUE(watched.expired());
+}
+
+TEST_F(DelegateCompletionTest, AnExceptionReleasesTheQueueToo) {
+    const std::weak_ptr<platform::DispatchQueue> watched = std::exchange(queue, nullptr);
+    completion->raised(std::make_exception_ptr(std::runtime_error("no")));
+    EXPECT_TRUE(watched.expired());
+}
+
+TEST_F(DelegateCompletionTest, AHandlerThatIsKeptKeepsThePluginFromNothing) {
+    auto keeper = std::make_shared<TestDelegate>("keeper");
+    CompletionHandler kept;
+    keeper->complete = [&kept](const CompletionHandler& handler) {
+        kept = handler;
+    };
+    completion->queue([completion = completion, keeper] { completion->complete(*keeper, "response"); });
+    const std::weak_ptr<TestDelegate> watched = keeper;
+    keeper.reset();
+    EXPECT_TRUE(watched.expired());
+    kept(false, std::nullopt);
+    EXPECT_EQ(group->left, 1);
+}
+
+TEST_F(DelegateCompletionTest, AQueueThatCannotTakeTheJobCountsAsAnException) {
+    completion = std::make_shared<DelegateCompletion>("d", group, std::make_shared<FullQueue>());
+    completion->queue([] { FAIL() << "the job was not taken"; });
+    EXPECT_EQ(group->left, 1);
+    const Lines lines = fake.systemLog.lines();
+    ASSERT_EQ(lines.size(), 1U);
+    const std::string beginning = "exception in setup response for plugin d (0.000 seconds): no thread";
+    EXPECT_EQ(lines[0].substr(0, beginning.size()), beginning);
+}
+
+TEST_F(DelegateCompletionTest, HandlerThenRaiseLogsBothAndLeavesOnce) {
+    plugin.complete = [](const CompletionHandler& handler) {
+        handler(true, std::nullopt);
+        throw std::runtime_error("too late");
+    };
+    completion->completeWithAliases(plugin, "response", std::nullopt);
+    EXPECT_EQ(group->left, 1);
+    EXPECT_EQ(fake.systemLog.lines(),
+              (Lines{"d setup+chosen: completed (0.000 seconds)",
+                     "exception in setup response for plugin d (0.000 seconds): too late"}));
+}
+
+TEST_F(DelegateCompletionTest, RaiseThenHandlerLogsTheRaiseAloneAndLeavesOnce) {
+    CompletionHandler kept;
+    plugin.complete = [&](const CompletionHandler& handler) {
+        kept = handler;
+        throw std::runtime_error("first");
+    };
+    completion->complete(plugin, "response");
+    EXPECT_EQ(group->left, 1);
+    kept(true, std::nullopt);
+    EXPECT_EQ(group->left, 1);
+    EXPECT_EQ(fake.systemLog.lines(),
+              (Lines{"exception in setup response for plugin d (0.000 seconds): first"}));
+}
+
+TEST_F(DelegateCompletionTest, TheHandlersSecondCallDoesNothing) {
+    plugin.complete = [](const CompletionHandler& handler) {
+        handler(true, std::nullopt);
+        handler(false, platform::Error{1, "again"});
+    };
+    completion->complete(plugin, "response");
+    completion = std::make_shared<DelegateCompletion>("e", group, queue);
+    completion->completeWithAliases(plugin, "response", std::nullopt);
+    EXPECT_EQ(group->left, 2);
+    EXPECT_EQ(fake.systemLog.lines(),
+              (Lines{"d setup: completed (0.000 seconds)", "e setup+chosen: completed (0.000 seconds)"}));
+}
+
+TEST_F(DelegateCompletionTest, WhateverAPluginThrowsIsCaughtAndLogged) {
+    plugin.complete = [](const CompletionHandler&) {
+        throw 42;
+    };
+    completion->complete(plugin, "response");
+    completion = std::make_shared<DelegateCompletion>("d", group, queue);
+    completion->completeWithAliases(plugin, "response", std::nullopt);
+    EXPECT_EQ(group->left, 2);
+    const Lines lines = fake.systemLog.lines();
+    ASSERT_EQ(lines.size(), 2U);
+    const std::string beginning = "exception in setup response for plugin d (0.000 seconds): ";
+    for (const std::string& line : lines) {
+        EXPECT_EQ(line.substr(0, beginning.size()), beginning);
+        EXPECT_GT(line.size(), beginning.size()) << "the exception is missing";
+    }
+}
+
+TEST_F(DelegateCompletionTest, AFailureLogsTheErrorOrNone) {
+    plugin.complete = [](const CompletionHandler& handler) {
+        handler(false, platform::Error{5, "server said no"});
+    };
+    completion->complete(plugin, "response");
+    completion = std::make_shared<DelegateCompletion>("e", group, queue);
+    plugin.complete = [](const CompletionHandler& handler) {
+        handler(false, std::nullopt);
+    };
+    completion->completeWithAliases(plugin, "response", std::nullopt);
+    EXPECT_EQ(fake.systemLog.lines(),
+              (Lines{"d setup: server said no (0.000 seconds)", "e setup+chosen: (null) (0.000 seconds)"}));
+}
+
+TEST_F(DelegateCompletionTest, SuccessWithAnErrorIsCompleted) {
+    plugin.complete = [](const CompletionHandler& handler) {
+        handler(true, platform::Error{5, "ignored"});
+    };
+    completion->complete(plugin, "response");
+    EXPECT_EQ(fake.systemLog.lines(), (Lines{"d setup: completed (0.000 seconds)"}));
+}
+
+TEST_F(DelegateCompletionTest, SecondsAreCountedFromTheStartWithThreeDecimals) {
+    fake.virtualTime.sleep(1234567us);
+    completion->complete(plugin, "response");
+    completion = std::make_shared<DelegateCompletion>("e", group, queue);
+    fake.virtualTime.sleep(61s + 500ms);
+    completion->raised(std::make_exception_ptr(std::runtime_error("no")));
+    EXPECT_EQ(fake.systemLog.lines(),
+              (Lines{"d setup: completed (1.235 seconds)",
+                     "exception in setup response for plugin e (61.500 seconds): no"}));
+}
+
+} // namespace
+} // namespace welcomer

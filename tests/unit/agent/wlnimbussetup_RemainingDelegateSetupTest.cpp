@@ -1,0 +1,357 @@
+#include "agent/wlnimbussetup_RemainingDelegateSetup.h"
+
+#include "tests/fakes/FakePlatform.h"
+#include "tests/unit/agent/TestDelegate.h"
+
+#include <algorithm>
+#include <gtest/gtest.h>
+#include <stdexcept>
+#include <string>
+#include <thread>
+#include <vector>
+
+namespace welcomer {
+namespace {
+
+using namespace std::chrono_literals;
+using Lines = std::vector<std::string>;
+
+const std::string kSharedQueue = "com.corvid.wlnimbussetup -- com.corvid.vidlink & com.corvid.chatter";
+
+class RemainingDelegateSetupTest : public testing::Test {
+  protected:
+    TestDelegate& add(const std::string& identifier) {
+        auto plugin = std::make_shared<TestDelegate>(identifier);
+        plugins.push_back(plugin);
+        return *plugin;
+    }
+
+    // Gives a delegate a cached response.
+    void respond(const std::string& identifier, PropertyList response = "response") {
+        responses.insert_or_assign(identifier, std::move(response));
+    }
+
+    void setUp(const PropertyList& replayObject) {
+        wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, group,
+                                             [this]() -> const DelegatePluginArray& { return plugins; });
+    }
+
+    // Sets up with the responses and the other entries.
+    void setUp() {
+        PropertyList::Dictionary object = others;
+        object.try_emplace("delegatesResponseDict", PropertyList::Dictionary{{"delegates", responses}});
+        setUp(PropertyList(object));
+    }
+
+    void setUpAndFinish() {
+        setUp();
+        EXPECT_TRUE(group->wait(1h));
+    }
+
+    DelegatePluginArray plugins;
+    PropertyList::Dictionary responses;
+    PropertyList::Dictionary others; // further entries of the replay object
+    fakes::FakePlatform fake;
+    const platform::ScopedPlatform installed{fake.platform()};
+    const std::shared_ptr<platform::WorkGroup> group = fake.virtualTime.createGroup();
+};
+
+TEST_F(RemainingDelegateSetupTest, AliasesAreCountedBeforeThePluginsAreAskedFor) {
+    int asked = 0;
+    wlnimbussetup_RemainingDelegateSetup(
+        PropertyList::Dictionary{{"vlAliases", PropertyList::Array{"a", "b"}},
+                                 {"imAliases", PropertyList::Array{"c"}}},
+        std::nullopt, group, [&]() -> const DelegatePluginArray& {
+            ++asked;
+            EXPECT_EQ(fake.systemLog.lines().size(), 2U);
+            EXPECT_EQ(fake.virtualTime.queueNames(), Lines{});
+            return plugins;
+        });
+    EXPECT_EQ(asked, 1);
+    EXPECT_EQ(fake.systemLog.lines(), (Lines{"Vidlink: 2 aliases", "Chatter: 1 aliases"}));
+}
+
+TEST_F(RemainingDelegateSetupTest, AbsentAliasesCountAsZeroAndArePassedOnAsNone) {
+    TestDelegate& vidlink = add("com.corvid.vidlink");
+    TestDelegate& chatter = add("com.corvid.chatter");
+    respond("com.corvid.vidlink");
+    respond("com.corvid.chatter");
+    setUpAndFinish();
+    EXPECT_EQ(fake.systemLog.lines()[0], "Vidlink: 0 aliases");
+    EXPECT_EQ(fake.systemLog.lines()[1], "Chatter: 0 aliases");
+    for (const TestDelegate* plugin : {&vidlink, &chatter}) {
+        ASSERT_EQ(plugin->calls.size(), 1U);
+        ASSERT_TRUE(plugin->calls[0].aliases) << "called without the aliases";
+        EXPECT_EQ(*plugin->calls[0].aliases, std::nullopt);
+    }
+}
+
+TEST_F(RemainingDelegateSetupTest, EachMessagingDelegateGetsItsOwnAliasesAndResponse) {
+    others = {{"vlAliases", PropertyList::Array{"a", "b"}}, {"imAliases", PropertyList::Array{}}};
+    TestDelegate& vidlink = add("com.corvid.vidlink");
+    TestDelegate& chatter = add("com.corvid.chatter");
+    respond("com.corvid.vidlink", 1);
+    respond("com.corvid.chatter", 2);
+    setUpAndFinish();
+    ASSERT_EQ(vidlink.calls.size(), 1U);
+    EXPECT_EQ(vidlink.calls[0].response, PropertyList(1));
+    EXPECT_EQ(vidlink.calls[0].aliases.value(), Aliases(Lines{"a", "b"}));
+    ASSERT_EQ(chatter.calls.size(), 1U);
+    EXPECT_EQ(chatter.calls[0].response, PropertyList(2));
+    EXPECT_EQ(chatter.calls[0].aliases.value(), Aliases(Lines{}));
+}
+
+TEST_F(RemainingDelegateSetupTest, OtherDelegatesGetTheResponseAlone) {
+    others = {{"vlAliases", PropertyList::Array{"a"}}};
+    TestDelegate& storefront = add("com.corvid.storefront");
+    respond("com.corvid.storefront", PropertyList::Dictionary{{"k", "v"}});
+    setUpAndFinish();
+    ASSERT_EQ(storefront.calls.size(), 1U);
+    EXPECT_EQ(storefront.calls[0].response, PropertyList(PropertyList::Dictionary{{"k", "v"}}));
+    EXPECT_FALSE(storefront.calls[0].aliases);
+}
+
+TEST_F(RemainingDelegateSetupTest, WithoutResponsesEveryPluginIsLoggedAndNothingIsQueued) {
+    add("b");
+    add("a");
+    setUp(PropertyList());
+    EXPECT_EQ(fake.systemLog.lines(), (Lines{"Vidlink: 0 aliases", "Chatter: 0 aliases",
+                                             "no cached response for b", "no cached response for a"}));
+    EXPECT_TRUE(group->wait(0ns));
+    EXPECT_EQ(fake.virtualTime.queueNames(), Lines{kSharedQueue});
+}
+
+TEST_F(RemainingDelegateSetupTest, ResponsesWithoutAPluginAreIgnoredSilently) {
+    respond("com.corvid.gone");
+    setUpAndFinish();
+    EXPECT_EQ(fake.systemLog.lines(), (Lines{"Vidlink: 0 aliases", "Chatter: 0 aliases"}));
+}
+
+TEST_F(RemainingDelegateSetupTest, EntriesOfTheWrongTypeCountAsAbsent) {
+    add("a");
+    const Lines asIfAbsent{"Vidlink: 0 aliases", "Chatter: 0 aliases", "no cached response for a"};
+    for (const PropertyList& wrong : {PropertyList("text"), PropertyList(7), PropertyList(true),
+                                      PropertyList(PropertyList::Array{"a"})}) {
+        others = {{"delegatesResponseDict", wrong},
+                  {"vlAliases", "alias"},
+                  {"imAliases", PropertyList::Dictionary{{"alias", "a"}}}};
+        fake.systemLog.clear();
+        setUpAndFinish();
+        EXPECT_EQ(fake.systemLog.lines(), asIfAbsent);
+
+        others = {{"delegatesResponseDict", PropertyList::Dictionary{{"delegates", wrong}}}};
+        fake.systemLog.clear();
+        setUpAndFinish();
+        EXPECT_EQ(fake.systemLog.lines(), asIfAbsent);
+    }
+}
+
+TEST_F(RemainingDelegateSetupTest, AReplayObjectThatIsNoDictionaryHasNoEntries) {
+    add("a");
+    for (const PropertyList& object : {PropertyList("text"), PropertyList(PropertyList::Array{"a"})}) {
+        fake.systemLog.clear();
+        setUp(object);
+        EXPECT_EQ(fake.systemLog.lines(),
+                  (Lines{"Vidlink: 0 aliases", "Chatter: 0 aliases", "no cached response for a"}));
+    }
+}
+
+TEST_F(RemainingDelegateSetupTest, AliasesThatAreNoStringsCountAsAbsent) {
+    others = {{"vlAliases", PropertyList::Array{"a", 1, true, PropertyList::Array{"x"}, "b"}}};
+    TestDelegate& vidlink = add("com.corvid.vidlink");
+    respond("com.corvid.vidlink");
+    setUpAndFinish();
+    EXPECT_EQ(fake.systemLog.lines()[0], "Vidlink: 2 aliases");
+    ASSERT_EQ(vidlink.calls.size(), 1U);
+    EXPECT_EQ(vidlink.calls[0].aliases.value(), Aliases(Lines{"a", "b"}));
+}
+
+TEST_F(RemainingDelegateSetupTest, AResponseThatIsNoDictionaryIsHandedOverAsItStands) {
+    TestDelegate& plugin = add("a");
+    for (const PropertyList& response : {PropertyList("text"), PropertyList(7), PropertyList(false),
+                                         PropertyList(PropertyList::Data{"\x01"})}) {
+        respond("a", response);
+        setUpAndFinish();
+        ASSERT_FALSE(plugin.calls.empty());
+        EXPECT_EQ(plugin.calls.back().response, response);
+    }
+}
+
+TEST_F(RemainingDelegateSetupTest, APluginThatRaisesOnItsIdentifierIsLoggedAndSkipped) {
+    add("x").identify = []() -> std::optional<std::string> {
+        throw std::runtime_error("who am I");
+    };
+    add("y").identify = []() -> std::optional<std::string> {
+        throw 42;
+    };
+    TestDelegate& other = add("z");
+    respond("z");
+    setUpAndFinish();
+    const Lines lines = fake.systemLog.lines();
+    ASSERT_EQ(lines.size(), 6U);
+    EXPECT_EQ(lines[2], "exception querying plugin <TestDelegate> for id: who am I");
+    EXPECT_EQ(lines[3].substr(0, 49), "exception querying plugin <TestDelegate> for id: ");
+    EXPECT_EQ(lines[4], "setting up z");
+    EXPECT_EQ(other.calls.size(), 1U);
+}
+
+TEST_F(RemainingDelegateSetupTest, APluginWithoutAnIdentifierHasNoResponse) {
+    TestDelegate& plugin = add("x");
+    plugin.identify = [] {
+        return std::nullopt;
+    };
+    respond("x");
+    respond("");
+    setUpAndFinish();
+    EXPECT_EQ(fake.systemLog.lines().back(), "no cached response for (null)");
+    EXPECT_EQ(plugin.calls.size(), 0U);
+}
+
+TEST_F(RemainingDelegateSetupTest, TheWholeLogInItsOrder) {
+    add("com.corvid.vidlink").complete = [this](const CompletionHandler& handler) {
+        fake.virtualTime.global().asyncAfter(1250ms, [handler] { handler(true, std::nullopt); });
+    };
+    add("com.corvid.storefront").complete = [this](const CompletionHandler& handler) {
+        fake.virtualTime.global().asyncAfter(500ms, [handler] {
+            handler(false, platform::Error{3, "sold out"});
+        });
+    };
+    add("com.corvid.silent");
+    add("com.corvid.chatter").complete = [](const CompletionHandler&) {
+        throw std::runtime_error("hung up");
+    };
+    respond("com.corvid.vidlink");
+    respond("com.corvid.storefront");
+    respond("com.corvid.chatter");
+    setUpAndFinish();
+    EXPECT_EQ(fake.systemLog.lines(),
+              (Lines{"Vidlink: 0 aliases", "Chatter: 0 aliases", "no cached response for com.corvid.silent",
+                     "setting up com.corvid.chatter", "setting up com.corvid.storefront",
+                     "setting up com.corvid.vidlink",
+                     "exception in setup response for plugin com.corvid.chatter (0.000 seconds): hung up",
+                     "com.corvid.storefront setup: sold out (0.500 seconds)",
+                     "com.corvid.vidlink setup+chosen: completed (1.250 seconds)"}));
+    for (const auto& record : fake.systemLog.records()) {
+        EXPECT_EQ(record.priority, 115);
+    }
+}
+
+TEST_F(RemainingDelegateSetupTest, ItReturnsAfterQueueingWithTheGroupEntered) {
+    CompletionHandler kept;
+    TestDelegate& plugin = add("a");
+    plugin.complete = [&](const CompletionHandler& handler) {
+        kept = handler;
+    };
+    respond("a");
+    setUp();
+    EXPECT_EQ(plugin.calls.size(), 0U);
+    EXPECT_EQ(fake.systemLog.lines().back(), "setting up a");
+    EXPECT_FALSE(group->wait(1s));
+    EXPECT_EQ(plugin.calls.size(), 1U);
+    kept(true, std::nullopt);
+    EXPECT_TRUE(group->wait(0ns));
+}
+
+TEST_F(RemainingDelegateSetupTest, TheMessagingDelegatesShareAQueueAndEveryOtherHasItsOwn) {
+    for (const char* identifier :
+         {"com.corvid.storefront", "com.corvid.vidlink", "com.corvid.chatter", "a"}) {
+        add(identifier);
+        respond(identifier);
+    }
+    setUpAndFinish();
+    EXPECT_EQ(fake.virtualTime.queueNames(), (Lines{kSharedQueue, "com.corvid.wlnimbussetup -- a",
+                                                    "com.corvid.wlnimbussetup -- com.corvid.storefront"}));
+}
+
+TEST_F(RemainingDelegateSetupTest, TheMessagingDelegatesNeverRunAtOnceWhileTheOthersRunBeside) {
+    Lines events;
+    for (const std::string identifier : {"com.corvid.vidlink", "com.corvid.chatter", "a", "b"}) {
+        add(identifier).complete = [&, identifier](const CompletionHandler& handler) {
+            events.push_back(identifier + " begins");
+            fake.virtualTime.sleep(1s);
+            events.push_back(identifier + " ends");
+            handler(true, std::nullopt);
+        };
+        respond(identifier);
+    }
+    setUpAndFinish();
+    const auto at = [&](const std::string& event) {
+        return std::find(events.begin(), events.end(), event) - events.begin();
+    };
+    ASSERT_EQ(events.size(), 8U);
+    EXPECT_LT(at("com.corvid.chatter ends"), at("com.corvid.vidlink begins"));
+    for (const char* begin : {"a begins", "b begins", "com.corvid.chatter begins"}) {
+        for (const char* end : {"a ends", "b ends", "com.corvid.chatter ends"}) {
+            EXPECT_LT(at(begin), at(end));
+        }
+    }
+}
+
+TEST_F(RemainingDelegateSetupTest, AMessagingDelegateWaitsForTheOthersCallAndNotForItsHandler) {
+    CompletionHandler kept;
+    add("com.corvid.chatter").complete = [&](const CompletionHandler& handler) {
+        kept = handler;
+    };
+    TestDelegate& vidlink = add("com.corvid.vidlink");
+    respond("com.corvid.chatter");
+    respond("com.corvid.vidlink");
+    setUp();
+    EXPECT_FALSE(group->wait(1s));
+    EXPECT_EQ(vidlink.calls.size(), 1U);
+    kept(true, std::nullopt);
+    EXPECT_TRUE(group->wait(0ns));
+}
+
+TEST_F(RemainingDelegateSetupTest, ARaisingPluginHarmsNoOther) {
+    add("a").complete = [](const CompletionHandler&) {
+        throw 42;
+    };
+    TestDelegate& other = add("b");
+    respond("a");
+    respond("b");
+    setUpAndFinish();
+    EXPECT_EQ(other.calls.size(), 1U);
+    EXPECT_EQ(fake.systemLog.lines().back(), "b setup: completed (0.000 seconds)");
+}
+
+TEST_F(RemainingDelegateSetupTest, AHandlerMayBeCalledFromAnotherThreadAfterTheCallHasReturned) {
+    std::vector<std::thread> threads;
+    for (const char* identifier : {"a", "com.corvid.vidlink"}) {
+        add(identifier).complete = [&](const CompletionHandler& handler) {
+            for (int i = 0; i < 2; ++i) {
+                threads.emplace_back([handler] { handler(true, std::nullopt); });
+            }
+        };
+        respond(identifier);
+    }
+    setUp();
+    fake.virtualTime.settle();
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+    EXPECT_EQ(threads.size(), 4U);
+    EXPECT_TRUE(group->wait(0ns));
+    EXPECT_EQ(fake.systemLog.lines().size(), 6U) << "one outcome each";
+}
+
+TEST_F(RemainingDelegateSetupTest, OfTwoPluginsThatNowShareAnIdentifierOneRuns) {
+    TestDelegate& first = add("a");
+    TestDelegate& second = add("a");
+    respond("a");
+    setUpAndFinish();
+    EXPECT_EQ(first.calls.size() + second.calls.size(), 1U);
+}
+
+TEST_F(RemainingDelegateSetupTest, AThousandDelegatesAreEachCompletedOnce) {
+    for (int i = 0; i < 1000; ++i) {
+        add("delegate " + std::to_string(i));
+        respond("delegate " + std::to_string(i));
+    }
+    setUpAndFinish();
+    for (const auto& plugin : plugins) {
+        EXPECT_EQ(static_cast<TestDelegate&>(*plugin).calls.size(), 1U);
+    }
+}
+
+} // namespace
+} // namespace welcomer

@@ -1,0 +1,183 @@
+#include "handoff/ReplayItem.h"
+
+#include "propertylist/PropertyListWriter.h"
+#include "tests/fakes/FakePlatform.h"
+
+#include <gtest/gtest.h>
+#include <string>
+#include <vector>
+
+namespace welcomer {
+namespace {
+
+using Lines = std::vector<std::string>;
+using Operation = fakes::FakeCredentialStore::Operation;
+
+const std::string kKey = "Welcomer Nimbus Replay Data, Welcomer";
+
+class ReplayItemTest : public testing::Test {
+  protected:
+    void put(const std::string& data, const std::string& label = "anna@example.com") {
+        fake.credentialStore.put({"Welcomer Nimbus Replay Data", "Welcomer", label, std::nullopt}, data);
+    }
+
+    // Whether data that is no property list is refused with one log line, and the item stays.
+    void expectRefused(const std::string& data) {
+        put(data);
+        PropertyList replayObject = "untouched";
+        std::string accountName = "untouched";
+        EXPECT_FALSE(WLGetNimbusReplayKeychainItem(&replayObject, &accountName));
+        EXPECT_EQ(replayObject, PropertyList("untouched"));
+        EXPECT_EQ(accountName, "untouched");
+        const Lines lines = fake.systemLog.lines();
+        ASSERT_EQ(lines.size(), 1U);
+        const std::string beginning = "Failed to deserialize replayable data length: ";
+        EXPECT_EQ(lines[0].substr(0, beginning.size()), beginning);
+        EXPECT_GT(lines[0].size(), beginning.size()) << "the error is missing";
+        ASSERT_EQ(fake.credentialStore.items().size(), 1U);
+        EXPECT_EQ(fake.credentialStore.items()[0].data, data);
+    }
+
+    const PropertyList object{PropertyList::Dictionary{{"vlAliases", PropertyList::Array{"anna@example.com"}},
+                                                       {"delegatesResponseDict", PropertyList()}}};
+    fakes::FakePlatform fake;
+    const platform::ScopedPlatform installed{fake.platform()};
+};
+
+TEST_F(ReplayItemTest, TheReaderGivesTheObjectAndTheLabel) {
+    put(*writeXMLPropertyList(object), "Zo\xC3\xAB");
+    PropertyList replayObject;
+    std::string accountName;
+    EXPECT_TRUE(WLGetNimbusReplayKeychainItem(&replayObject, &accountName));
+    EXPECT_EQ(replayObject, object);
+    EXPECT_EQ(accountName, "Zo\xC3\xAB");
+    EXPECT_EQ(fake.recorder.calls(),
+              (Lines{"CredentialStore.findItem " + kKey, "CredentialStore.readAttributes " + kKey}));
+}
+
+TEST_F(ReplayItemTest, TheReaderDoesNotDeleteTheItem) {
+    put(*writeXMLPropertyList(object));
+    PropertyList replayObject;
+    EXPECT_TRUE(WLGetNimbusReplayKeychainItem(&replayObject, nullptr));
+    EXPECT_EQ(fake.credentialStore.items().size(), 1U);
+}
+
+TEST_F(ReplayItemTest, TheReaderGivesAnEmptyLabelAsAnEmptyAccountName) {
+    put(*writeXMLPropertyList(object), "");
+    std::string accountName = "before";
+    EXPECT_TRUE(WLGetNimbusReplayKeychainItem(nullptr, &accountName));
+    EXPECT_EQ(accountName, "");
+}
+
+TEST_F(ReplayItemTest, TheReaderWithoutAnItemLogsTheStatus) {
+    PropertyList replayObject = "untouched";
+    std::string accountName = "untouched";
+    EXPECT_FALSE(WLGetNimbusReplayKeychainItem(&replayObject, &accountName));
+    EXPECT_EQ(fake.systemLog.lines(), (Lines{"Failed to find replay keychain item: 2"}));
+    EXPECT_EQ(replayObject, PropertyList("untouched"));
+    EXPECT_EQ(accountName, "untouched");
+}
+
+TEST_F(ReplayItemTest, AnItemOfAnotherServiceOrAccountIsNotTheReplayItem) {
+    fake.credentialStore.put({"Welcomer Nimbus Replay Data", "Other", "", std::nullopt}, "{}");
+    fake.credentialStore.put({"Other", "Welcomer", "", std::nullopt}, "{}");
+    EXPECT_FALSE(WLGetNimbusReplayKeychainItem(nullptr, nullptr));
+    EXPECT_FALSE(WLDeleteNimbusReplayKeychainItem());
+    EXPECT_EQ(fake.credentialStore.items().size(), 2U);
+}
+
+TEST_F(ReplayItemTest, TheReaderLogsAStatusWithItsSign) {
+    put("{}");
+    fake.credentialStore.setStatus(Operation::FindItem, -25300);
+    EXPECT_FALSE(WLGetNimbusReplayKeychainItem(nullptr, nullptr));
+    EXPECT_EQ(fake.systemLog.lines(), (Lines{"Failed to find replay keychain item: -25300"}));
+}
+
+TEST_F(ReplayItemTest, TheReaderWithBothOutputsAbsentDeserialisesNothing) {
+    put("no property list at all <<<");
+    EXPECT_TRUE(WLGetNimbusReplayKeychainItem(nullptr, nullptr));
+    EXPECT_EQ(fake.recorder.calls(), (Lines{"CredentialStore.findItem " + kKey}));
+}
+
+TEST_F(ReplayItemTest, TheReaderWithoutAnObjectOutputReadsTheLabelAlone) {
+    put("no property list at all <<<");
+    std::string accountName;
+    EXPECT_TRUE(WLGetNimbusReplayKeychainItem(nullptr, &accountName));
+    EXPECT_EQ(accountName, "anna@example.com");
+    EXPECT_EQ(fake.systemLog.lines(), Lines{});
+}
+
+TEST_F(ReplayItemTest, TheReaderWithoutAnAccountNameOutputReadsNoLabel) {
+    put(*writeXMLPropertyList(object));
+    fake.credentialStore.setStatus(Operation::ReadAttributes, platform::kCredentialReadFailed);
+    PropertyList replayObject;
+    EXPECT_TRUE(WLGetNimbusReplayKeychainItem(&replayObject, nullptr));
+    EXPECT_EQ(replayObject, object);
+    EXPECT_EQ(fake.recorder.callsTo("CredentialStore."), (Lines{"CredentialStore.findItem " + kKey}));
+}
+
+TEST_F(ReplayItemTest, TheReaderLogsALabelThatCannotBeRead) {
+    put(*writeXMLPropertyList(object));
+    fake.credentialStore.setStatus(Operation::ReadAttributes, platform::kCredentialItemNotFound);
+    PropertyList replayObject;
+    std::string accountName = "untouched";
+    EXPECT_FALSE(WLGetNimbusReplayKeychainItem(&replayObject, &accountName));
+    EXPECT_EQ(fake.systemLog.lines(), (Lines{"Failed to get account name attribute"}));
+    EXPECT_EQ(accountName, "untouched");
+}
+
+TEST_F(ReplayItemTest, TheReaderTakesAnObjectThatIsNoDictionary) {
+    put(*writeXMLPropertyList(PropertyList::Array{1, "two"}));
+    PropertyList replayObject;
+    EXPECT_TRUE(WLGetNimbusReplayKeychainItem(&replayObject, nullptr));
+    EXPECT_EQ(replayObject, PropertyList(PropertyList::Array{1, "two"}));
+}
+
+TEST_F(ReplayItemTest, EmptyDataIsRefused) {
+    expectRefused("");
+}
+
+TEST_F(ReplayItemTest, TruncatedDataIsRefused) {
+    const std::string whole = *writeXMLPropertyList(object);
+    expectRefused(whole.substr(0, whole.size() / 2));
+}
+
+TEST_F(ReplayItemTest, DataNestedAHundredThousandDeepIsRefused) {
+    std::string data = "<plist version=\"1.0\">";
+    for (int i = 0; i < 100'000; ++i) {
+        data += "<array>";
+    }
+    for (int i = 0; i < 100'000; ++i) {
+        data += "</array>";
+    }
+    expectRefused(data + "</plist>");
+}
+
+TEST_F(ReplayItemTest, BytesOfNoFormatAreRefused) {
+    expectRefused(std::string("\x00\xFF\xFE\x01\x80garbage", 12));
+}
+
+TEST_F(ReplayItemTest, DeletingFindsTheItemWithoutItsDataAndDeletesIt) {
+    put("anything");
+    EXPECT_TRUE(WLDeleteNimbusReplayKeychainItem());
+    EXPECT_EQ(fake.credentialStore.items().size(), 0U);
+    EXPECT_EQ(fake.recorder.calls(),
+              (Lines{"CredentialStore.findItem " + kKey, "CredentialStore.deleteItem " + kKey}));
+}
+
+TEST_F(ReplayItemTest, DeletingLogsTheStatusOfFinding) {
+    EXPECT_FALSE(WLDeleteNimbusReplayKeychainItem());
+    EXPECT_EQ(fake.systemLog.lines(), (Lines{"Failed to delete replay keychain item: 2"}));
+    EXPECT_EQ(fake.recorder.callsTo("CredentialStore."), (Lines{"CredentialStore.findItem " + kKey}));
+}
+
+TEST_F(ReplayItemTest, DeletingLogsTheStatusOfDeleting) {
+    put("anything");
+    fake.credentialStore.setStatus(Operation::DeleteItem, platform::kCredentialWriteFailed);
+    EXPECT_FALSE(WLDeleteNimbusReplayKeychainItem());
+    EXPECT_EQ(fake.systemLog.lines(), (Lines{"Failed to delete replay keychain item: 6"}));
+    EXPECT_EQ(fake.credentialStore.items().size(), 1U);
+}
+
+} // namespace
+} // namespace welcomer
