@@ -22,11 +22,12 @@ struct PropertyListReadResult {
 };
 
 // Reads a property list: the XML format, the binary format or the old-style text format, told apart by
-// content.
+// content. In all of them the last of several entries with the same key counts, and nothing but white space
+// and comments may stand beside the one value. The headers of the single readers say what each accepts.
 //  bytes   the whole property list; only read during the call
-//  result  the value, or an error that says what and where (line and column for the text formats, byte offset
-//  for
-//          the binary one). Never throws for bad input, and never follows a reference out of `bytes`.
+//  result  the value, or an error that says what and where: "line 3, column 14: ..." for the text formats,
+//          "byte 14: ..." for the binary one. Never throws for bad input, and never follows a reference out
+//          of `bytes`.
 // Any thread.
 PropertyListReadResult readPropertyList(std::string_view bytes);
 

@@ -1,10 +1,9 @@
 #include "text/Describe.h"
 
+#include "propertylist/CalendarDate.h"
+
 #include <array>
 #include <charconv>
-#include <chrono>
-#include <cmath>
-#include <cstdio>
 
 namespace welcomer::text {
 
@@ -33,24 +32,8 @@ std::string describeData(const PropertyList::Data& data) {
 }
 
 std::string describeDate(PropertyList::Date date) {
-    // Outside the years 0 to 9999 there is no ISO 8601 form to speak of; the number says more.
-    constexpr double yearZero = -62167219200.0;
-    constexpr double yearTenThousand = 253402300800.0;
-    if (!(date.secondsSince1970 >= yearZero && date.secondsSince1970 < yearTenThousand)) {
-        return toDecimal(date.secondsSince1970);
-    }
-    using namespace std::chrono;
-    const sys_seconds moment(seconds(static_cast<std::int64_t>(std::floor(date.secondsSince1970))));
-    const auto day = floor<days>(moment);
-    const year_month_day calendar(day);
-    const hh_mm_ss clock(moment - day);
-    std::array<char, 48> buffer{};
-    const int length =
-        std::snprintf(buffer.data(), buffer.size(), "%04d-%02u-%02uT%02d:%02d:%02dZ",
-                      static_cast<int>(calendar.year()), static_cast<unsigned>(calendar.month()),
-                      static_cast<unsigned>(calendar.day()), static_cast<int>(clock.hours().count()),
-                      static_cast<int>(clock.minutes().count()), static_cast<int>(clock.seconds().count()));
-    return {buffer.data(), static_cast<std::size_t>(length)};
+    // Outside the calendar's years there is no ISO 8601 form to speak of; the number says more.
+    return formatCalendarDate(date).value_or(toDecimal(date.secondsSince1970));
 }
 
 std::string describeArray(const PropertyList::Array& array) {
