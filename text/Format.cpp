@@ -35,7 +35,7 @@ std::string formatChecked(std::string_view format, std::span<const Argument> arg
         if (format.starts_with("%%")) {
             text += '%';
             format.remove_prefix(2);
-        } else if (const PlaceholderSpelling* spelling = placeholderAt(format)) {
+        } else if (const std::optional<PlaceholderSpelling> spelling = placeholderAt(format)) {
             text += next->render(spelling->placeholder);
             ++next;
             format.remove_prefix(spelling->text.size());

@@ -8,6 +8,7 @@
 #include <array>
 #include <concepts>
 #include <cstddef>
+#include <optional>
 #include <span>
 #include <string>
 #include <string_view>
@@ -35,14 +36,14 @@ inline constexpr std::array kPlaceholderSpellings{
     PlaceholderSpelling{"%0.3f", Placeholder::ThreeDecimals},
 };
 
-// The placeholder at the start of `rest`, or null.
-constexpr const PlaceholderSpelling* placeholderAt(std::string_view rest) {
+// The placeholder at the start of `rest`, or none.
+constexpr std::optional<PlaceholderSpelling> placeholderAt(std::string_view rest) {
     for (const PlaceholderSpelling& spelling : kPlaceholderSpellings) {
         if (rest.starts_with(spelling.text)) {
-            return &spelling;
+            return spelling;
         }
     }
-    return nullptr;
+    return std::nullopt;
 }
 
 // Whether an argument of type T may stand for a placeholder.
@@ -85,7 +86,7 @@ class FormatString {
                 ++i;
                 continue;
             }
-            const PlaceholderSpelling* spelling = placeholderAt(_text.substr(i));
+            const std::optional<PlaceholderSpelling> spelling = placeholderAt(_text.substr(i));
             if (!spelling) {
                 throw "a placeholder that the formatter does not know";
             }

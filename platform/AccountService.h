@@ -1,0 +1,130 @@
+// The cloud account framework: accounts, their services, and signing in.
+
+#pragma once
+
+#include "platform/Window.h"
+#include "propertylist/PropertyList.h"
+
+#include <memory>
+#include <optional>
+#include <string>
+
+namespace welcomer::platform {
+
+// The services of an account. Their texts are this system's own: they are only passed around, compared, shown
+// in log lines and kept in the account service's files.
+inline constexpr char kSKServiceIDContacts[] = "com.corvid.nimbus.service.contacts";
+inline constexpr char kSKServiceIDCalendars[] = "com.corvid.nimbus.service.calendars";
+inline constexpr char kSKServiceIDBookMarks[] = "com.corvid.nimbus.service.bookmarks";
+inline constexpr char kSKServiceIDMediaStream[] = "com.corvid.nimbus.service.mediastream";
+inline constexpr char kSKServiceIDReminders[] = "com.corvid.nimbus.service.reminders";
+inline constexpr char kSKServiceIDAccountSync[] = "com.corvid.nimbus.service.accountsync";
+inline constexpr char kSKServiceIDNotes[] = "com.corvid.nimbus.service.notes";
+inline constexpr char kSKServiceIDMail[] = "com.corvid.nimbus.service.mail";
+inline constexpr char kSKServiceIDLOC[] = "com.corvid.nimbus.service.locator";
+inline constexpr char kSKServiceMobileDocuments[] = "com.corvid.nimbus.service.documents";
+
+// Property keys of accounts, services and notifications.
+inline constexpr char kSKPropertyAccountID[] = "com.corvid.nimbus.property.accountID";
+inline constexpr char kSKPropertyMailEmailAddress[] = "com.corvid.nimbus.property.mailEmailAddress";
+inline constexpr char kSKPropertyAccountError[] = "com.corvid.nimbus.property.accountError";
+inline constexpr char kSKPropertyAccountErrorInfo[] = "com.corvid.nimbus.property.accountErrorInfo";
+
+// The notifications that end an authentication and a sign-in. A completed one carries the server's response,
+// among it an integer "status"; a failed one the account error (an integer under kSKPropertyAccountError)
+// and, where there is more to say, its info.
+inline constexpr char kSKNotificationAuthenticationCompleted[] =
+    "com.corvid.nimbus.notification.authenticationCompleted";
+inline constexpr char kSKNotificationAuthenticationFailed[] =
+    "com.corvid.nimbus.notification.authenticationFailed";
+inline constexpr char kSKNotificationSignInCompleted[] = "com.corvid.nimbus.notification.signInCompleted";
+inline constexpr char kSKNotificationSignInFailed[] = "com.corvid.nimbus.notification.signInFailed";
+
+// One service of one account.
+class CloudService {
+  public:
+    virtual ~CloudService() = default;
+
+    // Whether this machine and this user can have the service enabled. Any thread.
+    virtual bool canBeEnabled() = 0;
+
+    // The value of one of the service's properties, or none. Any thread.
+    virtual std::optional<PropertyList> propertyValue(const std::string& key) = 0;
+
+    // Turns the service on or off, with an interface where the account service has one to show.
+    //  creating  whether the service is being set up for the first time
+    //  window    the parent of that interface; borrowed for the call
+    // What became of it is not reported. Any thread.
+    virtual void enableWithWindow(bool enabled, bool creating, Window* window) = 0;
+
+    // The same without any interface. Any thread.
+    virtual void enableSilently(bool enabled) = 0;
+};
+
+// One cloud account of the current user.
+class CloudAccount {
+  public:
+    virtual ~CloudAccount() = default;
+
+    // The account's user name. Any thread.
+    virtual std::string accountID() = 0;
+
+    // Keeps the account service from showing its own dialogs about failures of this account, for as long as
+    // the process lives. Any thread.
+    virtual void suppressFailureDialogs() = 0;
+
+    // The account's service with this identifier, or null when it has none. The service keeps what it needs
+    // alive. Any thread.
+    virtual std::shared_ptr<CloudService> serviceForID(const std::string& identifier) = 0;
+};
+
+// The shared account manager.
+class AccountManager {
+  public:
+    virtual ~AccountManager() = default;
+
+    // The account with this identifier, or null.
+    //  identifier       as it came from the caller; the manager has no account for none, for what is no
+    //  string
+    //                   and for an empty one
+    //  createIfMissing  whether to make an account that does not exist; null then says that it could not be
+    //                   made
+    // Any thread.
+    virtual std::shared_ptr<CloudAccount> accountForID(const std::optional<PropertyList>& identifier,
+                                                       bool createIfMissing) = 0;
+
+    // Starts to check a user's password with the server and returns. The answer comes as exactly one
+    // authentication-completed or authentication-failed notification on the default centre, on the run loop
+    // of the thread that called; a port is attached to that loop until then. There is no time limit.
+    //  delegateRequest  what is asked of each delegate, a dictionary under "delegates"
+    // Any thread that runs its run loop.
+    virtual void authenticate(const std::string& username, const std::string& password,
+                              const PropertyList::Dictionary& delegateRequest) = 0;
+
+    // The same, and signs the user in: the account is made where it is missing, and is the logged-in account
+    // from then on. Ends in a sign-in-completed or a sign-in-failed notification.
+    virtual void finishSignIn(const std::string& username, const std::string& password,
+                              const PropertyList::Dictionary& delegateRequest) = 0;
+
+    // Says that setup has finished. The system has nothing to add and always passes none. Any thread.
+    virtual void markSetupFinished(const std::optional<PropertyList>& information) = 0;
+};
+
+class AccountService {
+  public:
+    virtual ~AccountService() = default;
+
+    // Lives as long as this object. Any thread.
+    virtual AccountManager& sharedManager() = 0;
+
+    // The account that is logged in for the current user, or null. Any thread.
+    virtual std::shared_ptr<CloudAccount> loggedInAccount() = 0;
+
+    // Whether a service of an account is enabled; false for no account and for a service that it does not
+    // have.
+    //  account  borrowed for the call; may be null
+    // Any thread.
+    virtual bool isServiceEnabled(CloudAccount* account, const std::string& identifier) = 0;
+};
+
+} // namespace welcomer::platform

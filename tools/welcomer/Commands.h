@@ -1,0 +1,16 @@
+// All commands of the tool. A new one is declared here and named once in the list.
+
+#pragma once
+
+namespace welcomer::tool {
+
+class CommandLine;
+
+void addTryCommand(CommandLine& commandLine);
+void addReplayCommands(CommandLine& commandLine);
+void addPluginsCommands(CommandLine& commandLine);
+
+// In the order in which --help shows them.
+inline constexpr void (*kCommands[])(CommandLine&) = {addTryCommand, addReplayCommands, addPluginsCommands};
+
+} // namespace welcomer::tool

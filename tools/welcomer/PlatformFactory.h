@@ -1,0 +1,26 @@
+// How the tool gets a platform: main.cpp, which knows the backends, hands this to everything else.
+
+#pragma once
+
+#include "platform/Platform.h"
+
+#include <functional>
+#include <memory>
+#include <string>
+
+namespace welcomer::tool {
+
+struct PlatformRequest {
+    std::string root = "/"; // every path of the system is looked up below it
+    platform::SystemLog* systemLog =
+        nullptr;                // takes the records in place of the system log, or null; borrowed
+    bool simulatedTime = false; // clock, run loops and queues on simulated time
+};
+
+// A platform together with what owns it.
+using PlatformHandle = std::shared_ptr<const platform::Platform>;
+
+// Builds a platform; opens nothing and starts no thread.
+using PlatformFactory = std::function<PlatformHandle(const PlatformRequest&)>;
+
+} // namespace welcomer::tool

@@ -1,0 +1,91 @@
+// welcomer plugins: what is in the plug-in directory, and what became of it.
+
+#include "plugins/WLNimbusDelegatePlugins.h"
+#include "tools/welcomer/Commands.h"
+#include "tools/welcomer/PropertyListOutput.h"
+#include "tools/welcomer/TextTable.h"
+#include "tools/welcomer/Tool.h"
+
+#include <CLI/CLI.hpp>
+#include <cstdio>
+#include <fcntl.h>
+#include <ostream>
+#include <unistd.h>
+
+namespace welcomer::tool {
+
+namespace {
+
+std::string stateOf(const PluginScanEntry& entry) {
+    return entry.plugin ? "loaded" : entry.reason;
+}
+
+void printAsJson(std::ostream& out, const std::vector<PluginScanEntry>& entries) {
+    Json plugins = Json::array();
+    for (const PluginScanEntry& entry : entries) {
+        plugins.push_back({{"identifier", entry.identifier ? Json(*entry.identifier) : Json()},
+                           {"file", entry.fileName},
+                           {"state", stateOf(entry)}});
+    }
+    printJson(out, {{"directory", kPluginDirectory}, {"plugins", plugins}});
+}
+
+void printAsTable(std::ostream& out, const std::vector<PluginScanEntry>& entries) {
+    if (entries.empty()) {
+        out << "No plug-ins in " << kPluginDirectory << '\n';
+        return;
+    }
+    TextTable table({"IDENTIFIER", "FILE", "STATE"});
+    for (const PluginScanEntry& entry : entries) {
+        table.addRow({entry.identifier.value_or("-"), entry.fileName, stateOf(entry)});
+    }
+    table.print(out);
+}
+
+// While it lives, what plug-ins write to the standard output goes to stderr: it is no result of the tool.
+class StandardOutputGuard {
+  public:
+    explicit StandardOutputGuard(std::ostream& out) : _real(fcntl(STDOUT_FILENO, F_DUPFD_CLOEXEC, 3)) {
+        out.flush();
+        dup2(STDERR_FILENO, STDOUT_FILENO);
+    }
+    ~StandardOutputGuard() {
+        std::fflush(stdout);
+        if (_real >= 0) {
+            dup2(_real, STDOUT_FILENO);
+            close(_real);
+        }
+    }
+    StandardOutputGuard(const StandardOutputGuard&) = delete;
+    StandardOutputGuard& operator=(const StandardOutputGuard&) = delete;
+
+  private:
+    const int _real;
+};
+
+std::vector<PluginScanEntry> scan(std::ostream& out) {
+    const StandardOutputGuard guard(out);
+    return scanDelegatePlugins();
+}
+
+void listPlugins(Session& session) {
+    const std::vector<PluginScanEntry> entries = scan(session.out);
+    if (session.options.json) {
+        printAsJson(session.out, entries);
+    } else {
+        printAsTable(session.out, entries);
+    }
+}
+
+} // namespace
+
+void addPluginsCommands(CommandLine& commandLine) {
+    CLI::App& group = commandLine.addGroup("plugins", "The delegate plug-ins of this machine");
+    commandLine.addCommand(
+        group, "list",
+        "Load every plug-in and show its identifier, its file, and its state: loaded, or why "
+        "it was skipped",
+        listPlugins);
+}
+
+} // namespace welcomer::tool

@@ -1,0 +1,25 @@
+// A table for people: columns as wide as their widest cell, two spaces between them.
+
+#pragma once
+
+#include <iosfwd>
+#include <string>
+#include <vector>
+
+namespace welcomer::tool {
+
+class TextTable {
+  public:
+    explicit TextTable(std::vector<std::string> header);
+
+    // One cell per column; a cell's control characters are shown, not sent to the terminal.
+    void addRow(const std::vector<std::string>& cells);
+
+    // Prints the header and the rows, each line after the indent.
+    void print(std::ostream& out, const std::string& indent = "") const;
+
+  private:
+    std::vector<std::vector<std::string>> _lines;
+};
+
+} // namespace welcomer::tool

@@ -1,0 +1,348 @@
+// welcomer try: the whole story, from the end of the setup to the end of the second login, in a fresh folder.
+
+#include "handoff/LaunchAgentFile.h"
+#include "handoff/ReplayItem.h"
+#include "handoff/WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup.h"
+#include "plugins/WLNimbusDelegatePlugins.h"
+#include "tools/welcomer/AgentProcess.h"
+#include "tools/welcomer/Commands.h"
+#include "tools/welcomer/DelegateReport.h"
+#include "tools/welcomer/ExampleFiles.h"
+#include "tools/welcomer/FolderSnapshot.h"
+#include "tools/welcomer/Printable.h"
+#include "tools/welcomer/ProgressLine.h"
+#include "tools/welcomer/PropertyListOutput.h"
+#include "tools/welcomer/ReplayReason.h"
+#include "tools/welcomer/TemporaryFolder.h"
+#include "tools/welcomer/TextTable.h"
+#include "tools/welcomer/Tool.h"
+
+#include <CLI/CLI.hpp>
+#include <filesystem>
+#include <iomanip>
+#include <optional>
+#include <ostream>
+#include <sstream>
+#include <utility>
+
+namespace welcomer::tool {
+
+namespace {
+
+namespace fs = std::filesystem;
+
+constexpr const char* kAccountName = "user@nimbus.example";
+constexpr const char* kBundlePath = "/usr/share/welcomer/setup-bundle";
+constexpr const char* kLingerLine = "delaying exit by two minutes";
+constexpr std::chrono::seconds kLinger{120};
+
+// What the setup application would have gathered: the server's cached responses and the chosen aliases.
+PropertyList exampleReplayObject() {
+    const auto response = [](const char* token) {
+        return PropertyList::Dictionary{{"status", 0}, {"token", PropertyList::Data{token}}};
+    };
+    return PropertyList::Dictionary{
+        {kReplayResponsesKey, PropertyList::Dictionary{{kReplayDelegatesKey,
+                                                        PropertyList::Dictionary{
+                                                            {"com.corvid.vidlink", response("vidlink")},
+                                                            {"com.corvid.chatter", response("chatter")},
+                                                            {"com.corvid.storefront", response("storefront")},
+                                                        }}}},
+        {kReplayVidlinkAliasesKey, PropertyList::Array{kAccountName, "+1 555 0100"}},
+        {kReplayChatterAliasesKey, PropertyList::Array{kAccountName}},
+    };
+}
+
+std::string seconds(std::chrono::nanoseconds duration) {
+    std::ostringstream text;
+    text << std::fixed << std::setprecision(3) << std::chrono::duration<double>(duration).count();
+    return text.str();
+}
+
+// One login, as it was seen from outside.
+struct Login {
+    std::vector<AgentLogRecord> log;
+    DelegateReport report;
+    AgentEnd end;
+};
+
+// What a login left on disk.
+struct LeftOnDisk {
+    bool launchAgent = false;
+    bool replayItem = false;
+    std::vector<std::string> files; // in the home folder, relative to it
+};
+
+class Story {
+  public:
+    Story(Session& session, bool timeLapse, const fs::path& root, InterruptionGuard& guard)
+        : _session(session),
+          _timeLapse(timeLapse),
+          _root(root),
+          _guard(guard),
+          _platform(session.buildPlatform({root.string(), &_log, false})),
+          _installed(*_platform),
+          _home(_platform->processIdentity.homeDirectory()) {}
+
+    void tell() {
+        _prepare();
+        _handOver();
+        _say("");
+        _say(_timeLapse
+                 ? "First login, on simulated time, which stands still while plug-ins work. The agent's log:"
+                 : "First login. The agent's log:");
+        const Login first = _login();
+        _say("");
+        _say("What is left on disk:");
+        const LeftOnDisk left = _look();
+
+        _say("");
+        _say("Second login. No launch agent is left to start; started all the same, the agent has nothing to "
+             "do:");
+        const FolderSnapshot before(_root);
+        const Login second = _login();
+        const std::vector<std::string> changes = before.changesUntilNow();
+        _say("  The second login has changed " +
+             (changes.empty() ? std::string("nothing.") : changes.front()));
+
+        if (_session.options.json) {
+            _printAsJson(first, second, left, changes);
+        }
+        _judge(first, second, left, changes);
+    }
+
+  private:
+    void _say(const std::string& line) {
+        if (!_session.options.json) {
+            _session.out << line << std::endl; // at once: people watch
+        }
+    }
+
+    fs::path _below(const fs::path& path) const { return _root / path.relative_path(); }
+
+    std::string _launchAgentPath() const {
+        return _home + "/Library/LaunchAgents/" + kLaunchAgentLabel + ".plist";
+    }
+
+    // The home folder, the plug-ins and the setup application, as a machine would have them.
+    void _prepare() {
+        const ExampleFiles examples = findExampleFiles();
+        if (fs::create_directories(_below(_home))) {
+            fs::permissions(_below(_home), fs::perms::owner_all);
+        }
+        const auto replace = fs::copy_options::recursive | fs::copy_options::overwrite_existing;
+        const fs::path plugins = _below(kPluginDirectory);
+        fs::create_directories(plugins);
+        std::string names;
+        for (const fs::path& plugin : examples.plugins) {
+            fs::copy(plugin, plugins / plugin.filename(), replace);
+            names += (names.empty() ? "" : ", ") + plugin.filename().string();
+        }
+        fs::create_directories(_below(kBundlePath));
+        fs::copy(examples.setupBundle, _below(kBundlePath), replace);
+
+        _say("Setup, below " + _root.string() + ":");
+        _say("  home folder        " + _home);
+        _say(std::string("  plug-ins           ") + kPluginDirectory + ": " + names);
+        _say(std::string("  setup application  ") + kBundlePath);
+    }
+
+    // The end of the setup: what only the user's own login can finish is handed over.
+    void _handOver() {
+        const PropertyList replay = exampleReplayObject();
+        const auto bundle = _platform->resourceBundles.open(kBundlePath);
+        if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(kAccountName, replay, *bundle)) {
+            throw CommandFailure("cannot hand over to the next login: " + replayReason(_log));
+        }
+        _say(std::string("  replay item        stored for ") + kAccountName + ", with the responses for " +
+             std::to_string(
+                 replay.find(kReplayResponsesKey)->find(kReplayDelegatesKey)->dictionary()->size()) +
+             " delegates and the aliases");
+        _say("  launch agent       " + _launchAgentPath());
+    }
+
+    Login _login() {
+        Login login;
+        ProgressLine progress;
+        const auto started = std::chrono::steady_clock::now();
+        std::optional<std::chrono::steady_clock::time_point> lingering;
+        AgentListener listener;
+        listener.record = [&](const AgentLogRecord& record) {
+            progress.clear();
+            login.log.push_back(record);
+            login.report.read(record.message);
+            std::ostringstream line;
+            line << std::setw(11) << seconds(record.time) << "  " << printable(record.message);
+            _say(line.str());
+            if (record.message == kLingerLine) {
+                lingering = std::chrono::steady_clock::now();
+                _showDelegates(login.report);
+                if (_timeLapse || !progress.visible()) {
+                    _say(_timeLapse ? "  Lingering: the two minutes pass at once on simulated time."
+                                    : "  Lingering for two minutes ...");
+                }
+            }
+        };
+        if (progress.visible()) {
+            listener.tick = [&] {
+                _showProgress(progress, login.report, started, lingering);
+            };
+        }
+        login.end = runAgentProcess(_session.buildPlatform, _root.string(), _timeLapse, _guard, listener);
+        progress.clear();
+        _say("  The agent has ended with " + login.end.description() + ".");
+        return login;
+    }
+
+    void _showDelegates(const DelegateReport& report) {
+        if (_session.options.json) {
+            return;
+        }
+        TextTable table({"DELEGATE", "OUTCOME", "SECONDS"});
+        for (const DelegateOutcome& delegate : report.delegates()) {
+            table.addRow(
+                {delegate.identifier, delegate.outcome, delegate.seconds.empty() ? "-" : delegate.seconds});
+        }
+        _session.out << '\n';
+        table.print(_session.out, "  ");
+        _session.out << std::endl;
+    }
+
+    void _showProgress(ProgressLine& progress, const DelegateReport& report,
+                       std::chrono::steady_clock::time_point started,
+                       std::optional<std::chrono::steady_clock::time_point> lingering) const {
+        const auto now = std::chrono::steady_clock::now();
+        const auto whole = [](auto duration) {
+            return std::to_string(std::chrono::duration_cast<std::chrono::seconds>(duration).count());
+        };
+        if (lingering && !_timeLapse) {
+            const std::chrono::duration<double> passed = now - *lingering;
+            progress.show("  Lingering " + ProgressLine::bar(passed / kLinger) + " " + whole(passed) +
+                          " of " + whole(kLinger) + " s");
+        } else if (!lingering && report.working() > 0) {
+            progress.show("  " + std::to_string(report.working()) + " of " +
+                          std::to_string(report.delegates().size()) + " delegates at work, " +
+                          whole(now - started) + " s");
+        }
+    }
+
+    LeftOnDisk _look() {
+        LeftOnDisk left;
+        left.launchAgent = _platform->fileSystem.exists(_launchAgentPath());
+        left.replayItem = WLGetNimbusReplayKeychainItem(nullptr, nullptr);
+        const fs::path home = _below(_home);
+        for (const auto& entry : fs::recursive_directory_iterator(home)) {
+            if (!entry.is_directory()) {
+                left.files.push_back(entry.path().lexically_relative(home).string());
+            }
+        }
+        _say(std::string("  launch agent  ") + (left.launchAgent ? "still there" : "none"));
+        _say(std::string("  replay item   ") + (left.replayItem ? "still there" : "none"));
+        for (const std::string& file : left.files) {
+            _say("  file          " + _home + "/" + file);
+        }
+        return left;
+    }
+
+    static Json _loginAsJson(const Login& login) {
+        Json log = Json::array();
+        for (const AgentLogRecord& record : login.log) {
+            log.push_back({{"seconds", std::chrono::duration<double>(record.time).count()},
+                           {"message", record.message}});
+        }
+        Json delegates = Json::array();
+        for (const DelegateOutcome& delegate : login.report.delegates()) {
+            delegates.push_back(
+                {{"identifier", delegate.identifier},
+                 {"outcome", delegate.outcome},
+                 {"seconds", delegate.seconds.empty() ? Json() : Json(std::stod(delegate.seconds))}});
+        }
+        return {{"log", log},
+                {"delegates", delegates},
+                {"exitStatus", login.end.exitStatus ? Json(*login.end.exitStatus) : Json()}};
+    }
+
+    void _printAsJson(const Login& first, const Login& second, const LeftOnDisk& left,
+                      const std::vector<std::string>& changes) {
+        printJson(
+            _session.out,
+            {{"account", kAccountName},
+             {"root", _root.string()},
+             {"home", _home},
+             {"timeLapse", _timeLapse},
+             {"firstLogin", _loginAsJson(first)},
+             {"left",
+              {{"launchAgent", left.launchAgent}, {"replayItem", left.replayItem}, {"files", left.files}}},
+             {"secondLogin", _loginAsJson(second)},
+             {"changedBySecondLogin", changes}});
+    }
+
+    static void _judge(const Login& first, const Login& second, const LeftOnDisk& left,
+                       const std::vector<std::string>& changes) {
+        if (!first.end.succeeded()) {
+            throw CommandFailure("the agent of the first login ended with " + first.end.description());
+        }
+        if (left.launchAgent || left.replayItem) {
+            throw CommandFailure(std::string("the first login left the ") +
+                                 (left.launchAgent ? "launch agent" : "replay item") + " behind");
+        }
+        if (!second.end.succeeded()) {
+            throw CommandFailure("the agent of the second login ended with " + second.end.description());
+        }
+        if (!changes.empty()) {
+            throw CommandFailure("the second login changed " + changes.front());
+        }
+    }
+
+    Session& _session;
+    const bool _timeLapse;
+    const fs::path _root;
+    InterruptionGuard& _guard;
+    KeptLog _log;
+    const PlatformHandle _platform;
+    const platform::ScopedPlatform _installed;
+    const std::string _home;
+};
+
+void tryStory(Session& session, bool timeLapse) {
+    const Options& options = session.options;
+    if (options.rootGiven && options.root == "/") {
+        throw UsageError("--root: the story needs a folder of its own, not the machine's own root");
+    }
+    // Before anything is made that an interruption would leave behind.
+    InterruptionGuard guard;
+    try {
+        std::optional<TemporaryFolder> temporary;
+        if (!options.rootGiven) {
+            temporary.emplace();
+        } else {
+            fs::create_directories(options.root);
+        }
+        Story(session, timeLapse, temporary ? temporary->path() : fs::path(options.root), guard).tell();
+    } catch (const Interrupted&) {
+        guard.release(); // the signal takes its course here
+        throw CommandFailure("interrupted");
+    }
+    if (!options.json) {
+        session.out << '\n'
+                    << (options.rootGiven ? options.root + " is left as it is."
+                                          : "The temporary folder is removed.")
+                    << '\n';
+    }
+}
+
+} // namespace
+
+void addTryCommand(CommandLine& commandLine) {
+    const auto timeLapse = std::make_shared<bool>(false);
+    CLI::App& command =
+        commandLine.addCommand("try",
+                               "The whole story in a fresh folder (or below --root): the setup hands over, "
+                               "the agent of the next login "
+                               "takes over, the example plug-ins finish, and nothing is left behind",
+                               [timeLapse](Session& session) { tryStory(session, *timeLapse); });
+    command.add_flag("--time-lapse", *timeLapse,
+                     "Run the agent on simulated time: the two minutes pass at once");
+}
+
+} // namespace welcomer::tool
