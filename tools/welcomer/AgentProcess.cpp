@@ -13,9 +13,9 @@
 #include <iostream>
 #include <mutex>
 #include <poll.h>
-#include <sys/pidfd.h>
 #include <sys/prctl.h>
 #include <sys/signalfd.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <system_error>
 #include <unistd.h>
@@ -245,7 +245,8 @@ AgentEnd runAgentProcess(const PlatformFactory& buildPlatform, const std::string
     Child child(id);
     input.close();
     // The end of the process is what counts: what a plug-in left running may hold the pipe open.
-    const Descriptor process(pidfd_open(id, 0));
+    // The call itself: its header gives it the wrong linkage in C++.
+    const Descriptor process(static_cast<int>(syscall(SYS_pidfd_open, id, 0)));
     if (process.number() < 0) {
         failed("cannot watch the agent's process");
     }

@@ -45,10 +45,23 @@ const CLI::App& namedLast(const CLI::App& app) {
     return named.empty() ? app : namedLast(*named.front());
 }
 
+// What is wrong with the arguments at this level.
+std::string explain(const CLI::ParseError& error, const CLI::App& app, const CLI::App& level) {
+    const bool needsCommand = level.get_require_subcommand_min() > 0;
+    if (!needsCommand || !dynamic_cast<const CLI::RequiredError*>(&error)) {
+        return error.what();
+    }
+    const std::vector<std::string> unknown = app.remaining(true); // they fall through to the top
+    return unknown.empty() ? "a command is needed" : "there is no command " + unknown.front();
+}
+
 void addGlobalOptions(CLI::App& app, Options& options) {
     app.add_option("--root", options.root,
                    "Look up every path of the system, the home folder among them, below this folder")
-        ->type_name("DIR");
+        ->type_name("DIR")
+        ->check([](const std::string& folder) {
+            return std::string(folder.empty() ? "the folder's name is empty" : "");
+        });
     app.add_flag("--json", options.json, "Print the result as one JSON document");
     app.add_flag("--verbose", options.verbose, "Show the system's log lines on stderr as they come");
     app.set_version_flag("--version", "welcomer " WELCOMER_VERSION);
@@ -67,14 +80,20 @@ std::optional<int> parse(CLI::App& app, int argc, char** argv) {
         std::cout << app.help();
         return kExitSuccess;
     } catch (const CLI::ParseError& error) {
-        return fail(std::string(error.what()) + " (see " + fullName(namedLast(app)) + " --help)", kExitUsage);
+        const CLI::App& level = namedLast(app);
+        return fail(explain(error, app, level) + " (see " + fullName(level) + " --help)", kExitUsage);
     }
 }
 
 void settleRoot(Options& options) {
     options.rootGiven = !options.root.empty();
-    options.root =
-        options.rootGiven ? std::filesystem::absolute(options.root).lexically_normal().string() : "/";
+    if (!options.rootGiven) {
+        options.root = "/";
+    } else if (!std::filesystem::is_directory(options.root)) {
+        throw CommandFailure("--root: there is no folder " + options.root);
+    } else {
+        options.root = std::filesystem::canonical(options.root).string();
+    }
 }
 
 int runCommand(const Command& command, const Options& options, const PlatformFactory& buildPlatform) {
@@ -127,9 +146,9 @@ int runTool(int argc, char** argv, const PlatformFactory& buildPlatform) {
     if (const auto status = parse(app, argc, argv)) {
         return *status;
     }
-    settleRoot(options);
 
     try {
+        settleRoot(options);
         return runCommand(commandLine.chosen(), options, buildPlatform);
     } catch (const UsageError& error) {
         return fail(std::string(error.what()) + " (see " + commandLine.chosenName() + " --help)", kExitUsage);

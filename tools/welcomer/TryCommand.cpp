@@ -38,15 +38,16 @@ constexpr std::chrono::seconds kLinger{120};
 
 // What the setup application would have gathered: the server's cached responses and the chosen aliases.
 PropertyList exampleReplayObject() {
-    const auto response = [](const char* token) {
-        return PropertyList::Dictionary{{"status", 0}, {"token", PropertyList::Data{token}}};
+    // The example plug-ins take as long as the response says, so that one sees them work beside one another.
+    const auto response = [](double delaySeconds) {
+        return PropertyList::Dictionary{{"status", 0}, {"delaySeconds", delaySeconds}};
     };
     return PropertyList::Dictionary{
         {kReplayResponsesKey, PropertyList::Dictionary{{kReplayDelegatesKey,
                                                         PropertyList::Dictionary{
-                                                            {"com.corvid.vidlink", response("vidlink")},
-                                                            {"com.corvid.chatter", response("chatter")},
-                                                            {"com.corvid.storefront", response("storefront")},
+                                                            {"com.corvid.vidlink", response(0.8)},
+                                                            {"com.corvid.chatter", response(0.5)},
+                                                            {"com.corvid.storefront", response(1.0)},
                                                         }}}},
         {kReplayVidlinkAliasesKey, PropertyList::Array{kAccountName, "+1 555 0100"}},
         {kReplayChatterAliasesKey, PropertyList::Array{kAccountName}},
@@ -88,17 +89,16 @@ class Story {
         _prepare();
         _handOver();
         _say("");
-        _say(_timeLapse
-                 ? "First login, on simulated time, which stands still while plug-ins work. The agent's log:"
-                 : "First login. The agent's log:");
+        _say(_timeLapse ? "First login, on simulated time (which stands still while plug-ins work):"
+                        : "First login:");
         const Login first = _login();
         _say("");
         _say("What is left on disk:");
         const LeftOnDisk left = _look();
 
         _say("");
-        _say("Second login. No launch agent is left to start; started all the same, the agent has nothing to "
-             "do:");
+        _say("Second login. No launch agent is left that would start the agent.");
+        _say("Started all the same, it has nothing to do:");
         const FolderSnapshot before(_root);
         const Login second = _login();
         const std::vector<std::string> changes = before.changesUntilNow();
@@ -133,17 +133,15 @@ class Story {
         const auto replace = fs::copy_options::recursive | fs::copy_options::overwrite_existing;
         const fs::path plugins = _below(kPluginDirectory);
         fs::create_directories(plugins);
-        std::string names;
         for (const fs::path& plugin : examples.plugins) {
             fs::copy(plugin, plugins / plugin.filename(), replace);
-            names += (names.empty() ? "" : ", ") + plugin.filename().string();
         }
         fs::create_directories(_below(kBundlePath));
         fs::copy(examples.setupBundle, _below(kBundlePath), replace);
 
         _say("Setup, below " + _root.string() + ":");
         _say("  home folder        " + _home);
-        _say(std::string("  plug-ins           ") + kPluginDirectory + ": " + names);
+        _say("  plug-ins           " + std::to_string(examples.plugins.size()) + " in " + kPluginDirectory);
         _say(std::string("  setup application  ") + kBundlePath);
     }
 
@@ -154,10 +152,9 @@ class Story {
         if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(kAccountName, replay, *bundle)) {
             throw CommandFailure("cannot hand over to the next login: " + replayReason(_log));
         }
-        _say(std::string("  replay item        stored for ") + kAccountName + ", with the responses for " +
-             std::to_string(
-                 replay.find(kReplayResponsesKey)->find(kReplayDelegatesKey)->dictionary()->size()) +
-             " delegates and the aliases");
+        const PropertyList& responses = *replay.find(kReplayResponsesKey)->find(kReplayDelegatesKey);
+        _say(std::string("  replay item        stored for ") + kAccountName + ", with " +
+             std::to_string(responses.dictionary()->size()) + " responses");
         _say("  launch agent       " + _launchAgentPath());
     }
 
@@ -315,8 +312,6 @@ void tryStory(Session& session, bool timeLapse) {
         std::optional<TemporaryFolder> temporary;
         if (!options.rootGiven) {
             temporary.emplace();
-        } else {
-            fs::create_directories(options.root);
         }
         Story(session, timeLapse, temporary ? temporary->path() : fs::path(options.root), guard).tell();
     } catch (const Interrupted&) {
@@ -335,12 +330,9 @@ void tryStory(Session& session, bool timeLapse) {
 
 void addTryCommand(CommandLine& commandLine) {
     const auto timeLapse = std::make_shared<bool>(false);
-    CLI::App& command =
-        commandLine.addCommand("try",
-                               "The whole story in a fresh folder (or below --root): the setup hands over, "
-                               "the agent of the next login "
-                               "takes over, the example plug-ins finish, and nothing is left behind",
-                               [timeLapse](Session& session) { tryStory(session, *timeLapse); });
+    CLI::App& command = commandLine.addCommand(
+        "try", "Walk the whole story in a fresh folder (or below --root), from the setup to the second login",
+        [timeLapse](Session& session) { tryStory(session, *timeLapse); });
     command.add_flag("--time-lapse", *timeLapse,
                      "Run the agent on simulated time: the two minutes pass at once");
 }
