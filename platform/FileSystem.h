@@ -4,12 +4,16 @@
 
 #include "platform/Error.h"
 
+#include <cstddef>
 #include <cstdint>
 #include <optional>
 #include <string>
 #include <vector>
 
 namespace welcomer::platform {
+
+// The longest file that counts as text, in bytes.
+inline constexpr std::size_t kMaximumTextSize = 1024 * 1024;
 
 class FileSystem {
   public:
@@ -34,6 +38,15 @@ class FileSystem {
     // The names of a folder's entries without "." and "..", in the file system's own order, or none when the
     // folder is missing or unreadable. Any thread.
     virtual std::optional<std::vector<std::string>> list(const std::string& path) = 0;
+
+    // A file's content, or none when it is missing or unreadable, no regular file, longer than
+    // kMaximumTextSize or not UTF-8. Never blocks on what is no regular file. Any thread.
+    virtual std::optional<std::string> readText(const std::string& path) = 0;
+
+    // Puts a text in place of a file's content, not atomically: when that fails, the file may hold a part of
+    // the text. A file that is missing is created with mode 0644, whatever the process's mask; one that is
+    // there keeps its permissions. Any thread.
+    virtual Outcome writeText(const std::string& path, const std::string& text) = 0;
 };
 
 } // namespace welcomer::platform

@@ -6,11 +6,14 @@
 #include "platform/CredentialStore.h"
 #include "platform/DispatchQueue.h"
 #include "platform/FileSystem.h"
+#include "platform/HostReachability.h"
 #include "platform/PluginBundle.h"
+#include "platform/PreferenceStore.h"
 #include "platform/ProcessIdentity.h"
 #include "platform/ResourceBundle.h"
 #include "platform/RunLoop.h"
 #include "platform/SystemLog.h"
+#include "platform/SystemVersionInfo.h"
 
 namespace welcomer::platform {
 
@@ -25,6 +28,9 @@ struct Platform {
     Clock& clock;
     RunLoops& runLoops;
     DispatchQueues& dispatchQueues;
+    PreferenceStore& preferenceStore;
+    SystemVersionInfo& systemVersionInfo;
+    HostReachability& hostReachability;
 };
 
 // The installed platform. A program installs one at its start, before anything else of the system is called,

@@ -1,5 +1,7 @@
 #include "tests/fakes/FakeFileSystem.h"
 
+#include "propertylist/UTF8.h"
+
 #include <algorithm>
 #include <cerrno>
 #include <deque>
@@ -207,6 +209,41 @@ std::optional<std::vector<std::string>> FakeFileSystem::list(const std::string& 
         names.push_back(name);
     }
     return names;
+}
+
+std::optional<std::string> FakeFileSystem::readText(const std::string& path) {
+    _recorder.record("FileSystem.readText " + path);
+    const std::lock_guard lock(_mutex);
+    int number = 0;
+    const Node* node = injected(Operation::ReadText, path) ? nullptr : find(path, true, number);
+    if (!node || node->kind != Kind::File || node->content.size() > platform::kMaximumTextSize ||
+        findInvalidUTF8(node->content) != std::string::npos) {
+        return std::nullopt;
+    }
+    return node->content;
+}
+
+platform::Outcome FakeFileSystem::writeText(const std::string& path, const std::string& text) {
+    _recorder.record("FileSystem.writeText " + path);
+    const std::lock_guard lock(_mutex);
+    if (const platform::Error* error = injected(Operation::WriteText, path)) {
+        return platform::Outcome::failure(*error);
+    }
+    const std::string what = "cannot write " + path;
+    int number = 0;
+    if (Node* node = find(path, true, number)) {
+        if (node->kind != Kind::File) {
+            return failure(what, EISDIR);
+        }
+        node->content = text;
+        return platform::Outcome::success();
+    }
+    Node* parent = find(parentOf(path), true, number);
+    if (!parent || parent->kind != Kind::Directory) {
+        return failure(what, parent ? ENOTDIR : number);
+    }
+    parent->add(nameOf(path), {Kind::File, 0644, text, {}});
+    return platform::Outcome::success();
 }
 
 void FakeFileSystem::addFile(const std::string& path, const std::string& content, mode_t mode) {

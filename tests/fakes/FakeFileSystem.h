@@ -19,7 +19,7 @@ namespace welcomer::fakes {
 // Recorded as "FileSystem.remove /path", "FileSystem.copy /from, /to" and so on. Any thread.
 class FakeFileSystem final : public platform::FileSystem {
   public:
-    enum class Operation { Exists, Remove, CreateDirectory, Copy, List };
+    enum class Operation { Exists, Remove, CreateDirectory, Copy, List, ReadText, WriteText };
 
     explicit FakeFileSystem(CallRecorder& recorder);
     ~FakeFileSystem() override;
@@ -29,6 +29,8 @@ class FakeFileSystem final : public platform::FileSystem {
     platform::Outcome createDirectory(const std::string& path, mode_t mode) override;
     platform::Outcome copy(const std::string& source, const std::string& destination) override;
     std::optional<std::vector<std::string>> list(const std::string& path) override;
+    std::optional<std::string> readText(const std::string& path) override;
+    platform::Outcome writeText(const std::string& path, const std::string& text) override;
 
     // Each puts something in place with the parents that it needs (mode 0755), in place of what is there.
     // Nothing of this is recorded, and no failure applies.
@@ -42,7 +44,7 @@ class FakeFileSystem final : public platform::FileSystem {
     bool isDirectory(const std::string& path) const;
 
     // Has an operation fail from now on at a path (a copy: at its destination) and change nothing: `exists`
-    // says no, `list` has no result. The message is the platform's own when none is given.
+    // says no, `list` and `readText` have no result. The message is the platform's own when none is given.
     void fail(Operation operation, const std::string& path, int number, const std::string& message = {});
 
     // Ends every failure.

@@ -7,10 +7,13 @@
 #include "tests/fakes/CallRecorder.h"
 #include "tests/fakes/FakeCredentialStore.h"
 #include "tests/fakes/FakeFileSystem.h"
+#include "tests/fakes/FakeHostReachability.h"
 #include "tests/fakes/FakePluginBundle.h"
+#include "tests/fakes/FakePreferenceStore.h"
 #include "tests/fakes/FakeProcessIdentity.h"
 #include "tests/fakes/FakeResourceBundles.h"
 #include "tests/fakes/FakeSystemLog.h"
+#include "tests/fakes/FakeSystemVersionInfo.h"
 
 namespace welcomer::fakes {
 
@@ -28,14 +31,18 @@ class FakePlatform {
     FakeCredentialStore credentialStore{recorder};
     FakePluginBundle pluginBundle{recorder};
     FakeResourceBundles resourceBundles{recorder};
+    FakePreferenceStore preferenceStore{recorder};
+    FakeSystemVersionInfo systemVersionInfo{recorder};
+    FakeHostReachability hostReachability{recorder};
     simulated::VirtualTime virtualTime; // the clock, the run loops and the queues
 
     // Borrowed: lives as long as this object.
     const platform::Platform& platform() const { return _platform; }
 
   private:
-    platform::Platform _platform{systemLog,       fileSystem,  processIdentity, credentialStore, pluginBundle,
-                                 resourceBundles, virtualTime, virtualTime,     virtualTime};
+    platform::Platform _platform{systemLog,    fileSystem,      processIdentity,   credentialStore,
+                                 pluginBundle, resourceBundles, virtualTime,       virtualTime,
+                                 virtualTime,  preferenceStore, systemVersionInfo, hostReachability};
 };
 
 } // namespace welcomer::fakes
