@@ -16,7 +16,9 @@
 #include <cstddef>
 #include <cstdint>
 #include <exception>
+#include <mutex>
 #include <optional>
+#include <set>
 #include <stdexcept>
 #include <string>
 #include <string_view>
@@ -295,13 +297,16 @@ class Adapter {
 
     static const char* delegateIdentifier(wl_delegate* self, wl_error_slot* slot) {
         return guarded(slot, [self]() -> const char* {
-            // One per thread, because the identifier is asked for on any.
-            thread_local std::optional<std::string> identifier;
-            identifier = delegate(self).delegateIdentifier();
-            if (identifier && identifier->find('\0') != std::string::npos) {
+            const std::optional<std::string> identifier = delegate(self).delegateIdentifier();
+            if (!identifier) {
+                return nullptr;
+            }
+            if (identifier->find('\0') != std::string::npos) {
                 throw std::invalid_argument("delegateIdentifier returned a NUL");
             }
-            return identifier ? identifier->c_str() : nullptr;
+            auto* adapter = static_cast<Adapter*>(self->plugin_data);
+            const std::lock_guard<std::mutex> lock(adapter->_mutex);
+            return adapter->_identifiers.insert(*identifier).first->c_str();
         });
     }
 
@@ -355,6 +360,10 @@ class Adapter {
     }
 
     wl_delegate _interface{};
+    std::mutex _mutex;
+    // The identifiers that were handed out, as a rule one: the host may still be reading any of them on
+    // another thread.
+    std::set<std::string> _identifiers;
     Delegate _delegate;
 };
 
