@@ -1,4 +1,5 @@
-/* The messaging delegate, in plain C: it registers the addresses that the user chose, on the calling thread. */
+/* The messaging delegate, in plain C: it registers the addresses that the user chose, on the calling thread.
+ */
 
 #define _POSIX_C_SOURCE 200809L /* nanosleep */
 
@@ -10,22 +11,22 @@
 /* What create makes. The structure that crosses points back to it. */
 struct chatter {
     wl_delegate interface;
-    const wl_host *host;
+    const wl_host* host;
 };
 
-static const struct chatter *chatter_of(const wl_delegate *self) {
+static const struct chatter* chatter_of(const wl_delegate* self) {
     return self->plugin_data;
 }
 
-static const char *delegate_identifier(wl_delegate *self, wl_error_slot *slot) {
+static const char* delegate_identifier(wl_delegate* self, wl_error_slot* slot) {
     (void)self;
     (void)slot;
     return "com.corvid.chatter";
 }
 
-static wl_value *delegate_setup_request(wl_delegate *self, wl_error_slot *slot) {
-    const wl_host *host = chatter_of(self)->host;
-    wl_value *request = host->new_dictionary();
+static wl_value* delegate_setup_request(wl_delegate* self, wl_error_slot* slot) {
+    const wl_host* host = chatter_of(self)->host;
+    wl_value* request = host->new_dictionary();
     if (!host->dictionary_set(request, "wantsAliases", WL_NUL_TERMINATED, host->new_boolean(true))) {
         host->release(request);
         host->raise(slot, "out of memory");
@@ -35,8 +36,8 @@ static wl_value *delegate_setup_request(wl_delegate *self, wl_error_slot *slot) 
 }
 
 /* Waits as long as the server asks; long enough to be seen when it says nothing. */
-static void work(const wl_host *host, const wl_value *response) {
-    const wl_value *wanted = host->dictionary_get(response, "delaySeconds", WL_NUL_TERMINATED);
+static void work(const wl_host* host, const wl_value* response) {
+    const wl_value* wanted = host->dictionary_get(response, "delaySeconds", WL_NUL_TERMINATED);
     double seconds = 0.02;
     int64_t whole = 0;
     if (!host->get_real(wanted, &seconds) && host->get_integer(wanted, &whole)) {
@@ -50,9 +51,9 @@ static void work(const wl_host *host, const wl_value *response) {
     }
 }
 
-static void complete_chosen_aliases(wl_delegate *self, const wl_value *response, const wl_value *aliases,
-                                    wl_completion_handler handler, wl_error_slot *slot) {
-    const wl_host *host = chatter_of(self)->host;
+static void complete_chosen_aliases(wl_delegate* self, const wl_value* response, const wl_value* aliases,
+                                    wl_completion_handler handler, wl_error_slot* slot) {
+    const wl_host* host = chatter_of(self)->host;
     (void)slot;
     if (host->value_type(response) != WL_VALUE_DICTIONARY) {
         handler.call(handler.context, false, 0, "the response is no dictionary");
@@ -69,26 +70,26 @@ static void complete_chosen_aliases(wl_delegate *self, const wl_value *response,
     handler.call(handler.context, true, 0, NULL);
 }
 
-static void complete(wl_delegate *self, const wl_value *response, wl_completion_handler handler,
-                     wl_error_slot *slot) {
+static void complete(wl_delegate* self, const wl_value* response, wl_completion_handler handler,
+                     wl_error_slot* slot) {
     complete_chosen_aliases(self, response, NULL, handler, slot);
 }
 
-static wl_value *messaging_aliases(wl_delegate *self, const wl_value *response, wl_error_slot *slot) {
-    const wl_host *host = chatter_of(self)->host;
-    const wl_value *offered = host->dictionary_get(response, "aliases", WL_NUL_TERMINATED);
+static wl_value* messaging_aliases(wl_delegate* self, const wl_value* response, wl_error_slot* slot) {
+    const wl_host* host = chatter_of(self)->host;
+    const wl_value* offered = host->dictionary_get(response, "aliases", WL_NUL_TERMINATED);
     if (host->value_type(offered) != WL_VALUE_ARRAY) {
         return NULL;
     }
-    wl_value *aliases = host->copy(offered);
+    wl_value* aliases = host->copy(offered);
     if (!aliases) {
         host->raise(slot, "out of memory");
     }
     return aliases;
 }
 
-static wl_delegate *create(const wl_host *host, wl_error_slot *slot) {
-    struct chatter *chatter = calloc(1, sizeof *chatter);
+static wl_delegate* create(const wl_host* host, wl_error_slot* slot) {
+    struct chatter* chatter = calloc(1, sizeof *chatter);
     if (!chatter) {
         host->raise(slot, "out of memory");
         return NULL;
@@ -104,7 +105,7 @@ static wl_delegate *create(const wl_host *host, wl_error_slot *slot) {
     return &chatter->interface;
 }
 
-static void destroy(wl_delegate *self) {
+static void destroy(wl_delegate* self) {
     if (self) {
         free(self->plugin_data);
     }

@@ -103,7 +103,7 @@ TEST_P(PluginLibrariesOfACompiler, AreSkippedWhenTheyBreakARuleAndDoNotHarmTheOt
     for (const char* name :
          {"no-symbol", "other-version", "other-protocol", "creates-nothing", "raises-create", "throws-create",
           "layer-throws-create", "no-identifier", "raises-identifier", "throws-identifier",
-          "layer-throws-identifier", "good", "layer"}) {
+          "layer-throws-identifier", "layer-nul-identifier", "good", "layer"}) {
         addFixture(name);
     }
     add("no-library", "/dev/null");
@@ -129,6 +129,8 @@ TEST_P(PluginLibrariesOfACompiler, AreSkippedWhenTheyBreakARuleAndDoNotHarmTheOt
             "Nimbus Plugins: Exception querying 'layer-throws-identifier.ncdplugin' for id on load: thrown "
             "in "
             "delegateIdentifier",
+            "Nimbus Plugins: Exception querying 'layer-nul-identifier.ncdplugin' for id on load: "
+            "delegateIdentifier returned a NUL",
             "Nimbus Plugins: duplicate plugins with id 'com.corvid.fixture', only one will be used",
             "Nimbus Plugins: Failed to get principal class for no-library.ncdplugin",
         }));
