@@ -1,0 +1,31 @@
+// Replacing a file in one step: whoever reads it meets the old content or the new, also after a crash.
+
+#pragma once
+
+#include <string>
+#include <string_view>
+#include <sys/types.h>
+
+namespace welcomer::local {
+
+// Blocks until this descriptor of a folder holds the folder's lock, which every writer of the folder's files
+// takes. The lock ends when the descriptor is closed, with the process at the latest; no file is made for it.
+//  result  0, or the system's error number
+// Any thread.
+int lockFolder(int folder);
+
+// Replaces a file: writes a temporary file in the same folder, syncs it, renames it and syncs the folder. A
+// file that is a mount point of its own cannot be renamed over; it is rewritten in place once its space is
+// reserved, and then a crash may leave it damaged.
+//  folder   a descriptor of the folder, whose lock the caller holds
+//  name     the file's name in it
+//  content  the new content, any bytes
+//  mode     the permissions of the new file, whatever the process's mask; a mount point keeps its own
+//  result   0, or the system's error number; the file is then unchanged and nothing is left beside it
+// Any thread.
+int replaceFile(int folder, const std::string& name, std::string_view content, mode_t mode);
+
+// Removes what a writer that was killed left beside a file. The caller holds the folder's lock. Any thread.
+void removeLeftOver(int folder, const std::string& name);
+
+} // namespace welcomer::local

@@ -1,0 +1,72 @@
+#include "backends/local/FileContent.h"
+
+#include "backends/local/FileDescriptor.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <fcntl.h>
+#include <sys/stat.h>
+
+namespace welcomer::local {
+
+namespace {
+
+constexpr std::size_t kSmallestRead = 4096;
+
+} // namespace
+
+int readAll(int descriptor, std::string& content, std::size_t maximum) {
+    struct stat status = {};
+    if (::fstat(descriptor, &status) != 0) {
+        return errno;
+    }
+    // One byte more than the size: a file that did not grow is then read by one call and a second that meets
+    // the end. Files that give no size, as those of procfs, grow the buffer.
+    std::size_t length = 0;
+    content.resize(std::max(static_cast<std::size_t>(status.st_size) + 1, kSmallestRead));
+    while (true) {
+        const ssize_t count = ::read(descriptor, content.data() + length, content.size() - length);
+        if (count < 0 && errno == EINTR) {
+            continue;
+        }
+        if (count < 0) {
+            return errno;
+        }
+        length += static_cast<std::size_t>(count);
+        if (length > maximum) {
+            return EFBIG;
+        }
+        if (count == 0) {
+            content.resize(length);
+            return 0;
+        }
+        if (length == content.size()) {
+            content.resize(2 * length);
+        }
+    }
+}
+
+int readFile(const std::string& path, std::string& content, std::size_t maximum) {
+    const FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+    struct stat status = {};
+    if (!file || ::fstat(file.get(), &status) != 0) {
+        return errno;
+    }
+    if (!S_ISREG(status.st_mode)) {
+        return EINVAL;
+    }
+    return readAll(file.get(), content, maximum);
+}
+
+int writeAll(int descriptor, std::string_view content) {
+    while (!content.empty()) {
+        const ssize_t count = ::write(descriptor, content.data(), content.size());
+        if (count < 0 && errno != EINTR) {
+            return errno;
+        }
+        content.remove_prefix(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
+    }
+    return 0;
+}
+
+} // namespace welcomer::local

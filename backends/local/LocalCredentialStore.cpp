@@ -1,0 +1,174 @@
+#include "backends/local/LocalCredentialStore.h"
+
+#include "backends/local/CredentialFolder.h"
+#include "backends/local/CredentialItemFormat.h"
+#include "backends/local/Directory.h"
+#include "platform/Path.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <utility>
+
+namespace welcomer::local {
+
+namespace {
+
+constexpr char kFolderName[] = "Credentials";
+constexpr mode_t kFolderMode = 0700;
+
+class Reference final : public platform::CredentialItemReference {
+  public:
+    Reference(std::string service, std::string account)
+        : _service(std::move(service)),
+          _account(std::move(account)) {}
+
+    const std::string& service() const { return _service; }
+    const std::string& account() const { return _account; }
+
+  private:
+    std::string _service;
+    std::string _account;
+};
+
+PropertyList::Array::iterator findIn(PropertyList::Array& items, const std::string& service,
+                                     const std::string& account) {
+    return std::find_if(items.begin(), items.end(), [&](const PropertyList& item) {
+        return credentialItemHasKey(item, service, account);
+    });
+}
+
+// Opens the folder for the creation of an item, and makes it where it is missing.
+std::int32_t openOrMake(CredentialFolder& folder, const std::string& path) {
+    std::int32_t status = folder.open(path);
+    if (status == platform::kCredentialItemNotFound) {
+        // Another process may make it at the same time.
+        const int error = makeDirectory(path, kFolderMode);
+        status = error == 0 || error == EEXIST ? folder.open(path) : platform::kCredentialWriteFailed;
+    }
+    // What cannot be opened, as a file where the folder should be, cannot be written either.
+    return status == platform::kCredentialReadFailed ? platform::kCredentialWriteFailed : status;
+}
+
+// Copies the one item out of the store at a path.
+std::int32_t readItem(const std::string& folderPath, const std::string& service, const std::string& account,
+                      PropertyList& item) {
+    if (credentialFileIsAbsent(folderPath)) {
+        return platform::kCredentialItemNotFound;
+    }
+    CredentialFolder folder;
+    PropertyList::Array items;
+    std::int32_t status = folder.open(folderPath);
+    if (status == platform::kCredentialSuccess) {
+        status = folder.load(items);
+    }
+    if (status != platform::kCredentialSuccess) {
+        return status;
+    }
+    const auto found = findIn(items, service, account);
+    if (found == items.end()) {
+        return platform::kCredentialItemNotFound;
+    }
+    item = std::move(*found);
+    return platform::kCredentialSuccess;
+}
+
+} // namespace
+
+std::string LocalCredentialStore::_folderPath(const std::string& library) const {
+    return _root.locate(platform::joinPath(library, kFolderName));
+}
+
+std::string LocalCredentialStore::_existingFolderPath() {
+    // Not userLibraryDirectories(), which would make a folder.
+    return _folderPath(platform::joinPath(_identity.homeDirectory(), "Library"));
+}
+
+std::int32_t LocalCredentialStore::createTrustedApplication(const std::string& path,
+                                                            platform::TrustedApplication& application) {
+    if (!path.starts_with('/')) {
+        return platform::kCredentialInvalidPath;
+    }
+    application.path = path;
+    return platform::kCredentialSuccess;
+}
+
+std::int32_t LocalCredentialStore::createAccess(const std::string& description,
+                                                std::vector<platform::TrustedApplication> trustedApplications,
+                                                platform::CredentialAccess& access) {
+    access = {description, std::move(trustedApplications)};
+    return platform::kCredentialSuccess;
+}
+
+std::int32_t LocalCredentialStore::createItem(const platform::CredentialItem& item, const std::string& data) {
+    // Makes the library folder where it is missing.
+    _identity.userLibraryDirectories();
+    CredentialFolder folder;
+    PropertyList::Array items;
+    std::int32_t status = openOrMake(folder, _existingFolderPath());
+    if (status == platform::kCredentialSuccess) {
+        status = folder.lock();
+    }
+    if (status == platform::kCredentialSuccess) {
+        status = folder.load(items);
+    }
+    if (status != platform::kCredentialSuccess) {
+        return status;
+    }
+    if (findIn(items, item.service, item.account) != items.end()) {
+        return platform::kCredentialDuplicateItem;
+    }
+    items.push_back(makeCredentialItem(item, data));
+    return folder.save(std::move(items));
+}
+
+std::int32_t LocalCredentialStore::findItem(const std::string& service, const std::string& account,
+                                            std::string* data,
+                                            std::unique_ptr<platform::CredentialItemReference>* reference) {
+    PropertyList item;
+    const std::int32_t status = readItem(_existingFolderPath(), service, account, item);
+    if (status != platform::kCredentialSuccess) {
+        return status;
+    }
+    if (data) {
+        *data = takeCredentialItemData(item);
+    }
+    if (reference) {
+        *reference = std::make_unique<Reference>(service, account);
+    }
+    return platform::kCredentialSuccess;
+}
+
+std::int32_t LocalCredentialStore::readAttributes(const platform::CredentialItemReference& reference,
+                                                  platform::CredentialItem& item) {
+    const auto& key = dynamic_cast<const Reference&>(reference);
+    PropertyList stored;
+    const std::int32_t status = readItem(_existingFolderPath(), key.service(), key.account(), stored);
+    if (status == platform::kCredentialSuccess) {
+        item = credentialItemAttributes(stored);
+    }
+    return status;
+}
+
+std::int32_t LocalCredentialStore::deleteItem(const platform::CredentialItemReference& reference) {
+    const auto& key = dynamic_cast<const Reference&>(reference);
+    CredentialFolder folder;
+    PropertyList::Array items;
+    std::int32_t status = folder.open(_existingFolderPath());
+    if (status == platform::kCredentialSuccess) {
+        status = folder.lock();
+    }
+    if (status == platform::kCredentialSuccess) {
+        status = folder.load(items);
+    }
+    if (status != platform::kCredentialSuccess) {
+        return status;
+    }
+    const auto found = findIn(items, key.service(), key.account());
+    if (found == items.end()) {
+        return platform::kCredentialItemNotFound;
+    }
+    items.erase(found);
+    return folder.save(std::move(items));
+}
+
+} // namespace welcomer::local

@@ -1,0 +1,28 @@
+// Files and folders of the machine, below a root folder.
+
+#pragma once
+
+#include "backends/local/RootFolder.h"
+#include "platform/FileSystem.h"
+
+namespace welcomer::local {
+
+class LocalFileSystem final : public platform::FileSystem {
+  public:
+    explicit LocalFileSystem(RootFolder root) : _root(std::move(root)) {}
+
+    bool exists(const std::string& path) override;
+    platform::Outcome remove(const std::string& path) override;
+    platform::Outcome createDirectory(const std::string& path, std::uint32_t mode) override;
+
+    // The copy is written under a temporary name and then linked, so that a process that is killed never
+    // leaves a part of it under its own name. Of the permissions the read, write and execute bits are copied.
+    platform::Outcome copy(const std::string& source, const std::string& destination) override;
+
+    std::optional<std::vector<std::string>> list(const std::string& path) override;
+
+  private:
+    const RootFolder _root;
+};
+
+} // namespace welcomer::local
