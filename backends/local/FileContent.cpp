@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <fcntl.h>
 #include <sys/stat.h>
 
@@ -19,6 +20,9 @@ int readAll(int descriptor, std::string& content, std::size_t maximum) {
     struct stat status = {};
     if (::fstat(descriptor, &status) != 0) {
         return errno;
+    }
+    if (status.st_size > 0 && static_cast<std::uintmax_t>(status.st_size) > maximum) {
+        return EFBIG; // a sparse file may claim more than there is memory for
     }
     // One byte more than the size: a file that did not grow is then read by one call and a second that meets
     // the end. Files that give no size, as those of procfs, grow the buffer.

@@ -4,6 +4,7 @@
 #include "backends/local/FileContent.h"
 #include "backends/local/FileDescriptor.h"
 #include "backends/local/SystemError.h"
+#include "propertylist/UTF8.h"
 
 #include <array>
 #include <cerrno>
@@ -15,6 +16,7 @@
 #include <sys/stat.h>
 #include <system_error>
 #include <unistd.h>
+#include <utility>
 
 namespace welcomer::local {
 
@@ -22,6 +24,7 @@ namespace {
 
 constexpr std::size_t kCopyBufferSize = 65536;
 constexpr mode_t kCopiedPermissions = 0777;
+constexpr mode_t kNewFileMode = 0644;
 
 int copyContent(int source, int destination) {
     std::array<char, kCopyBufferSize> buffer;
@@ -100,6 +103,25 @@ int removeAll(const std::string& path) {
     return removed || error ? error.value() : ENOENT;
 }
 
+// Opens a file to be written from its start, making it where it is missing. 0, or the system's error number.
+int openToWrite(const std::string& path, FileDescriptor& file) {
+    file = FileDescriptor(::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kNewFileMode));
+    if (file) {
+        return ::fchmod(file.get(), kNewFileMode) == 0 ? 0 : errno;
+    }
+    if (errno == EEXIST) {
+        // A pipe must not block; a dangling link is not followed to make a file elsewhere.
+        file = FileDescriptor(::open(path.c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC | O_NONBLOCK));
+    }
+    return file ? 0 : errno;
+}
+
+int writeFile(const std::string& path, std::string_view content) {
+    FileDescriptor file;
+    const int error = openToWrite(path, file);
+    return error == 0 ? writeAll(file.get(), content) : error;
+}
+
 } // namespace
 
 bool LocalFileSystem::exists(const std::string& path) {
@@ -138,6 +160,17 @@ std::optional<std::vector<std::string>> LocalFileSystem::list(const std::string&
         return std::nullopt;
     }
     return names;
+}
+
+std::optional<std::string> LocalFileSystem::readText(const std::string& path) {
+    std::string text;
+    const bool isText = readFile(_root.locate(path), text, platform::kMaximumTextSize) == 0 &&
+                        findInvalidUTF8(text) == std::string::npos;
+    return isText ? std::optional(std::move(text)) : std::nullopt;
+}
+
+platform::Outcome LocalFileSystem::writeText(const std::string& path, const std::string& text) {
+    return systemOutcome("cannot write " + path, writeFile(_root.locate(path), text));
 }
 
 } // namespace welcomer::local

@@ -20,6 +20,8 @@ class LocalFileSystem final : public platform::FileSystem {
     platform::Outcome copy(const std::string& source, const std::string& destination) override;
 
     std::optional<std::vector<std::string>> list(const std::string& path) override;
+    std::optional<std::string> readText(const std::string& path) override;
+    platform::Outcome writeText(const std::string& path, const std::string& text) override;
 
   private:
     const RootFolder _root;

@@ -238,6 +238,9 @@ platform::Outcome FakeFileSystem::writeText(const std::string& path, const std::
         node->content = text;
         return platform::Outcome::success();
     }
+    if (find(path, false, number)) {
+        return failure(what, ENOENT); // a dangling link
+    }
     Node* parent = find(parentOf(path), true, number);
     if (!parent || parent->kind != Kind::Directory) {
         return failure(what, parent ? ENOTDIR : number);

@@ -1,0 +1,63 @@
+// Preferences as files: one XML property list per domain in the user's Library/Preferences.
+
+#pragma once
+
+#include "backends/local/PreferenceFile.h"
+#include "backends/local/RootFolder.h"
+#include "platform/PreferenceStore.h"
+#include "platform/ProcessIdentity.h"
+
+#include <map>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace welcomer::local {
+
+// Synchronising with changes takes the folder's lock, merges the keys that were changed here into what is on
+// disk, writes a temporary file, syncs it and renames it over the old one: no change of another process is
+// lost, and the file is whole at any time, old or new. A file that is a mount point of its own cannot be
+// renamed over and is rewritten in place; a process that is killed in that moment leaves it damaged. A
+// symbolic link in a file's place is read through, and replaced when the domain is written.
+//
+// Files of every property-list format are read, so that those of other tools are understood. A damaged file
+// is renamed to "<domain>.plist.damaged", with a number where that name is taken.
+class LocalPreferenceStore final : public platform::PreferenceStore {
+  public:
+    //  root      the folder below which every path is looked up
+    //  identity  says where the user's library is; borrowed, must outlive the store
+    LocalPreferenceStore(RootFolder root, platform::ProcessIdentity& identity);
+
+    std::optional<PropertyList> copyValue(const std::string& key, const std::string& domain) override;
+    void setValue(const std::string& key, const PropertyList& value, const std::string& domain) override;
+    void removeValue(const std::string& key, const std::string& domain) override;
+    bool synchronise(const std::string& domain) override;
+    std::vector<platform::DamagedPreferences> damagedPreferences() override;
+
+  private:
+    struct Domain {
+        PropertyList::Dictionary seen;                              // as it was on disk
+        std::map<std::string, std::optional<PropertyList>> changes; // none: removed
+        bool isLoaded = false;
+    };
+
+    // All with _mutex held.
+    const std::string& _folder();
+    bool _load(const std::string& name, Domain& domain);
+    bool _storeChanges(const std::string& name, Domain& domain);
+    // Reads a domain again with its folder locked, and sets it aside when it is damaged.
+    //  result  none when the domain must be left alone
+    std::optional<PropertyList::Dictionary> _readLocked(const std::string& name,
+                                                        const LockedPreferenceFolder& folder);
+    void _noteDamage(const std::string& name, const std::string& reason, const std::string& setAsideName);
+
+    const RootFolder _root;
+    platform::ProcessIdentity& _identity;
+    std::mutex _mutex;
+    std::optional<std::string> _userFolder; // below the root; none until it is first needed
+    std::map<std::string, Domain> _domains;
+    std::vector<platform::DamagedPreferences> _damaged;
+};
+
+} // namespace welcomer::local

@@ -1,0 +1,113 @@
+#include "backends/local/PreferenceFile.h"
+
+#include "backends/local/AtomicFile.h"
+#include "backends/local/Directory.h"
+#include "backends/local/FileContent.h"
+#include "propertylist/PropertyListReader.h"
+#include "propertylist/PropertyListWriter.h"
+
+#include <cerrno>
+#include <fcntl.h>
+#include <optional>
+#include <sys/stat.h>
+#include <system_error>
+#include <unistd.h>
+#include <utility>
+
+namespace welcomer::local {
+
+namespace {
+
+using State = PreferenceFileContent::State;
+
+// More than any program keeps in its preferences.
+constexpr std::size_t kMaximumFileSize = std::size_t{16} * 1024 * 1024;
+constexpr mode_t kFolderMode = 0700;
+constexpr mode_t kFileMode = 0600;
+constexpr mode_t kPermissions = 07777;
+
+constexpr char kDamagedSuffix[] = ".damaged";
+constexpr int kMaximumDamagedFiles = 1000;
+
+// "name.damaged", "name.damaged-2", "name.damaged-3" and so on.
+std::string damagedName(const std::string& name, int number) {
+    return name + kDamagedSuffix + (number == 1 ? std::string() : "-" + std::to_string(number));
+}
+
+PreferenceFileContent damaged(std::string bytes, std::string reason) {
+    return {State::Damaged, {}, std::move(bytes), std::move(reason)};
+}
+
+} // namespace
+
+PreferenceFileContent readPreferenceFile(const std::string& path) {
+    std::string bytes;
+    const int error = readFile(path, bytes, kMaximumFileSize);
+    if (error == ENOENT || (error == 0 && bytes.empty())) {
+        return {};
+    }
+    if (error != 0) {
+        return {State::Unreadable, {}, {}, std::generic_category().message(error)};
+    }
+    PropertyListReadResult result = readPropertyList(bytes);
+    if (!result) {
+        return damaged(std::move(bytes), std::move(result.error));
+    }
+    PropertyList::Dictionary* values = result.value->dictionary();
+    if (!values) {
+        return damaged(std::move(bytes), "a property list, but no dictionary");
+    }
+    return {State::Whole, std::move(*values), {}, {}};
+}
+
+LockedPreferenceFolder::LockedPreferenceFolder(const std::string& path) {
+    makeDirectory(path, kFolderMode); // fails where it exists already; opening says the rest
+    FileDescriptor folder(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (folder && lockFolder(folder.get()) == 0) {
+        _folder = std::move(folder);
+    }
+}
+
+bool LockedPreferenceFolder::write(const std::string& name, const PropertyList::Dictionary& values) const {
+    const std::optional<std::string> bytes = writeXMLPropertyList(values);
+    if (!bytes) {
+        return false;
+    }
+    struct stat present = {};
+    const bool isPresent = ::fstatat(_folder.get(), name.c_str(), &present, 0) == 0;
+    const mode_t mode = isPresent ? present.st_mode & kPermissions : kFileMode;
+    return replaceFile(_folder.get(), name, *bytes, mode) == 0;
+}
+
+std::string LockedPreferenceFolder::setAside(const std::string& name, const std::string& bytes) const {
+    for (int number = 1; number <= kMaximumDamagedFiles; ++number) {
+        const std::string other = damagedName(name, number);
+        // An empty file of our own takes the name, so that nothing else is overwritten.
+        const FileDescriptor reserved(
+            ::openat(_folder.get(), other.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kFileMode));
+        if (!reserved && errno == EEXIST) {
+            continue;
+        }
+        if (!reserved) {
+            break;
+        }
+        if (::renameat(_folder.get(), name.c_str(), _folder.get(), other.c_str()) == 0 ||
+            (errno == EBUSY && _moveContent(name, reserved.get(), bytes))) {
+            return other;
+        }
+        ::unlinkat(_folder.get(), other.c_str(), 0);
+        break;
+    }
+    return {};
+}
+
+bool LockedPreferenceFolder::_moveContent(const std::string& name, int destination,
+                                          const std::string& bytes) const {
+    if (writeAll(destination, bytes) != 0 || ::fsync(destination) != 0) {
+        return false;
+    }
+    return static_cast<bool>(
+        FileDescriptor(::openat(_folder.get(), name.c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC)));
+}
+
+} // namespace welcomer::local

@@ -1,0 +1,57 @@
+// The file of one preference domain.
+
+#pragma once
+
+#include "backends/local/FileDescriptor.h"
+#include "propertylist/PropertyList.h"
+
+#include <string>
+
+namespace welcomer::local {
+
+// What was found in a domain's place.
+struct PreferenceFileContent {
+    enum class State {
+        Whole,      // a dictionary; an empty one where there is no file or an empty file
+        Damaged,    // no property list, or one that is no dictionary
+        Unreadable, // the system refused to read it, or it is too long to be one
+    };
+    State state = State::Whole;
+    PropertyList::Dictionary values; // empty unless whole
+    std::string bytes;               // of a damaged file
+    std::string reason;              // one line, unless whole
+};
+
+// Reads a domain's file, in any property-list format, without a lock.
+//  path  the file's path on this machine
+// Any thread.
+PreferenceFileContent readPreferenceFile(const std::string& path);
+
+// The folder of the domains' files, with its lock held for as long as this lives. One thread at a time.
+class LockedPreferenceFolder {
+  public:
+    // Opens the folder, a path of this machine, making it (mode 0700) where it is missing, and waits for the
+    // other writers.
+    explicit LockedPreferenceFolder(const std::string& path);
+
+    // Whether all of that succeeded; without it nothing below may be called.
+    explicit operator bool() const { return static_cast<bool>(_folder); }
+
+    // Replaces a file's content, all or nothing. The file keeps its permissions; a new one is the user's
+    // alone.
+    //  result  false when the values cannot be written
+    bool write(const std::string& name, const PropertyList::Dictionary& values) const;
+
+    // Gives a damaged file another name, one that is free. A mount point keeps its name and its content is
+    // moved.
+    //  bytes   its content
+    //  result  the other name, empty when that failed; the file is then unchanged
+    std::string setAside(const std::string& name, const std::string& bytes) const;
+
+  private:
+    bool _moveContent(const std::string& name, int destination, const std::string& bytes) const;
+
+    FileDescriptor _folder;
+};
+
+} // namespace welcomer::local
