@@ -15,6 +15,9 @@ using Names = std::vector<std::string>;
 template <typename Backend>
 class RunLoopContract : public testing::Test {
   protected:
+    // The thread's loop may outlive the test: nothing of it stays pending.
+    void TearDown() override { loop->run(0ns); }
+
     std::function<void()> note(const std::string& name) {
         return [this, name] {
             names.push_back(name);
