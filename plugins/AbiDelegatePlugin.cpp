@@ -96,7 +96,7 @@ AbiDelegatePlugin::create(const wl_delegate_plugin_descriptor& principalClass) {
         return nullptr;
     }
     // From here on the destructor gives the instance back.
-    const std::shared_ptr<AbiDelegatePlugin> plugin(new AbiDelegatePlugin(principalClass, instance));
+    std::shared_ptr<AbiDelegatePlugin> plugin(new AbiDelegatePlugin(principalClass, instance));
     throwIfRaised(slot);
     if (instance->size < kInstanceSize) {
         return nullptr;
