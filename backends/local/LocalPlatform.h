@@ -1,0 +1,46 @@
+// The platform on nothing but the kernel, the C library and files.
+
+#pragma once
+
+#include "backends/Backends.h"
+#include "backends/local/LocalClock.h"
+#include "backends/local/LocalCredentialStore.h"
+#include "backends/local/LocalDispatchQueues.h"
+#include "backends/local/LocalFileSystem.h"
+#include "backends/local/LocalHostReachability.h"
+#include "backends/local/LocalPluginBundle.h"
+#include "backends/local/LocalPreferenceStore.h"
+#include "backends/local/LocalProcessIdentity.h"
+#include "backends/local/LocalResourceBundles.h"
+#include "backends/local/LocalRunLoops.h"
+#include "backends/local/LocalSystemLog.h"
+#include "backends/local/LocalSystemVersionInfo.h"
+#include "backends/local/RootFolder.h"
+
+namespace welcomer::local {
+
+// Making one costs no system call: every service does its work when it is first asked.
+class LocalPlatform final : public PlatformOwner {
+  public:
+    explicit LocalPlatform(const PlatformOptions& options);
+
+    const platform::Platform& platform() const override { return _platform; }
+
+  private:
+    const RootFolder _root;
+    LocalSystemLog _systemLog;
+    LocalFileSystem _fileSystem{_root};
+    LocalProcessIdentity _processIdentity{_root};
+    LocalCredentialStore _credentialStore{_root, _processIdentity};
+    LocalPluginBundle _pluginBundle{_root};
+    LocalResourceBundles _resourceBundles{_root};
+    LocalClock _clock;
+    LocalRunLoops _runLoops;
+    LocalDispatchQueues _dispatchQueues;
+    LocalPreferenceStore _preferenceStore{_root, _processIdentity};
+    LocalSystemVersionInfo _systemVersionInfo{_fileSystem};
+    LocalHostReachability _hostReachability;
+    const platform::Platform _platform;
+};
+
+} // namespace welcomer::local
