@@ -29,11 +29,14 @@ std::deque<std::string> componentsOf(std::string_view path) {
 }
 
 std::string parentOf(const std::string& path) {
-    return path.substr(0, path.rfind('/'));
+    const std::size_t end = path.find_last_not_of('/') + 1; // slashes at the end name nothing
+    return path.substr(0, path.substr(0, end).rfind('/'));
 }
 
 std::string nameOf(const std::string& path) {
-    return path.substr(path.rfind('/') + 1);
+    const std::size_t end = path.find_last_not_of('/') + 1;
+    const std::size_t slash = path.substr(0, end).rfind('/') + 1;
+    return path.substr(slash, end - slash);
 }
 
 platform::Outcome failure(const std::string& what, int number) {

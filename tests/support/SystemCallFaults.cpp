@@ -1,0 +1,191 @@
+#include "tests/support/SystemCallFaults.h"
+
+#include <cerrno>
+#include <cstdarg>
+#include <cstddef>
+#include <cstdlib>
+#include <dlfcn.h>
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <sys/types.h>
+#include <unistd.h>
+
+namespace welcomer {
+
+namespace {
+
+enum class Mode { Off, Count, Fail, Crash };
+
+Mode mode = Mode::Off;
+int calls = 0;
+int target = 0;
+int targetError = 0;
+
+// Counts a call. True when it is the one to fail or to crash at.
+bool isTarget() {
+    if (mode == Mode::Off) {
+        return false;
+    }
+    ++calls;
+    return mode != Mode::Count && calls == target;
+}
+
+// Counts a call. True when it must fail, with errno set.
+bool mustFail() {
+    if (!isTarget()) {
+        return false;
+    }
+    if (mode == Mode::Crash) {
+        ::_exit(SystemCallFaults::kCrashed);
+    }
+    errno = targetError;
+    return true;
+}
+
+// The C library's own function, or a sanitizer's.
+template <typename Function>
+Function* real(const char* name) {
+    return reinterpret_cast<Function*>(::dlsym(RTLD_NEXT, name));
+}
+
+void start(Mode newMode, int number, int error) {
+    mode = newMode;
+    calls = 0;
+    target = number;
+    targetError = error;
+}
+
+} // namespace
+
+void SystemCallFaults::count() {
+    start(Mode::Count, 0, 0);
+}
+
+void SystemCallFaults::failAt(int number, int error) {
+    start(Mode::Fail, number, error);
+}
+
+void SystemCallFaults::crashAt(int number) {
+    start(Mode::Crash, number, 0);
+}
+
+int SystemCallFaults::stop() {
+    mode = Mode::Off;
+    return calls;
+}
+
+} // namespace welcomer
+
+using welcomer::mustFail;
+using welcomer::real;
+
+extern "C" {
+
+int access(const char* path, int type) noexcept {
+    static const auto next = real<int(const char*, int)>("access");
+    return mustFail() ? -1 : next(path, type);
+}
+
+int chmod(const char* path, mode_t mode) noexcept {
+    static const auto next = real<int(const char*, mode_t)>("chmod");
+    return mustFail() ? -1 : next(path, mode);
+}
+
+int fchmod(int file, mode_t mode) noexcept {
+    static const auto next = real<int(int, mode_t)>("fchmod");
+    return mustFail() ? -1 : next(file, mode);
+}
+
+int fstat(int file, struct stat* status) noexcept {
+    static const auto next = real<int(int, struct stat*)>("fstat");
+    return mustFail() ? -1 : next(file, status);
+}
+
+int fsync(int file) {
+    static const auto next = real<int(int)>("fsync");
+    return mustFail() ? -1 : next(file);
+}
+
+int flock(int file, int operation) noexcept {
+    static const auto next = real<int(int, int)>("flock");
+    return mustFail() ? -1 : next(file, operation);
+}
+
+int ftruncate(int file, off_t size) noexcept {
+    static const auto next = real<int(int, off_t)>("ftruncate");
+    return mustFail() ? -1 : next(file, size);
+}
+
+int link(const char* from, const char* to) noexcept {
+    static const auto next = real<int(const char*, const char*)>("link");
+    return mustFail() ? -1 : next(from, to);
+}
+
+int mkdir(const char* path, mode_t mode) noexcept {
+    static const auto next = real<int(const char*, mode_t)>("mkdir");
+    return mustFail() ? -1 : next(path, mode);
+}
+
+int mkostemp(char* pattern, int flags) {
+    static const auto next = real<int(char*, int)>("mkostemp");
+    return mustFail() ? -1 : next(pattern, flags);
+}
+
+int open(const char* path, int flags, ...) {
+    static const auto next = real<int(const char*, int, ...)>("open");
+    va_list arguments;
+    va_start(arguments, flags);
+    const mode_t mode = va_arg(arguments, mode_t); // meaningless unless a file is created
+    va_end(arguments);
+    return mustFail() ? -1 : next(path, flags, mode);
+}
+
+int openat(int folder, const char* path, int flags, ...) {
+    static const auto next = real<int(int, const char*, int, ...)>("openat");
+    va_list arguments;
+    va_start(arguments, flags);
+    const mode_t mode = va_arg(arguments, mode_t);
+    va_end(arguments);
+    return mustFail() ? -1 : next(folder, path, flags, mode);
+}
+
+int posix_fallocate(int file, off_t offset, off_t size) {
+    static const auto next = real<int(int, off_t, off_t)>("posix_fallocate");
+    return mustFail() ? errno : next(file, offset, size);
+}
+
+ssize_t read(int file, void* buffer, size_t size) {
+    static const auto next = real<ssize_t(int, void*, size_t)>("read");
+    return mustFail() ? -1 : next(file, buffer, size);
+}
+
+int renameat(int fromFolder, const char* from, int toFolder, const char* to) noexcept {
+    static const auto next = real<int(int, const char*, int, const char*)>("renameat");
+    return mustFail() ? -1 : next(fromFolder, from, toFolder, to);
+}
+
+int unlink(const char* path) noexcept {
+    static const auto next = real<int(const char*)>("unlink");
+    return mustFail() ? -1 : next(path);
+}
+
+int unlinkat(int folder, const char* path, int flags) noexcept {
+    static const auto next = real<int(int, const char*, int)>("unlinkat");
+    return mustFail() ? -1 : next(folder, path, flags);
+}
+
+ssize_t write(int file, const void* buffer, size_t size) {
+    static const auto next = real<ssize_t(int, const void*, size_t)>("write");
+    if (!welcomer::isTarget()) {
+        return next(file, buffer, size);
+    }
+    if (welcomer::mode == welcomer::Mode::Crash) {
+        const ssize_t half = next(file, buffer, size / 2);
+        ::_exit(half < 0 ? EXIT_FAILURE : welcomer::SystemCallFaults::kCrashed);
+    }
+    errno = welcomer::targetError;
+    return -1;
+}
+
+} // extern "C"

@@ -1,0 +1,30 @@
+// Has the system calls of this test program fail, or the process end, at a chosen one.
+//
+// A program that links SystemCallFaults.cpp makes its own calls of access, chmod, fchmod, fstat, fsync,
+// flock, ftruncate, link, mkdir, mkostemp, open, openat, posix_fallocate, read, renameat, unlink, unlinkat
+// and write through this counter; those that the C library makes within itself are not seen. One thread at a
+// time.
+
+#pragma once
+
+namespace welcomer {
+
+class SystemCallFaults {
+  public:
+    // Counts from now on, and counts only.
+    static void count();
+
+    // Has the call with this number, counted from 1, fail with an error number and do nothing.
+    static void failAt(int number, int error);
+
+    // Ends the process with kCrashed instead of making the call with this number; a write is half made.
+    static void crashAt(int number);
+
+    // Ends all of that.
+    //  result  the calls that were counted
+    static int stop();
+
+    static constexpr int kCrashed = 77;
+};
+
+} // namespace welcomer
