@@ -10,6 +10,7 @@
 #include <mutex>
 #include <optional>
 #include <set>
+#include <tuple>
 #include <utility>
 
 namespace welcomer::simulated {
@@ -48,7 +49,9 @@ struct Destination {
 struct Place {
     nanoseconds due;
     std::uint64_t sequence;
-    auto operator<=>(const Place&) const = default;
+    friend bool operator<(const Place& left, const Place& right) {
+        return std::tie(left.due, left.sequence) < std::tie(right.due, right.sequence);
+    }
 };
 
 struct Item {
