@@ -11,8 +11,8 @@ namespace welcomer {
 
 namespace {
 
-// Writes to `object` on success only; the item's data lives no longer than this takes.
-bool deserializeReplayObject(std::string data, PropertyList& object) {
+// Writes to `object` on success only.
+bool deserializeReplayObject(const std::string& data, PropertyList& object) {
     PropertyListReadResult read = readPropertyList(data);
     if (!read) {
         WL_LOG("Failed to deserialize replayable data length: %@", read.error);
@@ -33,7 +33,7 @@ bool WLGetNimbusReplayKeychainItem(PropertyList* replayObject, std::string* acco
         WL_LOG("Failed to find replay keychain item: %d", status);
         return false;
     }
-    if (replayObject && !deserializeReplayObject(std::move(data), *replayObject)) {
+    if (replayObject && !deserializeReplayObject(data, *replayObject)) {
         return false;
     }
     if (!accountName) {
