@@ -25,6 +25,11 @@ struct PlatformOptions {
 
     // Takes the records in place of the system log, or null. Borrowed: must outlive the platform.
     platform::SystemLog* systemLog = nullptr;
+
+    // Each takes the place of the machine's own, or null. Borrowed: must outlive the platform.
+    platform::Clock* clock = nullptr;
+    platform::RunLoops* runLoops = nullptr;
+    platform::DispatchQueues* dispatchQueues = nullptr;
 };
 
 // Builds the platform. Opens nothing and starts no thread: each service does its work when it is first asked.

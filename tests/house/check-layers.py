@@ -73,7 +73,8 @@ def refusal(source, target, quoted, tree):
     if aim in TESTS:
         return "includes a test"
     if aim == "backends" and room != "backends":
-        if target == "backends/Backends.h" and PROGRAMS.match(str(source)):
+        offered = target == "backends/Backends.h" or target.startswith("backends/simulated/")
+        if offered and PROGRAMS.match(str(source)):
             return None
         return "chooses a backend; only a program's main.cpp does"
     if aim == room:

@@ -55,6 +55,16 @@ class CheckLayers(unittest.TestCase):
         self.assert_one({**backend, "agent/Agent.cpp": use}, "chooses a backend")
         self.assert_one({**backend, "tools/welcomer/TryCommand.cpp": use}, "chooses a backend")
 
+    def test_only_a_program_chooses_simulated_time(self):
+        time = {"backends/simulated/VirtualTime.h": ""}
+        use = '#include "backends/simulated/VirtualTime.h"\n'
+        self.assertEqual(self.findings({**time, "tools/welcomer/main.cpp": use}), [])
+        self.assert_one({**time, "tools/welcomer/TryCommand.cpp": use}, "chooses a backend")
+
+    def test_a_program_does_not_reach_past_backends_h(self):
+        self.assert_one({"backends/local/A.h": "", "agent/main.cpp": '#include "backends/local/A.h"\n'},
+                        "chooses a backend")
+
     def test_system_headers_on_the_inner_floors_are_found(self):
         self.assert_one({"handoff/A.cpp": "#include <unistd.h>\n"}, "standard library alone")
         self.assert_one({"agent/A.cpp": "#include <sys/stat.h>\n"}, "standard library alone")

@@ -1,4 +1,5 @@
 #include "backends/Backends.h"
+#include "backends/simulated/VirtualTime.h"
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakeSystemLog.h"
 #include "tests/support/SystemCallFaults.h"
@@ -49,6 +50,17 @@ TEST(LocalPlatformTest, EveryServiceLooksBelowTheRoot) {
     EXPECT_TRUE(platform.preferenceStore.synchronise("com.corvid.test"));
     EXPECT_TRUE(std::filesystem::exists(root.locate(home + "/Library/Preferences")));
     EXPECT_NE(platform.pluginBundle.load("/Setup.app/Resources/agent", "symbol").reason, "");
+}
+
+TEST(LocalPlatformTest, TimePassesOnTheGivenServices) {
+    simulated::VirtualTime time;
+    const std::unique_ptr<PlatformOwner> owner =
+        buildPlatform({.clock = &time, .runLoops = &time, .dispatchQueues = &time});
+    const platform::Platform& platform = owner->platform();
+
+    EXPECT_EQ(&platform.clock, &time);
+    EXPECT_EQ(&platform.runLoops, &time);
+    EXPECT_EQ(&platform.dispatchQueues, &time);
 }
 
 TEST(LocalPlatformTest, RecordsGoToTheGivenLog) {
