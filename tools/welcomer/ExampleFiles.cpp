@@ -12,7 +12,7 @@ namespace fs = std::filesystem;
 ExampleFiles findExampleFiles() {
     const fs::path programs = fs::read_symlink("/proc/self/exe").parent_path();
     // The installed tree first, then the build tree.
-    for (const fs::path& folder : {programs.parent_path() / "share/welcomer", programs.parent_path()}) {
+    for (const fs::path& folder : {programs / WELCOMER_DATA_FROM_PROGRAMS, programs.parent_path()}) {
         ExampleFiles files{folder / "setup-bundle", {}};
         const fs::path plugins = folder / "plugins";
         if (!fs::is_directory(files.setupBundle) || !fs::is_directory(plugins)) {
