@@ -1,6 +1,7 @@
-/* A plug-in that writes to the standard output, which is the tool's. */
+/* A plug-in that writes to the standard output, which is the tool's, and to a file that the test names. */
 
 #include <stdio.h>
+#include <stdlib.h>
 #include <welcomer/delegate_plugin.h>
 
 static const char* identifier(wl_delegate* self, wl_error_slot* slot) {
@@ -15,6 +16,11 @@ static wl_delegate* create(const wl_host* host, wl_error_slot* slot) {
     (void)slot;
     puts("the talking plug-in says hello");
     fflush(stdout);
+    const char* const path = getenv("TOOL_TEST_FILE");
+    FILE* const file = path ? fopen(path, "w") : NULL;
+    if (file) {
+        fclose(file);
+    }
     return &delegate;
 }
 

@@ -394,6 +394,14 @@ class Try(ToolTest):
         self.assertEqual(result.returncode, 1)
         self.assertIn("welcomer: the agent of the first login ended with signal 6", result.stderr)
 
+    def test_a_launch_agent_that_is_left_behind_is_a_failure(self):
+        self.plugin_below_root("TalkingPlugin.ncdplugin")
+        self.environment["TOOL_TEST_FILE"] = str(self.home / "Library/LaunchAgents" / LAUNCH_AGENT)
+        result = self.run_below_root("try", "--time-lapse", env=self.environment)
+        self.assertEqual(result.returncode, 1)
+        self.assertRegex(result.stdout, r"launch agent +still there\n")
+        self.assertIn("welcomer: the first login left the launch agent behind\n", result.stderr)
+
     def start_on_terminal(self, *arguments):
         """The tool with a terminal of its own, of 100 columns, as its standard streams and its controlling terminal."""
         identifier, terminal = pty.fork()
@@ -435,6 +443,17 @@ class Try(ToolTest):
         self.assertEqual(process.wait(timeout=30), -signal.SIGTERM)
         process.communicate()
         self.assertEqual(list(self.temporary.iterdir()), [])
+
+    def test_a_tool_that_is_killed_takes_its_agent_along(self):
+        process = subprocess.Popen([PROGRAM, "try"], stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True,
+                                   env=self.environment)
+        for line in process.stdout:
+            if "Lingering for two minutes" in line:
+                break
+        agent = int(Path(f"/proc/{process.pid}/task/{process.pid}/children").read_text())
+        process.kill()
+        process.communicate(timeout=30)  # ends when the agent, which holds stderr, has ended too
+        self.assertFalse(Path(f"/proc/{agent}/exe").exists())
 
     def test_a_reader_that_goes_away_leaves_nothing_behind(self):
         process = subprocess.Popen([PROGRAM, "try", "--time-lapse"], stdout=subprocess.PIPE, stderr=subprocess.PIPE,
