@@ -3,18 +3,14 @@
 #pragma once
 
 #include "platform/DispatchQueue.h"
-#include "plugins/WLNimbusDelegatePlugins.h"
+#include "plugins/DelegatePluginSource.h"
 #include "propertylist/PropertyList.h"
 
-#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
 
 namespace welcomer {
-
-// Gives the delegate plug-ins; asked once, on the calling thread. The array must outlive the call.
-using DelegatePluginSource = std::function<const DelegatePluginArray&()>;
 
 // Hands every plug-in that has a cached response in the replay object that response, on queues of their own;
 // the video-calling and the messaging delegate share one. Each outcome is logged with the seconds that it
