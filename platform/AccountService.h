@@ -5,6 +5,7 @@
 #include "platform/Window.h"
 #include "propertylist/PropertyList.h"
 
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
@@ -39,6 +40,16 @@ inline constexpr char kSKNotificationAuthenticationFailed[] =
     "com.corvid.nimbus.notification.authenticationFailed";
 inline constexpr char kSKNotificationSignInCompleted[] = "com.corvid.nimbus.notification.signInCompleted";
 inline constexpr char kSKNotificationSignInFailed[] = "com.corvid.nimbus.notification.signInFailed";
+
+// Account errors. The system tells none, the terms of service and repair apart; the other numbers are for
+// people.
+inline constexpr std::int64_t kSKAccountErrorNone = 0;
+inline constexpr std::int64_t kSKAccountErrorWrongPassword = 1;
+inline constexpr std::int64_t kSKAccountErrorUnknownUser = 2;
+inline constexpr std::int64_t kSKAccountErrorTermsOfService = 3; // new ones are to be accepted
+inline constexpr std::int64_t kSKAccountErrorServerUnavailable = 4;
+inline constexpr std::int64_t kSKAccountErrorRepair = 5;    // the account is to be repaired
+inline constexpr std::int64_t kSKAccountErrorNotStored = 6; // signed in, but the account could not be kept
 
 // One service of one account.
 class CloudService {

@@ -1,0 +1,47 @@
+// The file that holds the user's accounts.
+
+#pragma once
+
+#include "backends/local/RootFolder.h"
+#include "platform/ProcessIdentity.h"
+#include "propertylist/PropertyList.h"
+
+#include <functional>
+#include <string>
+
+namespace welcomer::local {
+
+// "Accounts.plist" (0600) in "<home>/Library/Accounts" (0700), an XML property list:
+//     Accounts         a dictionary from account name to account; each account has
+//         Services         a dictionary from service identifier to service; each service has
+//             CanBeEnabled     boolean, true where it is missing
+//             Enabled          boolean, false where it is missing
+//             Properties       dictionary, for example the mail address
+//     LoggedInAccount  the name of the account that is logged in
+//     SetupFinished    boolean: setup has said so
+// A change takes the folder's lock, merges into what is on disk and replaces the file in one step, so that no
+// change of another process is lost and the file is whole at any time. A damaged file counts as empty and is
+// set aside before the first change. Any thread and any process.
+class AccountFile {
+  public:
+    // Borrows the identity, which must outlive this.
+    AccountFile(RootFolder root, platform::ProcessIdentity& identity)
+        : _root(std::move(root)),
+          _identity(identity) {}
+
+    // Everything in the file; empty when there is nothing that can be read.
+    PropertyList::Dictionary read();
+
+    // Changes the content.
+    //  change  is given what is on disk; its result says whether that is to be stored
+    //  result  whether the file holds the change now; false also when `change` has said no
+    bool change(const std::function<bool(PropertyList::Dictionary& content)>& change);
+
+  private:
+    std::string _folder();
+
+    const RootFolder _root;
+    platform::ProcessIdentity& _identity;
+};
+
+} // namespace welcomer::local

@@ -1,0 +1,264 @@
+#include "backends/local/LocalAccountService.h"
+
+#include <chrono>
+#include <cstdint>
+#include <utility>
+
+namespace welcomer::local {
+
+namespace {
+
+constexpr char kAccountsKey[] = "Accounts";
+constexpr char kLoggedInAccountKey[] = "LoggedInAccount";
+constexpr char kSetupFinishedKey[] = "SetupFinished";
+constexpr char kServicesKey[] = "Services";
+constexpr char kCanBeEnabledKey[] = "CanBeEnabled";
+constexpr char kEnabledKey[] = "Enabled";
+constexpr char kPropertiesKey[] = "Properties";
+
+// The dictionary under a key, or null.
+PropertyList::Dictionary* findDictionary(PropertyList::Dictionary& parent, const std::string& key) {
+    const auto found = parent.find(key);
+    return found == parent.end() ? nullptr : found->second.dictionary();
+}
+
+// The same, made where it is missing or something else.
+PropertyList::Dictionary& makeDictionary(PropertyList::Dictionary& parent, const std::string& key) {
+    PropertyList& value = parent[key];
+    if (!value.isDictionary()) {
+        value = PropertyList::Dictionary{};
+    }
+    return *value.dictionary();
+}
+
+PropertyList::Dictionary* findAccount(PropertyList::Dictionary& content, const std::string& name) {
+    PropertyList::Dictionary* accounts = findDictionary(content, kAccountsKey);
+    return accounts ? findDictionary(*accounts, name) : nullptr;
+}
+
+PropertyList::Dictionary* findService(PropertyList::Dictionary& content, const std::string& name,
+                                      const std::string& identifier) {
+    PropertyList::Dictionary* account = findAccount(content, name);
+    PropertyList::Dictionary* services = account ? findDictionary(*account, kServicesKey) : nullptr;
+    return services ? findDictionary(*services, identifier) : nullptr;
+}
+
+bool flag(const PropertyList::Dictionary& dictionary, const char* key, bool ifMissing) {
+    const auto found = dictionary.find(key);
+    return found == dictionary.end() ? ifMissing : found->second.boolean().value_or(ifMissing);
+}
+
+std::chrono::nanoseconds nanoseconds(double seconds) {
+    constexpr double kNanosecondsPerSecond = 1e9;
+    const double count = seconds * kNanosecondsPerSecond;
+    return count < static_cast<double>(std::chrono::nanoseconds::max().count())
+               ? std::chrono::nanoseconds(static_cast<std::int64_t>(count))
+               : std::chrono::nanoseconds::max();
+}
+
+} // namespace
+
+struct LocalAccountService::Accounts {
+    AccountFile file;
+    NimbusDirectory directory;
+
+    // Makes an account where it is missing, and then does more to the content, all in one change.
+    bool make(
+        const std::string& name,
+        const std::function<void(PropertyList::Dictionary&)>& more = [](PropertyList::Dictionary&) {}) {
+        return file.change([&](PropertyList::Dictionary& content) {
+            if (!findAccount(content, name)) {
+                makeDictionary(content, kAccountsKey)[name] =
+                    PropertyList::Dictionary{{kServicesKey, directory.servicesOfNewAccount(name)}};
+            }
+            more(content);
+            return true;
+        });
+    }
+};
+
+class LocalAccountService::Service final : public platform::CloudService {
+  public:
+    Service(std::shared_ptr<Accounts> accounts, std::string account, std::string identifier)
+        : _accounts(std::move(accounts)),
+          _account(std::move(account)),
+          _identifier(std::move(identifier)) {}
+
+    bool canBeEnabled() override {
+        PropertyList::Dictionary content = _accounts->file.read();
+        const PropertyList::Dictionary* service = findService(content, _account, _identifier);
+        return service && flag(*service, kCanBeEnabledKey, true);
+    }
+
+    std::optional<PropertyList> propertyValue(const std::string& key) override {
+        PropertyList::Dictionary content = _accounts->file.read();
+        PropertyList::Dictionary* service = findService(content, _account, _identifier);
+        const PropertyList::Dictionary* properties =
+            service ? findDictionary(*service, kPropertiesKey) : nullptr;
+        if (!properties || !properties->contains(key)) {
+            return std::nullopt;
+        }
+        return properties->at(key);
+    }
+
+    void enableWithWindow(bool enabled, bool /*creating*/, platform::Window* /*window*/) override {
+        enableSilently(enabled);
+    }
+
+    void enableSilently(bool enabled) override {
+        _accounts->file.change([&](PropertyList::Dictionary& content) {
+            PropertyList::Dictionary* service = findService(content, _account, _identifier);
+            if (!service || flag(*service, kEnabledKey, false) == enabled) {
+                return false; // nothing to store
+            }
+            (*service)[kEnabledKey] = enabled;
+            return true;
+        });
+    }
+
+  private:
+    const std::shared_ptr<Accounts> _accounts;
+    const std::string _account;
+    const std::string _identifier;
+};
+
+class LocalAccountService::Account final : public platform::CloudAccount {
+  public:
+    Account(std::shared_ptr<Accounts> accounts, std::string name)
+        : _accounts(std::move(accounts)),
+          _name(std::move(name)) {}
+
+    std::string accountID() override { return _name; }
+
+    void suppressFailureDialogs() override {
+        // There are none to suppress.
+    }
+
+    std::shared_ptr<platform::CloudService> serviceForID(const std::string& identifier) override {
+        PropertyList::Dictionary content = _accounts->file.read();
+        if (!findService(content, _name, identifier)) {
+            return nullptr;
+        }
+        return std::make_shared<Service>(_accounts, _name, identifier);
+    }
+
+  private:
+    const std::shared_ptr<Accounts> _accounts;
+    const std::string _name;
+};
+
+// One authentication or sign-in that is under way.
+struct LocalAccountService::Operation {
+    std::string username;
+    std::string password;
+    bool isSignIn = false;
+    std::shared_ptr<Accounts> accounts;
+    std::shared_ptr<platform::RunLoop> runLoop;  // of the thread that started it
+    std::shared_ptr<platform::RunLoopPort> port; // keeps that loop waiting for the answer
+
+    // On a thread of the global queue.
+    platform::Notification notification(const NimbusAnswer& answer) {
+        platform::Notification result{_name(answer.isCompleted), nullptr, answer.contents};
+        const auto logIn = [this](PropertyList::Dictionary& content) {
+            content[kLoggedInAccountKey] = username;
+        };
+        if (isSignIn && answer.isCompleted && !accounts->make(username, logIn)) {
+            result.name = _name(false);
+            result.contents = {{platform::kSKPropertyAccountError, platform::kSKAccountErrorNotStored}};
+        }
+        return result;
+    }
+
+  private:
+    const char* _name(bool isCompleted) const {
+        if (isSignIn) {
+            return isCompleted ? platform::kSKNotificationSignInCompleted
+                               : platform::kSKNotificationSignInFailed;
+        }
+        return isCompleted ? platform::kSKNotificationAuthenticationCompleted
+                           : platform::kSKNotificationAuthenticationFailed;
+    }
+};
+
+LocalAccountService::LocalAccountService(const RootFolder& root, platform::ProcessIdentity& identity,
+                                         platform::RunLoops& runLoops,
+                                         platform::DispatchQueues& dispatchQueues,
+                                         platform::NotificationCenter& notificationCenter)
+    : _accounts(std::make_shared<Accounts>(Accounts{AccountFile(root, identity), NimbusDirectory(root)})),
+      _runLoops(runLoops),
+      _dispatchQueues(dispatchQueues),
+      _notificationCenter(notificationCenter),
+      _isAlive(std::make_shared<bool>(true)) {}
+
+std::shared_ptr<platform::CloudAccount> LocalAccountService::loggedInAccount() {
+    PropertyList::Dictionary content = _accounts->file.read();
+    const auto name = content.find(kLoggedInAccountKey);
+    if (name == content.end() || !name->second.isString() || !findAccount(content, *name->second.string())) {
+        return nullptr;
+    }
+    return std::make_shared<Account>(_accounts, *name->second.string());
+}
+
+bool LocalAccountService::isServiceEnabled(platform::CloudAccount* account, const std::string& identifier) {
+    if (!account) {
+        return false;
+    }
+    PropertyList::Dictionary content = _accounts->file.read();
+    const PropertyList::Dictionary* service = findService(content, account->accountID(), identifier);
+    return service && flag(*service, kEnabledKey, false);
+}
+
+std::shared_ptr<platform::CloudAccount>
+LocalAccountService::accountForID(const std::optional<PropertyList>& identifier, bool createIfMissing) {
+    const std::string* name = identifier ? identifier->string() : nullptr;
+    if (!name || name->empty()) {
+        return nullptr;
+    }
+    PropertyList::Dictionary content = _accounts->file.read();
+    if (!findAccount(content, *name) && (!createIfMissing || !_accounts->make(*name))) {
+        return nullptr;
+    }
+    return std::make_shared<Account>(_accounts, *name);
+}
+
+void LocalAccountService::authenticate(const std::string& username, const std::string& password,
+                                       const PropertyList::Dictionary& /*delegateRequest*/) {
+    _start(std::make_shared<Operation>(Operation{username, password, false, _accounts, {}, {}}));
+}
+
+void LocalAccountService::finishSignIn(const std::string& username, const std::string& password,
+                                       const PropertyList::Dictionary& /*delegateRequest*/) {
+    _start(std::make_shared<Operation>(Operation{username, password, true, _accounts, {}, {}}));
+}
+
+void LocalAccountService::markSetupFinished(const std::optional<PropertyList>& /*information*/) {
+    _accounts->file.change([](PropertyList::Dictionary& content) {
+        content[kSetupFinishedKey] = true;
+        return true;
+    });
+}
+
+void LocalAccountService::_start(std::shared_ptr<Operation> operation) {
+    operation->runLoop = _runLoops.current();
+    operation->port = operation->runLoop->attachPort();
+    // On the loop's thread, which is this object's for as long as it lives.
+    const auto deliver = [this, isAlive = std::weak_ptr(_isAlive),
+                          operation](const platform::Notification& notification) {
+        operation->port.reset();
+        if (!isAlive.expired()) {
+            _notificationCenter.post(notification);
+        }
+    };
+    platform::DispatchQueue& queue = _dispatchQueues.global();
+    queue.async([&queue, operation, deliver, sender = static_cast<const void*>(this)] {
+        const NimbusAnswer answer =
+            operation->accounts->directory.answer(operation->username, operation->password);
+        queue.asyncAfter(nanoseconds(answer.delaySeconds), [operation, deliver, sender, answer] {
+            platform::Notification notification = operation->notification(answer);
+            notification.sender = sender;
+            operation->runLoop->perform([deliver, notification] { deliver(notification); });
+        });
+    });
+}
+
+} // namespace welcomer::local

@@ -1,0 +1,132 @@
+#include "backends/local/NimbusDirectory.h"
+
+#include "backends/local/PasswordHash.h"
+#include "backends/local/PreferenceFile.h"
+#include "platform/AccountService.h"
+#include "platform/PreferenceStore.h"
+
+#include <algorithm>
+
+namespace welcomer::local {
+
+namespace {
+
+constexpr char kUsersKey[] = "Users";
+constexpr char kPasswordKey[] = "Password";
+constexpr char kResponseKey[] = "Response";
+constexpr char kAccountErrorKey[] = "AccountError";
+constexpr char kAccountErrorInfoKey[] = "AccountErrorInfo";
+constexpr char kFailsKey[] = "Fails";
+constexpr char kDelaySecondsKey[] = "DelaySeconds";
+constexpr char kMailAddressKey[] = "MailAddress";
+constexpr char kServicesKey[] = "Services";
+constexpr char kPropertiesKey[] = "Properties";
+constexpr char kStatusKey[] = "status";
+
+NimbusAnswer accountError(std::int64_t error) {
+    return {false, {{platform::kSKPropertyAccountError, error}}, 0};
+}
+
+bool isRightPassword(const PropertyList& user, const std::string& password) {
+    const PropertyList* hash = user.find(kPasswordKey);
+    return hash && hash->isString() && passwordMatches(password, *hash->string());
+}
+
+double delaySeconds(const PropertyList& user) {
+    const PropertyList* delay = user.find(kDelaySecondsKey);
+    if (!delay) {
+        return 0;
+    }
+    return std::max(0.0, delay->real().value_or(static_cast<double>(delay->integer().value_or(0))));
+}
+
+bool fails(const PropertyList& user) {
+    const PropertyList* setting = user.find(kFailsKey);
+    return user.find(kAccountErrorKey) || (setting && setting->boolean().value_or(false));
+}
+
+// The answer to the right password.
+NimbusAnswer answerOf(const std::string& username, const PropertyList& user) {
+    NimbusAnswer answer;
+    answer.isCompleted = !fails(user);
+    answer.delaySeconds = delaySeconds(user);
+    const PropertyList* response = user.find(kResponseKey);
+    if (response && response->isDictionary()) {
+        answer.contents = *response->dictionary();
+    } else if (answer.isCompleted) {
+        answer.contents = {{kStatusKey, 0}};
+    }
+    answer.contents.insert_or_assign(platform::kSKPropertyAccountID, username);
+    if (const PropertyList* error = user.find(kAccountErrorKey)) {
+        answer.contents.insert_or_assign(platform::kSKPropertyAccountError, *error);
+    }
+    if (const PropertyList* info = user.find(kAccountErrorInfoKey)) {
+        answer.contents.insert_or_assign(platform::kSKPropertyAccountErrorInfo, *info);
+    }
+    return answer;
+}
+
+PropertyList::Dictionary everyService() {
+    PropertyList::Dictionary services;
+    for (const char* identifier :
+         {platform::kSKServiceIDContacts, platform::kSKServiceIDCalendars, platform::kSKServiceIDBookMarks,
+          platform::kSKServiceIDMediaStream, platform::kSKServiceIDReminders,
+          platform::kSKServiceIDAccountSync, platform::kSKServiceIDLOC, platform::kSKServiceIDMail,
+          platform::kSKServiceIDNotes, platform::kSKServiceMobileDocuments}) {
+        services.emplace(identifier, PropertyList::Dictionary{});
+    }
+    return services;
+}
+
+void setMailAddress(PropertyList::Dictionary& services, const PropertyList& address) {
+    const auto mail = services.find(platform::kSKServiceIDMail);
+    if (mail == services.end() || !mail->second.isDictionary()) {
+        return;
+    }
+    PropertyList& properties = (*mail->second.dictionary())[kPropertiesKey];
+    if (PropertyList::Dictionary* values = properties.dictionary()) {
+        values->emplace(platform::kSKPropertyMailEmailAddress, address); // one that is there already stays
+    }
+}
+
+} // namespace
+
+NimbusAnswer NimbusDirectory::answer(const std::string& username, const std::string& password) const {
+    const std::optional<PropertyList::Dictionary> users = _users();
+    if (!users) {
+        return accountError(platform::kSKAccountErrorServerUnavailable);
+    }
+    const auto user = users->find(username);
+    if (user == users->end()) {
+        return accountError(platform::kSKAccountErrorUnknownUser);
+    }
+    if (!isRightPassword(user->second, password)) {
+        return accountError(platform::kSKAccountErrorWrongPassword);
+    }
+    return answerOf(username, user->second);
+}
+
+PropertyList::Dictionary NimbusDirectory::servicesOfNewAccount(const std::string& username) const {
+    const std::optional<PropertyList::Dictionary> users = _users();
+    const auto user = users ? users->find(username) : PropertyList::Dictionary::const_iterator{};
+    if (!users || user == users->end()) {
+        return everyService();
+    }
+    const PropertyList* own = user->second.find(kServicesKey);
+    PropertyList::Dictionary services = own && own->isDictionary() ? *own->dictionary() : everyService();
+    if (const PropertyList* address = user->second.find(kMailAddressKey)) {
+        setMailAddress(services, *address);
+    }
+    return services;
+}
+
+std::optional<PropertyList::Dictionary> NimbusDirectory::_users() const {
+    const PreferenceFileContent file = readPreferenceFile(_root.locate(kNimbusDirectoryPath));
+    const auto users = file.values.find(kUsersKey);
+    if (users == file.values.end() || !users->second.isDictionary()) {
+        return std::nullopt;
+    }
+    return *users->second.dictionary();
+}
+
+} // namespace welcomer::local
