@@ -2,14 +2,17 @@
 
 #pragma once
 
+#include "platform/AccountService.h"
 #include "platform/Clock.h"
 #include "platform/CredentialStore.h"
 #include "platform/DispatchQueue.h"
 #include "platform/FileSystem.h"
 #include "platform/HostReachability.h"
+#include "platform/NotificationCenter.h"
 #include "platform/PluginBundle.h"
 #include "platform/PreferenceStore.h"
 #include "platform/ProcessIdentity.h"
+#include "platform/ProcessLauncher.h"
 #include "platform/ResourceBundle.h"
 #include "platform/RunLoop.h"
 #include "platform/SystemLog.h"
@@ -31,6 +34,9 @@ struct Platform {
     PreferenceStore& preferenceStore;
     SystemVersionInfo& systemVersionInfo;
     HostReachability& hostReachability;
+    NotificationCenter& notificationCenter;
+    AccountService& accountService;
+    ProcessLauncher& processLauncher;
 };
 
 // The installed platform. A program installs one at its start, before anything else of the system is called,

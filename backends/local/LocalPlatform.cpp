@@ -27,6 +27,9 @@ LocalPlatform::LocalPlatform(const PlatformOptions& options)
                 chosen(options.dispatchQueues, _dispatchQueues),
                 _preferenceStore,
                 _systemVersionInfo,
-                _hostReachability} {}
+                _hostReachability,
+                _notificationCenter,
+                _accountService,
+                _processLauncher} {}
 
 } // namespace welcomer::local

@@ -3,14 +3,17 @@
 #pragma once
 
 #include "backends/Backends.h"
+#include "backends/local/LocalAccountService.h"
 #include "backends/local/LocalClock.h"
 #include "backends/local/LocalCredentialStore.h"
 #include "backends/local/LocalDispatchQueues.h"
 #include "backends/local/LocalFileSystem.h"
 #include "backends/local/LocalHostReachability.h"
+#include "backends/local/LocalNotificationCenter.h"
 #include "backends/local/LocalPluginBundle.h"
 #include "backends/local/LocalPreferenceStore.h"
 #include "backends/local/LocalProcessIdentity.h"
+#include "backends/local/LocalProcessLauncher.h"
 #include "backends/local/LocalResourceBundles.h"
 #include "backends/local/LocalRunLoops.h"
 #include "backends/local/LocalSystemLog.h"
@@ -40,6 +43,10 @@ class LocalPlatform final : public PlatformOwner {
     LocalPreferenceStore _preferenceStore{_root, _processIdentity};
     LocalSystemVersionInfo _systemVersionInfo{_fileSystem};
     LocalHostReachability _hostReachability;
+    LocalNotificationCenter _notificationCenter;
+    LocalAccountService _accountService{_root, _processIdentity, _runLoops, _dispatchQueues,
+                                        _notificationCenter};
+    LocalProcessLauncher _processLauncher;
     const platform::Platform _platform;
 };
 

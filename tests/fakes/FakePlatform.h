@@ -5,12 +5,15 @@
 #include "backends/simulated/VirtualTime.h"
 #include "platform/Platform.h"
 #include "tests/fakes/CallRecorder.h"
+#include "tests/fakes/FakeAccountService.h"
 #include "tests/fakes/FakeCredentialStore.h"
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeHostReachability.h"
+#include "tests/fakes/FakeNotificationCenter.h"
 #include "tests/fakes/FakePluginBundle.h"
 #include "tests/fakes/FakePreferenceStore.h"
 #include "tests/fakes/FakeProcessIdentity.h"
+#include "tests/fakes/FakeProcessLauncher.h"
 #include "tests/fakes/FakeResourceBundles.h"
 #include "tests/fakes/FakeSystemLog.h"
 #include "tests/fakes/FakeSystemVersionInfo.h"
@@ -35,14 +38,18 @@ class FakePlatform {
     FakeSystemVersionInfo systemVersionInfo{recorder};
     FakeHostReachability hostReachability{recorder};
     simulated::VirtualTime virtualTime; // the clock, the run loops and the queues
+    FakeNotificationCenter notificationCenter;
+    FakeAccountService accountService{recorder, notificationCenter, virtualTime, virtualTime};
+    FakeProcessLauncher processLauncher{recorder};
 
     // Borrowed: lives as long as this object.
     const platform::Platform& platform() const { return _platform; }
 
   private:
-    platform::Platform _platform{systemLog,    fileSystem,      processIdentity,   credentialStore,
-                                 pluginBundle, resourceBundles, virtualTime,       virtualTime,
-                                 virtualTime,  preferenceStore, systemVersionInfo, hostReachability};
+    platform::Platform _platform{systemLog,          fileSystem,      processIdentity,   credentialStore,
+                                 pluginBundle,       resourceBundles, virtualTime,       virtualTime,
+                                 virtualTime,        preferenceStore, systemVersionInfo, hostReachability,
+                                 notificationCenter, accountService,  processLauncher};
 };
 
 } // namespace welcomer::fakes

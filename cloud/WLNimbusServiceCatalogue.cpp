@@ -1,0 +1,30 @@
+#include "cloud/WLNimbusServiceCatalogue.h"
+
+#include "platform/AccountService.h"
+
+namespace welcomer {
+
+std::vector<std::string> WLNimbusSyncServiceIDs() {
+    return {platform::kSKServiceIDContacts,  platform::kSKServiceIDCalendars,
+            platform::kSKServiceIDBookMarks, platform::kSKServiceIDMediaStream,
+            platform::kSKServiceIDReminders, platform::kSKServiceIDAccountSync};
+}
+
+std::vector<std::string> WLNimbusAllSetupServiceIDs() {
+    std::vector<std::string> identifiers = WLNimbusSyncServiceIDs();
+    identifiers.insert(identifiers.end(), {platform::kSKServiceIDLOC, platform::kSKServiceIDMail,
+                                           platform::kSKServiceIDNotes, platform::kSKServiceMobileDocuments});
+    return identifiers;
+}
+
+std::vector<std::string> WLNimbusPostLoginServiceIDs() {
+    return {platform::kSKServiceIDBookMarks, platform::kSKServiceIDMail,
+            platform::kSKServiceIDNotes,     platform::kSKServiceIDContacts,
+            platform::kSKServiceIDReminders, platform::kSKServiceIDCalendars};
+}
+
+std::vector<std::string> WLNimbusDelayedServiceIDs() {
+    return {platform::kSKServiceIDCalendars, platform::kSKServiceIDReminders};
+}
+
+} // namespace welcomer

@@ -1,0 +1,248 @@
+#include "cloud/WLNimbusSetupWithDictionary.h"
+
+#include "cloud/WLNimbusServiceCatalogue.h"
+#include "log/PCLogManager.h"
+#include "platform/Platform.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cstdint>
+#include <functional>
+#include <optional>
+#include <utility>
+
+namespace welcomer {
+
+namespace {
+
+using CloudService = std::shared_ptr<platform::CloudService>;
+
+constexpr const char* kDebugPostLoginDelayDefault = "WLDebugPostLoginDelay";
+constexpr double kPostLoginDelaySeconds = 3.0;
+constexpr double kNanosecondsPerSecond = 1e9;
+
+bool contains(const std::vector<std::string>& identifiers, const std::string& identifier) {
+    return std::find(identifiers.begin(), identifiers.end(), identifier) != identifiers.end();
+}
+
+void enable(platform::CloudService& service, const std::shared_ptr<platform::Window>& window) {
+    if (window) {
+        service.enableWithWindow(true, true, window.get());
+    } else {
+        service.enableSilently(true);
+    }
+}
+
+double postLoginDelaySeconds() {
+    const std::int64_t seconds =
+        platform::current().preferenceStore.integerDefault(kDebugPostLoginDelayDefault);
+    return seconds > 0 ? static_cast<double>(seconds) : kPostLoginDelaySeconds;
+}
+
+// Truncated to whole nanoseconds; what is beyond their range is the end of it.
+std::chrono::nanoseconds nanoseconds(double seconds) {
+    using Count = std::chrono::nanoseconds::rep;
+    const double count = seconds * kNanosecondsPerSecond;
+    if (count >= static_cast<double>(std::chrono::nanoseconds::max().count())) {
+        return std::chrono::nanoseconds::max();
+    }
+    return std::chrono::nanoseconds(static_cast<Count>(count));
+}
+
+// One pass over an account's services in one phase.
+class ServicePass {
+  public:
+    ServicePass(platform::CloudAccount& account, const std::vector<std::string>& selectedServices,
+                bool postLogin, const std::shared_ptr<platform::Window>& window)
+        : _account(account),
+          _selectedServices(selectedServices),
+          _postLogin(postLogin),
+          _window(window) {}
+
+    void run() {
+        for (const std::string& identifier : WLNimbusSyncServiceIDs()) {
+            _setUpSyncService(identifier);
+        }
+        _setUpLocator();
+        const std::optional<PropertyList> mailAddress = _setUpMail();
+        _setUpNotes(mailAddress);
+        _setUpDocuments();
+    }
+
+  private:
+    bool _isSelected(const std::string& identifier) const { return contains(_selectedServices, identifier); }
+
+    // Logs it when the service does not belong to this phase.
+    bool _belongsToThisPhase(const std::string& identifier) const {
+        if (contains(WLNimbusPostLoginServiceIDs(), identifier) == _postLogin) {
+            return true;
+        }
+        // The phase in which the service belongs, which is the other one.
+        WL_LOG("%@ should be configured %@", identifier, _postLogin ? "pre-login" : "post-login");
+        return false;
+    }
+
+    void _setUpSyncService(const std::string& identifier) {
+        if (!_isSelected(identifier)) {
+            WL_LOG("User opted out of %@", identifier);
+            return;
+        }
+        if (!_belongsToThisPhase(identifier)) {
+            return;
+        }
+        CloudService service = _account.serviceForID(identifier);
+        if (!service || !service->canBeEnabled()) {
+            WL_LOG("Nimbus service '%@' cannot be enabled on this machine for this user.", identifier);
+            return;
+        }
+        // Holds all that it needs: it may run after the pass has ended.
+        std::function<void()> task = [identifier, window = _window, service = std::move(service)] {
+            WL_LOG("Enabling Nimbus service '%@'", identifier);
+            enable(*service, window);
+        };
+        if (_postLogin && contains(WLNimbusDelayedServiceIDs(), identifier)) {
+            const double delay = postLoginDelaySeconds();
+            WL_LOG("Enabling '%@' after a %0.2f second delay", identifier, delay);
+            platform::current().dispatchQueues.global().asyncAfter(nanoseconds(delay), std::move(task));
+        } else {
+            task();
+        }
+    }
+
+    void _setUpLocator() {
+        if (!_isSelected(platform::kSKServiceIDLOC)) {
+            WL_LOG("User opted out of Nimbus Locator");
+            return;
+        }
+        if (!_belongsToThisPhase(platform::kSKServiceIDLOC)) {
+            return;
+        }
+        const CloudService service = _account.serviceForID(platform::kSKServiceIDLOC);
+        if (!service) {
+            WL_LOG("No Nimbus Locator service available to enable");
+        } else if (!service->canBeEnabled()) {
+            WL_LOG("Nimbus Locator cannot be enabled on this machine for this user.");
+        } else {
+            WL_LOG("Enabling Nimbus Locator");
+            enable(*service, _window);
+        }
+    }
+
+    // Gives the mail service's address whenever it was read, also when mail is not enabled then.
+    std::optional<PropertyList> _setUpMail() {
+        if (!_isSelected(platform::kSKServiceIDMail)) {
+            WL_LOG("User opted out of Nimbus Mail");
+            return std::nullopt;
+        }
+        if (!_belongsToThisPhase(platform::kSKServiceIDMail)) {
+            return std::nullopt;
+        }
+        const CloudService service = _account.serviceForID(platform::kSKServiceIDMail);
+        if (!service) {
+            WL_LOG("No Nimbus Mail service available to enable");
+            return std::nullopt;
+        }
+        std::optional<PropertyList> address = service->propertyValue(platform::kSKPropertyMailEmailAddress);
+        const std::string* addressText = address ? address->string() : nullptr;
+        if (!service->canBeEnabled()) {
+            WL_LOG("Nimbus Mail cannot be enabled on this machine for this user.");
+        } else if (addressText && !addressText->empty()) {
+            WL_LOG("Enabling Nimbus Mail: %@", *addressText);
+            enable(*service, _window);
+        } else {
+            WL_LOG("Could not enable Nimbus Mail, no address specified by SKService");
+        }
+        return address;
+    }
+
+    // The mail address counts as soon as there is one, also when it is empty.
+    void _setUpNotes(const std::optional<PropertyList>& mailAddress) {
+        if (!_isSelected(platform::kSKServiceIDNotes)) {
+            WL_LOG("User opted out of Nimbus Notes");
+            return;
+        }
+        if (!_belongsToThisPhase(platform::kSKServiceIDNotes)) {
+            return;
+        }
+        if (!mailAddress) {
+            WL_LOG("Cannot enable Nimbus notes without associated email address");
+            return;
+        }
+        const CloudService service = _account.serviceForID(platform::kSKServiceIDNotes);
+        if (!service) {
+            WL_LOG("No Nimbus Notes service available to enable");
+        } else if (!service->canBeEnabled()) {
+            WL_LOG("Nimbus Notes cannot be enabled on this machine for this user.");
+        } else {
+            WL_LOG("Enabling Nimbus Notes");
+            enable(*service, _window);
+        }
+    }
+
+    void _setUpDocuments() {
+        if (!_isSelected(platform::kSKServiceMobileDocuments)) {
+            WL_LOG("User opted out of Nimbus Documents & Data");
+            return;
+        }
+        if (!_belongsToThisPhase(platform::kSKServiceMobileDocuments)) {
+            return;
+        }
+        const CloudService service = _account.serviceForID(platform::kSKServiceMobileDocuments);
+        if (!service) {
+            WL_LOG("No Nimbus Documents & Data service available to enable");
+        } else if (!service->canBeEnabled()) {
+            WL_LOG("Nimbus Documents & Data cannot be enabled on this machine for this user.");
+        } else {
+            WL_LOG("Enabling Nimbus Documents & Data");
+            enable(*service, _window);
+        }
+    }
+
+    platform::CloudAccount& _account;
+    const std::vector<std::string>& _selectedServices;
+    const bool _postLogin;
+    const std::shared_ptr<platform::Window>& _window;
+};
+
+// Whether the service says that it can be enabled is asked for the log alone.
+void enableDocumentsOnly(platform::CloudAccount& account, const std::shared_ptr<platform::Window>& window) {
+    const CloudService service = account.serviceForID(platform::kSKServiceMobileDocuments);
+    if (!service || !service->canBeEnabled()) {
+        WL_LOG("Warning: Documents Service claims it cannot be enabled, trying anyway");
+    }
+    if (service) {
+        enable(*service, window);
+    }
+}
+
+} // namespace
+
+bool WLNimbusSetupWithDictionary2(const PropertyList::Dictionary& setupDictionary,
+                                  const std::vector<std::string>& selectedServices,
+                                  bool accountAndKeyValueStoreOnly, bool postLogin,
+                                  const std::shared_ptr<platform::Window>& window,
+                                  [[maybe_unused]] platform::Error* errorOut) {
+    const auto identifier = setupDictionary.find(platform::kSKPropertyAccountID);
+    const std::shared_ptr<platform::CloudAccount> account =
+        platform::current().accountService.sharedManager().accountForID(
+            identifier == setupDictionary.end() ? std::nullopt : std::optional(identifier->second), true);
+    if (!account) {
+        WL_LOG("Failed to retrieve SK_Account");
+        return false;
+    }
+    account->suppressFailureDialogs();
+    if (accountAndKeyValueStoreOnly) {
+        enableDocumentsOnly(*account, window);
+    } else {
+        ServicePass(*account, selectedServices, postLogin, window).run();
+    }
+    return true;
+}
+
+bool WLNimbusSetupWithDictionary(const PropertyList::Dictionary& setupDictionary,
+                                 const std::vector<std::string>& selectedServices,
+                                 const std::shared_ptr<platform::Window>& window) {
+    return WLNimbusSetupWithDictionary2(setupDictionary, selectedServices, false, false, window, nullptr);
+}
+
+} // namespace welcomer
