@@ -1,6 +1,7 @@
 #include "agent/wlnimbussetup.h"
 
 #include "agent/selfDestruct.h"
+#include "agent/wlnimbussetup_RemainingSkylarkSetup.h"
 #include "handoff/LaunchAgentFile.h"
 #include "handoff/ReplayItem.h"
 #include "log/PCLogManager.h"
@@ -53,6 +54,7 @@ void finishSetup(const std::string& label, const DelegatePluginSource& plugins) 
     }
     // Before any use of its contents, so that a crash never replays it twice.
     attempt([] { WLDeleteNimbusReplayKeychainItem(); });
+    attempt([&] { wlnimbussetup_RemainingSkylarkSetup(accountName, group); });
     attempt([&] { wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, group, plugins); });
     attempt([&] { waitFor(*group); });
     attempt(linger);

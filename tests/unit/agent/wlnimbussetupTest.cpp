@@ -4,6 +4,7 @@
 #include "tests/fakes/FakePlatform.h"
 #include "tests/unit/agent/TestDelegate.h"
 
+#include <algorithm>
 #include <array>
 #include <gtest/gtest.h>
 #include <stdexcept>
@@ -30,7 +31,13 @@ constexpr Wait kLinger{Wait::Kind::Run, 120s};
 
 class WlnimbussetupTest : public testing::Test {
   protected:
-    WlnimbussetupTest() { fake.fileSystem.addFile(kFile, "launch agent"); }
+    WlnimbussetupTest() {
+        fake.fileSystem.addFile(kFile, "launch agent");
+        fake.processLauncher.programs["/usr/bin/killall"] = [](const auto&) {
+            return 1; // no such process
+        };
+        fake.accountService.canCreateAccounts = false; // the first stage in three lines
+    }
 
     void putItem(const std::string& data) {
         fake.credentialStore.put({"Welcomer Nimbus Replay Data", "Welcomer", "anna", std::nullopt}, data);
@@ -85,13 +92,48 @@ TEST_F(WlnimbussetupTest, WithoutAReplayItemItRemovesItsLaunchAgentFileAndEndsAt
 TEST_F(WlnimbussetupTest, EveryStepInItsOrder) {
     putResponses({});
     EXPECT_EQ(run(), 0);
-    EXPECT_EQ(fake.recorder.calls(),
-              (Lines{"SystemLog.write 115, Self destructing...", "ProcessIdentity.userLibraryDirectories",
-                     "FileSystem.remove " + kFile, "CredentialStore.findItem " + kKey,
-                     "CredentialStore.readAttributes " + kKey, "CredentialStore.findItem " + kKey,
-                     "CredentialStore.deleteItem " + kKey, "SystemLog.write 115, Vidlink: 1 aliases",
-                     "SystemLog.write 115, Chatter: 0 aliases", "plugins",
-                     "SystemLog.write 115, delaying exit by two minutes", "SystemLog.write 115, exiting"}));
+    EXPECT_EQ(
+        fake.recorder.calls(),
+        (Lines{"SystemLog.write 115, Self destructing...", "ProcessIdentity.userLibraryDirectories",
+               "FileSystem.remove " + kFile, "CredentialStore.findItem " + kKey,
+               "CredentialStore.readAttributes " + kKey, "CredentialStore.findItem " + kKey,
+               "CredentialStore.deleteItem " + kKey, "SystemLog.write 115, Killing onlineaccounts",
+               "ProcessLauncher.launchAndWait /usr/bin/killall, -9, com.corvid.onlineaccounts",
+               "SystemLog.write 115, Enabling post-login services for account anna",
+               "AccountManager.accountForID anna, yes", "SystemLog.write 115, Failed to retrieve SK_Account",
+               "SystemLog.write 115, Vidlink: 1 aliases", "SystemLog.write 115, Chatter: 0 aliases",
+               "plugins", "SystemLog.write 115, delaying exit by two minutes",
+               "SystemLog.write 115, exiting"}));
+}
+
+TEST_F(WlnimbussetupTest, TheFirstStageGetsTheItemsAccountNameAndRunsBeforeThePluginsAreLoaded) {
+    fake.accountService.canCreateAccounts = true;
+    fake.accountService.servicesOfNewAccounts = {{platform::kSKServiceIDBookMarks, {}},
+                                                 {platform::kSKServiceIDReminders, {}}};
+    putResponses({});
+    EXPECT_EQ(run(), 0);
+    EXPECT_TRUE(fake.accountService.accounts["anna"][platform::kSKServiceIDBookMarks].enabled);
+    // Put off by three seconds, and enabled while the agent lingers.
+    EXPECT_TRUE(fake.accountService.accounts["anna"][platform::kSKServiceIDReminders].enabled);
+    const Lines calls = fake.recorder.calls();
+    const auto at = [&](const std::string& call) {
+        return std::find(calls.begin(), calls.end(), call) - calls.begin();
+    };
+    EXPECT_LT(at("CredentialStore.deleteItem " + kKey), at("SystemLog.write 115, Killing onlineaccounts"));
+    EXPECT_LT(at("AccountManager.accountForID anna, yes"), at("plugins"));
+    EXPECT_LT(at("plugins"), std::ssize(calls));
+}
+
+TEST_F(WlnimbussetupTest, WhatGetsOutOfTheFirstStageIsLoggedAndTheSecondStageFollows) {
+    fake.processLauncher.programs["/usr/bin/killall"] = [](const auto&) -> int {
+        throw 42;
+    };
+    TestDelegate& plugin = add("a");
+    putResponses({"a"});
+    EXPECT_EQ(run(), 0);
+    EXPECT_EQ(fake.recorder.callsTo("AccountManager."), Lines{});
+    EXPECT_EQ(plugin.calls.size(), 1U);
+    EXPECT_EQ(fake.systemLog.lines().back(), "exiting");
 }
 
 TEST_F(WlnimbussetupTest, WithoutAnyResponseItStillLingersForTwoMinutes) {
@@ -100,8 +142,10 @@ TEST_F(WlnimbussetupTest, WithoutAnyResponseItStillLingersForTwoMinutes) {
     EXPECT_EQ(run(), 0);
     EXPECT_EQ(
         fake.systemLog.lines(),
-        (Lines{"Self destructing...", "Vidlink: 1 aliases", "Chatter: 0 aliases",
-               "no cached response for com.corvid.storefront", "delaying exit by two minutes", "exiting"}));
+        (Lines{"Self destructing...", "Killing onlineaccounts",
+               "Enabling post-login services for account anna", "Failed to retrieve SK_Account",
+               "Vidlink: 1 aliases", "Chatter: 0 aliases", "no cached response for com.corvid.storefront",
+               "delaying exit by two minutes", "exiting"}));
     EXPECT_EQ(fake.virtualTime.waits(), (Waits{kGroupWait, kLinger}));
     EXPECT_EQ(fake.virtualTime.now(), 120s);
 }
@@ -113,12 +157,14 @@ TEST_F(WlnimbussetupTest, TheWholeLogOfAFullRun) {
     };
     putResponses({"com.corvid.vidlink", "com.corvid.storefront"});
     EXPECT_EQ(run(), 0);
-    EXPECT_EQ(fake.systemLog.lines(),
-              (Lines{"Self destructing...", "Vidlink: 1 aliases", "Chatter: 0 aliases",
-                     "setting up com.corvid.storefront", "setting up com.corvid.vidlink",
-                     "com.corvid.vidlink setup+chosen: completed (0.000 seconds)",
-                     "com.corvid.storefront setup: completed (0.250 seconds)", "delaying exit by two minutes",
-                     "exiting"}));
+    EXPECT_EQ(
+        fake.systemLog.lines(),
+        (Lines{"Self destructing...", "Killing onlineaccounts",
+               "Enabling post-login services for account anna", "Failed to retrieve SK_Account",
+               "Vidlink: 1 aliases", "Chatter: 0 aliases", "setting up com.corvid.storefront",
+               "setting up com.corvid.vidlink", "com.corvid.vidlink setup+chosen: completed (0.000 seconds)",
+               "com.corvid.storefront setup: completed (0.250 seconds)", "delaying exit by two minutes",
+               "exiting"}));
     EXPECT_EQ(fake.virtualTime.waits(), (Waits{kGroupWait, kSlice, kGroupWait, kSlice, kGroupWait, kLinger}));
     EXPECT_EQ(fake.virtualTime.now(), 120s + 250ms);
     EXPECT_EQ(fake.credentialStore.items().size(), 0U);
@@ -197,8 +243,10 @@ TEST_F(WlnimbussetupTest, AReplayObjectThatIsNoDictionaryLeavesNothingToSetUp) {
     putItem(*writeXMLPropertyList("text"));
     EXPECT_EQ(run(), 0);
     EXPECT_EQ(fake.systemLog.lines(),
-              (Lines{"Self destructing...", "Vidlink: 0 aliases", "Chatter: 0 aliases",
-                     "no cached response for a", "delaying exit by two minutes", "exiting"}));
+              (Lines{"Self destructing...", "Killing onlineaccounts",
+                     "Enabling post-login services for account anna", "Failed to retrieve SK_Account",
+                     "Vidlink: 0 aliases", "Chatter: 0 aliases", "no cached response for a",
+                     "delaying exit by two minutes", "exiting"}));
     EXPECT_EQ(fake.virtualTime.now(), 120s);
 }
 
@@ -297,8 +345,10 @@ TEST_F(WlnimbussetupTest, WhatGetsOutOfAStepIsLoggedAndTheNextStepsFollow) {
                             []() -> const DelegatePluginArray& { throw std::runtime_error("no memory"); }),
               0);
     EXPECT_EQ(fake.systemLog.lines(),
-              (Lines{"Self destructing...", "Vidlink: 1 aliases", "Chatter: 0 aliases",
-                     "exception in wlnimbussetup: no memory", "delaying exit by two minutes", "exiting"}));
+              (Lines{"Self destructing...", "Killing onlineaccounts",
+                     "Enabling post-login services for account anna", "Failed to retrieve SK_Account",
+                     "Vidlink: 1 aliases", "Chatter: 0 aliases", "exception in wlnimbussetup: no memory",
+                     "delaying exit by two minutes", "exiting"}));
     EXPECT_EQ(fake.virtualTime.now(), 120s);
 }
 
