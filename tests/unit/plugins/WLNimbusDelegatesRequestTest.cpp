@@ -1,0 +1,328 @@
+#include "plugins/WLNimbusDelegatesRequest.h"
+
+#include "tests/fakes/FakePlatform.h"
+
+#include <functional>
+#include <gtest/gtest.h>
+#include <memory>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+namespace welcomer {
+namespace {
+
+using Dictionary = PropertyList::Dictionary;
+using Strings = std::vector<std::string>;
+using Identifier = std::optional<std::string>;
+
+// A plug-in whose answers a test chooses, and which keeps count of the questions.
+class RequestingPlugin final : public WLFirstRunDelegateConfiguration {
+  public:
+    explicit RequestingPlugin(Identifier identifier) : identify([identifier] { return identifier; }) {}
+
+    std::function<Identifier()> identify;
+    std::function<std::optional<PropertyList>()> request = [] {
+        return std::optional<PropertyList>(Dictionary{{"version", 1}});
+    };
+    std::function<std::optional<Strings>(const PropertyList&)> aliases = [](const PropertyList&) {
+        return std::optional<Strings>(Strings{"alias"});
+    };
+    int requests = 0;
+    int aliasQuestions = 0;
+
+    Identifier delegateIdentifier() override { return identify(); }
+    std::optional<PropertyList> delegateSetupRequest() override {
+        ++requests;
+        return request();
+    }
+    void completeSetupWithResponseHandler(const PropertyList&, CompletionHandler) override {}
+    void completeSetupWithResponseChosenAliasesHandler(const PropertyList&, const std::optional<Strings>&,
+                                                       CompletionHandler) override {}
+    std::optional<Strings> messagingAliasesFromResponse(const PropertyList& response) override {
+        ++aliasQuestions;
+        return aliases(response);
+    }
+    std::string className() const override { return "RequestingPlugin"; }
+};
+
+class WLNimbusDelegatesRequestTest : public testing::Test {
+  protected:
+    RequestingPlugin& add(const Identifier& identifier) {
+        auto plugin = std::make_shared<RequestingPlugin>(identifier);
+        _plugins.push_back(plugin);
+        return *plugin;
+    }
+
+    // What the request has under "delegates"; the request must have nothing else.
+    static Dictionary delegates(const Dictionary& request) {
+        EXPECT_EQ(request.size(), 1U);
+        const auto found = request.find("delegates");
+        return found != request.end() && found->second.dictionary() ? *found->second.dictionary()
+                                                                    : Dictionary{{"no delegates", true}};
+    }
+
+    Dictionary request(const Dictionary& additions = {}, const Strings& omissions = {}) {
+        return delegates(WLNimbusDelegatesRequest(additions, omissions, source));
+    }
+    Dictionary messagingRequest() {
+        return delegates(WLNimbusCreateOrLoginDelegatesRequestForMessagingAliases(source));
+    }
+
+    Strings lines() const { return fake.systemLog.lines(); }
+
+    static constexpr const char* kSkylark = "com.corvid.skylark";
+    const Dictionary own{{"version", 1}};
+    const Dictionary none{};
+
+    fakes::FakePlatform fake;
+    const platform::ScopedPlatform installed{fake.platform()};
+    const DelegatePluginSource source = [this]() -> const DelegatePluginArray& {
+        return _plugins;
+    };
+
+  private:
+    DelegatePluginArray _plugins;
+};
+
+TEST_F(WLNimbusDelegatesRequestTest, WithoutPluginsItHoldsTheFormerOnlineServiceAlone) {
+    EXPECT_EQ(request(), (Dictionary{{kSkylark, none}}));
+    EXPECT_EQ(lines(), Strings{});
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, HoldsTheRequestOfEveryPlugin) {
+    add("com.corvid.vidlink");
+    add("com.corvid.storefront").request = [] {
+        return std::optional<PropertyList>("not a dictionary");
+    };
+    EXPECT_EQ(request(), (Dictionary{{kSkylark, none},
+                                     {"com.corvid.vidlink", own},
+                                     {"com.corvid.storefront", "not a dictionary"}}));
+    EXPECT_EQ(lines(), Strings{});
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, AnOmittedPluginIsNotAskedAndNotLogged) {
+    RequestingPlugin& omitted = add("com.corvid.vidlink");
+    add("com.corvid.chatter");
+    EXPECT_EQ(request({}, {"com.corvid.vidlink", "com.corvid.unknown"}),
+              (Dictionary{{kSkylark, none}, {"com.corvid.chatter", own}}));
+    EXPECT_EQ(omitted.requests, 0);
+    EXPECT_EQ(lines(), Strings{});
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, APluginWithoutARequestOmitsItselfWithALogLine) {
+    add("com.corvid.vidlink").request = [] {
+        return std::optional<PropertyList>();
+    };
+    EXPECT_EQ(request(), (Dictionary{{kSkylark, none}}));
+    EXPECT_EQ(lines(), Strings{"Nimbus Plugins: Delegate com.corvid.vidlink omits itself from Nimbus setup"});
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, AnEmptyDictionaryIsARequest) {
+    add("com.corvid.vidlink").request = [] {
+        return std::optional<PropertyList>(Dictionary{});
+    };
+    EXPECT_EQ(request(), (Dictionary{{kSkylark, none}, {"com.corvid.vidlink", none}}));
+    EXPECT_EQ(lines(), Strings{});
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, APluginThatRaisesOnItsIdentifierIsUnknownAndTheNextIsAsked) {
+    RequestingPlugin& raising = add("a");
+    raising.identify = []() -> Identifier {
+        throw std::runtime_error("no identity");
+    };
+    add("b");
+    EXPECT_EQ(request(), (Dictionary{{kSkylark, none}, {"b", own}}));
+    EXPECT_EQ(raising.requests, 0);
+    EXPECT_EQ(lines(),
+              Strings{"Nimbus Plugins: Exception querying '(unknown)' for setup request: no identity"});
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, APluginThatRaisesOnItsRequestIsNamedAndTheNextIsAsked) {
+    add("a").request = []() -> std::optional<PropertyList> {
+        throw std::runtime_error("no request");
+    };
+    add("b");
+    EXPECT_EQ(request(), (Dictionary{{kSkylark, none}, {"b", own}}));
+    EXPECT_EQ(lines(), Strings{"Nimbus Plugins: Exception querying 'a' for setup request: no request"});
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, APluginMayThrowAnythingAtAll) {
+    add("a").request = []() -> std::optional<PropertyList> {
+        throw 42;
+    };
+    add("b");
+    EXPECT_EQ(request(), (Dictionary{{kSkylark, none}, {"b", own}}));
+    ASSERT_EQ(lines().size(), 1U);
+    EXPECT_TRUE(lines()[0].starts_with("Nimbus Plugins: Exception querying 'a' for setup request: "));
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, ARequestWithoutAnIdentifierCannotBeStored) {
+    add(std::nullopt);
+    add("b");
+    EXPECT_EQ(request(), (Dictionary{{kSkylark, none}, {"b", own}}));
+    EXPECT_EQ(lines(), Strings{"Nimbus Plugins: Exception querying '(unknown)' for setup request: "
+                               "a request needs its delegate's identifier"});
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, TheFormerOnlineServiceCanBeOmittedUnlessAnAdditionBringsIt) {
+    EXPECT_EQ(request({}, {kSkylark}), none);
+    EXPECT_EQ(request({{kSkylark, own}}, {kSkylark}), (Dictionary{{kSkylark, own}}));
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, AdditionsWinOverPluginsAndTheFormerOnlineService) {
+    add("com.corvid.vidlink");
+    EXPECT_EQ(request({{"com.corvid.vidlink", "added"}, {kSkylark, "added"}, {"new", "added"}}),
+              (Dictionary{{"com.corvid.vidlink", "added"}, {kSkylark, "added"}, {"new", "added"}}));
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, AnAdditionIsSentForAnOmittedPluginToo) {
+    add("com.corvid.vidlink");
+    EXPECT_EQ(request({{"com.corvid.vidlink", "added"}}, {"com.corvid.vidlink"}),
+              (Dictionary{{"com.corvid.vidlink", "added"}, {kSkylark, none}}));
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, EverythingCanBeOmitted) {
+    add("a");
+    add("b");
+    EXPECT_EQ(request({}, WLNimbusAllDelegateIdentifiers(source)), none);
+    EXPECT_EQ(lines(), Strings{});
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, PluginsThatRaiseAtEveryStepLeaveTheOthersUnharmed) {
+    add("a").identify = []() -> Identifier {
+        throw 1;
+    };
+    add("b").request = []() -> std::optional<PropertyList> {
+        throw std::string("two");
+    };
+    add("c").request = [] {
+        return std::optional<PropertyList>();
+    };
+    add(std::nullopt);
+    add("d");
+    EXPECT_EQ(request({{"b", "added"}}, {}), (Dictionary{{kSkylark, none}, {"b", "added"}, {"d", own}}));
+    EXPECT_EQ(lines().size(), 4U);
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, OfTwoPluginsThatNowShareAnIdentifierTheLaterRequestIsSent) {
+    add("a");
+    add("a").request = [] {
+        return std::optional<PropertyList>("later");
+    };
+    EXPECT_EQ(request(), (Dictionary{{kSkylark, none}, {"a", "later"}}));
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, ForMessagingAliasesOnlyTheTwoMessagingDelegatesAreAsked) {
+    add("com.corvid.vidlink");
+    RequestingPlugin& store = add("com.corvid.storefront");
+    RequestingPlugin& nameless = add(std::nullopt);
+    add("com.corvid.chatter");
+    EXPECT_EQ(messagingRequest(),
+              (Dictionary{{kSkylark, none}, {"com.corvid.vidlink", own}, {"com.corvid.chatter", own}}));
+    EXPECT_EQ(store.requests, 0);
+    EXPECT_EQ(nameless.requests, 0);
+    EXPECT_EQ(lines(), Strings{});
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, ForMessagingAliasesTheFormerOnlineServiceIsAlwaysThere) {
+    EXPECT_EQ(messagingRequest(), (Dictionary{{kSkylark, none}}));
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, ForMessagingAliasesADelegateThatOmitsItselfOrRaisesIsLogged) {
+    add("com.corvid.vidlink").request = [] {
+        return std::optional<PropertyList>();
+    };
+    add("com.corvid.chatter").request = []() -> std::optional<PropertyList> {
+        throw std::runtime_error("no");
+    };
+    add("x").identify = []() -> Identifier {
+        throw std::runtime_error("never");
+    };
+    EXPECT_EQ(messagingRequest(), (Dictionary{{kSkylark, none}}));
+    EXPECT_EQ(lines(),
+              (Strings{"Nimbus Plugins: Delegate com.corvid.vidlink omits itself from Nimbus setup",
+                       "Nimbus Plugins: Exception querying 'com.corvid.chatter' for setup request: no",
+                       "Nimbus Plugins: Exception querying '(unknown)' for setup request: never"}));
+}
+
+class MessagingAliasesTest : public WLNimbusDelegatesRequestTest {
+  protected:
+    std::optional<Strings> aliases(const std::string& identifier, const PropertyList& response = "response") {
+        return WLNimbusGetMessagingAliasesFromDelegateResponse(identifier, response, source);
+    }
+};
+
+TEST_F(MessagingAliasesTest, AreThoseOfTheFirstPluginWithTheIdentifier) {
+    RequestingPlugin& other = add("com.corvid.vidlink");
+    add("com.corvid.chatter").aliases = [](const PropertyList& response) {
+        return std::optional<Strings>(Strings{"a", *response.string()});
+    };
+    RequestingPlugin& later = add("com.corvid.chatter");
+    EXPECT_EQ(aliases("com.corvid.chatter"), (Strings{"a", "response"}));
+    EXPECT_EQ(other.aliasQuestions, 0);
+    EXPECT_EQ(later.aliasQuestions, 0);
+}
+
+TEST_F(MessagingAliasesTest, AreNoneWithoutAPluginOfThatIdentifier) {
+    add("com.corvid.vidlink");
+    add(std::nullopt);
+    EXPECT_EQ(aliases("com.corvid.chatter"), std::nullopt);
+    EXPECT_EQ(lines(), Strings{});
+}
+
+TEST_F(MessagingAliasesTest, AreNoneWhenThePluginHasNone) {
+    add("a").aliases = [](const PropertyList&) {
+        return std::optional<Strings>();
+    };
+    RequestingPlugin& later = add("a");
+    EXPECT_EQ(aliases("a"), std::nullopt);
+    EXPECT_EQ(later.aliasQuestions, 0);
+}
+
+TEST_F(MessagingAliasesTest, APluginThatRaisesIsLoggedAndTheNextIsAsked) {
+    add("x").identify = []() -> Identifier {
+        throw std::runtime_error("no identity");
+    };
+    add("a").aliases = [](const PropertyList&) -> std::optional<Strings> {
+        throw std::runtime_error("no aliases");
+    };
+    add("a");
+    EXPECT_EQ(aliases("a"), Strings{"alias"});
+    EXPECT_EQ(lines(), (Strings{"Nimbus Plugins: Exception querying 'a' for aliases: no identity",
+                                "Nimbus Plugins: Exception querying 'a' for aliases: no aliases"}));
+}
+
+TEST_F(MessagingAliasesTest, AnEmptyIdentifierIsUnknownInTheLog) {
+    add("").aliases = [](const PropertyList&) -> std::optional<Strings> {
+        throw std::runtime_error("no");
+    };
+    EXPECT_EQ(aliases(""), std::nullopt);
+    EXPECT_EQ(lines(), Strings{"Nimbus Plugins: Exception querying '(unknown)' for aliases: no"});
+}
+
+using DelegateIdentifiersTest = WLNimbusDelegatesRequestTest;
+
+TEST_F(DelegateIdentifiersTest, AllBeginWithTheFormerOnlineServiceAndKeepTheRegistrysOrder) {
+    add("z");
+    add("a");
+    EXPECT_EQ(WLNimbusAllDelegateIdentifiers(source), (Strings{kSkylark, "z", "a"}));
+}
+
+TEST_F(DelegateIdentifiersTest, EmptyOnesAndThoseThatRaiseAreLeftOutSilently) {
+    add("");
+    add(std::nullopt);
+    add("x").identify = []() -> Identifier {
+        throw 42;
+    };
+    add("a");
+    EXPECT_EQ(WLNimbusAllDelegateIdentifiers(source), (Strings{kSkylark, "a"}));
+    EXPECT_EQ(lines(), Strings{});
+}
+
+TEST_F(DelegateIdentifiersTest, TheStoresAreTheAppStoreAndTheEBookStore) {
+    EXPECT_EQ(WLNimbusStoreDelegateIdentifiers(), (Strings{"com.corvid.storefront", "com.corvid.reader"}));
+}
+
+} // namespace
+} // namespace welcomer
