@@ -16,6 +16,8 @@ Interface& chosen(Interface* replacement, std::type_identity_t<Interface>& servi
 
 LocalPlatform::LocalPlatform(const PlatformOptions& options)
     : _root(options.root),
+      _accountService(_root, _processIdentity, chosen(options.runLoops, _runLoops),
+                      chosen(options.dispatchQueues, _dispatchQueues), _notificationCenter),
       _platform{chosen(options.systemLog, _systemLog),
                 _fileSystem,
                 _processIdentity,

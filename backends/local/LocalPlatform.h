@@ -44,8 +44,7 @@ class LocalPlatform final : public PlatformOwner {
     LocalSystemVersionInfo _systemVersionInfo{_fileSystem};
     LocalHostReachability _hostReachability;
     LocalNotificationCenter _notificationCenter;
-    LocalAccountService _accountService{_root, _processIdentity, _runLoops, _dispatchQueues,
-                                        _notificationCenter};
+    LocalAccountService _accountService;
     LocalProcessLauncher _processLauncher;
     const platform::Platform _platform;
 };

@@ -4,6 +4,7 @@
 
 #include <cerrno>
 #include <csignal>
+#include <fcntl.h>
 #include <spawn.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -36,6 +37,25 @@ class SpawnAttributes {
     posix_spawnattr_t _attributes = {};
 };
 
+// Has the program's standard streams lead nowhere.
+class NullStreams {
+  public:
+    NullStreams() {
+        ::posix_spawn_file_actions_init(&_actions);
+        ::posix_spawn_file_actions_addopen(&_actions, STDIN_FILENO, "/dev/null", O_RDWR, 0);
+        ::posix_spawn_file_actions_adddup2(&_actions, STDIN_FILENO, STDOUT_FILENO);
+        ::posix_spawn_file_actions_adddup2(&_actions, STDIN_FILENO, STDERR_FILENO);
+    }
+    ~NullStreams() { ::posix_spawn_file_actions_destroy(&_actions); }
+    NullStreams(const NullStreams&) = delete;
+    NullStreams& operator=(const NullStreams&) = delete;
+
+    const posix_spawn_file_actions_t* get() const { return &_actions; }
+
+  private:
+    posix_spawn_file_actions_t _actions = {};
+};
+
 // The argument list as the system takes it; it borrows the texts, which the system does not change.
 std::vector<char*> argumentList(const std::string& program, const std::vector<std::string>& arguments) {
     std::vector<char*> list{const_cast<char*>(program.c_str())};
@@ -51,8 +71,9 @@ std::vector<char*> argumentList(const std::string& program, const std::vector<st
 int LocalProcessLauncher::launchAndWait(const std::string& program,
                                         const std::vector<std::string>& arguments) {
     const SpawnAttributes attributes;
+    const NullStreams streams;
     pid_t process = 0;
-    const int launched = ::posix_spawn(&process, program.c_str(), nullptr, attributes.get(),
+    const int launched = ::posix_spawn(&process, program.c_str(), streams.get(), attributes.get(),
                                        argumentList(program, arguments).data(), ::environ);
     if (launched != 0) {
         throw platform::Exception(systemError("cannot launch " + program, launched).message);

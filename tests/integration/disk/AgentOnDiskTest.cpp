@@ -117,7 +117,10 @@ class AgentOnDiskTest : public testing::Test {
                                        time,
                                        real.preferenceStore,
                                        real.systemVersionInfo,
-                                       real.hostReachability};
+                                       real.hostReachability,
+                                       real.notificationCenter,
+                                       real.accountService,
+                                       real.processLauncher};
         const platform::ScopedPlatform scope(mixed);
         const std::array<const char*, 2> arguments{"wlnimbussetup", nullptr};
         return wlnimbussetup(1, arguments.data());
@@ -169,8 +172,21 @@ TEST_F(AgentOnDiskTest, TheAgentConsumesWhatTheWriterLeft) {
     ASSERT_TRUE(store());
     log.clear();
     EXPECT_EQ(runAgent(), 0);
-    EXPECT_EQ(log.lines(), (Lines{"Self destructing...", "Vidlink: 1 aliases", "Chatter: 0 aliases",
-                                  "delaying exit by two minutes", "exiting"}));
+    const Lines lines = log.lines();
+    ASSERT_EQ(lines.size(), 19U);
+    EXPECT_EQ(Lines(lines.begin(), lines.begin() + 3),
+              (Lines{"Self destructing...", "Killing onlineaccounts",
+                     "Enabling post-login services for account anna"}));
+    EXPECT_EQ(Lines(lines.begin() + 13, lines.end()),
+              (Lines{"Vidlink: 1 aliases", "Chatter: 0 aliases", "delaying exit by two minutes",
+                     "Enabling Nimbus service 'com.corvid.nimbus.service.calendars'",
+                     "Enabling Nimbus service 'com.corvid.nimbus.service.reminders'", "exiting"}));
+    platform::AccountService& accounts = owner->platform().accountService;
+    const auto account = accounts.sharedManager().accountForID("anna", false);
+    ASSERT_NE(account, nullptr);
+    EXPECT_TRUE(accounts.isServiceEnabled(account.get(), platform::kSKServiceIDContacts));
+    EXPECT_TRUE(accounts.isServiceEnabled(account.get(), platform::kSKServiceIDCalendars));
+    EXPECT_FALSE(accounts.isServiceEnabled(account.get(), platform::kSKServiceIDLOC));
     EXPECT_FALSE(fs::exists(agents / kFileName));
     EXPECT_FALSE(WLGetNimbusReplayKeychainItem(nullptr, nullptr));
 }
@@ -257,11 +273,12 @@ TEST_F(AgentOnDiskTest, AnItemInAHomeThatBecameReadOnlyIsUsedAllTheSame) {
     log.clear();
     EXPECT_EQ(runAgent(), 0);
     const Lines lines = log.lines();
-    ASSERT_EQ(lines.size(), 7U);
+    ASSERT_EQ(lines.size(), 10U);
     EXPECT_TRUE(startsWith(lines[1], "Failed to remove wlnimbussetup plist for ")) << lines[1];
     EXPECT_EQ(lines[2], "Failed to delete replay keychain item: 6");
-    EXPECT_EQ(lines[3], "Vidlink: 1 aliases");
-    EXPECT_EQ(lines[6], "exiting");
+    EXPECT_EQ(lines[5], "Failed to retrieve SK_Account"); // a new account cannot be stored
+    EXPECT_EQ(lines[6], "Vidlink: 1 aliases");
+    EXPECT_EQ(lines[9], "exiting");
 }
 
 TEST_F(AgentOnDiskTest, AHomeThatDoesNotExistIsLoggedAndNotMade) {

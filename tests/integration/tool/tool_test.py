@@ -309,7 +309,11 @@ class Try(ToolTest):
         for name, form in (("chatter", "setup+chosen"), ("storefront", "setup"), ("vidlink", "setup+chosen")):
             self.assertIn(f"setting up com.corvid.{name}", lines)
             self.assertTrue(any(line.startswith(f"com.corvid.{name} {form}: completed (") for line in lines), lines)
-        self.assertEqual(lines[-2:], ["delaying exit by two minutes", "exiting"])
+        self.assertEqual(lines[1:3], ["Killing onlineaccounts",
+                                      "Enabling post-login services for account user@nimbus.example"])
+        service = "Enabling Nimbus service 'com.corvid.nimbus.service.{}'".format
+        self.assertEqual(lines[-4:], ["delaying exit by two minutes", service("calendars"), service("reminders"),
+                                      "exiting"])
 
         table = re.findall(r"^  (com\.corvid\.\w+) +(completed) +\d+\.\d{3}$", first, re.MULTILINE)
         self.assertEqual(sorted(name for name, _ in table), IDENTIFIERS)
