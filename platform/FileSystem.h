@@ -13,7 +13,7 @@
 namespace welcomer::platform {
 
 // The longest file that counts as text, in bytes.
-inline constexpr std::size_t kMaximumTextSize = 1024 * 1024;
+inline constexpr std::size_t kMaximumTextSize = std::size_t{1024} * 1024;
 
 class FileSystem {
   public:

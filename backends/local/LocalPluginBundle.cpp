@@ -47,7 +47,7 @@ std::optional<std::string> libraryOf(const std::string& folder, std::string& rea
         reason = infoPath + ": no Executable";
         return std::nullopt;
     }
-    const std::optional<std::string> library = resolved(platform::joinPath(folder, *name));
+    std::optional<std::string> library = resolved(platform::joinPath(folder, *name));
     const std::optional<std::string> inside = resolved(folder);
     if (!library || !inside) {
         reason = folder + ": its Executable is missing";

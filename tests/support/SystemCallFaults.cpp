@@ -10,6 +10,7 @@
 #include <sys/stat.h>
 #include <sys/types.h>
 #include <unistd.h>
+#include <utility>
 
 namespace welcomer {
 
@@ -18,22 +19,22 @@ namespace {
 enum class Mode { Off, Count, Fail, Crash };
 
 Mode mode = Mode::Off;
-int calls = 0;
-int target = 0;
+std::vector<std::string> calls;
+std::size_t target = 0;
 int targetError = 0;
 
 // Counts a call. True when it is the one to fail or to crash at.
-bool isTarget() {
+bool isTarget(const char* name) {
     if (mode == Mode::Off) {
         return false;
     }
-    ++calls;
-    return mode != Mode::Count && calls == target;
+    calls.emplace_back(name);
+    return mode != Mode::Count && calls.size() == target;
 }
 
 // Counts a call. True when it must fail, with errno set.
-bool mustFail() {
-    if (!isTarget()) {
+bool mustFail(const char* name) {
+    if (!isTarget(name)) {
         return false;
     }
     if (mode == Mode::Crash) {
@@ -51,8 +52,8 @@ Function* real(const char* name) {
 
 void start(Mode newMode, int number, int error) {
     mode = newMode;
-    calls = 0;
-    target = number;
+    calls.clear();
+    target = static_cast<std::size_t>(number);
     targetError = error;
 }
 
@@ -70,9 +71,9 @@ void SystemCallFaults::crashAt(int number) {
     start(Mode::Crash, number, 0);
 }
 
-int SystemCallFaults::stop() {
+std::vector<std::string> SystemCallFaults::stop() {
     mode = Mode::Off;
-    return calls;
+    return std::exchange(calls, {});
 }
 
 } // namespace welcomer
@@ -84,52 +85,52 @@ extern "C" {
 
 int access(const char* path, int type) noexcept {
     static const auto next = real<int(const char*, int)>("access");
-    return mustFail() ? -1 : next(path, type);
+    return mustFail("access") ? -1 : next(path, type);
 }
 
 int chmod(const char* path, mode_t mode) noexcept {
     static const auto next = real<int(const char*, mode_t)>("chmod");
-    return mustFail() ? -1 : next(path, mode);
+    return mustFail("chmod") ? -1 : next(path, mode);
 }
 
 int fchmod(int file, mode_t mode) noexcept {
     static const auto next = real<int(int, mode_t)>("fchmod");
-    return mustFail() ? -1 : next(file, mode);
+    return mustFail("fchmod") ? -1 : next(file, mode);
 }
 
 int fstat(int file, struct stat* status) noexcept {
     static const auto next = real<int(int, struct stat*)>("fstat");
-    return mustFail() ? -1 : next(file, status);
+    return mustFail("fstat") ? -1 : next(file, status);
 }
 
 int fsync(int file) {
     static const auto next = real<int(int)>("fsync");
-    return mustFail() ? -1 : next(file);
+    return mustFail("fsync") ? -1 : next(file);
 }
 
 int flock(int file, int operation) noexcept {
     static const auto next = real<int(int, int)>("flock");
-    return mustFail() ? -1 : next(file, operation);
+    return mustFail("flock") ? -1 : next(file, operation);
 }
 
 int ftruncate(int file, off_t size) noexcept {
     static const auto next = real<int(int, off_t)>("ftruncate");
-    return mustFail() ? -1 : next(file, size);
+    return mustFail("ftruncate") ? -1 : next(file, size);
 }
 
 int link(const char* from, const char* to) noexcept {
     static const auto next = real<int(const char*, const char*)>("link");
-    return mustFail() ? -1 : next(from, to);
+    return mustFail("link") ? -1 : next(from, to);
 }
 
 int mkdir(const char* path, mode_t mode) noexcept {
     static const auto next = real<int(const char*, mode_t)>("mkdir");
-    return mustFail() ? -1 : next(path, mode);
+    return mustFail("mkdir") ? -1 : next(path, mode);
 }
 
 int mkostemp(char* pattern, int flags) {
     static const auto next = real<int(char*, int)>("mkostemp");
-    return mustFail() ? -1 : next(pattern, flags);
+    return mustFail("mkostemp") ? -1 : next(pattern, flags);
 }
 
 int open(const char* path, int flags, ...) {
@@ -138,7 +139,7 @@ int open(const char* path, int flags, ...) {
     va_start(arguments, flags);
     const mode_t mode = va_arg(arguments, mode_t); // meaningless unless a file is created
     va_end(arguments);
-    return mustFail() ? -1 : next(path, flags, mode);
+    return mustFail("open") ? -1 : next(path, flags, mode);
 }
 
 int openat(int folder, const char* path, int flags, ...) {
@@ -147,37 +148,37 @@ int openat(int folder, const char* path, int flags, ...) {
     va_start(arguments, flags);
     const mode_t mode = va_arg(arguments, mode_t);
     va_end(arguments);
-    return mustFail() ? -1 : next(folder, path, flags, mode);
+    return mustFail("openat") ? -1 : next(folder, path, flags, mode);
 }
 
 int posix_fallocate(int file, off_t offset, off_t size) {
     static const auto next = real<int(int, off_t, off_t)>("posix_fallocate");
-    return mustFail() ? errno : next(file, offset, size);
+    return mustFail("posix_fallocate") ? errno : next(file, offset, size);
 }
 
 ssize_t read(int file, void* buffer, size_t size) {
     static const auto next = real<ssize_t(int, void*, size_t)>("read");
-    return mustFail() ? -1 : next(file, buffer, size);
+    return mustFail("read") ? -1 : next(file, buffer, size);
 }
 
 int renameat(int fromFolder, const char* from, int toFolder, const char* to) noexcept {
     static const auto next = real<int(int, const char*, int, const char*)>("renameat");
-    return mustFail() ? -1 : next(fromFolder, from, toFolder, to);
+    return mustFail("renameat") ? -1 : next(fromFolder, from, toFolder, to);
 }
 
 int unlink(const char* path) noexcept {
     static const auto next = real<int(const char*)>("unlink");
-    return mustFail() ? -1 : next(path);
+    return mustFail("unlink") ? -1 : next(path);
 }
 
 int unlinkat(int folder, const char* path, int flags) noexcept {
     static const auto next = real<int(int, const char*, int)>("unlinkat");
-    return mustFail() ? -1 : next(folder, path, flags);
+    return mustFail("unlinkat") ? -1 : next(folder, path, flags);
 }
 
 ssize_t write(int file, const void* buffer, size_t size) {
     static const auto next = real<ssize_t(int, const void*, size_t)>("write");
-    if (!welcomer::isTarget()) {
+    if (!welcomer::isTarget("write")) {
         return next(file, buffer, size);
     }
     if (welcomer::mode == welcomer::Mode::Crash) {

@@ -7,6 +7,9 @@
 
 #pragma once
 
+#include <string>
+#include <vector>
+
 namespace welcomer {
 
 class SystemCallFaults {
@@ -21,8 +24,8 @@ class SystemCallFaults {
     static void crashAt(int number);
 
     // Ends all of that.
-    //  result  the calls that were counted
-    static int stop();
+    //  result  the names of the calls that were counted, in their order
+    static std::vector<std::string> stop();
 
     static constexpr int kCrashed = 77;
 };

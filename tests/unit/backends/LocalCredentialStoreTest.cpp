@@ -8,6 +8,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <csignal>
 #include <fstream>
@@ -137,12 +138,33 @@ TEST_F(LocalCredentialStoreWithLibraryTest, FindingInAStoreThatDoesNotExistCreat
 TEST_F(LocalCredentialStoreWithLibraryTest, FindingInAStoreThatDoesNotExistIsOneSystemCall) {
     SystemCallFaults::count();
     statusOf("account");
-    EXPECT_EQ(SystemCallFaults::stop(), 1);
+    EXPECT_EQ(SystemCallFaults::stop(), Names{"access"});
 
     root.addDirectory(kFolder);
     SystemCallFaults::count();
     statusOf("account");
-    EXPECT_EQ(SystemCallFaults::stop(), 1);
+    EXPECT_EQ(SystemCallFaults::stop(), Names{"access"});
+}
+
+TEST_F(LocalCredentialStoreWithLibraryTest, TheFileIsSyncedBeforeItGetsItsNameAndTheFolderAfterwards) {
+    ASSERT_EQ(create("one", "first"), 0);
+
+    SystemCallFaults::count();
+    ASSERT_EQ(create("two", "second"), 0);
+    const Names calls = SystemCallFaults::stop();
+
+    const auto written = std::find(calls.begin(), calls.end(), "write");
+    EXPECT_EQ(Names(written, calls.end()), (Names{"write", "fsync", "renameat", "fsync"}));
+}
+
+TEST_F(LocalCredentialStoreWithLibraryTest, ADeletionIsSyncedToo) {
+    ASSERT_EQ(create("one", "first"), 0);
+    std::unique_ptr<CredentialItemReference> reference;
+    ASSERT_EQ(store.findItem("service", "one", nullptr, &reference), 0);
+
+    SystemCallFaults::count();
+    ASSERT_EQ(store.deleteItem(*reference), 0);
+    EXPECT_EQ(SystemCallFaults::stop().back(), "fsync");
 }
 
 TEST_F(LocalCredentialStoreWithLibraryTest, DeletingTheLastItemRemovesTheFile) {
@@ -397,7 +419,7 @@ void LocalCredentialStoreWithLibraryTest::expectAllOrNothingOnFailure(int error,
 
         SystemCallFaults::failAt(number, error);
         const std::int32_t status = create("account", kSecret);
-        const int calls = SystemCallFaults::stop();
+        const auto calls = static_cast<int>(SystemCallFaults::stop().size());
 
         const auto where = testing::Message() << "call " << number << " of " << calls << ", error " << error;
         if (status == platform::kCredentialSuccess) {
@@ -479,7 +501,7 @@ void LocalCredentialStoreWithLibraryTest::expectDeletionAllOrNothing(bool otherI
 
         SystemCallFaults::failAt(number, ENOSPC);
         const std::int32_t status = store.deleteItem(*reference);
-        const int calls = SystemCallFaults::stop();
+        const auto calls = static_cast<int>(SystemCallFaults::stop().size());
 
         const auto where = testing::Message() << "call " << number << " of " << calls;
         EXPECT_EQ(secret("account"),
@@ -500,7 +522,11 @@ TEST_F(LocalCredentialStoreWithLibraryTest, DeletingIsAllOrNothingWhicheverCallF
 
 TEST_F(LocalCredentialStoreWithLibraryTest, AProcessThatIsKilledAtAnyMomentLeavesWholeItems) {
     const std::string large(200000, 'l');
+    std::unique_ptr<CredentialItemReference> reference;
     ASSERT_EQ(create("other", "kept"), 0);
+    ASSERT_EQ(create("account", large), 0);
+    ASSERT_EQ(store.findItem("service", "account", nullptr, &reference), 0);
+    ASSERT_EQ(store.deleteItem(*reference), 0);
     for (int round = 0; round < 30; ++round) {
         int progress[2] = {};
         ASSERT_EQ(::pipe(progress), 0);
@@ -510,7 +536,7 @@ TEST_F(LocalCredentialStoreWithLibraryTest, AProcessThatIsKilledAtAnyMomentLeave
                 const char byte = 0;
                 const bool told = ::write(progress[1], &byte, 1) == 1;
                 create("account", large);
-                if (!told || deleteItem("account") != 0) {
+                if (!told || store.deleteItem(*reference) != 0) {
                     ::_exit(1);
                 }
             }
@@ -521,7 +547,7 @@ TEST_F(LocalCredentialStoreWithLibraryTest, AProcessThatIsKilledAtAnyMomentLeave
         for (int count = 0; count <= round % 3; ++count) {
             ASSERT_EQ(::read(progress[0], &byte, 1), 1);
         }
-        for (int turn = 0; turn < 10 * round; ++turn) {
+        for (int turn = 0; turn < round; ++turn) {
             ::sched_yield();
         }
         ::kill(child, SIGKILL);
@@ -534,7 +560,7 @@ TEST_F(LocalCredentialStoreWithLibraryTest, AProcessThatIsKilledAtAnyMomentLeave
         ASSERT_TRUE(found == platform::kCredentialItemNotFound || secret("account") == large) << found;
         ASSERT_EQ(secret("other"), "kept");
         if (found == platform::kCredentialSuccess) {
-            ASSERT_EQ(deleteItem("account"), 0);
+            ASSERT_EQ(store.deleteItem(*reference), 0);
         }
     }
     ASSERT_EQ(create("next", "writer"), 0);

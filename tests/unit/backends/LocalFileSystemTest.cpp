@@ -87,13 +87,23 @@ TEST_F(LocalFileSystemTest, APipeIsNotCopiedAndDoesNotBlock) {
     EXPECT_EQ(root.names("/"), Names{"pipe"});
 }
 
+TEST_F(LocalFileSystemTest, ACopyIsSyncedBeforeItGetsItsName) {
+    root.addFile("/file", "text");
+
+    SystemCallFaults::count();
+    ASSERT_TRUE(fileSystem.copy("/file", "/copy"));
+    const Names calls = SystemCallFaults::stop();
+
+    EXPECT_EQ(Names(calls.end() - 3, calls.end()), (Names{"fsync", "link", "unlink"}));
+}
+
 TEST_F(LocalFileSystemTest, ACopyLeavesNothingBehindWhicheverCallFails) {
     root.addFile("/from/file", kContent);
     root.addDirectory("/to");
     for (int number = 1;; ++number) {
         SystemCallFaults::failAt(number, ENOSPC);
         const platform::Outcome outcome = fileSystem.copy("/from/file", "/to/copy");
-        const int calls = SystemCallFaults::stop();
+        const auto calls = static_cast<int>(SystemCallFaults::stop().size());
 
         if (outcome) {
             EXPECT_EQ(root.content("/to/copy"), kContent) << number;

@@ -24,7 +24,7 @@ TEST(LocalPlatformTest, BuildingMakesNoSystemCallAndNoThread) {
 
     SystemCallFaults::count();
     const std::unique_ptr<PlatformOwner> owner = buildPlatform();
-    EXPECT_EQ(SystemCallFaults::stop(), 0);
+    EXPECT_EQ(SystemCallFaults::stop(), std::vector<std::string>{});
 
     EXPECT_EQ(threadCount(), threads);
 }
