@@ -157,6 +157,14 @@ TEST_F(LocalCredentialStoreWithLibraryTest, TheFileIsSyncedBeforeItGetsItsNameAn
     EXPECT_EQ(Names(written, calls.end()), (Names{"write", "fsync", "renameat", "fsync"}));
 }
 
+TEST_F(LocalCredentialStoreWithLibraryTest, DeletingTheLastItemClearsAwayWhatAKilledWriterLeft) {
+    ASSERT_EQ(create("account", "secret"), 0);
+    root.addFile(kLeftOver, "another secret");
+
+    EXPECT_EQ(deleteItem("account"), 0);
+    EXPECT_EQ(root.names(kFolder), Names{});
+}
+
 TEST_F(LocalCredentialStoreWithLibraryTest, ADeletionIsSyncedToo) {
     ASSERT_EQ(create("one", "first"), 0);
     std::unique_ptr<CredentialItemReference> reference;
@@ -357,38 +365,41 @@ TEST_F(LocalCredentialStoreWithLibraryTest, SixtyFourMebibytesComeBack) {
 }
 
 TEST_F(LocalCredentialStoreWithLibraryTest, OfProcessesThatCreateTheSameItemOneSucceeds) {
-    constexpr int kProcesses = 12;
-    int gate[2] = {};
-    ASSERT_EQ(::pipe(gate), 0);
-    std::vector<pid_t> children;
-    for (int index = 0; index < kProcesses; ++index) {
-        const pid_t child = ::fork();
-        if (child == 0) {
-            ::close(gate[1]);
-            char byte = 0;
-            const bool opened = ::read(gate[0], &byte, 1) == 0;
-            ::_exit(opened ? create("account", std::to_string(::getpid())) : 99);
+    constexpr int kProcesses = 8;
+    for (int round = 0; round < 20; ++round) {
+        std::filesystem::remove_all(root.locate(kFolder)); // they race for the folder too
+        int gate[2] = {};
+        ASSERT_EQ(::pipe(gate), 0);
+        std::vector<pid_t> children;
+        for (int index = 0; index < kProcesses; ++index) {
+            const pid_t child = ::fork();
+            if (child == 0) {
+                ::close(gate[1]);
+                char byte = 0;
+                const bool opened = ::read(gate[0], &byte, 1) == 0;
+                ::_exit(opened ? create("account", std::to_string(::getpid())) : 99);
+            }
+            children.push_back(child);
         }
-        children.push_back(child);
-    }
-    ::close(gate[0]);
-    ::close(gate[1]); // all of them start now
+        ::close(gate[0]);
+        ::close(gate[1]); // all of them start now
 
-    std::optional<std::string> winner;
-    for (const pid_t child : children) {
-        int status = 0;
-        ASSERT_EQ(::waitpid(child, &status, 0), child);
-        if (WEXITSTATUS(status) == platform::kCredentialSuccess) {
-            EXPECT_EQ(winner, std::nullopt);
-            winner = std::to_string(child);
-        } else {
-            EXPECT_EQ(WEXITSTATUS(status), platform::kCredentialDuplicateItem);
+        std::optional<std::string> winner;
+        for (const pid_t child : children) {
+            int status = 0;
+            ASSERT_EQ(::waitpid(child, &status, 0), child);
+            if (WEXITSTATUS(status) == platform::kCredentialSuccess) {
+                EXPECT_EQ(winner, std::nullopt);
+                winner = std::to_string(child);
+            } else {
+                EXPECT_EQ(WEXITSTATUS(status), platform::kCredentialDuplicateItem);
+            }
         }
+        EXPECT_NE(winner, std::nullopt);
+        EXPECT_EQ(secret("account"), winner);
+        EXPECT_EQ(deleteItem("account"), 0);
+        EXPECT_EQ(root.names(kFolder), Names{});
     }
-    EXPECT_NE(winner, std::nullopt);
-    EXPECT_EQ(secret("account"), winner);
-    EXPECT_EQ(deleteItem("account"), 0);
-    EXPECT_EQ(root.names(kFolder), Names{});
 }
 
 TEST_F(LocalCredentialStoreWithLibraryTest, ProcessesThatCreateDifferentItemsLoseNone) {
@@ -629,6 +640,28 @@ TEST_F(LocalCredentialStoreOnDiskTest, AFileThatIsAMountPointIsRewrittenInPlace)
     expectClean();
     EXPECT_EQ(create("three", "third"), 0);
     EXPECT_EQ(secret("three"), "third");
+    unmount(root.locate(kFile));
+}
+
+TEST_F(LocalCredentialStoreOnDiskTest, AMountPointWhoseSpaceCannotBeReservedKeepsItsContent) {
+    ASSERT_EQ(create("one", "first"), 0);
+    mountOnItself(root.locate(kFile));
+    const std::string before = root.content(kFile).value_or("");
+    SystemCallFaults::count();
+    ASSERT_EQ(create("two", "second"), 0);
+    const Names calls = SystemCallFaults::stop();
+    const auto reservation = std::find(calls.begin(), calls.end(), "posix_fallocate");
+    ASSERT_NE(reservation, calls.end());
+    ASSERT_EQ(deleteItem("two"), 0);
+    ASSERT_EQ(root.content(kFile), before);
+
+    SystemCallFaults::failAt(static_cast<int>(reservation - calls.begin()) + 1, ENOSPC);
+    const std::int32_t status = create("two", "second");
+    SystemCallFaults::stop();
+
+    EXPECT_EQ(status, platform::kCredentialWriteFailed);
+    EXPECT_EQ(root.content(kFile), before);
+    expectClean();
     unmount(root.locate(kFile));
 }
 

@@ -202,6 +202,21 @@ TEST_F(LocalFileSystemTest, AnUnreadableFolderHasNoList) {
     EXPECT_EQ(removal.error.number, EACCES);
 }
 
+TEST_F(LocalFileSystemTest, AFolderThatCannotBeRemovedWhollyIsAFailure) {
+    if (::geteuid() != 0) {
+        GTEST_SKIP() << "only the superuser can become another user";
+    }
+    root.addFile("/folder/inner/file", "text");
+    ::chmod(root.locate("/folder").c_str(), 0777);
+    ::chmod(root.path().c_str(), 0777);
+    ASSERT_EQ(::seteuid(1), 0);
+    const platform::Outcome removal = fileSystem.remove("/folder");
+    ASSERT_EQ(::seteuid(0), 0);
+
+    EXPECT_EQ(removal.error.number, EACCES);
+    EXPECT_EQ(root.content("/folder/inner/file"), "text");
+}
+
 // The tests below give the process file systems of its own.
 class LocalFileSystemOnDiskTest : public LocalFileSystemTest {
   protected:
