@@ -25,6 +25,11 @@ namespace welcomer::fakes {
 //     const platform::ScopedPlatform installed(fake.platform());
 class FakePlatform {
   public:
+    FakePlatform() = default;
+
+    // The same, but with other files than the fake ones; borrowed.
+    explicit FakePlatform(platform::FileSystem& otherFiles) : _files(otherFiles) {}
+
     // Every call to any of the fakes, in order.
     CallRecorder recorder;
 
@@ -46,7 +51,8 @@ class FakePlatform {
     const platform::Platform& platform() const { return _platform; }
 
   private:
-    platform::Platform _platform{systemLog,          fileSystem,      processIdentity,   credentialStore,
+    platform::FileSystem& _files = fileSystem;
+    platform::Platform _platform{systemLog,          _files,          processIdentity,   credentialStore,
                                  pluginBundle,       resourceBundles, virtualTime,       virtualTime,
                                  virtualTime,        preferenceStore, systemVersionInfo, hostReachability,
                                  notificationCenter, accountService,  processLauncher};
