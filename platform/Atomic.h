@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include <atomic>
 #include <mutex>
 #include <utility>
 
@@ -22,12 +23,26 @@ class Atomic {
 
     void set(Value value) {
         const std::lock_guard lock(_mutex);
-        std::swap(_value, value); // the old value is destroyed after the lock is released
+        _value = std::move(value);
     }
 
   private:
     mutable std::mutex _mutex;
     Value _value{};
+};
+
+// A flag needs no lock.
+template <>
+class Atomic<bool> {
+  public:
+    Atomic() = default;
+    explicit Atomic(bool value) : _value(value) {}
+
+    bool get() const { return _value.load(); }
+    void set(bool value) { _value.store(value); }
+
+  private:
+    std::atomic<bool> _value = false;
 };
 
 } // namespace welcomer::platform

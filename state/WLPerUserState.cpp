@@ -6,6 +6,7 @@
 #include <cstddef>
 #include <functional>
 #include <string_view>
+#include <utility>
 
 namespace welcomer {
 
@@ -16,13 +17,19 @@ constexpr char kIsNewUserAccountProperty[] = "isNewUserAccount";
 
 constexpr std::size_t kComparedComponents = 3;
 
-std::optional<PropertyList> asValue(const std::optional<std::string>& text) {
-    return text ? std::optional<PropertyList>(*text) : std::nullopt;
+// The store's own form of the domain's name.
+const std::string& domain() {
+    static const auto* const name = new std::string(kPerUserStateDomain);
+    return *name;
 }
 
-std::optional<std::string> asText(const std::optional<PropertyList>& value) {
-    const std::string* text = value ? value->string() : nullptr;
-    return text ? std::optional(*text) : std::nullopt;
+std::optional<PropertyList> asValue(std::optional<std::string> text) {
+    return text ? std::optional<PropertyList>(std::move(*text)) : std::nullopt;
+}
+
+std::optional<std::string> asText(std::optional<PropertyList> value) {
+    std::string* text = value ? value->string() : nullptr;
+    return text ? std::optional(std::move(*text)) : std::nullopt;
 }
 
 WLPerUserState::VersionComponents componentsOf(std::string_view version) {
@@ -190,15 +197,15 @@ bool WLPerUserState::writeToDefaults() {
         }
     }
     WL_LOG_AS("-[WLPerUserState writeToDefaults]", "Writing per-user state");
-    return platform::current().preferenceStore.synchronise(kPerUserStateDomain);
+    return platform::current().preferenceStore.synchronise(domain());
 }
 
 void WLPerUserState::_loadFromDefaults() {
     // A failure only means that others' changes may not be seen yet.
-    static_cast<void>(platform::current().preferenceStore.synchronise(kPerUserStateDomain));
+    static_cast<void>(platform::current().preferenceStore.synchronise(domain()));
     for (const Entry& entry : _entries()) {
         if (entry.text) {
-            _setText(entry.text, asValue(_stringForKey(entry.key)));
+            _setText(entry.text, _stringForKey(entry.key));
         } else {
             (this->*entry.flag).set(_boolForKey(entry.key));
         }
@@ -250,11 +257,11 @@ const std::vector<WLPerUserState::Entry>& WLPerUserState::_entries() {
     return *entries;
 }
 
-void WLPerUserState::_setText(Text WLPerUserState::*property, const std::optional<PropertyList>& value) {
+void WLPerUserState::_setText(Text WLPerUserState::*property, std::optional<PropertyList> value) {
     if (property == &WLPerUserState::_previousSystemVersion) {
-        change(kPreviousSystemVersionProperty, [&] { _previousSystemVersion.set(value); });
+        change(kPreviousSystemVersionProperty, [&] { _previousSystemVersion.set(std::move(value)); });
     } else {
-        (this->*property).set(value);
+        (this->*property).set(std::move(value));
     }
 }
 
@@ -265,26 +272,30 @@ std::vector<std::string> WLPerUserState::keysAffecting(std::string_view derivedK
     return {};
 }
 
-std::optional<std::string> WLPerUserState::_stringForKey(const std::string& key) {
-    return asText(platform::current().preferenceStore.copyValue(key, kPerUserStateDomain));
+std::optional<PropertyList> WLPerUserState::_stringForKey(const std::string& key) {
+    std::optional<PropertyList> value = platform::current().preferenceStore.copyValue(key, domain());
+    if (value && !value->isString()) {
+        value.reset();
+    }
+    return value;
 }
 
 bool WLPerUserState::_boolForKey(const std::string& key) {
-    const auto value = platform::current().preferenceStore.copyValue(key, kPerUserStateDomain);
+    const auto value = platform::current().preferenceStore.copyValue(key, domain());
     return value && value->boolean().value_or(false);
 }
 
 void WLPerUserState::_setStringForKey(const std::optional<PropertyList>& string, const std::string& key) {
     platform::PreferenceStore& store = platform::current().preferenceStore;
     if (string) {
-        store.setValue(key, *string, kPerUserStateDomain);
+        store.setValue(key, *string, domain());
     } else {
-        store.removeValue(key, kPerUserStateDomain);
+        store.removeValue(key, domain());
     }
 }
 
 void WLPerUserState::_setBoolForKey(bool flag, const std::string& key) {
-    platform::current().preferenceStore.setValue(key, flag, kPerUserStateDomain);
+    platform::current().preferenceStore.setValue(key, flag, domain());
 }
 
 } // namespace welcomer

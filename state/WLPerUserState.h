@@ -123,7 +123,7 @@ class WLPerUserState final : public platform::Observable {
 
     // One property and its preference key; exactly one of the two is set.
     struct Entry {
-        const char* key;
+        std::string key;
         Text WLPerUserState::*text;
         Flag WLPerUserState::*flag;
         bool isTakenFromDictionary;
@@ -131,12 +131,12 @@ class WLPerUserState final : public platform::Observable {
     static const std::vector<Entry>& _entries(); // in canonical order
 
     // Every change of a text goes through here.
-    void _setText(Text WLPerUserState::*property, const std::optional<PropertyList>& value);
+    void _setText(Text WLPerUserState::*property, std::optional<PropertyList> value);
 
     std::vector<std::string> keysAffecting(std::string_view derivedKey) const override;
 
     // The store.
-    static std::optional<std::string> _stringForKey(const std::string& key);
+    static std::optional<PropertyList> _stringForKey(const std::string& key); // a string or none
     static bool _boolForKey(const std::string& key);
     static void _setStringForKey(const std::optional<PropertyList>& string, const std::string& key);
     static void _setBoolForKey(bool flag, const std::string& key);

@@ -56,7 +56,8 @@ int lockFolder(int folder) {
     return result == 0 ? 0 : errno;
 }
 
-int replaceFile(int folder, const std::string& name, std::string_view content, mode_t mode) {
+int replaceFile(int folder, const std::string& name, std::string_view content, mode_t mode,
+                AfterCrash afterCrash) {
     removeLeftOver(folder, name);
     const std::string temporary = temporaryName(name);
     int error = writeNewFile(folder, temporary, content, mode);
@@ -69,8 +70,10 @@ int replaceFile(int folder, const std::string& name, std::string_view content, m
         removeLeftOver(folder, name);
         return error;
     }
-    // The file is in place already: a folder that cannot be synced takes nothing back.
-    ::fsync(folder);
+    if (afterCrash == AfterCrash::New) {
+        // The file is in place already: a folder that cannot be synced takes nothing back.
+        ::fsync(folder);
+    }
     return 0;
 }
 

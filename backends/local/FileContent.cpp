@@ -14,20 +14,15 @@ namespace {
 
 constexpr std::size_t kSmallestRead = 4096;
 
-} // namespace
-
-int readAll(int descriptor, std::string& content, std::size_t maximum) {
-    struct stat status = {};
-    if (::fstat(descriptor, &status) != 0) {
-        return errno;
-    }
+// Reads an open file whose status is known.
+int readRest(int descriptor, const struct stat& status, std::string& content, std::size_t maximum) {
     if (status.st_size > 0 && static_cast<std::uintmax_t>(status.st_size) > maximum) {
         return EFBIG; // a sparse file may claim more than there is memory for
     }
-    // One byte more than the size: a file that did not grow is then read by one call and a second that meets
-    // the end. Files that give no size, as those of procfs, grow the buffer.
+    // Files that give no size, as those of procfs, grow the buffer.
+    const auto expected = static_cast<std::size_t>(status.st_size);
     std::size_t length = 0;
-    content.resize(std::max(static_cast<std::size_t>(status.st_size) + 1, kSmallestRead));
+    content.resize(expected > 0 ? expected + 1 : kSmallestRead);
     while (true) {
         const ssize_t count = ::read(descriptor, content.data() + length, content.size() - length);
         if (count < 0 && errno == EINTR) {
@@ -40,7 +35,8 @@ int readAll(int descriptor, std::string& content, std::size_t maximum) {
         if (length > maximum) {
             return EFBIG;
         }
-        if (count == 0) {
+        // A regular file that ended where it should, although there was room for more, has no more to give.
+        if (count == 0 || (S_ISREG(status.st_mode) && length == expected && length < content.size())) {
             content.resize(length);
             return 0;
         }
@@ -50,16 +46,20 @@ int readAll(int descriptor, std::string& content, std::size_t maximum) {
     }
 }
 
+} // namespace
+
+int readAll(int descriptor, std::string& content, std::size_t maximum) {
+    struct stat status = {};
+    return ::fstat(descriptor, &status) == 0 ? readRest(descriptor, status, content, maximum) : errno;
+}
+
 int readFile(const std::string& path, std::string& content, std::size_t maximum) {
     const FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
     struct stat status = {};
     if (!file || ::fstat(file.get(), &status) != 0) {
         return errno;
     }
-    if (!S_ISREG(status.st_mode)) {
-        return EINVAL;
-    }
-    return readAll(file.get(), content, maximum);
+    return S_ISREG(status.st_mode) ? readRest(file.get(), status, content, maximum) : EINVAL;
 }
 
 int writeAll(int descriptor, std::string_view content) {

@@ -31,37 +31,47 @@ LocalPreferenceStore::LocalPreferenceStore(RootFolder root, platform::ProcessIde
 std::optional<PropertyList> LocalPreferenceStore::copyValue(const std::string& key,
                                                             const std::string& domain) {
     const std::lock_guard lock(_mutex);
-    Domain& used = _domains[domain];
+    Domain& used = _use(domain);
     if (const auto change = used.changes.find(key); change != used.changes.end()) {
         return change->second;
     }
     if (!used.isLoaded) {
         _load(domain, used);
     }
-    const auto found = used.seen.find(key);
-    return found == used.seen.end() ? std::nullopt : std::optional(found->second);
+    std::optional<PropertyList> value;
+    if (const auto found = used.onDisk.values.find(key); found != used.onDisk.values.end()) {
+        value = found->second;
+    }
+    return value;
 }
 
 void LocalPreferenceStore::setValue(const std::string& key, const PropertyList& value,
                                     const std::string& domain) {
     const std::lock_guard lock(_mutex);
-    _domains[domain].changes.insert_or_assign(key, value);
+    _use(domain).changes.insert_or_assign(key, value);
 }
 
 void LocalPreferenceStore::removeValue(const std::string& key, const std::string& domain) {
     const std::lock_guard lock(_mutex);
-    _domains[domain].changes.insert_or_assign(key, std::nullopt);
+    _use(domain).changes.insert_or_assign(key, std::nullopt);
 }
 
 bool LocalPreferenceStore::synchronise(const std::string& domain) {
     const std::lock_guard lock(_mutex);
-    Domain& used = _domains[domain];
+    Domain& used = _use(domain);
     return used.changes.empty() ? _load(domain, used) : _storeChanges(domain, used);
 }
 
 std::vector<platform::DamagedPreferences> LocalPreferenceStore::damagedPreferences() {
     const std::lock_guard lock(_mutex);
     return _damaged;
+}
+
+LocalPreferenceStore::Domain& LocalPreferenceStore::_use(const std::string& name) {
+    if (!_lastUsed || _lastUsed->first != name) {
+        _lastUsed = &*_domains.try_emplace(name).first;
+    }
+    return _lastUsed->second;
 }
 
 const std::string& LocalPreferenceStore::_folder() {
@@ -72,41 +82,41 @@ const std::string& LocalPreferenceStore::_folder() {
     return *_userFolder;
 }
 
+const std::string& LocalPreferenceStore::_pathOf(const std::string& name, Domain& domain) {
+    if (domain.path.empty()) {
+        domain.path = _root.locate(platform::joinPath(_folder(), fileName(name)));
+    }
+    return domain.path;
+}
+
 bool LocalPreferenceStore::_load(const std::string& name, Domain& domain) {
     domain.isLoaded = true;
-    domain.seen.clear();
     if (!isDomainName(name)) {
         return false;
     }
-    PreferenceFileContent content =
-        readPreferenceFile(_root.locate(platform::joinPath(_folder(), fileName(name))));
-    if (content.state == State::Damaged) {
+    rereadPreferenceFile(_pathOf(name, domain), domain.onDisk);
+    if (domain.onDisk.state == State::Damaged) {
         // What was read may be a file that is being rewritten in place; with the lock it is what it is.
         const LockedPreferenceFolder folder(_root.locate(_folder()));
-        if (!folder) {
-            _noteDamage(name, content.reason, {});
-            return true;
+        if (folder) {
+            _readLocked(name, domain, folder);
+        } else {
+            _noteDamage(name, domain.onDisk.reason, {});
         }
-        domain.seen = _readLocked(name, folder).value_or(PropertyList::Dictionary());
-        return true;
     }
-    domain.seen = std::move(content.values);
-    return content.state == State::Whole;
+    return domain.onDisk.state != State::Unreadable;
 }
 
 bool LocalPreferenceStore::_storeChanges(const std::string& name, Domain& domain) {
     if (!isDomainName(name)) {
         return false;
     }
+    _userFolder.reset(); // asking makes the library folder where it is missing
     const LockedPreferenceFolder folder(_root.locate(_folder()));
-    if (!folder) {
+    if (!folder || !_readLocked(name, domain, folder)) {
         return false;
     }
-    const std::optional<PropertyList::Dictionary> stored = _readLocked(name, folder);
-    if (!stored) {
-        return false;
-    }
-    PropertyList::Dictionary merged = *stored;
+    PropertyList::Dictionary merged = domain.onDisk.values;
     for (const auto& [key, value] : domain.changes) {
         if (value) {
             merged.insert_or_assign(key, *value);
@@ -114,28 +124,31 @@ bool LocalPreferenceStore::_storeChanges(const std::string& name, Domain& domain
             merged.erase(key);
         }
     }
-    if (merged != *stored && !folder.write(fileName(name), merged)) {
-        return false;
+    if (merged != domain.onDisk.values) {
+        std::optional<std::string> bytes = folder.write(fileName(name), merged);
+        if (!bytes) {
+            return false;
+        }
+        domain.onDisk = {State::Whole, std::move(merged), std::move(*bytes), {}};
     }
-    domain.seen = std::move(merged);
     domain.changes.clear();
     domain.isLoaded = true;
     return true;
 }
 
-std::optional<PropertyList::Dictionary>
-LocalPreferenceStore::_readLocked(const std::string& name, const LockedPreferenceFolder& folder) {
-    PreferenceFileContent content =
-        readPreferenceFile(_root.locate(platform::joinPath(_folder(), fileName(name))));
-    if (content.state == State::Whole) {
-        return std::move(content.values);
+bool LocalPreferenceStore::_readLocked(const std::string& name, Domain& domain,
+                                       const LockedPreferenceFolder& folder) {
+    rereadPreferenceFile(_pathOf(name, domain), domain.onDisk);
+    if (domain.onDisk.state != State::Damaged) {
+        return domain.onDisk.state == State::Whole;
     }
-    if (content.state == State::Unreadable) {
-        return std::nullopt;
+    const std::string other = folder.setAside(fileName(name), domain.onDisk.bytes);
+    _noteDamage(name, domain.onDisk.reason, other);
+    if (other.empty()) {
+        return false;
     }
-    const std::string other = folder.setAside(fileName(name), content.bytes);
-    _noteDamage(name, content.reason, other);
-    return other.empty() ? std::nullopt : std::optional<PropertyList::Dictionary>(std::in_place);
+    domain.onDisk = {};
+    return true;
 }
 
 void LocalPreferenceStore::_noteDamage(const std::string& name, const std::string& reason,

@@ -37,19 +37,21 @@ class LocalPreferenceStore final : public platform::PreferenceStore {
 
   private:
     struct Domain {
-        PropertyList::Dictionary seen;                              // as it was on disk
+        PreferenceFileContent onDisk;                               // as it was when it was last read
         std::map<std::string, std::optional<PropertyList>> changes; // none: removed
+        std::string path; // of the file, on this machine; empty until it is first needed
         bool isLoaded = false;
     };
 
     // All with _mutex held.
+    Domain& _use(const std::string& name);
     const std::string& _folder();
+    const std::string& _pathOf(const std::string& name, Domain& domain);
     bool _load(const std::string& name, Domain& domain);
     bool _storeChanges(const std::string& name, Domain& domain);
     // Reads a domain again with its folder locked, and sets it aside when it is damaged.
-    //  result  none when the domain must be left alone
-    std::optional<PropertyList::Dictionary> _readLocked(const std::string& name,
-                                                        const LockedPreferenceFolder& folder);
+    //  result  false when the domain must be left alone
+    bool _readLocked(const std::string& name, Domain& domain, const LockedPreferenceFolder& folder);
     void _noteDamage(const std::string& name, const std::string& reason, const std::string& setAsideName);
 
     const RootFolder _root;
@@ -57,6 +59,7 @@ class LocalPreferenceStore final : public platform::PreferenceStore {
     std::mutex _mutex;
     std::optional<std::string> _userFolder; // below the root; none until it is first needed
     std::map<std::string, Domain> _domains;
+    decltype(_domains)::value_type* _lastUsed = nullptr; // mostly it is the next one, too
     std::vector<platform::DamagedPreferences> _damaged;
 };
 

@@ -34,30 +34,42 @@ std::string damagedName(const std::string& name, int number) {
     return name + kDamagedSuffix + (number == 1 ? std::string() : "-" + std::to_string(number));
 }
 
-PreferenceFileContent damaged(std::string bytes, std::string reason) {
-    return {State::Damaged, {}, std::move(bytes), std::move(reason)};
+PreferenceFileContent parse(std::string bytes) {
+    if (bytes.empty()) {
+        return {};
+    }
+    PropertyListReadResult result = readPropertyList(bytes);
+    if (!result) {
+        return {State::Damaged, {}, std::move(bytes), std::move(result.error)};
+    }
+    PropertyList::Dictionary* values = result.value->dictionary();
+    if (!values) {
+        return {State::Damaged, {}, std::move(bytes), "a property list, but no dictionary"};
+    }
+    return {State::Whole, std::move(*values), std::move(bytes), {}};
 }
 
 } // namespace
 
 PreferenceFileContent readPreferenceFile(const std::string& path) {
+    PreferenceFileContent content;
+    rereadPreferenceFile(path, content);
+    return content;
+}
+
+void rereadPreferenceFile(const std::string& path, PreferenceFileContent& content) {
     std::string bytes;
     const int error = readFile(path, bytes, kMaximumFileSize);
-    if (error == ENOENT || (error == 0 && bytes.empty())) {
-        return {};
+    if (error != 0 && error != ENOENT) {
+        content = {State::Unreadable, {}, {}, std::generic_category().message(error)};
+        return;
     }
-    if (error != 0) {
-        return {State::Unreadable, {}, {}, std::generic_category().message(error)};
+    if (error == ENOENT) {
+        bytes.clear();
     }
-    PropertyListReadResult result = readPropertyList(bytes);
-    if (!result) {
-        return damaged(std::move(bytes), std::move(result.error));
+    if (content.state == State::Unreadable || bytes != content.bytes) {
+        content = parse(std::move(bytes));
     }
-    PropertyList::Dictionary* values = result.value->dictionary();
-    if (!values) {
-        return damaged(std::move(bytes), "a property list, but no dictionary");
-    }
-    return {State::Whole, std::move(*values), {}, {}};
 }
 
 LockedPreferenceFolder::LockedPreferenceFolder(const std::string& path) {
@@ -68,15 +80,17 @@ LockedPreferenceFolder::LockedPreferenceFolder(const std::string& path) {
     }
 }
 
-bool LockedPreferenceFolder::write(const std::string& name, const PropertyList::Dictionary& values) const {
-    const std::optional<std::string> bytes = writeXMLPropertyList(values);
-    if (!bytes) {
-        return false;
-    }
+std::optional<std::string> LockedPreferenceFolder::write(const std::string& name,
+                                                         const PropertyList::Dictionary& values) const {
+    std::optional<std::string> bytes = writeXMLPropertyList(values);
     struct stat present = {};
     const bool isPresent = ::fstatat(_folder.get(), name.c_str(), &present, 0) == 0;
     const mode_t mode = isPresent ? present.st_mode & kPermissions : kFileMode;
-    return replaceFile(_folder.get(), name, *bytes, mode) == 0;
+    // Syncing the folder too would take as long again, for a change that nothing else relies on.
+    if (bytes && replaceFile(_folder.get(), name, *bytes, mode, AfterCrash::OldOrNew) != 0) {
+        bytes.reset();
+    }
+    return bytes;
 }
 
 std::string LockedPreferenceFolder::setAside(const std::string& name, const std::string& bytes) const {

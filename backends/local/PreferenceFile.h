@@ -5,6 +5,7 @@
 #include "backends/local/FileDescriptor.h"
 #include "propertylist/PropertyList.h"
 
+#include <optional>
 #include <string>
 
 namespace welcomer::local {
@@ -18,7 +19,7 @@ struct PreferenceFileContent {
     };
     State state = State::Whole;
     PropertyList::Dictionary values; // empty unless whole
-    std::string bytes;               // of a damaged file
+    std::string bytes;               // the file's own, unless unreadable
     std::string reason;              // one line, unless whole
 };
 
@@ -26,6 +27,11 @@ struct PreferenceFileContent {
 //  path  the file's path on this machine
 // Any thread.
 PreferenceFileContent readPreferenceFile(const std::string& path);
+
+// The same, where it was read before: bytes that did not change are not parsed again.
+//  content  what was there before, replaced by what is there now
+// Any thread.
+void rereadPreferenceFile(const std::string& path, PreferenceFileContent& content);
 
 // The folder of the domains' files, with its lock held for as long as this lives. One thread at a time.
 class LockedPreferenceFolder {
@@ -39,8 +45,8 @@ class LockedPreferenceFolder {
 
     // Replaces a file's content, all or nothing. The file keeps its permissions; a new one is the user's
     // alone.
-    //  result  false when the values cannot be written
-    bool write(const std::string& name, const PropertyList::Dictionary& values) const;
+    //  result  the file's new bytes, none when the values cannot be written
+    std::optional<std::string> write(const std::string& name, const PropertyList::Dictionary& values) const;
 
     // Gives a damaged file another name, one that is free. A mount point keeps its name and its content is
     // moved.
