@@ -30,6 +30,7 @@ struct PlatformOptions {
     platform::Clock* clock = nullptr;
     platform::RunLoops* runLoops = nullptr;
     platform::DispatchQueues* dispatchQueues = nullptr;
+    platform::HostReachability* hostReachability = nullptr;
 };
 
 // Builds the platform. Opens nothing and starts no thread: each service does its work when it is first asked.

@@ -29,7 +29,7 @@ LocalPlatform::LocalPlatform(const PlatformOptions& options)
                 chosen(options.dispatchQueues, _dispatchQueues),
                 _preferenceStore,
                 _systemVersionInfo,
-                _hostReachability,
+                chosen(options.hostReachability, _hostReachability),
                 _notificationCenter,
                 _accountService,
                 _processLauncher} {}

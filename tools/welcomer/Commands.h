@@ -9,8 +9,12 @@ class CommandLine;
 void addTryCommand(CommandLine& commandLine);
 void addReplayCommands(CommandLine& commandLine);
 void addPluginsCommands(CommandLine& commandLine);
+void addStateCommands(CommandLine& commandLine);
+void addSyncCommands(CommandLine& commandLine);
+void addSwitchCommands(CommandLine& commandLine);
 
 // In the order in which --help shows them.
-inline constexpr void (*kCommands[])(CommandLine&) = {addTryCommand, addReplayCommands, addPluginsCommands};
+inline constexpr void (*kCommands[])(CommandLine&) = {addTryCommand,    addReplayCommands, addPluginsCommands,
+                                                      addStateCommands, addSyncCommands,   addSwitchCommands};
 
 } // namespace welcomer::tool

@@ -19,4 +19,9 @@ std::string KeptLog::reason() const {
     return _last.empty() ? "no reason was given" : _last;
 }
 
+bool KeptLog::isEmpty() const {
+    const std::lock_guard lock(_mutex);
+    return _last.empty();
+}
+
 } // namespace welcomer::tool

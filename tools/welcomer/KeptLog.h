@@ -20,6 +20,9 @@ class KeptLog : public platform::SystemLog {
     // The last line, or "no reason was given". The system logs the reason of a failure last. Any thread.
     std::string reason() const;
 
+    // Whether there was no line yet. Any thread.
+    bool isEmpty() const;
+
   private:
     mutable std::mutex _mutex;
     std::string _last;

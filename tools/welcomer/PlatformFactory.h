@@ -15,6 +15,8 @@ struct PlatformRequest {
     platform::SystemLog* systemLog =
         nullptr;                // takes the records in place of the system log, or null; borrowed
     bool simulatedTime = false; // clock, run loops and queues on simulated time
+    platform::HostReachability* hostReachability =
+        nullptr; // in place of the machine's own, or null; borrowed
 };
 
 // A platform together with what owns it.

@@ -96,11 +96,33 @@ void settleRoot(Options& options) {
     }
 }
 
+// Says on stderr, at its end, which preferences were damaged: they count as empty.
+class DamageReport {
+  public:
+    explicit DamageReport(platform::PreferenceStore& preferences) : _preferences(preferences) {}
+    ~DamageReport() {
+        std::cout.flush();
+        for (const platform::DamagedPreferences& damage : _preferences.damagedPreferences()) {
+            const std::string place =
+                damage.setAsidePath.empty() ? "still in their place" : "now at " + damage.setAsidePath;
+            std::cerr << printable("welcomer: the preferences " + damage.domain + " are damaged (" +
+                                   damage.reason + ") and " + place)
+                      << '\n';
+        }
+    }
+    DamageReport(const DamageReport&) = delete;
+    DamageReport& operator=(const DamageReport&) = delete;
+
+  private:
+    platform::PreferenceStore& _preferences;
+};
+
 int runCommand(const Command& command, const Options& options, const PlatformFactory& buildPlatform) {
     KeptLog log;
     log.setVerbose(options.verbose);
     const PlatformHandle platform = buildPlatform({options.root, &log, false});
     const platform::ScopedPlatform installed(*platform);
+    const DamageReport damageReport(platform->preferenceStore);
     Session session{options, buildPlatform, log, std::cout};
     command(session);
     std::cout.flush();

@@ -19,6 +19,7 @@ struct OwnedPlatform {
 tool::PlatformHandle build(const tool::PlatformRequest& request) {
     const auto owned = std::make_shared<OwnedPlatform>();
     PlatformOptions options{.root = request.root, .systemLog = request.systemLog};
+    options.hostReachability = request.hostReachability;
     if (request.simulatedTime) {
         owned->simulatedTime = std::make_unique<VirtualTime>(VirtualTime::OutstandingWork::OnRealThreads);
         options.clock = owned->simulatedTime.get();
