@@ -238,7 +238,7 @@ void LocalAccountService::markSetupFinished(const std::optional<PropertyList>& /
     });
 }
 
-void LocalAccountService::_start(std::shared_ptr<Operation> operation) {
+void LocalAccountService::_start(const std::shared_ptr<Operation>& operation) {
     operation->runLoop = _runLoops.current();
     operation->port = operation->runLoop->attachPort();
     // On the loop's thread, which is this object's for as long as it lives.

@@ -41,7 +41,7 @@ class LocalAccountService final : public platform::AccountService, public platfo
     class Service;
     struct Operation;
 
-    void _start(std::shared_ptr<Operation> operation);
+    void _start(const std::shared_ptr<Operation>& operation);
 
     const std::shared_ptr<Accounts> _accounts; // shared with handles and with operations that are under way
     platform::RunLoops& _runLoops;

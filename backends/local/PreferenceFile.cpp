@@ -95,7 +95,7 @@ std::optional<std::string> LockedPreferenceFolder::write(const std::string& name
 
 std::string LockedPreferenceFolder::setAside(const std::string& name, const std::string& bytes) const {
     for (int number = 1; number <= kMaximumDamagedFiles; ++number) {
-        const std::string other = damagedName(name, number);
+        std::string other = damagedName(name, number);
         // An empty file of our own takes the name, so that nothing else is overwritten.
         const FileDescriptor reserved(
             ::openat(_folder.get(), other.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kFileMode));

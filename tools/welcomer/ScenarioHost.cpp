@@ -60,14 +60,14 @@ bool isOfKind(const PropertyList& value, Kind kind) {
 
 void check(const PropertyList::Dictionary& answers, const char* part) {
     const auto& known = kAnswers.at(part);
-    const std::string prefix = *part == '\0' ? std::string() : std::string(part) + ".";
     for (const auto& [name, value] : answers) {
+        const std::string path = *part == '\0' ? name : part + ("." + name);
         const auto found = known.find(name);
         if (found == known.end()) {
-            throw CommandFailure("the scenario's " + prefix + name + " means nothing");
+            throw CommandFailure("the scenario's " + path + " means nothing");
         }
         if (!isOfKind(value, found->second)) {
-            throw CommandFailure("the scenario's " + prefix + name + " is of the wrong type");
+            throw CommandFailure("the scenario's " + path + " is of the wrong type");
         }
         if (*part == '\0' && kAnswers.contains(name)) {
             check(*value.dictionary(), name.c_str());
@@ -106,7 +106,7 @@ class ScenarioHost::Cloud final : public CloudSetupManager {
         return _host._answer(kCloud, hasOtherAnswer ? "abortSetupAfterSeeding" : "abortSetup");
     }
     OptionalDictionary mainAccountResponseDict() override {
-        const OptionalDictionary response = _host._dictionary(kCloud, "mainAccountResponseDict");
+        OptionalDictionary response = _host._dictionary(kCloud, "mainAccountResponseDict");
         _host._calls.push_back(std::string("NimbusManager.mainAccountResponseDict: ") +
                                (response ? "a response" : "none"));
         return response;
@@ -156,7 +156,7 @@ class ScenarioHost::Helper final : public WLLoginHelper {
         return answer;
     }
     OptionalDictionary queryKeychainSyncStatus(const std::optional<PropertyList>&) override {
-        const OptionalDictionary answer = _host._dictionary(kHelper, "queryKeychainSyncStatus");
+        OptionalDictionary answer = _host._dictionary(kHelper, "queryKeychainSyncStatus");
         _host._calls.push_back(std::string("wlloginhelper.queryKeychainSyncStatus: none: ") +
                                (answer ? "a dictionary" : "none"));
         return answer;
