@@ -56,6 +56,7 @@ void finishSetup(const std::string& label, const DelegatePluginSource& plugins) 
     attempt([] { WLDeleteNimbusReplayKeychainItem(); });
     attempt([&] { wlnimbussetup_RemainingSkylarkSetup(accountName, group); });
     attempt([&] { wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, group, plugins); });
+    replayObject = PropertyList(); // may be large, and each plug-in's job holds what it needs of it
     attempt([&] { waitFor(*group); });
     attempt(linger);
 }

@@ -13,7 +13,10 @@ install(EXPORT WelcomerTargets NAMESPACE Welcomer:: DESTINATION "${WELCOMER_CMAK
 foreach(folder propertylist text platform log handoff plugins network switch cloud state agent)
     if(IS_DIRECTORY "${PROJECT_SOURCE_DIR}/${folder}")
         install(DIRECTORY "${PROJECT_SOURCE_DIR}/${folder}" DESTINATION "${WELCOMER_MODULE_INCLUDE_DIR}"
-                FILES_MATCHING PATTERN "*.h")
+                FILES_MATCHING PATTERN "*.h"
+                # The host's side of the C ABI is nothing for a setup application.
+                PATTERN AbiDelegatePlugin.h EXCLUDE PATTERN CompletionHandlers.h EXCLUDE
+                PATTERN PropertyListHandles.h EXCLUDE)
     endif()
 endforeach()
 install(FILES "${PROJECT_SOURCE_DIR}/backends/Backends.h" DESTINATION "${WELCOMER_MODULE_INCLUDE_DIR}/backends")
