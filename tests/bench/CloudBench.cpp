@@ -1,0 +1,224 @@
+// The cloud services: enabling after login against bare writes of the same file, building the request from
+// many plug-ins, and a sign-in that is answered at once.
+
+#include "backends/Backends.h"
+#include "backends/local/LocalRunLoops.h"
+#include "backends/local/NimbusDirectory.h"
+#include "backends/local/PasswordHash.h"
+#include "backends/simulated/VirtualTime.h"
+#include "cloud/NimbusTesselDelegate.h"
+#include "cloud/WLNimbusServiceCatalogue.h"
+#include "cloud/WLNimbusSetupWithDictionary.h"
+#include "plugins/WLNimbusDelegatesRequest.h"
+#include "propertylist/PropertyListWriter.h"
+
+#include <benchmark/benchmark.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cstdint>
+#include <cstdlib>
+#include <fcntl.h>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <memory>
+#include <optional>
+#include <stdexcept>
+#include <string>
+#include <unistd.h>
+#include <utility>
+
+namespace welcomer {
+namespace {
+
+using namespace std::chrono_literals;
+using Dictionary = PropertyList::Dictionary;
+
+constexpr char kUser[] = "newcomer@nimbus.example";
+constexpr char kPassword[] = "open sesame";
+
+class SilentLog final : public platform::SystemLog {
+  public:
+    void write(int, const std::string&) override {}
+};
+
+// A system of its own in a temporary folder, whose directory knows one user.
+class Fixture {
+  public:
+    explicit Fixture(PlatformOptions options = {}) {
+        std::string folder = std::filesystem::temp_directory_path() / "welcomer-bench-XXXXXX";
+        if (!::mkdtemp(folder.data())) {
+            throw std::runtime_error("cannot make " + folder);
+        }
+        root = folder;
+        options.root = folder;
+        options.systemLog = &log;
+        owner = buildPlatform(options);
+        const std::string home = owner->platform().processIdentity.homeDirectory();
+        std::filesystem::create_directories(folder + home);
+        const std::filesystem::path directory = folder + local::kNimbusDirectoryPath;
+        std::filesystem::create_directories(directory.parent_path());
+        const Dictionary user = {{"Password", local::makePasswordHash(kPassword).value()},
+                                 {"MailAddress", kUser}};
+        const Dictionary users = {{kUser, user}};
+        std::ofstream(directory) << *writeXMLPropertyList(Dictionary{{"Users", users}});
+        installed.emplace(owner->platform());
+        accountFile = folder + home + "/Library/Accounts/Accounts.plist";
+    }
+    ~Fixture() {
+        std::error_code error;
+        std::filesystem::remove_all(root, error);
+    }
+    Fixture(const Fixture&) = delete;
+    Fixture& operator=(const Fixture&) = delete;
+
+    SilentLog log;
+    std::unique_ptr<PlatformOwner> owner;
+    std::optional<platform::ScopedPlatform> installed;
+    std::filesystem::path root;
+    std::string accountFile;
+};
+
+std::string readFile(const std::string& path) {
+    std::ifstream file(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+double seconds(std::chrono::steady_clock::duration duration) {
+    return std::chrono::duration<double>(duration).count();
+}
+
+// The post-login phase of an account whose services are off, its delayed services included.
+void postLoginStage(benchmark::State& benchmarkState) {
+    simulated::VirtualTime time;
+    Fixture fixture({.clock = &time, .runLoops = &time, .dispatchQueues = &time});
+    const auto account =
+        platform::current().accountService.sharedManager().accountForID(PropertyList(kUser), true);
+    const std::string before = readFile(fixture.accountFile);
+    const auto port = time.current()->attachPort();
+    for ([[maybe_unused]] auto _ : benchmarkState) {
+        std::ofstream(fixture.accountFile, std::ios::binary) << before;
+        const auto start = std::chrono::steady_clock::now();
+        WLNimbusSetupWithDictionary2({{platform::kSKPropertyAccountID, kUser}}, WLNimbusAllSetupServiceIDs(),
+                                     false, true, nullptr, nullptr);
+        time.current()->run(3s);
+        benchmarkState.SetIterationTime(seconds(std::chrono::steady_clock::now() - start));
+    }
+    for (const std::string& identifier : WLNimbusPostLoginServiceIDs()) {
+        if (!platform::current().accountService.isServiceEnabled(account.get(), identifier)) {
+            benchmarkState.SkipWithError("a service was not enabled");
+        }
+    }
+}
+BENCHMARK(postLoginStage)->UseManualTime()->Unit(benchmark::kMicrosecond);
+
+// What stores a file of that size durably ten times, and no more.
+void tenBareWrites(benchmark::State& benchmarkState) {
+    simulated::VirtualTime time;
+    Fixture fixture({.clock = &time, .runLoops = &time, .dispatchQueues = &time});
+    platform::current().accountService.sharedManager().accountForID(PropertyList(kUser), true);
+    const std::string content = readFile(fixture.accountFile);
+    for ([[maybe_unused]] auto _ : benchmarkState) {
+        const auto start = std::chrono::steady_clock::now();
+        for (int round = 0; round < 10; ++round) {
+            const int file = ::open(fixture.accountFile.c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC);
+            const bool written =
+                ::write(file, content.data(), content.size()) == static_cast<ssize_t>(content.size()) &&
+                ::fsync(file) == 0;
+            if (::close(file) != 0 || !written) {
+                benchmarkState.SkipWithError("the file was not written");
+            }
+        }
+        benchmarkState.SetIterationTime(seconds(std::chrono::steady_clock::now() - start));
+    }
+}
+BENCHMARK(tenBareWrites)->UseManualTime()->Unit(benchmark::kMicrosecond);
+
+class RequestingDelegate final : public WLFirstRunDelegateConfiguration {
+  public:
+    explicit RequestingDelegate(std::string identifier) : _identifier(std::move(identifier)) {}
+    std::optional<std::string> delegateIdentifier() override { return _identifier; }
+    std::optional<PropertyList> delegateSetupRequest() override { return Dictionary{{"version", 1}}; }
+    void completeSetupWithResponseHandler(const PropertyList& /*response*/,
+                                          CompletionHandler /*handler*/) override {}
+    void
+    completeSetupWithResponseChosenAliasesHandler(const PropertyList& /*response*/,
+                                                  const std::optional<std::vector<std::string>>& /*aliases*/,
+                                                  CompletionHandler /*handler*/) override {}
+    std::optional<std::vector<std::string>>
+    messagingAliasesFromResponse(const PropertyList& /*response*/) override {
+        return std::nullopt;
+    }
+    std::string className() const override { return "RequestingDelegate"; }
+
+  private:
+    std::string _identifier;
+};
+
+void buildRequest(benchmark::State& benchmarkState) {
+    DelegatePluginArray plugins;
+    for (std::int64_t number = 0; number < benchmarkState.range(0); ++number) {
+        plugins.push_back(
+            std::make_shared<RequestingDelegate>("com.corvid.bench.number" + std::to_string(number)));
+    }
+    for ([[maybe_unused]] auto _ : benchmarkState) {
+        benchmark::DoNotOptimize(
+            WLNimbusDelegatesRequest({}, {}, [&]() -> const DelegatePluginArray& { return plugins; }));
+    }
+}
+BENCHMARK(buildRequest)->Arg(1)->Arg(10)->Arg(100)->Arg(1000)->Unit(benchmark::kMicrosecond);
+
+// The machine's own loops, counting the slices that are asked of them.
+class CountingRunLoops final : public platform::RunLoops {
+  public:
+    class Loop final : public platform::RunLoop {
+      public:
+        Loop(std::shared_ptr<platform::RunLoop> loop, int& slices)
+            : _loop(std::move(loop)),
+              _slices(slices) {}
+        void run(std::chrono::nanoseconds duration) override {
+            ++_slices;
+            _loop->run(duration);
+        }
+        void perform(std::function<void()> block) override { _loop->perform(std::move(block)); }
+        std::unique_ptr<platform::RunLoopPort> attachPort() override { return _loop->attachPort(); }
+        bool hasForeignSources() const override { return _loop->hasForeignSources(); }
+
+      private:
+        const std::shared_ptr<platform::RunLoop> _loop;
+        int& _slices;
+    };
+
+    std::shared_ptr<platform::RunLoop> current() override {
+        return std::make_shared<Loop>(_loops.current(), slices);
+    }
+
+    int slices = 0;
+
+  private:
+    local::LocalRunLoops _loops;
+};
+
+// With the most slices that any of the sign-ins turned.
+void signInAnsweredAtOnce(benchmark::State& benchmarkState) {
+    CountingRunLoops loops;
+    Fixture fixture({.runLoops = &loops});
+    int most = 0;
+    for ([[maybe_unused]] auto _ : benchmarkState) {
+        loops.slices = 0;
+        NimbusTesselDelegate delegate;
+        if (!delegate.signInWithUsernameAndPasswordAdditionalDelegatesOmittingDelegatesError(
+                kUser, kPassword, {}, {}, nullptr)) {
+            benchmarkState.SkipWithError("the sign-in failed");
+        }
+        most = std::max(most, loops.slices);
+    }
+    benchmarkState.counters["slices"] = most;
+}
+BENCHMARK(signInAnsweredAtOnce)->UseRealTime()->Unit(benchmark::kMicrosecond);
+
+} // namespace
+} // namespace welcomer
+
+BENCHMARK_MAIN();
