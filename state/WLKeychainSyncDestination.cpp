@@ -59,7 +59,10 @@ bool prepareKeychain(SetupStateManager& manager) {
     const auto password = cloud.password();
     const auto response = cloud.mainAccountResponseDict();
     helper.configureNimbusAccountForKeychainSyncKVSPasswordBag(userName, password, response);
-    return helper.seedKeychainComponentsWithIDPassword(userName, password);
+    // Asked again, as for each message to the helper: configuring may have changed them.
+    const auto seedName = cloud.username();
+    const auto seedPassword = cloud.password();
+    return helper.seedKeychainComponentsWithIDPassword(seedName, seedPassword);
 }
 
 std::int64_t circleStatus(WLLoginHelper& helper) {

@@ -21,6 +21,8 @@ struct HostAnswers {
     bool abortSetup = false;
     bool abortSetupAfterSeeding = false; // takes the place of the former once components were seeded
     std::optional<PropertyList::Dictionary> mainAccountResponseDict = PropertyList::Dictionary{{"dsid", 1}};
+    std::string username = "cloud user";
+    std::string usernameAfterConfiguring = "cloud user";
     bool seedKeychainComponents = true;
     std::optional<PropertyList::Dictionary> keychainSyncStatus = PropertyList::Dictionary{{"status", 1}};
     bool isBackupEnabled = false; // of the helper
@@ -48,6 +50,7 @@ class SetupHost final : public SetupStateManager {
     void restart(const HostAnswers& newAnswers) {
         answers = newAnswers;
         flags = {};
+        _hasConfigured = false;
         _hasSeeded = false;
     }
 
@@ -88,7 +91,11 @@ class SetupHost final : public SetupStateManager {
         Dictionary mainAccountResponseDict() override {
             return host._answer("cloud.mainAccountResponseDict", host.answers.mainAccountResponseDict);
         }
-        Text username() override { return host._answer("cloud.username", Text("cloud user")); }
+        Text username() override {
+            return host._answer(
+                "cloud.username",
+                Text(host._hasConfigured ? host.answers.usernameAfterConfiguring : host.answers.username));
+        }
         Text password() override { return host._answer("cloud.password", Text("cloud password")); }
         bool backupIsEnabled() override {
             return host._answer("cloud.backupIsEnabled", host.flags.backupIsEnabled);
@@ -113,6 +120,7 @@ class SetupHost final : public SetupStateManager {
         }
         void configureNimbusAccountForKeychainSyncKVSPasswordBag(const Text& userName, const Text& password,
                                                                  const Dictionary& bag) override {
+            host._hasConfigured = true;
             host._recorder.record("helper.configure " + text::describe(userName) + ", " +
                                   text::describe(password) + ", " +
                                   (bag ? text::describe(PropertyList(*bag)) : "none"));
@@ -147,6 +155,7 @@ class SetupHost final : public SetupStateManager {
     }
 
     fakes::CallRecorder& _recorder;
+    bool _hasConfigured = false;
     bool _hasSeeded = false;
     NetworkingManager _network;
     User _user{*this};

@@ -108,6 +108,14 @@ TEST_F(WLKeychainSyncDestinationTest, TheUpsellGoesOnWithoutAResponse) {
 
 // After the rules
 
+TEST_F(WLKeychainSyncDestinationTest, TheComponentsAreSeededForTheUserNameAsConfiguringLeftIt) {
+    host.answers.usernameAfterConfiguring = "renamed user";
+    EXPECT_TRUE(determine());
+    EXPECT_EQ(fake.recorder.callsTo("helper.configure"),
+              (Lines{"helper.configure cloud user, cloud password, {dsid = 1}"}));
+    EXPECT_EQ(fake.recorder.callsTo("helper.seed"), (Lines{"helper.seed renamed user, cloud password"}));
+}
+
 TEST_F(WLKeychainSyncDestinationTest, ComponentsThatFailToInitialiseAbort) {
     host.answers.seedKeychainComponents = false;
     EXPECT_FALSE(determine());
@@ -318,6 +326,8 @@ class Model {
         _call("cloud.mainAccountResponseDict");
         _call(std::string("helper.configure cloud user, cloud password, ") +
               (host.mainAccountResponseDict ? "{dsid = 1}" : "none"));
+        _call("cloud.username");
+        _call("cloud.password");
         _call("helper.seed cloud user, cloud password");
         if (!host.seedKeychainComponents) {
             return _skip("Aborting Keychain Sync because components failed to initialize");

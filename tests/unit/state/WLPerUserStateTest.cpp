@@ -156,6 +156,19 @@ TEST_F(WLPerUserStateTest, ATextOfAnotherTypeReadsAsNone) {
     }
 }
 
+TEST_F(WLPerUserStateTest, ATextOfAnotherTypeIsInNoDictionaryAndWritingRemovesIt) {
+    for (const TextProperty& text : kTexts) {
+        fake.preferenceStore.store(kDomain, text.key, 10);
+    }
+    WLPerUserState state;
+    EXPECT_EQ(state.dictionaryRepresentation(), Dictionary());
+    EXPECT_TRUE(state.writeToDefaults());
+    const Dictionary stored = fake.preferenceStore.stored(kDomain);
+    for (const TextProperty& text : kTexts) {
+        EXPECT_FALSE(stored.contains(text.key)) << text.key;
+    }
+}
+
 TEST_F(WLPerUserStateTest, APreviousSystemVersionStoredAsANumberMakesANewUserAccount) {
     store({{"PreviousSystemVersion", 10}});
     const WLPerUserState state;
