@@ -87,6 +87,7 @@ std::int32_t FakeCredentialStore::findItem(const std::string& service, const std
         return platform::kCredentialItemNotFound;
     }
     if (data) {
+        ++_dataReads;
         *data = found->data;
     }
     if (reference) {
@@ -124,6 +125,11 @@ std::int32_t FakeCredentialStore::deleteItem(const platform::CredentialItemRefer
     }
     _items.erase(found);
     return platform::kCredentialSuccess;
+}
+
+int FakeCredentialStore::dataReads() const {
+    const std::lock_guard lock(_mutex);
+    return _dataReads;
 }
 
 std::vector<FakeCredentialStore::StoredItem> FakeCredentialStore::items() const {

@@ -47,6 +47,9 @@ class FakeCredentialStore final : public platform::CredentialStore {
     // The items in the order of their creation.
     std::vector<StoredItem> items() const;
 
+    // How often an item's data was asked for.
+    int dataReads() const;
+
     // Puts an item in place of the one with the same service and account. Nothing is recorded, and no set
     // status applies.
     void put(const platform::CredentialItem& item, const std::string& data);
@@ -62,6 +65,7 @@ class FakeCredentialStore final : public platform::CredentialStore {
     CallRecorder& _recorder;
     mutable std::mutex _mutex;
     std::vector<StoredItem> _items;
+    int _dataReads = 0;
     std::map<Operation, std::int32_t> _statuses;
 };
 

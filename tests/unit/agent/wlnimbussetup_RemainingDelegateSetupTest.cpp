@@ -1,5 +1,6 @@
 #include "agent/wlnimbussetup_RemainingDelegateSetup.h"
 
+#include "log/PCLogManager.h"
 #include "tests/fakes/FakePlatform.h"
 #include "tests/unit/agent/TestDelegate.h"
 
@@ -250,6 +251,21 @@ TEST_F(RemainingDelegateSetupTest, ItReturnsAfterQueueingWithTheGroupEntered) {
     EXPECT_EQ(plugin.calls.size(), 1U);
     kept(true, std::nullopt);
     EXPECT_TRUE(group->wait(0ns));
+}
+
+TEST_F(RemainingDelegateSetupTest, TheSettingUpLineComesBeforeTheStartTimeAndBeforeTheGroupIsEntered) {
+    add("a");
+    respond("a");
+    PCLogManager::sharedManager().setObserver([&](const PCLogManager::Call& call) {
+        if (call.message == "setting up a") {
+            EXPECT_TRUE(group->wait(0ns));
+            fake.virtualTime.sleep(1s);
+        }
+    });
+    setUp();
+    PCLogManager::sharedManager().setObserver({});
+    EXPECT_TRUE(group->wait(1h));
+    EXPECT_EQ(fake.systemLog.lines().back(), "a setup: completed (0.000 seconds)");
 }
 
 TEST_F(RemainingDelegateSetupTest, TheMessagingDelegatesShareAQueueAndEveryOtherHasItsOwn) {

@@ -163,6 +163,7 @@ TEST_F(ReplayItemTest, DeletingFindsTheItemWithoutItsDataAndDeletesIt) {
     EXPECT_EQ(fake.credentialStore.items().size(), 0U);
     EXPECT_EQ(fake.recorder.calls(),
               (Lines{"CredentialStore.findItem " + kKey, "CredentialStore.deleteItem " + kKey}));
+    EXPECT_EQ(fake.credentialStore.dataReads(), 0);
 }
 
 TEST_F(ReplayItemTest, DeletingLogsTheStatusOfFinding) {
