@@ -30,6 +30,11 @@ class FakePlatform {
     // The same, but with other files than the fake ones; borrowed.
     explicit FakePlatform(platform::FileSystem& otherFiles) : _files(otherFiles) {}
 
+    // The same, and with other plug-in bundles too.
+    FakePlatform(platform::FileSystem& otherFiles, platform::PluginBundle& otherPlugins)
+        : _files(otherFiles),
+          _plugins(otherPlugins) {}
+
     // Every call to any of the fakes, in order.
     CallRecorder recorder;
 
@@ -52,8 +57,9 @@ class FakePlatform {
 
   private:
     platform::FileSystem& _files = fileSystem;
+    platform::PluginBundle& _plugins = pluginBundle;
     platform::Platform _platform{systemLog,          _files,          processIdentity,   credentialStore,
-                                 pluginBundle,       resourceBundles, virtualTime,       virtualTime,
+                                 _plugins,           resourceBundles, virtualTime,       virtualTime,
                                  virtualTime,        preferenceStore, systemVersionInfo, hostReachability,
                                  notificationCenter, accountService,  processLauncher};
 };

@@ -1,11 +1,16 @@
 // Plug-ins as their authors build them: real shared libraries, in C and C++, by each compiler that is there.
 
+#include "backends/local/LocalFileSystem.h"
+#include "backends/local/LocalPluginBundle.h"
 #include "plugins/AbiDelegatePlugin.h"
 #include "plugins/WLNimbusDelegatePlugins.h"
+#include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakePlatform.h"
 
+#include <algorithm>
 #include <dlfcn.h>
 #include <filesystem>
+#include <fstream>
 #include <functional>
 #include <future>
 #include <gtest/gtest.h>
@@ -360,6 +365,60 @@ TEST_F(ExamplePlugins, GiveTheAliasesThatTheServerOffers) {
     EXPECT_EQ(chatter->messagingAliasesFromResponse({}), std::nullopt);
     EXPECT_EQ(thrown([&] { storefront->messagingAliasesFromResponse(response); }),
               "messagingAliasesFromResponse: is not implemented");
+}
+
+// The examples as they are installed, found and loaded from a plug-in directory on disk.
+class ExamplePluginsOnDisk : public testing::Test {
+  protected:
+    ExamplePluginsOnDisk() {
+        root.addDirectory(kPluginDirectory);
+        for (const char* name : {"Vidlink.ncdplugin", "Chatter.ncdplugin", "Storefront.ncdplugin"}) {
+            std::filesystem::copy(std::filesystem::path(EXAMPLE_PLUGINS) / name, locate(name),
+                                  std::filesystem::copy_options::recursive);
+        }
+    }
+
+    std::string locate(const std::string& name) const {
+        return root.locate(std::string(kPluginDirectory) + "/" + name);
+    }
+
+    static Strings identifiers() {
+        Strings found;
+        for (const auto& plugin : WLNimbusDelegatePlugins()) {
+            found.push_back(plugin->delegateIdentifier().value_or("none"));
+        }
+        std::sort(found.begin(), found.end());
+        return found;
+    }
+
+    TemporaryRoot root;
+    local::LocalFileSystem files{local::RootFolder(root.path())};
+    local::LocalPluginBundle bundles{local::RootFolder(root.path())};
+    fakes::FakePlatform fake{files, bundles};
+    const platform::ScopedPlatform installed{fake.platform()};
+};
+
+TEST_F(ExamplePluginsOnDisk, AreLoadedWhetherTheyAreALibraryOrAFolderWithAnInfoFile) {
+    ASSERT_TRUE(std::filesystem::is_directory(locate("Vidlink.ncdplugin")));
+    ASSERT_TRUE(std::filesystem::is_regular_file(locate("Chatter.ncdplugin")));
+    EXPECT_EQ(identifiers(), (Strings{"com.corvid.chatter", "com.corvid.storefront", "com.corvid.vidlink"}));
+    EXPECT_EQ(fake.systemLog.lines(), Strings());
+}
+
+TEST_F(ExamplePluginsOnDisk, TheFolderWithoutItsInfoFileIsSkippedAloneWithOneLine) {
+    std::filesystem::remove(locate("Vidlink.ncdplugin/Info.plist"));
+    EXPECT_EQ(identifiers(), (Strings{"com.corvid.chatter", "com.corvid.storefront"}));
+    EXPECT_EQ(fake.systemLog.lines(),
+              (Strings{"Nimbus Plugins: Failed to get principal class for Vidlink.ncdplugin"}));
+}
+
+TEST_F(ExamplePluginsOnDisk, TheInfoFileNamesTheLibrary) {
+    std::filesystem::rename(locate("Vidlink.ncdplugin/Vidlink.so"), locate("Vidlink.ncdplugin/Other.so"));
+    EXPECT_EQ(scanDelegatePlugins().size(), 3U);
+    EXPECT_EQ(fake.systemLog.lines(),
+              (Strings{"Nimbus Plugins: Failed to get principal class for Vidlink.ncdplugin"}));
+    std::ofstream(locate("Vidlink.ncdplugin/Info.plist")) << "{ Executable = \"Other.so\"; }";
+    EXPECT_EQ(identifiers(), (Strings{"com.corvid.chatter", "com.corvid.storefront", "com.corvid.vidlink"}));
 }
 
 } // namespace
