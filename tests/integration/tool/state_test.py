@@ -19,6 +19,7 @@ from tool_test import PROGRAM, ToolTest
 IS_SUPERUSER = os.geteuid() == 0
 ORDINARY_USER = "nobody"
 RECORD = "Library/Preferences/com.corvid.FirstRun.plist"
+SYNC_SERVICE = "com.corvid.nimbus.service.accountsync"
 
 
 class OrdinaryUserTest(ToolTest):
@@ -46,10 +47,13 @@ class OrdinaryUserTest(ToolTest):
         return plistlib.loads(self.record.read_bytes())
 
     def write_record(self, record, **options):
-        self.record.parent.mkdir(parents=True, exist_ok=True)
-        self.record.write_bytes(record if isinstance(record, bytes) else plistlib.dumps(record, **options))
+        self.write_in_library(self.record, record, **options)
+
+    def write_in_library(self, file, content, **options):
+        file.parent.mkdir(parents=True, exist_ok=True)
+        file.write_bytes(content if isinstance(content, bytes) else plistlib.dumps(content, **options))
         if IS_SUPERUSER:
-            for path in (self.record.parent.parent, self.record.parent, self.record):
+            for path in (file.parent.parent, file.parent, file):
                 os.chown(path, self.user["user"], self.user["group"])
 
 
@@ -247,6 +251,26 @@ class Sync(OrdinaryUserTest):
                          {"offered": False, "reason": "nobody is logged in to a cloud account"})
         self.assertIn("not offered", self.succeeds(self.call("sync", "upsell")))
         self.assertFalse(self.record.exists())
+
+    def test_the_upsell_of_a_user_who_is_logged_in_stores_nothing(self):
+        def case(enabled, locked, record, offered, reason):
+            self.write_in_library(self.home / "Library/Accounts/Accounts.plist", {
+                "LoggedInAccount": "me@nimbus.example",
+                "Accounts": {"me@nimbus.example": {"Services": {SYNC_SERVICE: {"Enabled": enabled}}}}})
+            self.write_in_library(self.record.with_name("com.corvid.screensaver.plist"), {"askForPassword": locked})
+            self.write_record(record)
+            before = self.record.read_bytes()
+            with self.subTest(enabled=enabled, locked=locked, record=record):
+                self.assertEqual(json.loads(self.succeeds(self.call("--json", "sync", "upsell"))),
+                                 {"offered": offered, "reason": reason})
+                self.assertEqual(self.record.read_bytes(), before)
+
+        case(True, True, {}, False, "Sync upsell skipped because sync is already enabled")
+        case(False, False, {}, False, "Sync upsell skipped because screen lock is not enabled")
+        case(False, True, {}, True, None)
+        case(False, True, {"DidSeeSyncSetup": True, "DidSeeSyncSetup2": True}, False, "the user has seen it already")
+        case(False, True, {"DidSeeSyncSetup": True}, True, None)
+        self.assertIn("Keychain Sync Cert Change", self.call("--verbose", "sync", "upsell").stderr)
 
 
 class Switch(OrdinaryUserTest):
