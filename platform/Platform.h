@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "platform/AccountDirectory.h"
 #include "platform/AccountService.h"
 #include "platform/Clock.h"
 #include "platform/CredentialStore.h"
@@ -36,6 +37,7 @@ struct Platform {
     HostReachability& hostReachability;
     NotificationCenter& notificationCenter;
     AccountService& accountService;
+    AccountDirectory& accountDirectory;
     ProcessLauncher& processLauncher;
 };
 

@@ -16,6 +16,20 @@ PropertyList::Dictionary AccountFile::read() {
     return readPreferenceFile(platform::joinPath(_folder(), kFileName)).values;
 }
 
+std::vector<std::string> AccountFile::names() {
+    std::vector<std::string> names;
+    const PropertyList::Dictionary content = read();
+    const auto accounts = content.find(kAccountsKey);
+    if (accounts != content.end() && accounts->second.isDictionary()) {
+        for (const auto& [name, account] : *accounts->second.dictionary()) {
+            if (account.isDictionary()) {
+                names.push_back(name);
+            }
+        }
+    }
+    return names;
+}
+
 bool AccountFile::change(const std::function<bool(PropertyList::Dictionary& content)>& change) {
     const std::string path = _folder();
     const LockedPreferenceFolder folder(path);

@@ -8,8 +8,11 @@
 
 #include <functional>
 #include <string>
+#include <vector>
 
 namespace welcomer::local {
+
+inline constexpr char kAccountsKey[] = "Accounts";
 
 // "Accounts.plist" (0600) in "<home>/Library/Accounts" (0700), an XML property list:
 //     Accounts         a dictionary from account name to account; each account has
@@ -31,6 +34,9 @@ class AccountFile {
 
     // Everything in the file; empty when there is nothing that can be read.
     PropertyList::Dictionary read();
+
+    // The names of the accounts, in order.
+    std::vector<std::string> names();
 
     // Changes the content.
     //  change  is given what is on disk; its result says whether that is to be stored

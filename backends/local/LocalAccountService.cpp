@@ -8,7 +8,6 @@ namespace welcomer::local {
 
 namespace {
 
-constexpr char kAccountsKey[] = "Accounts";
 constexpr char kLoggedInAccountKey[] = "LoggedInAccount";
 constexpr char kSetupFinishedKey[] = "SetupFinished";
 constexpr char kServicesKey[] = "Services";

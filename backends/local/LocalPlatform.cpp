@@ -32,6 +32,7 @@ LocalPlatform::LocalPlatform(const PlatformOptions& options)
                 chosen(options.hostReachability, _hostReachability),
                 _notificationCenter,
                 _accountService,
+                _accountDirectory,
                 _processLauncher} {}
 
 } // namespace welcomer::local

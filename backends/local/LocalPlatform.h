@@ -3,6 +3,7 @@
 #pragma once
 
 #include "backends/Backends.h"
+#include "backends/local/LocalAccountDirectory.h"
 #include "backends/local/LocalAccountService.h"
 #include "backends/local/LocalClock.h"
 #include "backends/local/LocalCredentialStore.h"
@@ -45,6 +46,7 @@ class LocalPlatform final : public PlatformOwner {
     LocalHostReachability _hostReachability;
     LocalNotificationCenter _notificationCenter;
     LocalAccountService _accountService;
+    LocalAccountDirectory _accountDirectory{_root, _processIdentity};
     LocalProcessLauncher _processLauncher;
     const platform::Platform _platform;
 };

@@ -1,11 +1,14 @@
 #include "backends/local/NimbusDirectory.h"
 
+#include "backends/local/Directory.h"
 #include "backends/local/PasswordHash.h"
 #include "backends/local/PreferenceFile.h"
+#include "backends/local/SystemError.h"
 #include "platform/AccountService.h"
-#include "platform/PreferenceStore.h"
 
 #include <algorithm>
+#include <cerrno>
+#include <utility>
 
 namespace welcomer::local {
 
@@ -22,6 +25,21 @@ constexpr char kMailAddressKey[] = "MailAddress";
 constexpr char kServicesKey[] = "Services";
 constexpr char kPropertiesKey[] = "Properties";
 constexpr char kStatusKey[] = "status";
+
+constexpr mode_t kFolderMode = 0755; // the folder is not for the directory alone
+
+platform::Outcome failure(std::string message) {
+    return platform::Outcome::failure({0, std::move(message)});
+}
+
+// Makes the folders above the directory that are missing.
+void makeFolders(const RootFolder& root) {
+    const std::string path = kNimbusDirectoryPath;
+    for (std::size_t slash = path.find('/', 1); slash != std::string::npos;
+         slash = path.find('/', slash + 1)) {
+        makeDirectory(root.locate(path.substr(0, slash)), kFolderMode); // most are there
+    }
+}
 
 NimbusAnswer accountError(std::int64_t error) {
     return {false, {{platform::kSKPropertyAccountError, error}}, 0};
@@ -118,6 +136,55 @@ PropertyList::Dictionary NimbusDirectory::servicesOfNewAccount(const std::string
         setMailAddress(services, *address);
     }
     return services;
+}
+
+std::optional<std::vector<std::string>> NimbusDirectory::userNames() const {
+    const PreferenceFileContent file = readPreferenceFile(_root.locate(kNimbusDirectoryPath));
+    std::vector<std::string> names;
+    const auto users = file.values.find(kUsersKey);
+    const bool isAbsent = users == file.values.end();
+    if (file.state != PreferenceFileContent::State::Whole || (!isAbsent && !users->second.isDictionary())) {
+        return std::nullopt;
+    }
+    if (!isAbsent) {
+        for (const auto& [name, user] : *users->second.dictionary()) {
+            names.push_back(name);
+        }
+    }
+    return names;
+}
+
+platform::Outcome NimbusDirectory::storeUser(const platform::CloudUser& user) const {
+    const std::optional<std::string> hash = makePasswordHash(user.password);
+    if (!hash) {
+        return failure("the system can make no hash of this password");
+    }
+    PropertyList::Dictionary entry{{kPasswordKey, *hash}, {kResponseKey, user.response}};
+    if (user.mailAddress) {
+        entry[kMailAddressKey] = *user.mailAddress;
+    }
+
+    makeFolders(_root);
+    const std::string path = _root.locate(kNimbusDirectoryPath);
+    const std::size_t slash = path.rfind('/');
+    errno = 0;
+    const LockedPreferenceFolder folder(path.substr(0, slash));
+    if (!folder) {
+        return systemOutcome("cannot write to " + path.substr(0, slash), errno != 0 ? errno : EIO);
+    }
+    PreferenceFileContent file = readPreferenceFile(path);
+    if (file.state != PreferenceFileContent::State::Whole) {
+        return failure(path + ": " + file.reason);
+    }
+    PropertyList& users = file.values.emplace(kUsersKey, PropertyList::Dictionary{}).first->second;
+    if (!users.isDictionary()) {
+        return failure(path + ": " + kUsersKey + " is no dictionary");
+    }
+    (*users.dictionary())[user.name] = std::move(entry);
+    errno = 0;
+    return folder.write(path.substr(slash + 1), file.values)
+               ? platform::Outcome::success()
+               : systemOutcome("cannot write " + path, errno != 0 ? errno : EIO);
 }
 
 std::optional<PropertyList::Dictionary> NimbusDirectory::_users() const {

@@ -4,10 +4,12 @@
 #pragma once
 
 #include "backends/local/RootFolder.h"
+#include "platform/AccountDirectory.h"
 #include "propertylist/PropertyList.h"
 
 #include <optional>
 #include <string>
+#include <vector>
 
 namespace welcomer::local {
 
@@ -45,6 +47,15 @@ class NimbusDirectory {
     // The services that an account gets when it is made: all of them for a user that the directory does not
     // know. Any thread.
     PropertyList::Dictionary servicesOfNewAccount(const std::string& username) const;
+
+    // The users' names in order, nobody's where there is no directory; none when it cannot be read or is
+    // damaged. Any thread.
+    std::optional<std::vector<std::string>> userNames() const;
+
+    // Writes a user, in place of all that the directory has about one of that name. A directory that is made
+    // for it is its owner's alone: whoever can read it can try passwords. A damaged one is left as it is. Any
+    // thread and any process.
+    platform::Outcome storeUser(const platform::CloudUser& user) const;
 
   private:
     // What the directory has about a user; none when it cannot be read.

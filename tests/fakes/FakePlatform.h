@@ -5,6 +5,7 @@
 #include "backends/simulated/VirtualTime.h"
 #include "platform/Platform.h"
 #include "tests/fakes/CallRecorder.h"
+#include "tests/fakes/FakeAccountDirectory.h"
 #include "tests/fakes/FakeAccountService.h"
 #include "tests/fakes/FakeCredentialStore.h"
 #include "tests/fakes/FakeFileSystem.h"
@@ -50,6 +51,7 @@ class FakePlatform {
     simulated::VirtualTime virtualTime; // the clock, the run loops and the queues
     FakeNotificationCenter notificationCenter;
     FakeAccountService accountService{recorder, notificationCenter, virtualTime, virtualTime};
+    FakeAccountDirectory accountDirectory{accountService};
     FakeProcessLauncher processLauncher{recorder};
 
     // Borrowed: lives as long as this object.
@@ -61,7 +63,7 @@ class FakePlatform {
     platform::Platform _platform{systemLog,          _files,          processIdentity,   credentialStore,
                                  _plugins,           resourceBundles, virtualTime,       virtualTime,
                                  virtualTime,        preferenceStore, systemVersionInfo, hostReachability,
-                                 notificationCenter, accountService,  processLauncher};
+                                 notificationCenter, accountService,  accountDirectory,  processLauncher};
 };
 
 } // namespace welcomer::fakes

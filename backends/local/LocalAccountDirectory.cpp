@@ -1,0 +1,19 @@
+#include "backends/local/LocalAccountDirectory.h"
+
+#include "backends/local/NimbusDirectory.h"
+
+namespace welcomer::local {
+
+std::vector<std::string> LocalAccountDirectory::accounts() {
+    return _accountFile.names();
+}
+
+std::optional<std::vector<std::string>> LocalAccountDirectory::users() {
+    return NimbusDirectory(_root).userNames();
+}
+
+platform::Outcome LocalAccountDirectory::storeUser(const platform::CloudUser& user) {
+    return NimbusDirectory(_root).storeUser(user);
+}
+
+} // namespace welcomer::local

@@ -1,0 +1,28 @@
+// The accounts in the user's file, and the users in the machine's.
+
+#pragma once
+
+#include "backends/local/AccountFile.h"
+#include "platform/AccountDirectory.h"
+
+namespace welcomer::local {
+
+// AccountFile.h and NimbusDirectory.h say where the files are and what is in them. The file of the users is
+// made for its owner alone: whoever can read it can try passwords.
+class LocalAccountDirectory final : public platform::AccountDirectory {
+  public:
+    // Borrows the identity, which must outlive this.
+    LocalAccountDirectory(const RootFolder& root, platform::ProcessIdentity& identity)
+        : _root(root),
+          _accountFile(root, identity) {}
+
+    std::vector<std::string> accounts() override;
+    std::optional<std::vector<std::string>> users() override;
+    platform::Outcome storeUser(const platform::CloudUser& user) override;
+
+  private:
+    const RootFolder _root;
+    AccountFile _accountFile;
+};
+
+} // namespace welcomer::local

@@ -1,0 +1,41 @@
+// Which cloud accounts there are, and who can sign in to one: for the tool. Setup and the agent ask none of
+// this.
+
+#pragma once
+
+#include "platform/Error.h"
+#include "propertylist/PropertyList.h"
+
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace welcomer::platform {
+
+// Somebody who can sign in.
+struct CloudUser {
+    std::string name;
+    std::string password;
+    std::optional<std::string> mailAddress; // of the mail service in an account that is made for the user
+
+    // What the server answers to the right password: an integer "status", 0 for success, and under
+    // "delegates" a dictionary from delegate identifier to response, with the aliases on offer.
+    PropertyList::Dictionary response;
+};
+
+class AccountDirectory {
+  public:
+    virtual ~AccountDirectory() = default;
+
+    // The names of the current user's accounts, in order. Any thread, as all of these.
+    virtual std::vector<std::string> accounts() = 0;
+
+    // The names of those who can sign in, in order; none when that cannot be known here.
+    virtual std::optional<std::vector<std::string>> users() = 0;
+
+    // Has somebody be able to sign in, in place of whoever had that name. Accounts that exist do not change.
+    //  user  with a name that is not empty
+    virtual Outcome storeUser(const CloudUser& user) = 0;
+};
+
+} // namespace welcomer::platform

@@ -1,0 +1,40 @@
+// Users in memory, and the accounts of the fake account service.
+
+#pragma once
+
+#include "platform/AccountDirectory.h"
+#include "tests/fakes/FakeAccountService.h"
+
+#include <map>
+#include <string>
+
+namespace welcomer::fakes {
+
+class FakeAccountDirectory final : public platform::AccountDirectory {
+  public:
+    explicit FakeAccountDirectory(FakeAccountService& service) : _service(service) {}
+
+    // Who can sign in, by name. Set between the calls.
+    std::map<std::string, platform::CloudUser> cloudUsers;
+
+    std::vector<std::string> accounts() override { return _names(_service.accounts); }
+    std::optional<std::vector<std::string>> users() override { return _names(cloudUsers); }
+    platform::Outcome storeUser(const platform::CloudUser& user) override {
+        cloudUsers.insert_or_assign(user.name, user);
+        return platform::Outcome::success();
+    }
+
+  private:
+    template <typename Map>
+    static std::vector<std::string> _names(const Map& map) {
+        std::vector<std::string> names;
+        for (const auto& entry : map) {
+            names.push_back(entry.first);
+        }
+        return names;
+    }
+
+    FakeAccountService& _service;
+};
+
+} // namespace welcomer::fakes
