@@ -7,6 +7,9 @@ namespace welcomer::tool {
 class CommandLine;
 
 void addTryCommand(CommandLine& commandLine);
+void addSetupCommand(CommandLine& commandLine);
+void addAccountCommands(CommandLine& commandLine);
+void addServicesCommands(CommandLine& commandLine);
 void addReplayCommands(CommandLine& commandLine);
 void addPluginsCommands(CommandLine& commandLine);
 void addStateCommands(CommandLine& commandLine);
@@ -14,7 +17,8 @@ void addSyncCommands(CommandLine& commandLine);
 void addSwitchCommands(CommandLine& commandLine);
 
 // In the order in which --help shows them.
-inline constexpr void (*kCommands[])(CommandLine&) = {addTryCommand,    addReplayCommands, addPluginsCommands,
-                                                      addStateCommands, addSyncCommands,   addSwitchCommands};
+inline constexpr void (*kCommands[])(CommandLine&) = {
+    addTryCommand,      addSetupCommand,  addAccountCommands, addServicesCommands, addReplayCommands,
+    addPluginsCommands, addStateCommands, addSyncCommands,    addSwitchCommands};
 
 } // namespace welcomer::tool

@@ -16,7 +16,8 @@ struct PlatformRequest {
         nullptr;                // takes the records in place of the system log, or null; borrowed
     bool simulatedTime = false; // clock, run loops and queues on simulated time
     platform::HostReachability* hostReachability =
-        nullptr; // in place of the machine's own, or null; borrowed
+        nullptr;                                        // in place of the machine's own, or null; borrowed
+    platform::DispatchQueues* dispatchQueues = nullptr; // the same; not with simulated time
 };
 
 // A platform together with what owns it.

@@ -3,14 +3,12 @@
 #include "plugins/WLNimbusDelegatePlugins.h"
 #include "tools/welcomer/Commands.h"
 #include "tools/welcomer/PropertyListOutput.h"
+#include "tools/welcomer/StandardOutputGuard.h"
 #include "tools/welcomer/TextTable.h"
 #include "tools/welcomer/Tool.h"
 
 #include <CLI/CLI.hpp>
-#include <cstdio>
-#include <fcntl.h>
 #include <ostream>
-#include <unistd.h>
 
 namespace welcomer::tool {
 
@@ -41,27 +39,6 @@ void printAsTable(std::ostream& out, const std::vector<PluginScanEntry>& entries
     }
     table.print(out);
 }
-
-// While it lives, what plug-ins write to the standard output goes to stderr: it is no result of the tool.
-class StandardOutputGuard {
-  public:
-    explicit StandardOutputGuard(std::ostream& out) : _real(fcntl(STDOUT_FILENO, F_DUPFD_CLOEXEC, 3)) {
-        out.flush();
-        dup2(STDERR_FILENO, STDOUT_FILENO);
-    }
-    ~StandardOutputGuard() {
-        std::fflush(stdout);
-        if (_real >= 0) {
-            dup2(_real, STDOUT_FILENO);
-            close(_real);
-        }
-    }
-    StandardOutputGuard(const StandardOutputGuard&) = delete;
-    StandardOutputGuard& operator=(const StandardOutputGuard&) = delete;
-
-  private:
-    const int _real;
-};
 
 std::vector<PluginScanEntry> scan(std::ostream& out) {
     const StandardOutputGuard guard(out);

@@ -20,6 +20,7 @@ tool::PlatformHandle build(const tool::PlatformRequest& request) {
     const auto owned = std::make_shared<OwnedPlatform>();
     PlatformOptions options{.root = request.root, .systemLog = request.systemLog};
     options.hostReachability = request.hostReachability;
+    options.dispatchQueues = request.dispatchQueues;
     if (request.simulatedTime) {
         owned->simulatedTime = std::make_unique<VirtualTime>(VirtualTime::OutstandingWork::OnRealThreads);
         options.clock = owned->simulatedTime.get();

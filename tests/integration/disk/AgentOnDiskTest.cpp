@@ -120,6 +120,7 @@ class AgentOnDiskTest : public testing::Test {
                                        real.hostReachability,
                                        real.notificationCenter,
                                        real.accountService,
+                                       real.accountDirectory,
                                        real.processLauncher};
         const platform::ScopedPlatform scope(mixed);
         const std::array<const char*, 2> arguments{"wlnimbussetup", nullptr};

@@ -69,7 +69,8 @@ class ToolTest(unittest.TestCase):
 
 class CommandLine(ToolTest):
     COMMANDS = [[], ["try"], ["replay"], ["replay", "store"], ["replay", "show"], ["replay", "delete"], ["plugins"],
-                ["plugins", "list"]]
+                ["plugins", "list"], ["setup"], ["account"], ["account", "add"], ["account", "list"], ["account", "status"],
+                ["account", "sign-in"], ["account", "services"], ["services"], ["services", "list"], ["services", "enable"]]
 
     def test_every_command_explains_itself(self):
         for command in self.COMMANDS:

@@ -1,0 +1,578 @@
+#!/usr/bin/env python3
+"""The tool's commands about cloud accounts, their services and setting one up.
+
+Run like tool_test.py beside it.
+"""
+
+import fcntl
+import json
+import os
+import plistlib
+import pty
+import re
+import select
+import shutil
+import signal
+import struct
+import subprocess
+import termios
+import time
+import unittest
+
+from tool_test import BUILD, IDENTIFIERS, LAUNCH_AGENT, OWN_PLUGINS, PLUGIN_FOLDER, PROGRAM, ToolTest
+
+DIRECTORY = "var/lib/welcomer/nimbus-directory.plist"
+SERVICE = "com.corvid.nimbus.service."
+PRE_LOGIN = ["photo-stream", "account-sync", "locator", "documents"]
+POST_LOGIN = ["contacts", "calendars", "bookmarks", "reminders", "mail", "notes"]
+ALL = ["contacts", "calendars", "bookmarks", "photo-stream", "reminders", "account-sync", "locator", "mail", "notes",
+       "documents"]
+ALIASES = ["anna@nimbus.example", "+1 555 0100"]
+PASSWORD = "open sesame"
+
+
+class CloudTest(ToolTest):
+    def setUp(self):
+        super().setUp()
+        self.directory = self.root / DIRECTORY
+
+    def with_password(self, password, *arguments, **options):
+        """The tool below the root, with a password in a descriptor and without a terminal."""
+        reading, writing = os.pipe()
+        os.write(writing, (password + "\nnot the password\n").encode())
+        os.close(writing)
+        try:
+            return self.run_below_root(*arguments, "--password-fd", reading, pass_fds=[reading],
+                                       start_new_session=True, **options)
+        finally:
+            os.close(reading)
+
+    def add(self, user="anna", password=PASSWORD, aliases=ALIASES):
+        options = [option for alias in aliases for option in ("--alias", alias)]
+        self.succeeds(self.with_password(password, "account", "add", user, "--mail", f"{user}@nimbus.example", *options))
+
+    def change_user(self, user="anna", **values):
+        """What an administrator would do with an editor."""
+        directory = plistlib.loads(self.directory.read_bytes())
+        directory["Users"][user].update(values)
+        self.directory.write_bytes(plistlib.dumps(directory))
+
+    def json(self, *arguments):
+        return json.loads(self.succeeds(self.run_below_root("--json", *arguments)))
+
+    def states(self, user="anna"):
+        return {service["service"]: service for service in self.json("account", "services", user)["services"]}
+
+    def enabled(self, user="anna"):
+        return [name for name, service in self.states(user).items() if service["enabled"]]
+
+
+class Account(CloudTest):
+    def test_at_first_nobody_is_there(self):
+        self.assertEqual(self.json("account", "list"), {"accounts": []})
+        self.assertEqual(self.json("account", "status"),
+                         {"loggedIn": None, "enabledServices": [], "noServicesEnabled": True})
+        self.assertIn("Nobody is logged in", self.succeeds(self.run_below_root("account", "status")))
+        self.assertIn("No accounts", self.succeeds(self.run_below_root("account", "list")))
+        self.fails(self.run_below_root("account", "services"), 1, "nobody is logged in")
+        self.assertFalse(self.directory.exists(), "looking makes nothing")
+
+    def test_an_added_user_can_sign_in_and_has_no_account_before(self):
+        self.add()
+        self.assertEqual(self.json("account", "list")["accounts"],
+                         [{"name": "anna", "canSignIn": True, "hasAccount": False, "loggedIn": False}])
+        self.fails(self.run_below_root("account", "services", "anna"), 1, "there is no account anna")
+        self.assertIn("anna is signed in", self.succeeds(self.with_password(PASSWORD, "account", "sign-in", "anna")))
+        self.assertEqual(self.json("account", "list")["accounts"],
+                         [{"name": "anna", "canSignIn": True, "hasAccount": True, "loggedIn": True}])
+        self.assertEqual(self.json("account", "status"),
+                         {"loggedIn": "anna", "enabledServices": [], "noServicesEnabled": True})
+        rows = self.succeeds(self.run_below_root("account", "list")).splitlines()
+        self.assertRegex(rows[1], r"^anna +yes +yes +yes$")
+
+    def test_the_password_is_never_stored_or_shown(self):
+        self.add()
+        result = self.with_password(PASSWORD, "--verbose", "account", "sign-in", "anna")
+        self.assertEqual(result.returncode, 0)
+        self.assertIn("signInWithUsername", result.stderr)
+        self.assertNotIn(PASSWORD, result.stderr + result.stdout)
+        for path in self.root.rglob("*"):
+            if path.is_file():
+                self.assertNotIn(PASSWORD.encode(), path.read_bytes(), path)
+        self.assertEqual(self.directory.stat().st_mode & 0o777, 0o600)
+
+    def test_the_results_in_json(self):
+        self.assertEqual(json.loads(self.succeeds(self.with_password("x", "--json", "account", "add", "bert"))),
+                         {"user": "bert", "added": True})
+        self.assertEqual(json.loads(self.succeeds(self.with_password("x", "--json", "account", "sign-in", "bert"))),
+                         {"account": "bert", "signedIn": True})
+
+    def test_a_user_is_not_added_twice(self):
+        self.add()
+        before = self.directory.read_bytes()
+        self.fails(self.with_password("other", "account", "add", "anna"), 1, "anna exists already")
+        self.assertEqual(self.directory.read_bytes(), before)
+
+    def test_an_empty_name_and_an_empty_password_are_refused(self):
+        self.fails(self.with_password("x", "account", "add", ""), 2, "name is empty")
+        self.fails(self.with_password("x", "account", "sign-in", ""), 2, "name is empty")
+        self.fails(self.with_password("", "account", "add", "anna"), 1, "the password is empty")
+        self.assertFalse(self.directory.exists())
+
+    def test_no_password_on_the_command_line(self):
+        self.add()
+        self.fails(self.run_below_root("account", "sign-in", "anna", PASSWORD), 2, "--help")
+
+    def test_without_a_terminal_and_a_descriptor_it_is_a_usage_error(self):
+        self.fails(self.run_below_root("account", "add", "anna", start_new_session=True), 2,
+                   "no terminal.*--password-fd N")
+        self.fails(self.run_below_root("setup", start_new_session=True), 2, "no terminal.*--answers PLIST")
+
+    def test_a_descriptor_that_is_not_open_or_no_number(self):
+        self.fails(self.run_below_root("account", "add", "anna", "--password-fd", 77), 1,
+                   "--password-fd 77: Bad file descriptor")
+        for number in ("-1", "x"):
+            self.fails(self.run_below_root("account", "add", "anna", "--password-fd", number), 2, "--password-fd")
+
+    def test_only_the_first_line_of_the_descriptor_is_read(self):
+        reading, writing = os.pipe()
+        os.write(writing, b"secret\nrest")
+        os.close(writing)
+        self.succeeds(self.run_below_root("account", "add", "anna", "--password-fd", reading, pass_fds=[reading]))
+        self.assertEqual(os.read(reading, 100), b"rest")
+        os.close(reading)
+
+    def test_a_directory_that_is_damaged_stays_as_it_is_and_is_the_reason(self):
+        self.directory.parent.mkdir(parents=True)
+        self.directory.write_text("<plist><dict><key>torn")
+        self.fails(self.with_password("x", "account", "add", "anna"), 1, "nimbus-directory.plist: ")
+        self.assertEqual(self.directory.read_text(), "<plist><dict><key>torn")
+        self.fails(self.with_password("x", "account", "sign-in", "anna"), 1, "directory of users")
+
+    def test_every_outcome_of_a_sign_in_is_told(self):
+        self.fails(self.with_password("x", "account", "sign-in", "anna"), 1, "directory of users is missing")
+        self.add()
+        self.fails(self.with_password("x", "account", "sign-in", "anna"), 1, "the password is wrong")
+        self.fails(self.with_password("x", "account", "sign-in", "bert"), 1, "there is no such user")
+        for values, reason in (({"AccountError": 3}, r"terms of service are to be accepted first\n"),
+                               ({"AccountError": 3, "AccountErrorInfo": "terms 7"}, r"accepted first \(terms 7\)"),
+                               ({"AccountError": 5, "AccountErrorInfo": {"url": "x"}}, r"repaired first \({url = x}\)"),
+                               ({"AccountError": 42}, "account error 42"),
+                               ({"Fails": True}, "the server gave no reason"),
+                               ({"Response": {"status": 2}}, "a status other than 0")):
+            with self.subTest(values):
+                before = self.directory.read_bytes()
+                self.change_user(**values)
+                self.fails(self.with_password(PASSWORD, "account", "sign-in", "anna"), 1,
+                           r"cannot sign in anna: .*" + reason.replace(r"\n", ""))
+                self.directory.write_bytes(before)
+                self.assertIsNone(self.json("account", "status")["loggedIn"])
+
+    def test_a_failure_with_account_error_0_is_a_success_of_the_check_but_the_sign_in_fails(self):
+        self.add()
+        self.change_user(AccountError=0)
+        self.fails(self.with_password(PASSWORD, "account", "sign-in", "anna"), 1, "could not be completed")
+
+    def test_somebody_else_who_is_logged_in_is_in_the_way(self):
+        self.add()
+        self.add("bert")
+        self.succeeds(self.with_password(PASSWORD, "account", "sign-in", "anna"))
+        self.fails(self.with_password(PASSWORD, "account", "sign-in", "bert"), 1, "anna is logged in")
+        self.succeeds(self.with_password(PASSWORD, "account", "sign-in", "anna"))
+        self.assertEqual(self.json("account", "status")["loggedIn"], "anna")
+
+    def test_the_table_of_services(self):
+        self.add()
+        self.change_user(Services={SERVICE + "mail": {"CanBeEnabled": False}, SERVICE + "locator": {}})
+        self.succeeds(self.with_password(PASSWORD, "account", "sign-in", "anna"))
+        rows = [re.split("  +", row) for row in self.succeeds(self.run_below_root("account", "services")).splitlines()]
+        self.assertEqual(rows[0], ["SERVICE", "PHASE", "PRESENT", "CAN BE ENABLED", "ENABLED"])
+        self.assertEqual([row[0] for row in rows[1:]], ALL)
+        table = {row[0]: row[1:] for row in rows}
+        self.assertEqual(table["mail"], ["post-login", "yes", "no", "no"])
+        self.assertEqual(table["locator"], ["pre-login", "yes", "yes", "no"])
+        self.assertEqual(table["contacts"], ["post-login", "no", "no", "no"])
+
+    def test_the_answer_that_takes_its_time_is_waited_for(self):
+        self.add()
+        self.change_user(DelaySeconds=1)
+        started = time.monotonic()
+        self.succeeds(self.with_password(PASSWORD, "account", "sign-in", "anna"))
+        self.assertGreaterEqual(time.monotonic() - started, 2, "the check and the sign-in")
+
+
+class Services(CloudTest):
+    def test_the_catalogue_with_its_phases(self):
+        services = self.json("services", "list")["services"]
+        self.assertEqual([service["service"] for service in services], ALL)
+        self.assertEqual([service["service"] for service in services if service["phase"] == "pre-login"], PRE_LOGIN)
+        self.assertEqual([service["service"] for service in services if service["delayed"]], ["calendars", "reminders"])
+        self.assertEqual(len({service["identifier"] for service in services}), 10)
+        rows = self.succeeds(self.run_below_root("services", "list")).splitlines()
+        self.assertRegex(rows[2], rf"^calendars +post-login +yes +{SERVICE}calendars$")
+
+    def enable(self, *arguments):
+        return self.json("services", "enable", "--account", "anna", *arguments)
+
+    def test_the_pre_login_phase(self):
+        self.add()
+        document = self.enable("--phase", "pre")
+        self.assertEqual(self.enabled(), PRE_LOGIN)
+        self.assertEqual((document["account"], document["phase"]), ("anna", "pre-login"))
+        self.assertEqual(len(document["log"]), 10)
+        self.assertIn(f"{SERVICE}contacts should be configured post-login", document["log"])
+        self.assertEqual([service["service"] for service in document["services"] if service["enabled"]], PRE_LOGIN)
+
+    def test_the_post_login_phase_waits_for_its_delayed_tasks(self):
+        self.add()
+        started = time.monotonic()
+        document = self.enable("--phase", "post")
+        self.assertGreaterEqual(time.monotonic() - started, 3)
+        self.assertEqual(self.enabled(), POST_LOGIN)
+        self.assertIn(f"Enabling '{SERVICE}calendars' after a 3.00 second delay", document["log"])
+        self.assertEqual(sorted(document["log"][-2:]),
+                         [f"Enabling Nimbus service '{SERVICE}{name}'" for name in ("calendars", "reminders")])
+
+    def test_the_delay_can_be_set(self):
+        self.add()
+        preferences = self.home / "Library/Preferences"
+        preferences.mkdir(parents=True)
+        (preferences / "com.corvid.welcomer.plist").write_bytes(plistlib.dumps({"WLDebugPostLoginDelay": 1}))
+        document = self.enable("--phase", "post", "--select", "calendars")
+        self.assertIn(f"Enabling '{SERVICE}calendars' after a 1.00 second delay", document["log"])
+        self.assertEqual(self.enabled(), ["calendars"])
+
+    def test_what_is_not_selected_is_opted_out_by_name_or_identifier(self):
+        self.add()
+        document = self.enable("--phase", "pre", "--select", "locator", "--select", SERVICE + "documents")
+        self.assertEqual(self.enabled(), ["locator", "documents"])
+        self.assertIn(f"User opted out of {SERVICE}mediastream", document["log"])
+
+    def test_documents_alone_whatever_the_phase_and_the_selection(self):
+        self.add()
+        self.assertEqual(self.enable("--phase", "post", "--only", "kvs", "--select", "mail")["log"], [])
+        self.assertEqual(self.enabled(), ["documents"])
+
+    def test_people_see_the_log_lines_and_the_table(self):
+        self.add()
+        text = self.succeeds(self.run_below_root("services", "enable", "--account", "anna", "--phase", "pre"))
+        self.assertIn("Enabling Nimbus Locator\n", text)
+        self.assertRegex(text, r"\nlocator +pre-login +yes +yes +yes\n")
+
+    def test_what_makes_no_sense(self):
+        for arguments in (["--phase", "mid"], [], ["--phase", "pre", "--only", "mail"],
+                          ["--phase", "pre", "--select", "nonsense"], ["--phase", "pre", "--select"]):
+            with self.subTest(arguments):
+                self.fails(self.run_below_root("services", "enable", "--account", "anna", *arguments), 2, "--help")
+        self.fails(self.run_below_root("services", "enable", "--phase", "pre"), 2, "--account")
+
+    def test_an_account_that_cannot_be_had_is_a_failure(self):
+        self.fails(self.run_below_root("services", "enable", "--account", "", "--phase", "pre"), 1,
+                   "Failed to retrieve SK_Account")
+
+    def test_interrupted_while_waiting_it_ends(self):
+        self.add()
+        process = subprocess.Popen([PROGRAM, "--root", self.root, "--verbose", "services", "enable", "--account", "anna",
+                                    "--phase", "post"], stdout=subprocess.DEVNULL, stderr=subprocess.PIPE, text=True)
+        for line in process.stderr:
+            if "Documents" in line or "documents" in line:
+                break
+        process.send_signal(signal.SIGINT)
+        self.assertEqual(process.wait(timeout=30), -signal.SIGINT)
+        process.stderr.close()
+        self.assertNotIn("calendars", self.enabled())
+
+
+class SetupTest(CloudTest):
+    def setUp(self):
+        super().setUp()
+        plugins = self.root / PLUGIN_FOLDER
+        plugins.mkdir(parents=True)
+        for plugin in (BUILD / "plugins").glob("*.ncdplugin"):
+            (shutil.copytree if plugin.is_dir() else shutil.copy)(plugin, plugins / plugin.name)
+        self.plugins = plugins
+        self.bundle = self.root / "usr/share/welcomer/setup-bundle"
+        shutil.copytree(BUILD / "setup-bundle", self.bundle)
+        self.launch_agent = self.home / "Library/LaunchAgents" / LAUNCH_AGENT
+        self.add()
+
+    def replay(self):
+        return self.json("replay", "show")
+
+
+class SetupAnswers(SetupTest):
+    def set_up(self, answers, *more, password=PASSWORD):
+        file = self.folder / "answers.plist"
+        file.write_bytes(answers if isinstance(answers, bytes) else plistlib.dumps(answers))
+        return self.with_password(password, "setup", "--answers", file, *more)
+
+    def nothing_was_set_up(self):
+        self.assertFalse(self.launch_agent.exists())
+        self.fails(self.run_below_root("replay", "show"), 1, "no such item")
+
+    def test_with_the_account_alone_everything_is_taken(self):
+        document = json.loads(self.succeeds(self.set_up({"Account": "anna"}, "--json")))
+        self.assertEqual(document["account"], "anna")
+        self.assertEqual(document["aliases"], {"com.corvid.chatter": ALIASES, "com.corvid.vidlink": ALIASES})
+        self.assertEqual(document["atNextLogin"], {"services": [SERVICE + name for name in POST_LOGIN],
+                                                   "delegates": IDENTIFIERS})
+        self.assertEqual(document["launchAgent"] + ".plist", LAUNCH_AGENT)
+        self.assertEqual(self.enabled(), PRE_LOGIN)
+        self.assertEqual(self.json("account", "status")["loggedIn"], "anna")
+        self.assertTrue(self.launch_agent.exists())
+        item = self.replay()
+        self.assertEqual(item["account"], "anna")
+        self.assertEqual((item["replay"]["vlAliases"], item["replay"]["imAliases"]), (ALIASES, ALIASES))
+        self.assertEqual(set(item["replay"]["delegatesResponseDict"]["delegates"]),
+                         {*IDENTIFIERS, "com.corvid.reader"})
+        accounts = plistlib.loads((self.home / "Library/Accounts/Accounts.plist").read_bytes())
+        self.assertIs(accounts["SetupFinished"], True)
+
+    def test_people_are_told_what_will_happen(self):
+        text = self.succeeds(self.set_up({"Account": "anna"}))
+        self.assertIn("anna is set up.", text)
+        self.assertRegex(text, r"  locator +pre-login +yes +yes +yes\n")
+        self.assertIn("turns on contacts, calendars, bookmarks, reminders, mail, notes,\n", text)
+        self.assertIn("finish: com.corvid.chatter, com.corvid.storefront, com.corvid.vidlink,\n", text)
+
+    def test_chosen_services_and_aliases(self):
+        self.succeeds(self.set_up({"Account": "anna", "Services": ["locator", SERVICE + "documents"],
+                                   "Aliases": {"com.corvid.vidlink": ALIASES[1:], "com.corvid.chatter": []}}))
+        self.assertEqual(self.enabled(), ["locator", "documents"])
+        replay = self.replay()["replay"]
+        self.assertEqual((replay["vlAliases"], replay["imAliases"]), (ALIASES[1:], []))
+
+    def test_just_the_account_and_its_documents(self):
+        self.succeeds(self.set_up({"Account": "anna", "JustTheAccountAndKVS": True, "Services": []}))
+        self.assertEqual(self.enabled(), ["documents"])
+
+    def test_the_answers_may_have_any_format(self):
+        self.succeeds(self.set_up(b"{ Account = anna; Services = (locator); }"))
+        self.assertEqual(self.enabled(), ["locator"])
+
+    def test_answers_that_make_no_sense_are_refused_before_the_sign_in(self):
+        for answers, reason in ((["anna"], "no dictionary"), ({}, "Account"), ({"Account": 1}, "Account"),
+                                ({"Account": "anna", "Colour": "red"}, "no question is called Colour"),
+                                ({"Account": "anna", "Services": "mail"}, "Services"),
+                                ({"Account": "anna", "Services": [1]}, "Services"),
+                                ({"Account": "anna", "Services": ["nonsense"]}, "there is no service nonsense"),
+                                ({"Account": "anna", "JustTheAccountAndKVS": "maybe"}, "JustTheAccountAndKVS"),
+                                ({"Account": "anna", "Aliases": []}, "Aliases")):
+            with self.subTest(answers):
+                self.fails(self.set_up(answers), 1, "answers.plist: .*" + reason)
+                self.assertIsNone(self.json("account", "status")["loggedIn"])
+        self.nothing_was_set_up()
+
+    def test_aliases_that_are_not_on_offer_are_refused_before_anything_is_set_up(self):
+        for aliases in ({"com.corvid.vidlink": ["other"]}, {"com.corvid.storefront": ["x"]},
+                        {"com.corvid.chatter": "text"}):
+            with self.subTest(aliases):
+                self.fails(self.set_up({"Account": "anna", "Aliases": aliases}), 1, "answers.plist: ")
+                self.assertIsNone(self.json("account", "status")["loggedIn"])
+        self.nothing_was_set_up()
+
+    def test_a_wrong_password_sets_nothing_up(self):
+        self.fails(self.set_up({"Account": "anna"}, password="wrong"), 1, "the password is wrong")
+        self.nothing_was_set_up()
+
+    def test_what_is_in_the_way_is_told_before_the_sign_in(self):
+        self.launch_agent.parent.mkdir(parents=True)
+        self.launch_agent.write_text("mine")
+        self.fails(self.set_up({"Account": "anna"}), 1, "the agent is installed already")
+        self.launch_agent.unlink()
+        self.succeeds(self.set_up({"Account": "anna"}))
+        self.launch_agent.unlink()
+        self.fails(self.set_up({"Account": "anna"}), 1, "a replay item is waiting")
+        self.succeeds(self.run_below_root("replay", "delete"))
+        self.add("bert")
+        self.fails(self.set_up({"Account": "bert"}), 1, "anna is logged in")
+        self.nothing_was_set_up()
+
+    def test_for_somebody_who_is_logged_in_already_no_sign_in_is_made_again(self):
+        self.succeeds(self.with_password(PASSWORD, "account", "sign-in", "anna"))
+        result = self.set_up({"Account": "anna"}, "--verbose")
+        self.assertEqual(result.returncode, 0)
+        self.assertEqual(result.stderr.count("_validateOK"), 1, "the check alone")
+        self.assertEqual(self.enabled(), PRE_LOGIN)
+
+    def test_a_bundle_that_is_not_there_is_told_before_the_sign_in(self):
+        shutil.rmtree(self.bundle)
+        self.fails(self.set_up({"Account": "anna"}), 1, "no setup application at /usr/share/welcomer/setup-bundle below ")
+        self.assertIsNone(self.json("account", "status")["loggedIn"])
+        shutil.copytree(BUILD / "setup-bundle", self.root / "elsewhere")
+        self.succeeds(self.set_up({"Account": "anna"}, "--bundle", "/elsewhere"))
+
+    def test_without_plugins_there_are_no_aliases(self):
+        shutil.rmtree(self.plugins)
+        document = json.loads(self.succeeds(self.set_up({"Account": "anna"}, "--json")))
+        self.assertEqual((document["aliases"], document["atNextLogin"]["delegates"]), ({}, []))
+        self.assertNotIn("vlAliases", self.replay()["replay"])
+
+    def test_a_plugin_that_writes_to_stdout_does_not_spoil_the_document(self):
+        shutil.copy(OWN_PLUGINS / "TalkingPlugin.ncdplugin", self.plugins)
+        result = self.set_up({"Account": "anna"}, "--json")
+        self.assertEqual(json.loads(result.stdout)["account"], "anna")
+        self.assertIn("hello", result.stderr)
+
+
+class SetupAtTerminal(SetupTest):
+    """A person, on a terminal of 100 columns."""
+
+    def start(self, *arguments, stdout=None):
+        self.process, self.terminal = pty.fork()
+        if self.process == 0:
+            fcntl.ioctl(1, termios.TIOCSWINSZ, struct.pack("HHHH", 40, 100, 0, 0))
+            if stdout:
+                os.dup2(os.open(stdout, os.O_WRONLY | os.O_CREAT), 1)
+            os.execv(PROGRAM, [str(PROGRAM), "--root", str(self.root), *arguments])
+        self.addCleanup(os.close, self.terminal)
+        self.seen = ""
+
+    def expect(self, pattern, timeout=60):
+        """Reads until the pattern has come; forgets what was before its end."""
+        end = time.monotonic() + timeout
+        while not (match := re.search(pattern, self.seen)):
+            ready, _, _ = select.select([self.terminal], [], [], max(0, end - time.monotonic()))
+            self.assertTrue(ready, f"{pattern} did not come: {self.seen}")
+            try:
+                self.seen += os.read(self.terminal, 65536).decode()
+            except OSError:
+                self.fail(f"{pattern} did not come: {self.seen}")
+        before, self.seen = self.seen[:match.end()], self.seen[match.end():]
+        return before
+
+    def answer(self, pattern, text):
+        before = self.expect(pattern)
+        os.write(self.terminal, (text + "\n").encode())
+        return before
+
+    def answer_password(self, pattern, text):
+        """Waits for the terminal to be without echo, and checks that the text is not shown."""
+        before = self.expect(pattern)
+        self.assertFalse(termios.tcgetattr(self.terminal)[3] & termios.ECHO)
+        os.write(self.terminal, (text + "\n").encode())
+        return before
+
+    def end(self):
+        """The rest of what is shown, and the exit status."""
+        rest = self.seen
+        while True:
+            try:
+                part = os.read(self.terminal, 65536).decode()
+            except OSError:
+                break
+            if not part:
+                break
+            rest += part
+        _, status = os.waitpid(self.process, 0)
+        return rest, status
+
+    def test_a_person_sets_up_an_account(self):
+        self.start("setup")
+        self.answer("account's name: ", "  anna ")
+        self.answer_password("Password for anna: ", "wrong")
+        self.assertNotIn("wrong\r\n", self.expect("password is wrong. Please try again"))
+        self.answer_password("Password for anna: ", PASSWORD)
+        shown = self.answer(r"video calling\?[^$]*none \[all\]: ", "2")
+        self.assertNotIn(PASSWORD, shown)
+        self.assertIn("  1  anna@nimbus.example\r\n  2  +1 555 0100\r\n", shown)
+        self.answer(r"messaging\?[^$]*none \[all\]: ", "7")
+        self.answer(r"numbers from 1 to 2, all or none.[^$]*none \[all\]: ", "")
+        shown = self.answer(r"turned on now:[^$]*none \[all\]: ", "1, 3")
+        self.assertIn("  1  photo-stream\r\n  2  account-sync\r\n  3  locator\r\n  4  documents\r\n", shown)
+        shown = self.answer(r"Set up this account\? \[Y/n\] ", "y")
+        self.assertIn("Services now:   photo-stream, locator\r\n", shown)
+        self.assertIn("+1 555 0100 (com.corvid.vidlink)", shown)
+        rest, status = self.end()
+        self.assertEqual(status, 0, rest)
+        self.assertIn("anna is set up.", rest)
+        self.assertIn("At the next login the agent starts, once.", rest)
+        self.assertEqual(self.enabled(), ["photo-stream", "locator"])
+        replay = self.replay()["replay"]
+        self.assertEqual((replay["vlAliases"], replay["imAliases"]), (ALIASES[1:], ALIASES))
+        self.assertTrue(self.launch_agent.exists())
+
+    def test_saying_no_sets_nothing_up(self):
+        self.start("setup")
+        self.answer("account's name: ", "anna")
+        self.answer_password("Password for anna: ", PASSWORD)
+        for _ in range(3):
+            self.answer(r"none \[all\]: ", "none")
+        self.answer(r"\[Y/n\] ", "perhaps")
+        self.answer(r"\[Y/n\] ", "n")
+        rest, status = self.end()
+        self.assertEqual(os.waitstatus_to_exitcode(status), 1)
+        self.assertIn("welcomer: nothing was set up", rest)
+        self.assertIsNone(self.json("account", "status")["loggedIn"])
+        self.assertFalse(self.launch_agent.exists())
+
+    def test_three_wrong_passwords_end_it(self):
+        self.start("setup")
+        self.answer("account's name: ", "anna")
+        for _ in range(3):
+            self.answer_password("Password for anna: ", "wrong")
+        rest, status = self.end()
+        self.assertEqual(os.waitstatus_to_exitcode(status), 1)
+        self.assertIn("welcomer: cannot sign in anna: the password is wrong", rest)
+
+    def test_the_end_of_the_input_ends_it(self):
+        self.start("setup")
+        self.expect("account's name: ")
+        os.write(self.terminal, b"\x04")
+        rest, status = self.end()
+        self.assertEqual(os.waitstatus_to_exitcode(status), 1)
+        self.assertIn("the input has ended", rest)
+
+    def test_control_c_at_the_password_ends_it_with_the_echo_back(self):
+        self.start("setup")
+        self.answer("account's name: ", "anna")
+        self.expect("Password for anna: ")
+        self.assertFalse(termios.tcgetattr(self.terminal)[3] & termios.ECHO)
+        os.write(self.terminal, b"\x03")
+        deadline = time.monotonic() + 30
+        while not termios.tcgetattr(self.terminal)[3] & termios.ECHO:
+            self.assertLess(time.monotonic(), deadline)
+            time.sleep(0.01)
+        _, status = self.end()
+        self.assertEqual(os.waitstatus_to_exitcode(status), -signal.SIGINT)
+
+    def test_a_slow_answer_is_shown_as_waiting(self):
+        self.change_user(DelaySeconds=2)
+        self.start("setup")
+        self.answer("account's name: ", "anna")
+        self.answer_password("Password for anna: ", PASSWORD)
+        self.expect(r"Signing in \.\.\. 1 s")
+        self.answer(r"none \[all\]: ", "")
+        self.assertNotIn("Signing in", self.seen)
+        os.write(self.terminal, b"\x03")
+        self.end()
+
+    def test_the_document_is_on_stdout_alone(self):
+        file = self.folder / "result.json"
+        self.start("--json", "setup", stdout=file)
+        self.answer("account's name: ", "anna")
+        self.answer_password("Password for anna: ", PASSWORD)
+        for _ in range(3):
+            self.answer(r"none \[all\]: ", "")
+        self.answer(r"\[Y/n\] ", "")
+        rest, status = self.end()
+        self.assertEqual(status, 0, rest)
+        self.assertEqual(json.loads(file.read_text())["account"], "anna")
+
+    def test_a_new_users_password_is_asked_for_twice(self):
+        self.start("account", "add", "bert")
+        self.answer_password("New password for bert: ", "one")
+        self.answer_password("Once more: ", "two")
+        rest, status = self.end()
+        self.assertEqual(os.waitstatus_to_exitcode(status), 1)
+        self.assertIn("the two passwords differ", rest)
+        self.start("account", "add", "bert")
+        self.answer_password("New password for bert: ", "one")
+        self.answer_password("Once more: ", "one")
+        rest, status = self.end()
+        self.assertEqual(status, 0, rest)
+        self.succeeds(self.with_password("one", "account", "sign-in", "bert"))
+
+
+if __name__ == "__main__":
+    unittest.main()

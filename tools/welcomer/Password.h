@@ -1,0 +1,28 @@
+// Passwords: from the terminal without echo or from a descriptor, never from the command line.
+
+#pragma once
+
+#include <optional>
+#include <string>
+
+namespace CLI {
+class App;
+}
+
+namespace welcomer::tool {
+
+// Where a command's password comes from: a descriptor, or the terminal.
+using PasswordSource = std::optional<int>;
+
+// Gives a command the option --password-fd.
+void addPasswordOption(CLI::App& command, PasswordSource& source);
+
+// Gets the password: the descriptor's first line, or what is typed. Nothing beyond the line is read.
+//  question  for the terminal
+// Throws CommandFailure when there is none, and UsageError where there is neither descriptor nor terminal.
+std::string getPassword(const PasswordSource& source, const std::string& question);
+
+// The same for a new password: not empty, and typed twice.
+std::string getNewPassword(const PasswordSource& source, const std::string& question);
+
+} // namespace welcomer::tool

@@ -1,0 +1,95 @@
+// What a setup application does with the module, one step after the other.
+
+#pragma once
+
+#include "cloud/NimbusTesselDelegate.h"
+#include "platform/ResourceBundle.h"
+#include "tools/welcomer/Tool.h"
+
+#include <iosfwd>
+#include <map>
+#include <string>
+#include <vector>
+
+namespace welcomer::tool {
+
+// Where the setup application's bundle is installed, below the root.
+inline constexpr const char* kSetupBundlePath = "/usr/share/welcomer/setup-bundle";
+
+// The account service did not accept the user name and the password.
+class SignInFailure : public CommandFailure {
+  public:
+    SignInFailure(const std::string& reason, bool isWrongPassword)
+        : CommandFailure(reason),
+          _isWrongPassword(isWrongPassword) {}
+
+    // Whether another password may help.
+    bool isWrongPassword() const { return _isWrongPassword; }
+
+  private:
+    bool _isWrongPassword;
+};
+
+// The aliases that the server offers one of the messaging delegates.
+struct AliasOffer {
+    const char* identifier; // the delegate's
+    const char* purpose;    // "video calling"
+    const char* replayKey;  // where the replay object keeps the chosen ones
+    std::vector<std::string> aliases;
+};
+
+// The chosen aliases by delegate identifier.
+using ChosenAliases = std::map<std::string, std::vector<std::string>>;
+
+// The steps, to be called in their order; each throws CommandFailure with the reason. One thread, which has a
+// run loop; the installed platform is used.
+class SetupFlow {
+  public:
+    //  log           where the reasons of failures are read; borrowed
+    //  out           the tool's results, which plug-ins are kept away from; borrowed
+    //  showsWaiting  whether a terminal is shown what is waited for
+    SetupFlow(const KeptLog& log, std::ostream& out, bool showsWaiting)
+        : _log(log),
+          _out(out),
+          _showsWaiting(showsWaiting) {}
+
+    // Refuses to begin while somebody else is logged in to a cloud account: completing the setup would take
+    // the one for the other.
+    static void checkWhoIsLoggedIn(const std::string& account);
+
+    // Refuses to begin where a hand-over is waiting already.
+    static void checkNothingIsWaiting();
+
+    // Has the server check the password and ask each delegate. Throws SignInFailure. May be called again
+    // after that.
+    void signIn(const std::string& account, const std::string& password);
+
+    // What there is to choose from, by delegate in a fixed order; delegates without a plug-in or a response
+    // are left out.
+    std::vector<AliasOffer> aliasOffers();
+
+    // The identifiers of the delegates that have a plug-in and a response, in order.
+    std::vector<std::string> delegates();
+
+    // Signs in for good, unless that is so already, and enables the selected pre-login services.
+    //  services              their identifiers
+    //  justTheAccountAndKVS  documents and data alone
+    void complete(const std::vector<std::string>& services, bool justTheAccountAndKVS);
+
+    // Stores the replay item, installs the agent for the next login, and tells the account service that setup
+    // has finished.
+    void handOver(const ChosenAliases& aliases, platform::ResourceBundle& bundle);
+
+  private:
+    SignInFailure _signInFailure() const;
+    const PropertyList* _response(const std::string& delegate) const;
+
+    const KeptLog& _log;
+    std::ostream& _out;
+    const bool _showsWaiting;
+    std::string _account;
+    std::string _password;
+    std::unique_ptr<NimbusTesselDelegate> _delegate;
+};
+
+} // namespace welcomer::tool
