@@ -69,10 +69,11 @@ class Descriptor {
 struct RecordHeader {
     std::int64_t nanoseconds;
     std::uint64_t length;
+    std::uint64_t isTold; // not a log record
 };
 
-// The agent's system log in the child: the other end of the pipe.
-class PipeLog final : public platform::SystemLog {
+// The child's system log, and what else it tells: the other end of the pipe.
+class PipeLog final : public KeptLog {
   public:
     explicit PipeLog(int descriptor) : _descriptor(descriptor) {}
 
@@ -81,15 +82,22 @@ class PipeLog final : public platform::SystemLog {
         _start = clock.now();
     }
 
-    void write(int, const std::string& message) override {
-        const std::chrono::nanoseconds time = _clock ? _clock->now() - _start : std::chrono::nanoseconds(0);
-        const RecordHeader header{time.count(), message.size()};
-        const std::lock_guard lock(_mutex);
-        _write({reinterpret_cast<const char*>(&header), sizeof header});
-        _write(message);
+    void write(int priority, const std::string& message) override {
+        KeptLog::write(priority, message);
+        _send(message, false);
     }
 
+    void tell(const std::string& text) { _send(text, true); }
+
   private:
+    void _send(const std::string& text, bool isTold) {
+        const std::chrono::nanoseconds time = _clock ? _clock->now() - _start : std::chrono::nanoseconds(0);
+        const RecordHeader header{time.count(), text.size(), isTold ? 1U : 0U};
+        const std::lock_guard lock(_mutex);
+        _write({reinterpret_cast<const char*>(&header), sizeof header});
+        _write(text);
+    }
+
     void _write(std::string_view bytes) {
         while (!bytes.empty()) {
             const ssize_t count = ::write(_descriptor, bytes.data(), bytes.size());
@@ -139,8 +147,12 @@ class RecordReader {
             if (_bytes.size() - used - sizeof header < header.length) {
                 break;
             }
-            _listener.record({std::chrono::nanoseconds(header.nanoseconds),
-                              _bytes.substr(used + sizeof header, header.length)});
+            const std::string text = _bytes.substr(used + sizeof header, header.length);
+            if (header.isTold == 0) {
+                _listener.record({std::chrono::nanoseconds(header.nanoseconds), text});
+            } else if (_listener.told) {
+                _listener.told(text);
+            }
             used += sizeof header + header.length;
         }
         _bytes.erase(0, used);
@@ -152,9 +164,9 @@ class RecordReader {
 };
 
 // The child's whole life.
-[[noreturn]] void beAgent(const PlatformFactory& buildPlatform, const std::string& root, bool simulatedTime,
-                          pid_t parent, int logDescriptor) {
-    // Should the tool be killed, its agent goes with it.
+[[noreturn]] void beChild(const PlatformFactory& buildPlatform, const std::string& root, bool simulatedTime,
+                          pid_t parent, int logDescriptor, const ChildLife& life) {
+    // Should the tool be killed, its child goes with it.
     prctl(PR_SET_PDEATHSIG, SIGKILL);
     if (getppid() != parent) {
         _exit(1);
@@ -164,8 +176,12 @@ class RecordReader {
     const PlatformHandle platform = buildPlatform({root, &log, simulatedTime});
     log.setClock(platform->clock);
     const platform::ScopedPlatform installed(*platform);
+    leaveProcess(life(log, [&log](const std::string& text) { log.tell(text); }));
+}
+
+int beAgent(const KeptLog& /*log*/, const std::function<void(const std::string&)>& /*tell*/) {
     const char* const arguments[] = {"wlnimbussetup", nullptr};
-    leaveProcess(wlnimbussetup(1, arguments));
+    return wlnimbussetup(1, arguments);
 }
 
 // Takes the child away if it is still there when this ends.
@@ -224,6 +240,11 @@ std::string AgentEnd::description() const {
 
 AgentEnd runAgentProcess(const PlatformFactory& buildPlatform, const std::string& root, bool simulatedTime,
                          InterruptionGuard& guard, const AgentListener& listener) {
+    return runChildProcess(buildPlatform, root, simulatedTime, guard, listener, beAgent);
+}
+
+AgentEnd runChildProcess(const PlatformFactory& buildPlatform, const std::string& root, bool simulatedTime,
+                         InterruptionGuard& guard, const AgentListener& listener, const ChildLife& life) {
     int ends[2];
     if (pipe2(ends, O_CLOEXEC) != 0) {
         failed("cannot make a pipe");
@@ -236,11 +257,11 @@ AgentEnd runAgentProcess(const PlatformFactory& buildPlatform, const std::string
     const pid_t parent = getpid();
     const pid_t id = fork();
     if (id < 0) {
-        failed("cannot make a process for the agent");
+        failed("cannot make a process");
     }
     if (id == 0) {
         guard.release();
-        beAgent(buildPlatform, root, simulatedTime, parent, input.number());
+        beChild(buildPlatform, root, simulatedTime, parent, input.number(), life);
     }
     Child child(id);
     input.close();
@@ -248,7 +269,7 @@ AgentEnd runAgentProcess(const PlatformFactory& buildPlatform, const std::string
     // The call itself: its header gives it the wrong linkage in C++.
     const Descriptor process(static_cast<int>(syscall(SYS_pidfd_open, id, 0)));
     if (process.number() < 0) {
-        failed("cannot watch the agent's process");
+        failed("cannot watch the process");
     }
 
     RecordReader reader(output.number(), listener);

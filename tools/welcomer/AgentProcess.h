@@ -1,8 +1,8 @@
-// Runs the agent's own code in a child process, as a login would, and listens to its log.
+// Runs the system's own code in a child process, as a setup or a login would, and listens to its log.
 
 #pragma once
 
-#include "platform/SystemLog.h"
+#include "tools/welcomer/KeptLog.h"
 #include "tools/welcomer/PlatformFactory.h"
 
 #include <chrono>
@@ -31,17 +31,24 @@ class InterruptionGuard {
     int _descriptor = -1;
 };
 
-// One record of the agent's log.
+// One record of the child's log.
 struct AgentLogRecord {
-    std::chrono::nanoseconds time; // since the agent's start, on the agent's own clock
+    std::chrono::nanoseconds time; // since the child's start, on the child's own clock
     std::string message;
 };
 
-// Who listens to the agent. Called on the thread that runs it.
+// Who listens to the child. Called on the thread that runs it.
 struct AgentListener {
     std::function<void(const AgentLogRecord&)> record;
-    std::function<void()> tick; // about every 200 ms while the agent runs, or null
+    std::function<void()> tick;                   // about every 200 ms while the child runs, or null
+    std::function<void(const std::string&)> told; // what the child tells besides its log, or null
 };
+
+// What a child process does, with its platform installed; its result is the exit status. It must not throw.
+//  log   the child's own system log so far
+//  tell  hands a text to the parent
+using ChildLife =
+    std::function<int(const KeptLog& log, const std::function<void(const std::string& text)>& tell)>;
 
 // How the child process ended.
 struct AgentEnd {
@@ -55,10 +62,14 @@ struct AgentEnd {
 // Thrown when a signal came: the child is gone, and the caller's guard passes the signal on.
 class Interrupted {};
 
-// Runs an agent as a child process and waits for its end. The child's standard output goes to stderr.
-//  root           the folder below which the agent looks up everything
-//  simulatedTime  whether the agent runs on simulated time
+// Runs a child process and waits for its end. The child's standard output goes to stderr.
+//  root           the folder below which the child looks up everything
+//  simulatedTime  whether the child runs on simulated time
 // Main thread, no other thread running. Throws CommandFailure when no process can be made, and Interrupted.
+AgentEnd runChildProcess(const PlatformFactory& buildPlatform, const std::string& root, bool simulatedTime,
+                         InterruptionGuard& guard, const AgentListener& listener, const ChildLife& life);
+
+// The same, with the agent as it is at a login.
 AgentEnd runAgentProcess(const PlatformFactory& buildPlatform, const std::string& root, bool simulatedTime,
                          InterruptionGuard& guard, const AgentListener& listener);
 

@@ -196,7 +196,8 @@ std::vector<std::string> chooseServices(Terminal& terminal) {
     std::ranges::transform(offered, std::back_inserter(names), &CatalogueEntry::name);
     terminal.say("");
     std::vector<std::string> chosen;
-    for (const std::size_t index : terminal.choose("Services that can be turned on now:", names)) {
+    for (const std::size_t index : terminal.choose(
+             "Services that can be turned on now (the others come with the next login):", names)) {
         chosen.push_back(offered[index].identifier);
     }
     for (const CatalogueEntry& entry : catalogueOf(true)) {

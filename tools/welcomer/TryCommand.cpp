@@ -1,8 +1,9 @@
-// welcomer try: the whole story, from the end of the setup to the end of the second login, in a fresh folder.
+// welcomer try: the whole story, from the setup to the end of the second login, in a fresh folder.
 
+#include "cloud/WLNimbusServiceCatalogue.h"
 #include "handoff/LaunchAgentFile.h"
 #include "handoff/ReplayItem.h"
-#include "handoff/WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup.h"
+#include "plugins/DelegateIdentifiers.h"
 #include "plugins/WLNimbusDelegatePlugins.h"
 #include "tools/welcomer/AgentProcess.h"
 #include "tools/welcomer/Commands.h"
@@ -12,7 +13,8 @@
 #include "tools/welcomer/Printable.h"
 #include "tools/welcomer/ProgressLine.h"
 #include "tools/welcomer/PropertyListOutput.h"
-#include "tools/welcomer/ReplayReason.h"
+#include "tools/welcomer/ServiceStates.h"
+#include "tools/welcomer/SetupFlow.h"
 #include "tools/welcomer/TemporaryFolder.h"
 #include "tools/welcomer/TextTable.h"
 #include "tools/welcomer/Tool.h"
@@ -20,8 +22,10 @@
 #include <CLI/CLI.hpp>
 #include <filesystem>
 #include <iomanip>
+#include <iostream>
 #include <optional>
 #include <ostream>
+#include <random>
 #include <sstream>
 #include <utility>
 
@@ -32,25 +36,52 @@ namespace {
 namespace fs = std::filesystem;
 
 constexpr const char* kAccountName = "user@nimbus.example";
-constexpr const char* kBundlePath = "/usr/share/welcomer/setup-bundle";
 constexpr const char* kLingerLine = "delaying exit by two minutes";
 constexpr std::chrono::seconds kLinger{120};
 
-// What the setup application would have gathered: the server's cached responses and the chosen aliases.
-PropertyList exampleReplayObject() {
+// A new user of the story's own, with what the server answers.
+platform::CloudUser exampleUser() {
     // The example plug-ins take as long as the response says, so that one sees them work beside one another.
     const auto response = [](double delaySeconds) {
         return PropertyList::Dictionary{{"status", 0}, {"delaySeconds", delaySeconds}};
     };
-    return PropertyList::Dictionary{
-        {kReplayResponsesKey, PropertyList::Dictionary{{kReplayDelegatesKey,
-                                                        PropertyList::Dictionary{
-                                                            {"com.corvid.vidlink", response(0.8)},
-                                                            {"com.corvid.chatter", response(0.5)},
-                                                            {"com.corvid.storefront", response(1.0)},
-                                                        }}}},
-        {kReplayVidlinkAliasesKey, PropertyList::Array{kAccountName, "+1 555 0100"}},
-        {kReplayChatterAliasesKey, PropertyList::Array{kAccountName}},
+    PropertyList::Dictionary vidlink = response(0.8);
+    PropertyList::Dictionary chatter = response(0.5);
+    vidlink["aliases"] = PropertyList::Array{kAccountName, "+1 555 0100"};
+    chatter["aliases"] = PropertyList::Array{kAccountName};
+    std::random_device random;
+    std::ostringstream password;
+    password << std::hex << random() << random();
+    return {kAccountName,
+            password.str(),
+            kAccountName,
+            {{"status", 0},
+             {kReplayDelegatesKey, PropertyList::Dictionary{{kVidlinkIdentifier, vidlink},
+                                                            {kChatterIdentifier, chatter},
+                                                            {kStorefrontIdentifier, response(1.0)}}}}};
+}
+
+// The setup application's whole life, in a process of its own. Tells a document with the chosen aliases, or
+// with the reason for which it failed.
+ChildLife setupLife(const std::string& password) {
+    return [password](const KeptLog& log, const std::function<void(const std::string&)>& tell) {
+        try {
+            SetupFlow::checkWhoIsLoggedIn(kAccountName);
+            SetupFlow flow(log, std::cout, false);
+            flow.signIn(kAccountName, password);
+            ChosenAliases aliases;
+            for (const AliasOffer& offer : flow.aliasOffers()) {
+                aliases[offer.identifier] = offer.aliases;
+            }
+            flow.complete(WLNimbusAllSetupServiceIDs(), false);
+            const auto bundle = platform::current().resourceBundles.open(kSetupBundlePath);
+            flow.handOver(aliases, *bundle);
+            tell(Json{{"aliases", aliases}, {"delegates", flow.delegates()}}.dump());
+            return kExitSuccess;
+        } catch (const std::exception& error) {
+            tell(Json{{"failure", error.what()}}.dump(-1, ' ', false, Json::error_handler_t::replace));
+            return kExitFailed;
+        }
     };
 }
 
@@ -59,6 +90,13 @@ std::string seconds(std::chrono::nanoseconds duration) {
     text << std::fixed << std::setprecision(3) << std::chrono::duration<double>(duration).count();
     return text.str();
 }
+
+// The setup, as it was seen from outside.
+struct Setup {
+    std::vector<AgentLogRecord> log;
+    Json result;
+    std::vector<ServiceState> services; // afterwards
+};
 
 // One login, as it was seen from outside.
 struct Login {
@@ -71,6 +109,7 @@ struct Login {
 struct LeftOnDisk {
     bool launchAgent = false;
     bool replayItem = false;
+    std::vector<ServiceState> services;
     std::vector<std::string> files; // in the home folder, relative to it
 };
 
@@ -87,7 +126,9 @@ class Story {
 
     void tell() {
         _prepare();
-        _handOver();
+        _say("");
+        _say("Setup, before the first login:");
+        const Setup setup = _setUp();
         _say("");
         _say(_timeLapse ? "First login, on simulated time (which stands still while plug-ins work):"
                         : "First login:");
@@ -106,7 +147,7 @@ class Story {
              (changes.empty() ? std::string("nothing.") : changes.front()));
 
         if (_session.options.json) {
-            _printAsJson(first, second, left, changes);
+            _printAsJson(setup, first, second, left, changes);
         }
         _judge(first, second, left, changes);
     }
@@ -136,26 +177,70 @@ class Story {
         for (const fs::path& plugin : examples.plugins) {
             fs::copy(plugin, plugins / plugin.filename(), replace);
         }
-        fs::create_directories(_below(kBundlePath));
-        fs::copy(examples.setupBundle, _below(kBundlePath), replace);
+        fs::create_directories(_below(kSetupBundlePath));
+        fs::copy(examples.setupBundle, _below(kSetupBundlePath), replace);
 
-        _say("Setup, below " + _root.string() + ":");
+        const platform::CloudUser user = exampleUser();
+        if (const platform::Outcome outcome = _platform->accountDirectory.storeUser(user); !outcome) {
+            throw CommandFailure("cannot add the user: " + outcome.error.message);
+        }
+        _password = user.password;
+
+        _say("A machine, below " + _root.string() + ":");
         _say("  home folder        " + _home);
         _say("  plug-ins           " + std::to_string(examples.plugins.size()) + " in " + kPluginDirectory);
-        _say(std::string("  setup application  ") + kBundlePath);
+        _say(std::string("  setup application  ") + kSetupBundlePath);
+        _say(std::string("  who can sign in    ") + kAccountName);
     }
 
-    // The end of the setup: what only the user's own login can finish is handed over.
-    void _handOver() {
-        const PropertyList replay = exampleReplayObject();
-        const auto bundle = _platform->resourceBundles.open(kBundlePath);
-        if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(kAccountName, replay, *bundle)) {
-            throw CommandFailure("cannot hand over to the next login: " + replayReason(_log));
+    void _showRecord(const AgentLogRecord& record) {
+        std::ostringstream line;
+        line << std::setw(11) << seconds(record.time) << "  " << printable(record.message);
+        _say(line.str());
+    }
+
+    // Signs in, enables the services that are on before the first login, and hands over what only the user's
+    // own login can finish.
+    Setup _setUp() {
+        Setup setup;
+        AgentListener listener;
+        listener.record = [&](const AgentLogRecord& record) {
+            setup.log.push_back(record);
+            _showRecord(record);
+        };
+        listener.told = [&](const std::string& text) {
+            setup.result = Json::parse(text);
+        };
+        const AgentEnd end = runChildProcess(_session.buildPlatform, _root.string(), false, _guard, listener,
+                                             setupLife(_password));
+        if (!end.succeeded()) {
+            throw CommandFailure(setup.result.contains("failure")
+                                     ? setup.result["failure"].get<std::string>()
+                                     : "the setup ended with " + end.description());
         }
-        const PropertyList& responses = *replay.find(kReplayResponsesKey)->find(kReplayDelegatesKey);
-        _say(std::string("  replay item        stored for ") + kAccountName + ", with " +
-             std::to_string(responses.dictionary()->size()) + " responses");
-        _say("  launch agent       " + _launchAgentPath());
+        setup.services = _services();
+        _say("");
+        for (const auto& [identifier, aliases] : setup.result["aliases"].items()) {
+            _say("  " + std::to_string(aliases.size()) + " aliases chosen for " + identifier);
+        }
+        _say(std::string("  The replay item is stored for ") + kAccountName + ", with " +
+             std::to_string(setup.result["delegates"].size()) + " responses.");
+        _say("  The launch agent is installed: " + _launchAgentPath());
+        _showServices(setup.services);
+        return setup;
+    }
+
+    std::vector<ServiceState> _services() const {
+        return serviceStates(
+            _platform->accountService.sharedManager().accountForID(kAccountName, false).get());
+    }
+
+    void _showServices(const std::vector<ServiceState>& services) {
+        if (!_session.options.json) {
+            _session.out << '\n';
+            printServiceStates(_session.out, services, "  ");
+            _session.out << std::flush;
+        }
     }
 
     Login _login() {
@@ -168,9 +253,7 @@ class Story {
             progress.clear();
             login.log.push_back(record);
             login.report.read(record.message);
-            std::ostringstream line;
-            line << std::setw(11) << seconds(record.time) << "  " << printable(record.message);
-            _say(line.str());
+            _showRecord(record);
             if (record.message == kLingerLine) {
                 lingering = std::chrono::steady_clock::now();
                 _showDelegates(login.report);
@@ -227,6 +310,7 @@ class Story {
         LeftOnDisk left;
         left.launchAgent = _platform->fileSystem.exists(_launchAgentPath());
         left.replayItem = WLGetNimbusReplayKeychainItem(nullptr, nullptr);
+        left.services = _services();
         const fs::path home = _below(_home);
         for (const auto& entry : fs::recursive_directory_iterator(home)) {
             if (!entry.is_directory()) {
@@ -238,15 +322,20 @@ class Story {
         for (const std::string& file : left.files) {
             _say("  file          " + _home + "/" + file);
         }
+        _showServices(left.services);
         return left;
     }
 
-    static Json _loginAsJson(const Login& login) {
+    static Json _logAsJson(const std::vector<AgentLogRecord>& records) {
         Json log = Json::array();
-        for (const AgentLogRecord& record : login.log) {
+        for (const AgentLogRecord& record : records) {
             log.push_back({{"seconds", std::chrono::duration<double>(record.time).count()},
                            {"message", record.message}});
         }
+        return log;
+    }
+
+    static Json _loginAsJson(const Login& login) {
         Json delegates = Json::array();
         for (const DelegateOutcome& delegate : login.report.delegates()) {
             delegates.push_back(
@@ -254,24 +343,30 @@ class Story {
                  {"outcome", delegate.outcome},
                  {"seconds", delegate.seconds.empty() ? Json() : Json(std::stod(delegate.seconds))}});
         }
-        return {{"log", log},
+        return {{"log", _logAsJson(login.log)},
                 {"delegates", delegates},
                 {"exitStatus", login.end.exitStatus ? Json(*login.end.exitStatus) : Json()}};
     }
 
-    void _printAsJson(const Login& first, const Login& second, const LeftOnDisk& left,
+    void _printAsJson(const Setup& setup, const Login& first, const Login& second, const LeftOnDisk& left,
                       const std::vector<std::string>& changes) {
-        printJson(
-            _session.out,
-            {{"account", kAccountName},
-             {"root", _root.string()},
-             {"home", _home},
-             {"timeLapse", _timeLapse},
-             {"firstLogin", _loginAsJson(first)},
-             {"left",
-              {{"launchAgent", left.launchAgent}, {"replayItem", left.replayItem}, {"files", left.files}}},
-             {"secondLogin", _loginAsJson(second)},
-             {"changedBySecondLogin", changes}});
+        printJson(_session.out, {{"account", kAccountName},
+                                 {"root", _root.string()},
+                                 {"home", _home},
+                                 {"timeLapse", _timeLapse},
+                                 {"setup",
+                                  {{"log", _logAsJson(setup.log)},
+                                   {"aliases", setup.result["aliases"]},
+                                   {"delegates", setup.result["delegates"]},
+                                   {"services", toJson(setup.services)}}},
+                                 {"firstLogin", _loginAsJson(first)},
+                                 {"left",
+                                  {{"launchAgent", left.launchAgent},
+                                   {"replayItem", left.replayItem},
+                                   {"services", toJson(left.services)},
+                                   {"files", left.files}}},
+                                 {"secondLogin", _loginAsJson(second)},
+                                 {"changedBySecondLogin", changes}});
     }
 
     static void _judge(const Login& first, const Login& second, const LeftOnDisk& left,
@@ -282,6 +377,11 @@ class Story {
         if (left.launchAgent || left.replayItem) {
             throw CommandFailure(std::string("the first login left the ") +
                                  (left.launchAgent ? "launch agent" : "replay item") + " behind");
+        }
+        for (const ServiceState& service : left.services) {
+            if (!service.isEnabled) {
+                throw CommandFailure("after the first login " + service.entry.name + " is not enabled");
+            }
         }
         if (!second.end.succeeded()) {
             throw CommandFailure("the agent of the second login ended with " + second.end.description());
@@ -299,6 +399,7 @@ class Story {
     const PlatformHandle _platform;
     const platform::ScopedPlatform _installed;
     const std::string _home;
+    std::string _password; // of the story's user
 };
 
 void tryStory(Session& session, bool timeLapse) {

@@ -478,7 +478,7 @@ class SetupAtTerminal(SetupTest):
         self.assertIn("  1  anna@nimbus.example\r\n  2  +1 555 0100\r\n", shown)
         self.answer(r"messaging\?[^$]*none \[all\]: ", "7")
         self.answer(r"numbers from 1 to 2, all or none.[^$]*none \[all\]: ", "")
-        shown = self.answer(r"turned on now:[^$]*none \[all\]: ", "1, 3")
+        shown = self.answer(r"turned on now [^$]*none \[all\]: ", "1, 3")
         self.assertIn("  1  photo-stream\r\n  2  account-sync\r\n  3  locator\r\n  4  documents\r\n", shown)
         shown = self.answer(r"Set up this account\? \[Y/n\] ", "y")
         self.assertIn("Services now:   photo-stream, locator\r\n", shown)

@@ -300,10 +300,30 @@ class Try(ToolTest):
         root.mkdir()
         return root
 
+    def log_lines(self, text):
+        return [line.split(maxsplit=1)[1] for line in text.splitlines() if re.match(r" +\d+\.\d{3}  ", line)]
+
+    def enabled_in(self, text):
+        return re.findall(r"^  ([\w-]+) +(?:pre|post)-login +yes +yes +yes$", text, re.MULTILINE)
+
     def test_the_whole_story(self):
         text = self.succeeds(self.run_tool("try", "--time-lapse", env=self.environment))
-        first, second = text.split("Second login")
-        lines = [line.split(maxsplit=1)[1] for line in first.splitlines() if re.match(r" +\d+\.\d{3}  ", line)]
+        setup, first = text.split("First login")
+        first, second = first.split("Second login")
+        lines = self.log_lines(setup)
+        self.assertTrue(any("signInWithUsername" in line and line.endswith("user@nimbus.example - *") for line in lines))
+        request = next(line for line in lines if "'uber' request" in line)
+        for identifier in IDENTIFIERS:
+            self.assertIn(identifier, request)
+        service = "com.corvid.nimbus.service.{}".format
+        self.assertIn(f"Enabling Nimbus service '{service('mediastream')}'", lines)
+        self.assertIn(f"{service('contacts')} should be configured post-login", lines)
+        self.assertTrue(any(re.match(r"Stored \d+b replay data", line) for line in lines))
+        self.assertEqual(lines[-1], "WLCallTesselFinishedSetup")
+        self.assertEqual(self.enabled_in(setup), ["photo-stream", "account-sync", "locator", "documents"])
+        self.assertRegex(setup, r"2 aliases chosen for com.corvid.vidlink\n")
+
+        lines = self.log_lines(first)
         self.assertEqual(lines[0], "Self destructing...")
         begin = lines.index("Vidlink: 2 aliases")
         self.assertEqual(lines[begin + 1], "Chatter: 1 aliases")
@@ -312,9 +332,11 @@ class Try(ToolTest):
             self.assertTrue(any(line.startswith(f"com.corvid.{name} {form}: completed (") for line in lines), lines)
         self.assertEqual(lines[1:3], ["Killing onlineaccounts",
                                       "Enabling post-login services for account user@nimbus.example"])
-        service = "Enabling Nimbus service 'com.corvid.nimbus.service.{}'".format
-        self.assertEqual(lines[-4:], ["delaying exit by two minutes", service("calendars"), service("reminders"),
+        enabling = "Enabling Nimbus service 'com.corvid.nimbus.service.{}'".format
+        self.assertEqual(lines[-4:], ["delaying exit by two minutes", enabling("calendars"), enabling("reminders"),
                                       "exiting"])
+        self.assertIn("Enabling Nimbus Mail: user@nimbus.example", lines)
+        self.assertEqual(len(self.enabled_in(first)), 10)
 
         table = re.findall(r"^  (com\.corvid\.\w+) +(completed) +\d+\.\d{3}$", first, re.MULTILINE)
         self.assertEqual(sorted(name for name, _ in table), IDENTIFIERS)
@@ -349,6 +371,10 @@ class Try(ToolTest):
             self.assertEqual(delegate["outcome"], "completed")
             self.assertIsInstance(delegate["seconds"], float)
         self.assertEqual(document["firstLogin"]["exitStatus"], 0)
+        self.assertEqual(document["setup"]["aliases"]["com.corvid.chatter"], ["user@nimbus.example"])
+        self.assertEqual([service["service"] for service in document["setup"]["services"] if service["enabled"]],
+                         ["photo-stream", "account-sync", "locator", "documents"])
+        self.assertEqual({service["enabled"] for service in document["left"]["services"]}, {True})
         self.assertEqual((document["left"]["launchAgent"], document["left"]["replayItem"]), (False, False))
         self.assertEqual(document["secondLogin"]["exitStatus"], 0)
         self.assertEqual(document["secondLogin"]["delegates"], [])
@@ -393,8 +419,24 @@ class Try(ToolTest):
                       delegates)
         self.assertIn("hello", result.stderr, "a plug-in's own words are no result of the tool")
 
+    def test_a_setup_that_crashes_is_a_failure(self):
+        self.plugin_below_root("CrashingPlugin.ncdplugin")
+        result = self.run_below_root("try", "--time-lapse", env=self.environment)
+        self.assertEqual(result.returncode, 1)
+        self.assertIn("welcomer: the setup ended with signal 6", result.stderr)
+
+    def test_a_setup_that_fails_says_why(self):
+        root = self.fresh_root()
+        accounts = root / HOME.lstrip("/") / "Library/Accounts"
+        accounts.mkdir(parents=True)
+        (accounts / "Accounts.plist").write_bytes(plistlib.dumps({"Accounts": {"bert": {}}, "LoggedInAccount": "bert"}))
+        result = self.run_tool("--root", root, "try", "--time-lapse", env=self.environment)
+        self.assertEqual(result.returncode, 1)
+        self.assertEqual(result.stderr, "welcomer: bert is logged in to the cloud already\n")
+
     def test_an_agent_that_crashes_is_a_failure(self):
         self.plugin_below_root("CrashingPlugin.ncdplugin")
+        self.environment["TOOL_TEST_FILE"] = str(self.home / "Library/Accounts/Accounts.plist")
         result = self.run_below_root("try", "--time-lapse", env=self.environment)
         self.assertEqual(result.returncode, 1)
         self.assertIn("welcomer: the agent of the first login ended with signal 6", result.stderr)
