@@ -77,7 +77,7 @@ def main():
         "loadRecord": {"median_us": record["loadRecord"], "peer_us": record["readFileAndPropertyList"],
                        "maximum_ratio": 1.2},
         "loadChangedRecord": {"median_us": record["loadChangedRecord"],
-                              "peer_us": record["readChangedFileAndPropertyList"]},
+                              "peer_us": record["readChangedFileAndPropertyList"], "maximum_ratio": 1.2},
     }
     if os.geteuid() == 0:
         switch = switch_medians(build, rounds)

@@ -7,7 +7,8 @@ from pathlib import Path
 
 NAMES = {
     "writeToDefaults": ("`writeToDefaults`", "writing and syncing one file of the same size"),
-    "loadRecord": ("loading the record", "reading its file and the property list in it"),
+    "loadChangedRecord": ("loading the record", "reading its file and the property list in it"),
+    "loadRecord": ("loading it again, unchanged", "reading its file and the property list in it"),
     "switchSelect": ("`switch select`, whole process", "a shell script with the same file operations"),
 }
 
