@@ -3,6 +3,7 @@
 #include "cloud/WLNimbusServiceCatalogue.h"
 #include "handoff/LaunchAgentFile.h"
 #include "platform/Platform.h"
+#include "text/Format.h"
 #include "tools/welcomer/Commands.h"
 #include "tools/welcomer/Password.h"
 #include "tools/welcomer/Printable.h"
@@ -107,12 +108,12 @@ class Answers {
              aliases ? *aliases->dictionary() : PropertyList::Dictionary()) {
             const auto offer = std::ranges::find(offers, identifier, &AliasOffer::identifier);
             if (offer == offers.end()) {
-                _fail("nobody offers aliases for " + identifier);
+                _fail(identifier + " has no aliases on offer");
             }
             std::vector<std::string> chosen = _texts(wanted, kAliasesKey);
             for (const std::string& alias : chosen) {
                 if (std::ranges::find(offer->aliases, alias) == offer->aliases.end()) {
-                    _fail("the alias " + alias + " is not on offer for " + identifier);
+                    _fail(text::format("%@ has no alias %@ on offer", identifier, alias));
                 }
             }
             decisions.aliases[identifier] = std::move(chosen);

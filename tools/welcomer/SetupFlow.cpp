@@ -89,9 +89,10 @@ std::vector<AliasOffer> SetupFlow::aliasOffers() {
     };
     std::erase_if(offers, [this](AliasOffer& offer) {
         const PropertyList* response = _response(offer.identifier);
-        auto aliases = response ? WLNimbusGetMessagingAliasesFromDelegateResponse(offer.identifier, *response)
-                                : std::nullopt;
-        offer.aliases = std::move(aliases).value_or(std::vector<std::string>());
+        const auto aliases =
+            response ? WLNimbusGetMessagingAliasesFromDelegateResponse(offer.identifier, *response)
+                     : std::nullopt;
+        offer.aliases = aliases.value_or(std::vector<std::string>());
         return !aliases;
     });
     return offers;
