@@ -1,10 +1,19 @@
 #include "backends/Backends.h"
 
 #include "backends/local/LocalPlatform.h"
+#ifdef WELCOMER_DESKTOP
+#include "backends/desktop/DesktopPlatform.h"
+#endif
 
 namespace welcomer {
 
 std::unique_ptr<PlatformOwner> buildPlatform(const PlatformOptions& options) {
+#ifdef WELCOMER_DESKTOP
+    // The desktop's services know of no other root.
+    if (options.root == "/") {
+        return std::make_unique<desktop::DesktopPlatform>(options);
+    }
+#endif
     return std::make_unique<local::LocalPlatform>(options);
 }
 

@@ -2,10 +2,12 @@
 
 #pragma once
 
+#include "platform/BackendReport.h"
 #include "platform/Platform.h"
 
 #include <memory>
 #include <string>
+#include <vector>
 
 namespace welcomer {
 
@@ -16,6 +18,9 @@ class PlatformOwner {
 
     // Borrowed: lives as long as this object.
     virtual const platform::Platform& platform() const = 0;
+
+    // How the interfaces that have more than one backend are served now. Asks every service: may block.
+    virtual std::vector<platform::BackendReport> backendReports() { return {}; }
 };
 
 // What a program may choose.
@@ -33,7 +38,9 @@ struct PlatformOptions {
     platform::HostReachability* hostReachability = nullptr;
 };
 
-// Builds the platform. Opens nothing and starts no thread: each service does its work when it is first asked.
+// Builds the platform: on the desktop's own services for the root "/", where they are built in and there, and
+// on nothing but the kernel and files elsewhere. Opens nothing and starts no thread: each service does its
+// work when it is first asked.
 std::unique_ptr<PlatformOwner> buildPlatform(const PlatformOptions& options = {});
 
 } // namespace welcomer

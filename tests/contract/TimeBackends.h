@@ -6,6 +6,9 @@
 #include "backends/local/LocalDispatchQueues.h"
 #include "backends/local/LocalRunLoops.h"
 #include "backends/simulated/VirtualTime.h"
+#ifdef WELCOMER_DESKTOP_RUNLOOP
+#include "backends/desktop/DesktopRunLoops.h"
+#endif
 
 #include <gtest/gtest.h>
 
@@ -29,12 +32,26 @@ struct SimulatedTime {
     platform::DispatchQueues& dispatchQueues = time;
 };
 
+#ifdef WELCOMER_DESKTOP_RUNLOOP
+// GLib's main context on the main thread.
+struct DesktopTime {
+    local::LocalClock clock;
+    desktop::DesktopRunLoops runLoops;
+    local::LocalDispatchQueues dispatchQueues;
+};
+
+using TimeBackends = testing::Types<LocalTime, SimulatedTime, DesktopTime>;
+#else
 using TimeBackends = testing::Types<LocalTime, SimulatedTime>;
+#endif
 
 struct TimeBackendNames {
     template <typename Backend>
     static std::string GetName(int) {
-        return std::is_same_v<Backend, LocalTime> ? "Local" : "Simulated";
+        if (std::is_same_v<Backend, LocalTime>) {
+            return "Local";
+        }
+        return std::is_same_v<Backend, SimulatedTime> ? "Simulated" : "Desktop";
     }
 };
 

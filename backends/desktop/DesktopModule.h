@@ -1,0 +1,82 @@
+// A program's side of a desktop backend: finds the module, loads it once, and makes its service.
+
+#pragma once
+
+#include "backends/desktop/ModuleEntry.h"
+
+#include <memory>
+#include <mutex>
+#include <string>
+#include <utility>
+
+namespace welcomer::desktop {
+
+// Loads the module NAME.so and checks that it belongs to this program.
+//  folder  where the modules are; empty: beside the program (in a build tree, and in an installed one,
+//  wherever that has
+//          been moved to), then where this build is installed
+//  whyNot  one line when there is no result
+//  result  the module's entry, valid until the process ends; or null
+// Any thread. Loading is what takes time: callers keep the result.
+const ModuleEntry* loadModule(const std::string& name, const std::string& folder, std::string& whyNot);
+
+// One module and its one service. `Module` describes it: kName, Interface and Arguments.
+template <class Module>
+class DesktopModule {
+  public:
+    using Interface = typename Module::Interface;
+    using Arguments = typename Module::Arguments;
+
+    // Costs nothing: everything happens when the service is first asked for.
+    explicit DesktopModule(Arguments arguments, std::string folder = "")
+        : _arguments(std::move(arguments)),
+          _folder(std::move(folder)) {}
+
+    // The service, borrowed; null when there is none, and then there never will be: another backend serves.
+    // Any thread.
+    Interface* service() {
+        const std::lock_guard lock(_mutex);
+        if (!_isSettled) {
+            _isSettled = true;
+            if (const ModuleEntry* entry = _load()) {
+                _service.reset(static_cast<Interface*>(entry->create(&_arguments, _whyNot)));
+            }
+        }
+        return _service.get();
+    }
+
+    // Has the module say how it serves now.
+    //  report  `backend`, `reason` and `advice` are filled in where the module can be loaded, else `reason`
+    //  and `advice` result  whether the desktop's service serves
+    // Any thread.
+    bool describe(platform::BackendReport& report) {
+        const std::lock_guard lock(_mutex);
+        if (const ModuleEntry* entry = _load()) {
+            return entry->describe(&_arguments, report);
+        }
+        report.reason = _whyNot;
+        report.advice =
+            "install the desktop backends, or build with WELCOMER_DESKTOP where their libraries are";
+        return false;
+    }
+
+  private:
+    const ModuleEntry* _load() {
+        if (!_wasLoaded) {
+            _wasLoaded = true;
+            _entry = loadModule(Module::kName, _folder, _whyNot);
+        }
+        return _entry;
+    }
+
+    const Arguments _arguments;
+    const std::string _folder;
+    std::mutex _mutex;
+    bool _wasLoaded = false;
+    bool _isSettled = false;
+    const ModuleEntry* _entry = nullptr;
+    std::unique_ptr<Interface> _service;
+    std::string _whyNot;
+};
+
+} // namespace welcomer::desktop

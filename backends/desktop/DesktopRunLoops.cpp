@@ -1,0 +1,19 @@
+#include "backends/desktop/DesktopRunLoops.h"
+
+#include <unistd.h>
+
+namespace welcomer::desktop {
+
+std::shared_ptr<platform::RunLoop> DesktopRunLoops::current() {
+    const bool isMainThread = ::gettid() == ::getpid();
+    platform::RunLoops* const loops = isMainThread ? _module.service() : nullptr;
+    return loops ? loops->current() : _local.current();
+}
+
+platform::BackendReport DesktopRunLoops::report() {
+    platform::BackendReport report{"RunLoop", "standard threads", "", ""};
+    _module.describe(report);
+    return report;
+}
+
+} // namespace welcomer::desktop

@@ -1,0 +1,25 @@
+// Run loops: GLib's main context for the main thread, so that whatever uses GLib there keeps working while
+// the system waits; the local backend's loops for every other thread, and where GLib's is not there.
+
+#pragma once
+
+#include "backends/desktop/DesktopModule.h"
+#include "backends/desktop/RunLoopModule.h"
+#include "backends/local/LocalRunLoops.h"
+
+namespace welcomer::desktop {
+
+// The main thread's loop, once asked for, is the same until the process ends.
+class DesktopRunLoops final : public platform::RunLoops {
+  public:
+    std::shared_ptr<platform::RunLoop> current() override;
+
+    // Any thread; loads the module.
+    platform::BackendReport report();
+
+  private:
+    DesktopModule<RunLoopModule> _module{{}};
+    local::LocalRunLoops _local;
+};
+
+} // namespace welcomer::desktop

@@ -1,0 +1,28 @@
+#include "backends/desktop/ModuleEntry.h"
+#include "backends/desktop/RunLoopModule.h"
+#include "backends/desktop/runloop/GLibRunLoop.h"
+
+#include <glib.h>
+
+namespace welcomer::desktop {
+
+namespace {
+
+std::unique_ptr<platform::RunLoops> createRunLoops(const RunLoopModule::Arguments& /*arguments*/,
+                                                   std::string& /*whyNot*/) {
+    return std::make_unique<GLibRunLoops>();
+}
+
+bool describeRunLoops(const RunLoopModule::Arguments& /*arguments*/, platform::BackendReport& report) {
+    report.backend = "GLib main context";
+    report.reason = "GLib " + std::to_string(glib_major_version) + "." + std::to_string(glib_minor_version) +
+                    " is there; other threads use standard ones";
+    return true;
+}
+
+} // namespace
+
+} // namespace welcomer::desktop
+
+WELCOMER_DESKTOP_MODULE(welcomer::desktop::RunLoopModule, welcomer::desktop::createRunLoops,
+                        welcomer::desktop::describeRunLoops)

@@ -1,0 +1,18 @@
+// Which backend serves an interface of the platform, and why: for people.
+
+#pragma once
+
+#include <string>
+
+namespace welcomer::platform {
+
+// Every text is one line.
+struct BackendReport {
+    std::string interface; // the interface's name, such as CredentialStore
+    std::string backend;   // who serves it, such as "Secret Service" or "local file"
+    std::string reason;    // why that one does, and in what state it is
+    std::string advice;    // what would bring in what is missing; empty when nothing is
+    friend bool operator==(const BackendReport&, const BackendReport&) = default;
+};
+
+} // namespace welcomer::platform

@@ -1,0 +1,118 @@
+#include "backends/desktop/DesktopModule.h"
+#include "tests/fixtures/modules/FixtureModule.h"
+
+#include <gtest/gtest.h>
+
+#include <thread>
+
+namespace welcomer::desktop {
+
+namespace {
+
+using fixtures::Visitor;
+using fixtures::VisitorModule;
+
+struct Counts {
+    int created = 0;
+    int ended = 0;
+};
+
+template <int number>
+DesktopModule<VisitorModule<number>> moduleWith(Counts& counts) {
+    return DesktopModule<VisitorModule<number>>({&counts.created, &counts.ended}, WELCOMER_FIXTURE_MODULES);
+}
+
+// What loading says about a module that cannot serve.
+template <int number>
+std::string reasonOf() {
+    Counts counts;
+    auto module = moduleWith<number>(counts);
+    EXPECT_EQ(module.service(), nullptr);
+    platform::BackendReport report{"Visitor", "local", "", ""};
+    EXPECT_FALSE(module.describe(report));
+    EXPECT_EQ(report.backend, "local");
+    EXPECT_NE(report.advice, "");
+    return report.reason;
+}
+
+} // namespace
+
+TEST(DesktopModuleTest, NothingIsLoadedBeforeTheServiceIsAskedFor) {
+    Counts counts;
+    { const auto module = moduleWith<0>(counts); }
+    EXPECT_EQ(counts.created, 0);
+}
+
+TEST(DesktopModuleTest, TheServiceIsMadeOnceForAllThreadsAndEndsWithTheModule) {
+    Counts counts;
+    {
+        auto module = moduleWith<0>(counts);
+        std::vector<Visitor*> seen(8);
+        std::vector<std::thread> threads;
+        for (Visitor*& service : seen) {
+            threads.emplace_back([&module, &service] { service = module.service(); });
+        }
+        for (std::thread& thread : threads) {
+            thread.join();
+        }
+        ASSERT_NE(seen.front(), nullptr);
+        EXPECT_EQ(seen, std::vector<Visitor*>(8, seen.front()));
+        EXPECT_EQ(counts.created, 1);
+        EXPECT_EQ(counts.ended, 0);
+    }
+    EXPECT_EQ(counts.ended, 1);
+}
+
+TEST(DesktopModuleTest, ObjectsCrossBothWays) {
+    Counts counts;
+    auto module = moduleWith<0>(counts);
+    ASSERT_NE(module.service(), nullptr);
+    const std::string prefix = "a prefix that is too long for the string's own room: ";
+
+    const auto echoed =
+        module.service()->echo({"one", "two"}, [&](const std::string& word) { return prefix + word; });
+
+    ASSERT_EQ(echoed.size(), 1U);
+    EXPECT_EQ(echoed.begin()->second, (std::vector<std::string>{prefix + "one", prefix + "two"}));
+    auto text = std::make_shared<std::string>("the program's text");
+    EXPECT_EQ(module.service()->share(text), text);
+    EXPECT_EQ(*text, "the program's text and the module's text, on the heap of both");
+    EXPECT_EQ(text.use_count(), 1);
+}
+
+TEST(DesktopModuleTest, AModuleCatchesWhatItThrows) {
+    Counts counts;
+    auto module = moduleWith<0>(counts);
+    ASSERT_NE(module.service(), nullptr);
+    EXPECT_EQ(module.service()->survive(), "thrown and caught in the module");
+}
+
+TEST(DesktopModuleTest, AModuleSpeaksForItself) {
+    Counts counts;
+    auto module = moduleWith<0>(counts);
+    platform::BackendReport report{"Visitor", "local", "", ""};
+    EXPECT_TRUE(module.describe(report));
+    EXPECT_EQ(report.backend, "the module's own words");
+    EXPECT_EQ(counts.created, 0);
+}
+
+TEST(DesktopModuleTest, AModuleWhoseServiceIsNotThereMakesNone) {
+    Counts counts;
+    auto module = moduleWith<1>(counts);
+    EXPECT_EQ(module.service(), nullptr);
+    EXPECT_EQ(module.service(), nullptr);
+}
+
+TEST(DesktopModuleTest, AModuleOfAnotherBuildIsRefused) {
+    EXPECT_NE(reasonOf<2>().find("is of another build: another build"), std::string::npos);
+}
+
+TEST(DesktopModuleTest, ALibraryWithoutAnEntryIsNoModule) {
+    EXPECT_NE(reasonOf<3>().find("is no module"), std::string::npos);
+}
+
+TEST(DesktopModuleTest, AModuleThatIsNotInstalledIsSaidToBeMissing) {
+    EXPECT_EQ(reasonOf<4>(), "the module missing.so is not installed");
+}
+
+} // namespace welcomer::desktop
