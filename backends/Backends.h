@@ -36,6 +36,9 @@ struct PlatformOptions {
     platform::RunLoops* runLoops = nullptr;
     platform::DispatchQueues* dispatchQueues = nullptr;
     platform::HostReachability* hostReachability = nullptr;
+
+    // The folder of the application's main bundle, a path of this machine; empty: the application has none.
+    std::string mainBundle = {};
 };
 
 // Builds the platform: on the desktop's own services for the root "/", where they are built in and there, and

@@ -9,6 +9,8 @@ set(WELCOMER_TEST_NAMESERVERS
     "The nameservers of the test environments Nimbus1 to Nimbus4 and Q1 to Q4: IPv4 addresses, no two the same")
 set(WELCOMER_PUBLIC_WEB_HOST "www.example.com" CACHE STRING
     "The public web host that stands for the internet when reachability is probed")
+set(WELCOMER_INTERNAL_ADDRESS_PREFIX "203.0.113." CACHE STRING
+    "What the addresses of the maker's own network begin with: whole numbers, each with the dot behind it")
 
 # welcomer_read_configuration(VARIABLE COUNT PATTERN): checks a list and gives its entries as C++ string literals.
 function(welcomer_read_configuration variable count pattern)
@@ -37,5 +39,6 @@ set(host_pattern "[A-Za-z0-9]([A-Za-z0-9.-]*[A-Za-z0-9])?")
 welcomer_read_configuration(WELCOMER_RESOLVER_DOMAINS 4 "${host_pattern}")
 welcomer_read_configuration(WELCOMER_TEST_NAMESERVERS 8 "[0-9]+[.][0-9]+[.][0-9]+[.][0-9]+")
 welcomer_read_configuration(WELCOMER_PUBLIC_WEB_HOST 1 "${host_pattern}")
+welcomer_read_configuration(WELCOMER_INTERNAL_ADDRESS_PREFIX 1 "[0-9]+[.]([0-9]+[.])?([0-9]+[.])?")
 configure_file("${CMAKE_CURRENT_LIST_DIR}/WelcomerConfiguration.h.in"
                "${PROJECT_BINARY_DIR}/generated/WelcomerConfiguration.h" @ONLY)

@@ -1,13 +1,295 @@
 #include "network/NetworkingManager.h"
 
 #include "generated/WelcomerConfiguration.h"
+#include "log/PCLogManager.h"
+#include "network/NCUtils.h"
+#include "network/WLPortScanner.h"
+#include "platform/NetworkStateStore.h"
 #include "platform/Platform.h"
+#include "propertylist/UTF8.h"
 
-#include <cstdint>
-#include <optional>
-#include <string>
+#include <algorithm>
+#include <array>
+#include <chrono>
+#include <exception>
+#include <limits>
+#include <string_view>
+#include <utility>
 
 namespace welcomer {
+
+namespace {
+
+using platform::NetworkDomain;
+using platform::NetworkEntity;
+using platform::NetworkStateKey;
+using Text = NetworkingManager::Text;
+using TextList = NetworkingManager::TextList;
+using Dictionary = PropertyList::Dictionary;
+
+constexpr char kStateClientName[] = "Welcomer";
+constexpr char kLinkClientName[] = "FirstRun"; // another name than above
+constexpr char kPreferencesName[] = "com.corvid.FirstRun";
+constexpr char kDebugDefault[] = "WLNetworkingManagerDebug";
+constexpr char kInternalMarker[] = "/CorvidInternal";
+constexpr char kLinkLocalPrefix[] = "169.254.";
+constexpr char kNoAddress[] = "0.0.0.0";
+constexpr int kMaximumRetries = 60;
+constexpr std::chrono::seconds kOneSecond{1};
+constexpr std::ptrdiff_t kNodesWanted = 3;
+
+constexpr char kReadDefaultsFunction[] = "-[NetworkingManager _readDefaultConfiguration]";
+constexpr char kPreferencesFunction[] = "-[NetworkingManager systemPreferences]";
+constexpr char kDynamicFunction[] = "-[NetworkingManager hasUsableDynamicEthernetConfiguration]";
+constexpr char kDirectoryFunction[] = "-[NetworkingManager dirServiceNodesExist]";
+constexpr char kApplyFunction[] = "-[NetworkingManager applySettings:]";
+constexpr char kManualFunction[] = "-[NetworkingManager configureManual]";
+constexpr char kServiceFunction[] = "-[NetworkingManager configureService:]";
+constexpr char kDNSFunction[] = "-[NetworkingManager _setManualDNS:dns:]";
+constexpr char kCommitFunction[] = "-[NetworkingManager commitPrefs]";
+constexpr char kRegisterFunction[] = "-[NetworkingManager registerNewNetworkServices]";
+
+Text textOf(const PropertyList* value) {
+    const std::string* text = value ? value->string() : nullptr;
+    return text ? Text(*text) : std::nullopt;
+}
+
+Text textOf(const Dictionary& values, const char* key) {
+    const auto found = values.find(key);
+    return found == values.end() ? std::nullopt : textOf(&found->second);
+}
+
+// The texts of a list; what else is in it is left out.
+TextList listOf(const Dictionary& values, const char* key) {
+    const auto found = values.find(key);
+    const PropertyList::Array* array = found == values.end() ? nullptr : found->second.array();
+    if (!array) {
+        return std::nullopt;
+    }
+    std::vector<std::string> list;
+    for (const PropertyList& each : *array) {
+        if (const std::string* text = each.string()) {
+            list.push_back(*text);
+        }
+    }
+    return list;
+}
+
+Text firstOf(const Dictionary& values, const char* key) {
+    const auto found = values.find(key);
+    const PropertyList::Array* array = found == values.end() ? nullptr : found->second.array();
+    return array && !array->empty() ? textOf(&array->front()) : std::nullopt;
+}
+
+// A value that a configuration cannot go without.
+const std::string& required(const Text& value, const char* name) {
+    if (!value) {
+        throw platform::Exception(std::string("no ") + name + " was given");
+    }
+    return *value;
+}
+
+PropertyList::Array onlyElement(const std::string& value) {
+    return {PropertyList(value)};
+}
+
+// The store's last error, as log lines show it.
+struct StoreError {
+    StoreError()
+        : code(platform::current().networkConfigStore.lastErrorCode()),
+          text(platform::current().networkConfigStore.errorText(code)) {}
+
+    const std::int32_t code;
+    const std::string text;
+
+    long number() const { return code; }
+    const char* characters() const { return text.c_str(); }
+};
+
+// Commits and applies; a failure whose code is 0 does not stop it.
+//  result  whether nothing stopped it
+bool storeEstablished(platform::NetworkConfigConnection& preferences, const char* function) {
+    if (!preferences.commitChanges()) {
+        const StoreError error;
+        WL_LOG_AS(function, "NCPreferencesCommitChanges failed error code %ld error %s", error.number(),
+                  error.characters());
+        preferences.synchronize();
+        if (error.code != 0) {
+            return false;
+        }
+    }
+    if (!preferences.applyChanges()) {
+        const StoreError error;
+        WL_LOG_AS(function, "NCPreferencesApplyChanges failed error code %ld error %s", error.number(),
+                  error.characters());
+        if (error.code != 0) {
+            return false;
+        }
+    }
+    WL_LOG_AS(function, "updated network configuration");
+    return true;
+}
+
+bool isDeviceLinkActive(const std::string& device) {
+    const auto store = platform::current().networkStateStore.open(kLinkClientName);
+    const auto link =
+        store
+            ? store->copyValue(NetworkStateKey::interface(NetworkDomain::State, device, NetworkEntity::Link))
+            : std::nullopt;
+    if (!link) {
+        return false;
+    }
+    const auto active = link->find(platform::kNetworkActive);
+    return active != link->end() && active->second.boolean().value_or(false);
+}
+
+Dictionary errorDictionary(const char* titleKey, const char* bodyKey) {
+    const auto bundle = platform::current().resourceBundles.openMainBundle();
+    return {{"title", bundle->localizedString(titleKey, "")}, {"body", bundle->localizedString(bodyKey, "")}};
+}
+
+std::vector<std::string> authenticationSubnodeNames() {
+    const auto node =
+        platform::current().directoryService.openNode(platform::kDirectoryAuthenticationSearchNode);
+    return node ? node->subnodeNames() : std::vector<std::string>();
+}
+
+std::string_view withoutLeadingSpaces(std::string_view text) {
+    return text.substr(std::min(text.find_first_not_of(' '), text.size()));
+}
+
+} // namespace
+
+NetworkingManager::NetworkingManager() {
+    _readDefaultConfiguration();
+}
+
+// Reading
+
+void NetworkingManager::_readDefaultConfiguration() {
+    auto store = platform::current().networkStateStore.open(kStateClientName);
+    if (!store) {
+        WL_LOG_AS(kReadDefaultsFunction, "NetworkingManager: error connecting to dynamic store");
+        return;
+    }
+    TextList dns;
+    Text domain;
+    if (const auto global =
+            store->copyValue(NetworkStateKey::global(NetworkDomain::State, NetworkEntity::DNS))) {
+        dns = listOf(*global, platform::kNetworkServerAddresses);
+        domain = textOf(*global, platform::kNetworkDomainName);
+    }
+    Text router;
+    Text method;
+    Text address;
+    Text mask;
+    if (const auto global =
+            store->copyValue(NetworkStateKey::global(NetworkDomain::State, NetworkEntity::IPv4))) {
+        router = textOf(*global, platform::kNetworkRouter);
+        if (const Text primary = textOf(*global, platform::kNetworkPrimaryService)) {
+            if (const auto setup = store->copyValue(
+                    NetworkStateKey::service(NetworkDomain::Setup, *primary, NetworkEntity::IPv4))) {
+                method = textOf(*setup, platform::kNetworkConfigMethod);
+            }
+            if (const auto state = store->copyValue(
+                    NetworkStateKey::service(NetworkDomain::State, *primary, NetworkEntity::IPv4))) {
+                address = firstOf(*state, platform::kNetworkAddresses);
+                mask = firstOf(*state, platform::kNetworkSubnetMasks);
+            }
+        }
+    }
+    store.reset();
+    if (address && !address->empty() && !address->starts_with(kLinkLocalPrefix)) {
+        _defaultConfigurationMethod.set(method);
+        _defaultIPAddress.set(address);
+        _defaultSubnetMask.set(mask);
+        _defaultRouter.set(router);
+        _defaultDNS.set(dns);
+        _defaultSearchDomains.set(domain ? std::vector{*domain} : std::vector<std::string>());
+    }
+    WL_LOG_AS(kReadDefaultsFunction, "--- WLCopyNetworkConfig ---");
+    WL_LOG_AS(kReadDefaultsFunction, "IP: %@", address);
+    WL_LOG_AS(kReadDefaultsFunction, "Mask: %@", mask);
+    WL_LOG_AS(kReadDefaultsFunction, "Router: %@", router);
+    if (dns) {
+        WL_LOG_AS(kReadDefaultsFunction, "DNS: %@", dns->empty() ? std::nullopt : Text(dns->front()));
+    }
+    WL_LOG_AS(kReadDefaultsFunction, "Domain: %@", domain);
+    WL_LOG_AS(kReadDefaultsFunction, "Config Method: %@", method);
+}
+
+Text NetworkingManager::_currentDHCPAddress() {
+    const auto store = platform::current().networkStateStore.open(kStateClientName);
+    if (!store) {
+        return std::nullopt;
+    }
+    const auto global = store->copyValue(NetworkStateKey::global(NetworkDomain::State, NetworkEntity::IPv4));
+    const Text primary = global ? textOf(*global, platform::kNetworkPrimaryService) : std::nullopt;
+    if (!primary) {
+        return std::nullopt;
+    }
+    // Read and dropped: the method does not matter.
+    static_cast<void>(
+        store->copyValue(NetworkStateKey::service(NetworkDomain::Setup, *primary, NetworkEntity::IPv4)));
+    const auto state =
+        store->copyValue(NetworkStateKey::service(NetworkDomain::State, *primary, NetworkEntity::IPv4));
+    Text address = state ? firstOf(*state, platform::kNetworkAddresses) : std::nullopt;
+    return address && address->empty() ? std::nullopt : address;
+}
+
+Text NetworkingManager::defaultIP4ConfigurationMethod() {
+    const auto set = _currentSet();
+    const auto service = NCUtils::serviceInSetWithHardwareKey(set.get(), _hardwareKey());
+    const auto protocol = service ? service->copyProtocol(platform::kNetworkProtocolIPv4) : nullptr;
+    const auto configuration = protocol ? protocol->configuration() : std::nullopt;
+    return configuration ? textOf(*configuration, platform::kNetworkConfigMethod) : std::nullopt;
+}
+
+Text NetworkingManager::_hardwareKey() const {
+    if (userSaidConfigureLAN()) {
+        return platform::kNetworkEthernet;
+    }
+    static_cast<void>(userSaidConfigureWiFi()); // every other choice is wireless all the same
+    return platform::kNetworkWireless;
+}
+
+std::shared_ptr<platform::NetworkConfigConnection> NetworkingManager::systemPreferences() {
+    if (_prefs) {
+        return _prefs;
+    }
+    const platform::Platform& platform = platform::current();
+    std::shared_ptr<platform::NetworkSet> set;
+    for (long retries = 0;; ++retries) {
+        if (retries > 0) {
+            WL_LOG_AS(kPreferencesFunction, "waiting for network configuration to be established (%ld)",
+                      retries);
+            platform.clock.sleep(kOneSecond);
+            _prefs.reset();
+        }
+        _prefs = platform.networkConfigStore.open(kPreferencesName);
+        set = _prefs->copyCurrentSet();
+        if (set) {
+            break;
+        }
+        if (machinePortList().empty() || retries >= kMaximumRetries) {
+            return _prefs;
+        }
+    }
+    if (set->establishDefaultConfiguration()) {
+        storeEstablished(*_prefs, kPreferencesFunction);
+    } else {
+        const StoreError error; // also when nothing went wrong
+        WL_LOG_AS(kPreferencesFunction, "NCNetworkSetEstablishDefaultConfiguration returned %ld error %s",
+                  error.number(), error.characters());
+    }
+    return _prefs;
+}
+
+std::shared_ptr<platform::NetworkSet> NetworkingManager::_currentSet() {
+    return systemPreferences()->copyCurrentSet();
+}
+
+// Probing
 
 bool NetworkingManager::internetIsReachable() {
     const std::optional<std::uint32_t> flags =
@@ -16,6 +298,305 @@ bool NetworkingManager::internetIsReachable() {
             ->flags();
     constexpr std::uint32_t kMask = platform::kHostReachable | platform::kHostConnectionRequired;
     return flags && (*flags & kMask) == platform::kHostReachable;
+}
+
+bool NetworkingManager::isOnCorvidInternalNetwork() {
+    const Text address = _currentDHCPAddress();
+    return address && address->starts_with(configuration::kInternalAddressPrefix) &&
+           platform::current().fileSystem.exists(kInternalMarker);
+}
+
+std::optional<NetworkingManager::Services> NetworkingManager::servicesWithEthernetPluggedIn() {
+    const auto set = _currentSet();
+    std::optional<Services> services =
+        NCUtils::servicesInSetWithHardwareKey(set.get(), platform::kNetworkEthernet);
+    if (services) {
+        std::erase_if(*services, [](const auto& service) {
+            const platform::NetworkInterface* interface =
+                NCUtils::interfaceInServiceWithType(service.get(), platform::kNetworkEthernet);
+            const Text device = interface ? interface->deviceName() : std::nullopt;
+            return !device || !isDeviceLinkActive(*device);
+        });
+    }
+    return services;
+}
+
+bool NetworkingManager::isEthernetCablePluggedIn() {
+    const std::optional<Services> services = servicesWithEthernetPluggedIn();
+    return services && !services->empty();
+}
+
+bool NetworkingManager::hasUsableDynamicEthernetConfiguration() {
+    const auto set = _currentSet();
+    const auto service = NCUtils::serviceInSetWithHardwareKey(set.get(), platform::kNetworkEthernet);
+    const auto protocol = service ? service->copyProtocol(platform::kNetworkProtocolIPv4) : nullptr;
+    const auto configuration = protocol ? protocol->configuration() : std::nullopt;
+    const Text method = configuration ? textOf(*configuration, platform::kNetworkConfigMethod) : std::nullopt;
+    if (!method) {
+        return false;
+    }
+    WL_LOG_AS(kDynamicFunction, "NetworkingManager: hasUsableDynamicEthernetConfiguration: (configMethod %@)",
+              *method);
+    if (*method != platform::kNetworkMethodBootP && *method != platform::kNetworkMethodDHCP &&
+        *method != platform::kNetworkMethodLinkLocal) {
+        return false;
+    }
+    if (_currentDHCPAddress()) {
+        return false;
+    }
+    const bool isReachable = internetIsReachable();
+    if (isReachable) {
+        WL_LOG_AS(kDynamicFunction, "hasUsableDynamicEthernetConfiguration: reg. host reachable.");
+    } else {
+        WL_LOG_AS(kDynamicFunction, "hasUsableDynamicEthernetConfiguration: reg. host *NOT* reachable.");
+    }
+    return isReachable;
+}
+
+bool NetworkingManager::dirServiceNodesExist() {
+    platform::DirectoryService& directory = platform::current().directoryService;
+    const std::vector<std::string> searchPath = authenticationSubnodeNames();
+    WL_LOG_AS(kDirectoryFunction, "NetworkingManager: DirService: search paths: %@", searchPath);
+    if (std::ranges::all_of(searchPath, [&](const auto& name) { return directory.isLocalNodeName(name); })) {
+        return false;
+    }
+    const auto node = directory.openNode(platform::kDirectoryAuthenticationSearchNode);
+    const std::vector<std::string> names = node ? node->subnodeNames() : std::vector<std::string>();
+    if (std::ssize(names) < kNodesWanted) {
+        return false;
+    }
+    const std::vector<std::string> unreachable = node->unreachableSubnodeNames();
+    WL_LOG_AS(kDirectoryFunction, "NetworkingManager: DirService: subnodeNames %@", names);
+    WL_LOG_AS(kDirectoryFunction, "NetworkingManager: DirService: unreachableSubnodeNames %@", unreachable);
+    const std::ptrdiff_t reachable = std::ranges::count_if(
+        names, [&](const auto& name) { return std::ranges::count(unreachable, name) == 0; });
+    WL_LOG_AS(kDirectoryFunction, "NetworkingManager: DirService: reachableNodes %ld", reachable);
+    return reachable >= kNodesWanted;
+}
+
+// Applying
+
+bool NetworkingManager::applySettings(PropertyList::Dictionary* error) {
+    const std::uint64_t warningType = _internetConnectionWarningType;
+    const bool configuresLAN = userSaidConfigureLAN();
+    const auto failed = [&](PropertyList::Dictionary dictionary) {
+        if (error) {
+            *error = std::move(dictionary);
+        }
+        return false;
+    };
+    bool result = true;
+    if (configuresLAN && warningType != 0 && !configureManual()) {
+        return failed(genericConfigurationErrorDict());
+    }
+    if (warningType == 1) {
+        _waitForInternet(result);
+    }
+    if (warningType == 2 || (warningType == 1 && !result)) {
+        return failed(genericReachabilityErrorDict());
+    }
+    return result;
+}
+
+void NetworkingManager::_waitForInternet(bool& isReachable) const {
+    // Counted without a sign, so that a negative wait runs around without overflowing.
+    const auto wait = static_cast<std::uint64_t>(_secondsToWait);
+    constexpr auto kEnd = std::numeric_limits<std::uint64_t>::max(); // -1
+    std::uint64_t counter = wait;
+    do {
+        isReachable = internetIsReachable();
+        if (isReachable) {
+            break;
+        }
+        platform::current().clock.sleep(kOneSecond);
+        --counter;
+    } while (counter != kEnd);
+    WL_LOG_AS(kApplyFunction, "%@: Internet is %@reachable after %lu seconds", *this,
+              isReachable ? "" : "not ", wait - counter);
+}
+
+PropertyList::Dictionary NetworkingManager::genericReachabilityErrorDict() {
+    return errorDictionary("NETWORKING_MANAGER_NO_INTERNET_TITLE", "NETWORKING_MANAGER_NO_INTERNET_BODY");
+}
+
+PropertyList::Dictionary NetworkingManager::genericConfigurationErrorDict() {
+    return errorDictionary("NETWORKING_MANAGER_GENERIC_ERROR_TITLE", "NETWORKING_MANAGER_GENERIC_ERROR_BODY");
+}
+
+bool NetworkingManager::configureManual() {
+    if (platform::current().preferenceStore.booleanDefault(kDebugDefault)) {
+        WL_LOG_AS(kManualFunction, "NetworkingManager: Configuring manual ethernet");
+        WL_LOG_AS(kManualFunction, "Method: %@", configurationMethod());
+        WL_LOG_AS(kManualFunction, "IP:     %@", ipAddress());
+        WL_LOG_AS(kManualFunction, "Subnet: %@", subnetMask());
+        WL_LOG_AS(kManualFunction, "Router: %@", router());
+        WL_LOG_AS(kManualFunction, "DNS:    %@", dns());
+        WL_LOG_AS(kManualFunction, "Search: %@", searchDomains());
+    }
+    bool result = false;
+    try {
+        Text key = _hardwareKey();
+        if (!key) {
+            WL_LOG_AS(kManualFunction, "NetworkingManager: no Connection specified, assuming %@",
+                      platform::kNetworkEthernet);
+            key = platform::kNetworkEthernet;
+        }
+        const auto set = _currentSet();
+        if (*key != platform::kNetworkEthernet) {
+            const auto service = NCUtils::serviceInSetWithHardwareKey(set.get(), key);
+            if (!service) {
+                throw platform::Exception("unable to find service for connection type");
+            }
+            service->setEnabled(true); // before configuring, unlike below
+            result = configureService(*service);
+        } else if (const auto plugged = servicesWithEthernetPluggedIn(); plugged && !plugged->empty()) {
+            result = configureService(*plugged->front());
+            plugged->front()->setEnabled(true);
+        } else {
+            for (const auto& service :
+                 NCUtils::servicesInSetWithHardwareKey(set.get(), key).value_or(Services())) {
+                result = configureService(*service);
+                service->setEnabled(true);
+            }
+        }
+    } catch (const std::exception&) { // NOLINT(bugprone-empty-catch): the result so far is the answer
+    }
+    return result;
+}
+
+bool NetworkingManager::configureService(platform::NetworkService& service) {
+    try {
+        _configureService(service);
+    } catch (const std::exception&) {
+        return false;
+    }
+    return commitPrefs();
+}
+
+void NetworkingManager::_configureService(platform::NetworkService& service) {
+    static constexpr std::array<std::pair<const char*, const char*>, 4> kMethods = {{
+        {kConfigurationMethodManual, platform::kNetworkMethodManual},
+        {kConfigurationMethodManualDHCP, platform::kNetworkMethodInform},
+        {kConfigurationMethodDHCP, platform::kNetworkMethodDHCP},
+        {kConfigurationMethodBootP, platform::kNetworkMethodBootP},
+    }};
+    if (!_hardwareKey()) {
+        WL_LOG_AS(kServiceFunction, "NetworkingManager: no Connection specified, assuming %@",
+                  platform::kNetworkEthernet);
+    }
+    std::string method = platform::kNetworkMethodDHCP;
+    const Text chosen = configurationMethod();
+    const auto* const known =
+        std::ranges::find_if(kMethods, [&](const auto& each) { return chosen == each.first; });
+    if (known == kMethods.end()) {
+        WL_LOG_AS(kServiceFunction, "NetworkingManager: no TCPConfigureMethod specified, assuming %@",
+                  method);
+    } else {
+        method = known->second;
+    }
+    const auto protocol = NCUtils::createOrGetProtocolForService(platform::kNetworkProtocolIPv4, &service);
+    if (!protocol) {
+        throw platform::Exception("missing IPv4 protocol in service");
+    }
+    Dictionary configuration = protocol->configuration().value_or(Dictionary());
+    configuration.insert_or_assign(platform::kNetworkConfigMethod, method);
+    if (method == platform::kNetworkMethodDHCP) {
+        _setDHCPIP4(configuration);
+    } else if (method == platform::kNetworkMethodManual) {
+        _setManualIP4(configuration);
+    } else if (method == platform::kNetworkMethodInform) {
+        _setManualDHCPIP4(configuration);
+    }
+    if (!protocol->setConfiguration(configuration)) {
+        const StoreError error;
+        WL_LOG_AS(kServiceFunction,
+                  "NetworkingManager: NCNetworkProtocolSetConfiguration failed error code %ld error %s",
+                  error.number(), error.characters());
+    }
+    _setManualDNSDns(service, dns());
+}
+
+void NetworkingManager::_setManualIP4(PropertyList::Dictionary& configuration) const {
+    configuration.insert_or_assign(platform::kNetworkAddresses,
+                                   onlyElement(required(ipAddress(), "address")));
+    configuration.insert_or_assign(platform::kNetworkSubnetMasks,
+                                   onlyElement(required(subnetMask(), "subnet mask")));
+    configuration.insert_or_assign(platform::kNetworkRouter, required(router(), "router"));
+}
+
+void NetworkingManager::_setDHCPIP4(PropertyList::Dictionary& configuration) const {
+    if (const Text clientID = dhcpClientID()) {
+        configuration.insert_or_assign(platform::kNetworkDHCPClientID, *clientID);
+    }
+}
+
+void NetworkingManager::_setManualDHCPIP4(PropertyList::Dictionary& configuration) const {
+    configuration.insert_or_assign(platform::kNetworkAddresses,
+                                   onlyElement(required(ipAddress(), "address")));
+}
+
+void NetworkingManager::_setManualDNSDns(platform::NetworkService& service, const TextList& dns) const {
+    const auto protocol = NCUtils::createOrGetProtocolForService(platform::kNetworkProtocolDNS, &service);
+    if (!protocol) {
+        throw platform::Exception("missing DNS protocol in service");
+    }
+    Dictionary configuration = protocol->configuration().value_or(Dictionary());
+    PropertyList::Array kept;
+    for (const std::string& entry : dns.value_or(std::vector<std::string>())) {
+        const std::string_view address = withoutLeadingSpaces(entry); // spaces behind it stay
+        if (address.empty()) {
+            continue;
+        }
+        if (findInvalidUTF8(address) != std::string_view::npos) { // no text that could be copied
+            WL_LOG_AS(kDNSFunction, "*** _setManualDNS bad DNS %@", entry);
+        } else if (address != kNoAddress) {
+            kept.emplace_back(address);
+        }
+    }
+    // The search domains are asked for and never written.
+    static_cast<void>(searchDomains());
+    if (kept.empty()) {
+        return;
+    }
+    configuration.insert_or_assign(platform::kNetworkServerAddresses, std::move(kept));
+    if (!protocol->setConfiguration(configuration)) {
+        const StoreError error;
+        WL_LOG_AS(kDNSFunction, "Error %ld from NCNetworkProtocolSetConfiguration", error.number());
+    }
+}
+
+bool NetworkingManager::commitPrefs() {
+    const auto preferences = systemPreferences();
+    if (!preferences->commitChanges()) {
+        const StoreError error;
+        WL_LOG_AS(kCommitFunction,
+                  "NetworkingManager: NCPreferencesCommitChanges failed error code %ld error %s",
+                  error.number(), error.characters());
+        preferences->synchronize();
+        return error.code == 0; // a failure without a code counts as success, on purpose
+    }
+    if (!preferences->applyChanges()) {
+        const StoreError error;
+        WL_LOG_AS(kCommitFunction,
+                  "NetworkingManager: NCPreferencesApplyChanges failed error code %ld error %s",
+                  error.number(), error.characters());
+        return error.code == 0;
+    }
+    return true;
+}
+
+void NetworkingManager::registerNewNetworkServices() {
+    const auto preferences = systemPreferences();
+    const auto set = preferences->copyCurrentSet();
+    if (!set) {
+        WL_LOG_AS(kRegisterFunction, "NCNetworkSetCopyCurrent failed");
+        return;
+    }
+    if (!set->establishDefaultConfiguration()) {
+        WL_LOG_AS(kRegisterFunction, "NCNetworkSetEstablishDefaultConfiguration : no new devices.");
+        return;
+    }
+    storeEstablished(*preferences, kRegisterFunction);
 }
 
 } // namespace welcomer

@@ -6,9 +6,12 @@
 #include "platform/AccountService.h"
 #include "platform/Clock.h"
 #include "platform/CredentialStore.h"
+#include "platform/DirectoryService.h"
 #include "platform/DispatchQueue.h"
 #include "platform/FileSystem.h"
 #include "platform/HostReachability.h"
+#include "platform/NetworkConfigStore.h"
+#include "platform/NetworkStateStore.h"
 #include "platform/NotificationCenter.h"
 #include "platform/PluginBundle.h"
 #include "platform/PreferenceStore.h"
@@ -39,6 +42,9 @@ struct Platform {
     AccountService& accountService;
     AccountDirectory& accountDirectory;
     ProcessLauncher& processLauncher;
+    NetworkConfigStore& networkConfigStore;
+    NetworkStateStore& networkStateStore;
+    DirectoryService& directoryService;
 };
 
 // The installed platform. A program installs one at its start, before anything else of the system is called,

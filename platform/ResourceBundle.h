@@ -18,6 +18,12 @@ class ResourceBundle {
     //  type  its type, the file name's extension without the dot; empty: the name stands alone
     // Any thread.
     virtual std::optional<std::string> pathForResource(const std::string& name, const std::string& type) = 0;
+
+    // The text under a key of the bundle's default string table, in the user's language where the bundle has
+    // it.
+    //  fallback  the result when there is no such text
+    // Any thread; may read a file.
+    virtual std::string localizedString(const std::string& key, const std::string& fallback) = 0;
 };
 
 class ResourceBundles {
@@ -26,6 +32,10 @@ class ResourceBundles {
 
     // Opens the bundle at a path. A bundle that does not exist has no resources. Any thread.
     virtual std::unique_ptr<ResourceBundle> open(const std::string& path) = 0;
+
+    // Opens the main bundle: that of the running application. An application without one has no resources.
+    // Any thread.
+    virtual std::unique_ptr<ResourceBundle> openMainBundle() = 0;
 };
 
 } // namespace welcomer::platform

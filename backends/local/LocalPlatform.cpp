@@ -16,6 +16,7 @@ Interface& chosen(Interface* replacement, std::type_identity_t<Interface>& servi
 
 LocalPlatform::LocalPlatform(const PlatformOptions& options)
     : _root(options.root),
+      _resourceBundles(_root, options.mainBundle),
       _accountService(_root, _processIdentity, chosen(options.runLoops, _runLoops),
                       chosen(options.dispatchQueues, _dispatchQueues), _notificationCenter),
       _platform{chosen(options.systemLog, _systemLog),
@@ -33,6 +34,9 @@ LocalPlatform::LocalPlatform(const PlatformOptions& options)
                 _notificationCenter,
                 _accountService,
                 _accountDirectory,
-                _processLauncher} {}
+                _processLauncher,
+                _networkConfigStore,
+                _networkStateStore,
+                _directoryService} {}
 
 } // namespace welcomer::local

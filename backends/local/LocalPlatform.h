@@ -7,9 +7,12 @@
 #include "backends/local/LocalAccountService.h"
 #include "backends/local/LocalClock.h"
 #include "backends/local/LocalCredentialStore.h"
+#include "backends/local/LocalDirectoryService.h"
 #include "backends/local/LocalDispatchQueues.h"
 #include "backends/local/LocalFileSystem.h"
 #include "backends/local/LocalHostReachability.h"
+#include "backends/local/LocalNetworkConfigStore.h"
+#include "backends/local/LocalNetworkStateStore.h"
 #include "backends/local/LocalNotificationCenter.h"
 #include "backends/local/LocalPluginBundle.h"
 #include "backends/local/LocalPreferenceStore.h"
@@ -37,7 +40,7 @@ class LocalPlatform final : public PlatformOwner {
     LocalProcessIdentity _processIdentity{_root};
     LocalCredentialStore _credentialStore{_root, _processIdentity};
     LocalPluginBundle _pluginBundle{_root};
-    LocalResourceBundles _resourceBundles{_root};
+    LocalResourceBundles _resourceBundles;
     LocalClock _clock;
     LocalRunLoops _runLoops;
     LocalDispatchQueues _dispatchQueues;
@@ -48,6 +51,9 @@ class LocalPlatform final : public PlatformOwner {
     LocalAccountService _accountService;
     LocalAccountDirectory _accountDirectory{_root, _processIdentity};
     LocalProcessLauncher _processLauncher;
+    LocalNetworkConfigStore _networkConfigStore{_root};
+    LocalNetworkStateStore _networkStateStore{_root};
+    LocalDirectoryService _directoryService{_fileSystem};
     const platform::Platform _platform;
 };
 

@@ -22,8 +22,6 @@ using State = PreferenceFileContent::State;
 
 // More than any program keeps in its preferences.
 constexpr std::size_t kMaximumFileSize = std::size_t{16} * 1024 * 1024;
-constexpr mode_t kFolderMode = 0700;
-constexpr mode_t kFileMode = 0600;
 constexpr mode_t kPermissions = 07777;
 
 constexpr char kDamagedSuffix[] = ".damaged";
@@ -72,8 +70,9 @@ void rereadPreferenceFile(const std::string& path, PreferenceFileContent& conten
     }
 }
 
-LockedPreferenceFolder::LockedPreferenceFolder(const std::string& path) {
-    makeDirectory(path, kFolderMode); // fails where it exists already; opening says the rest
+LockedPreferenceFolder::LockedPreferenceFolder(const std::string& path, mode_t folderMode, mode_t fileMode)
+    : _fileMode(fileMode) {
+    makeDirectory(path, folderMode); // fails where it exists already; opening says the rest
     FileDescriptor folder(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     if (folder && lockFolder(folder.get()) == 0) {
         _folder = std::move(folder);
@@ -85,7 +84,7 @@ std::optional<std::string> LockedPreferenceFolder::write(const std::string& name
     std::optional<std::string> bytes = writeXMLPropertyList(values);
     struct stat present = {};
     const bool isPresent = ::fstatat(_folder.get(), name.c_str(), &present, 0) == 0;
-    const mode_t mode = isPresent ? present.st_mode & kPermissions : kFileMode;
+    const mode_t mode = isPresent ? present.st_mode & kPermissions : _fileMode;
     // Syncing the folder too would take as long again, for a change that nothing else relies on.
     if (bytes && replaceFile(_folder.get(), name, *bytes, mode, AfterCrash::OldOrNew) != 0) {
         bytes.reset();
@@ -98,7 +97,7 @@ std::string LockedPreferenceFolder::setAside(const std::string& name, const std:
         std::string other = damagedName(name, number);
         // An empty file of our own takes the name, so that nothing else is overwritten.
         const FileDescriptor reserved(
-            ::openat(_folder.get(), other.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kFileMode));
+            ::openat(_folder.get(), other.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, _fileMode));
         if (!reserved && errno == EEXIST) {
             continue;
         }

@@ -7,6 +7,7 @@
 
 #include <optional>
 #include <string>
+#include <sys/types.h>
 
 namespace welcomer::local {
 
@@ -36,15 +37,17 @@ void rereadPreferenceFile(const std::string& path, PreferenceFileContent& conten
 // The folder of the domains' files, with its lock held for as long as this lives. One thread at a time.
 class LockedPreferenceFolder {
   public:
-    // Opens the folder, a path of this machine, making it (mode 0700) where it is missing, and waits for the
-    // other writers.
-    explicit LockedPreferenceFolder(const std::string& path);
+    // Opens the folder, a path of this machine, making it where it is missing, and waits for the other
+    // writers.
+    //  folderMode, fileMode  the permissions of a new folder and of its new files; the user's alone unless
+    //                        given
+    explicit LockedPreferenceFolder(const std::string& path, mode_t folderMode = 0700,
+                                    mode_t fileMode = 0600);
 
     // Whether all of that succeeded; without it nothing below may be called.
     explicit operator bool() const { return static_cast<bool>(_folder); }
 
-    // Replaces a file's content, all or nothing. The file keeps its permissions; a new one is the user's
-    // alone.
+    // Replaces a file's content, all or nothing. The file keeps its permissions.
     //  result  the file's new bytes, none when the values cannot be written
     std::optional<std::string> write(const std::string& name, const PropertyList::Dictionary& values) const;
 
@@ -57,6 +60,7 @@ class LockedPreferenceFolder {
   private:
     bool _moveContent(const std::string& name, int destination, const std::string& bytes) const;
 
+    const mode_t _fileMode;
     FileDescriptor _folder;
 };
 

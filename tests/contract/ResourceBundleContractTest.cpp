@@ -6,6 +6,9 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdlib>
+#include <string>
+
 namespace welcomer::contract {
 
 namespace {
@@ -14,13 +17,14 @@ namespace {
 // bundle "/Setup.app".
 struct LocalBundles {
     TemporaryRoot root;
-    local::LocalResourceBundles bundles{local::RootFolder(root.path())};
+    local::LocalResourceBundles bundles{local::RootFolder(root.path()), root.locate("/Setup.app")};
 
     LocalBundles() {
         root.addFile("/Setup.app/Resources/agent", "");
         root.addFile("/Setup.app/Resources/agent.plist", "");
         root.addFile("/Setup.app/Resources/with.dot.plist", "");
         root.addFile("/Setup.app/outside", "");
+        root.addFile("/Setup.app/Resources/Localizable.strings", "\"KEY\" = \"A text\"; DATA = <00>;");
     }
 };
 
@@ -32,6 +36,7 @@ struct FakeBundles {
         bundles.add("/Setup.app", "agent", "", "/Setup.app/Resources/agent");
         bundles.add("/Setup.app", "agent", "plist", "/Setup.app/Resources/agent.plist");
         bundles.add("/Setup.app", "with.dot", "plist", "/Setup.app/Resources/with.dot.plist");
+        bundles.mainBundleTexts = {{"KEY", "A text"}};
     }
 };
 
@@ -76,6 +81,60 @@ TYPED_TEST(ResourceBundleContract, ABundleThatDoesNotExistHasNoResources) {
 
     ASSERT_NE(bundle, nullptr);
     EXPECT_EQ(bundle->pathForResource("agent", ""), std::nullopt);
+}
+
+TYPED_TEST(ResourceBundleContract, TheMainBundlesTextsAreFoundByTheirKeysAndOthersFallBack) {
+    const auto bundle = this->backend.bundles.openMainBundle();
+
+    ASSERT_NE(bundle, nullptr);
+    EXPECT_EQ(bundle->localizedString("KEY", "fallback"), "A text");
+    EXPECT_EQ(bundle->localizedString("OTHER", "fallback"), "fallback");
+    EXPECT_EQ(bundle->localizedString("DATA", ""), "");
+    EXPECT_EQ(this->backend.bundles.open("/Other.app")->localizedString("KEY", "fallback"), "fallback");
+}
+
+// The languages
+
+class LocalizedStringTest : public testing::Test {
+  protected:
+    LocalizedStringTest() {
+        for (const char* variable : {"LC_ALL", "LC_MESSAGES", "LANG"}) {
+            ::unsetenv(variable);
+        }
+        root.addFile("/App/Resources/Localizable.strings", "A = english; B = english; C = english;");
+        root.addFile("/App/Resources/de/Localizable.strings", "A = deutsch; B = deutsch;");
+        root.addFile("/App/Resources/de_AT/Localizable.strings", "A = austrian;");
+    }
+
+    std::string textsIn(const char* variable, const char* language) {
+        ::setenv(variable, language, 1);
+        const auto bundle =
+            local::LocalResourceBundles(local::RootFolder("/"), root.locate("/App")).openMainBundle();
+        return bundle->localizedString("A", "-") + " " + bundle->localizedString("B", "-") + " " +
+               bundle->localizedString("C", "-");
+    }
+
+    TemporaryRoot root;
+};
+
+TEST_F(LocalizedStringTest, TheLanguageOfTheEnvironmentComesFirstThenItsRelativesThenTheBundlesOwn) {
+    EXPECT_EQ(textsIn("LANG", "C"), "english english english");
+    EXPECT_EQ(textsIn("LANG", "de_AT.UTF-8"), "austrian deutsch english");
+    EXPECT_EQ(textsIn("LC_MESSAGES", "de_DE@euro"), "deutsch deutsch english");
+    EXPECT_EQ(textsIn("LC_ALL", "fr_FR"), "english english english");
+    EXPECT_EQ(textsIn("LC_ALL", "../../../etc"), "english english english");
+    EXPECT_EQ(textsIn("LC_ALL", ""), "deutsch deutsch english");
+}
+
+TEST_F(LocalizedStringTest, AnApplicationWithoutAMainBundleHasNoTexts) {
+    const auto bundle = local::LocalResourceBundles(local::RootFolder(root.path())).openMainBundle();
+    EXPECT_EQ(bundle->localizedString("A", "-"), "-");
+    EXPECT_EQ(bundle->pathForResource("A", ""), std::nullopt);
+}
+
+TEST_F(LocalizedStringTest, ATableThatIsNoneHasNoTexts) {
+    root.addFile("/App/Resources/Localizable.strings", "\"A\" = ");
+    EXPECT_EQ(textsIn("LANG", "C"), "- - -");
 }
 
 } // namespace welcomer::contract

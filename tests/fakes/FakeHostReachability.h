@@ -26,6 +26,10 @@ class FakeHostReachability final : public platform::HostReachability {
     // None: they cannot be read.
     std::optional<std::uint32_t> flags = platform::kHostReachable;
 
+    // How many probes find nothing before the flags count, and how many there were.
+    std::uint64_t failingProbes = 0;
+    std::uint64_t probes = 0;
+
   private:
     class Target final : public platform::HostReachabilityTarget {
       public:
@@ -35,7 +39,7 @@ class FakeHostReachability final : public platform::HostReachability {
 
         std::optional<std::uint32_t> flags() override {
             _network._recorder.record("HostReachability.flags " + _hostName);
-            return _network.flags;
+            return ++_network.probes > _network.failingProbes ? _network.flags : 0U;
         }
 
       private:

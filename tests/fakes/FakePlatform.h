@@ -8,8 +8,11 @@
 #include "tests/fakes/FakeAccountDirectory.h"
 #include "tests/fakes/FakeAccountService.h"
 #include "tests/fakes/FakeCredentialStore.h"
+#include "tests/fakes/FakeDirectoryService.h"
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeHostReachability.h"
+#include "tests/fakes/FakeNetworkConfigStore.h"
+#include "tests/fakes/FakeNetworkStateStore.h"
 #include "tests/fakes/FakeNotificationCenter.h"
 #include "tests/fakes/FakePluginBundle.h"
 #include "tests/fakes/FakePreferenceStore.h"
@@ -53,6 +56,9 @@ class FakePlatform {
     FakeAccountService accountService{recorder, notificationCenter, virtualTime, virtualTime};
     FakeAccountDirectory accountDirectory{accountService};
     FakeProcessLauncher processLauncher{recorder};
+    FakeNetworkConfigStore networkConfigStore{recorder};
+    FakeNetworkStateStore networkStateStore{recorder};
+    FakeDirectoryService directoryService{recorder};
 
     // Borrowed: lives as long as this object.
     const platform::Platform& platform() const { return _platform; }
@@ -60,10 +66,16 @@ class FakePlatform {
   private:
     platform::FileSystem& _files = fileSystem;
     platform::PluginBundle& _plugins = pluginBundle;
-    platform::Platform _platform{systemLog,          _files,          processIdentity,   credentialStore,
-                                 _plugins,           resourceBundles, virtualTime,       virtualTime,
-                                 virtualTime,        preferenceStore, systemVersionInfo, hostReachability,
-                                 notificationCenter, accountService,  accountDirectory,  processLauncher};
+    platform::Platform _platform{systemLog,          _files,
+                                 processIdentity,    credentialStore,
+                                 _plugins,           resourceBundles,
+                                 virtualTime,        virtualTime,
+                                 virtualTime,        preferenceStore,
+                                 systemVersionInfo,  hostReachability,
+                                 notificationCenter, accountService,
+                                 accountDirectory,   processLauncher,
+                                 networkConfigStore, networkStateStore,
+                                 directoryService};
 };
 
 } // namespace welcomer::fakes

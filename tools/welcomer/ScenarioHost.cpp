@@ -205,7 +205,7 @@ LocalUserAccountManager& ScenarioHost::localUserAccountManager() {
 
 NetworkingManager& ScenarioHost::networkingManager() {
     _calls.emplace_back("SetupStateManager.networkingManager");
-    return _network;
+    return _network ? *_network : _network.emplace();
 }
 
 CloudSetupManager& ScenarioHost::NimbusManager() {

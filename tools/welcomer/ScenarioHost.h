@@ -71,7 +71,7 @@ class ScenarioHost final : public SetupStateManager {
     std::vector<std::string> _calls;
     Flags _flags;
     bool _hasSeeded = false;
-    NetworkingManager _network;
+    std::optional<NetworkingManager> _network; // reads the network when it is first asked for
     std::unique_ptr<User> _user;
     std::unique_ptr<Cloud> _cloud;
     std::unique_ptr<Helper> _helper;

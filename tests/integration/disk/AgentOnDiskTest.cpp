@@ -121,7 +121,10 @@ class AgentOnDiskTest : public testing::Test {
                                        real.notificationCenter,
                                        real.accountService,
                                        real.accountDirectory,
-                                       real.processLauncher};
+                                       real.processLauncher,
+                                       real.networkConfigStore,
+                                       real.networkStateStore,
+                                       real.directoryService};
         const platform::ScopedPlatform scope(mixed);
         const std::array<const char*, 2> arguments{"wlnimbussetup", nullptr};
         return wlnimbussetup(1, arguments.data());

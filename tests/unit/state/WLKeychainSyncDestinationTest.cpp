@@ -21,6 +21,11 @@ const std::string kMarker = "/var/db/.WLFakeComplexRecovery";
 
 class WLKeychainSyncDestinationTest : public testing::Test {
   protected:
+    WLKeychainSyncDestinationTest() {
+        fake.recorder.clear(); // of what the host's network manager read and logged
+        fake.systemLog.clear();
+    }
+
     void setScreenLock(bool asksForPassword) {
         fake.preferenceStore.setValue("askForPassword", asksForPassword, "com.corvid.screensaver");
     }

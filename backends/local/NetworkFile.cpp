@@ -1,0 +1,201 @@
+#include "backends/local/NetworkFile.h"
+
+#include "backends/local/Directory.h"
+#include "backends/local/PreferenceFile.h"
+#include "platform/NetworkConfigStore.h"
+#include "platform/Path.h"
+
+namespace welcomer::local {
+
+namespace {
+
+using Dictionary = PropertyList::Dictionary;
+
+constexpr const char* kParentFolders[] = {"/var", "/var/lib"};
+constexpr char kFolder[] = "/var/lib/welcomer";
+constexpr char kFileName[] = "network.plist";
+constexpr mode_t kFolderMode = 0755; // everybody may read it
+constexpr mode_t kFileMode = 0644;
+
+constexpr char kCurrentSet[] = "CurrentSet";
+constexpr char kSets[] = "Sets";
+constexpr char kServices[] = "Services";
+constexpr char kName[] = "Name";
+constexpr char kDevice[] = "Device";
+constexpr char kEnabled[] = "Enabled";
+constexpr char kProtocols[] = "Protocols";
+constexpr char kConfiguration[] = "Configuration";
+constexpr char kAutomaticSet[] = "automatic";
+
+// The dictionary under a key, which is made where there is none.
+Dictionary& dictionaryIn(Dictionary& content, const std::string& key) {
+    PropertyList& value = content[key];
+    if (!value.isDictionary()) {
+        value = Dictionary();
+    }
+    return *value.dictionary();
+}
+
+const PropertyList* valueIn(const Dictionary& content, const std::string& key) {
+    const auto found = content.find(key);
+    return found == content.end() ? nullptr : &found->second;
+}
+
+const PropertyList* serviceIn(const Dictionary& content, const std::string& serviceID) {
+    const PropertyList* services = valueIn(content, kServices);
+    return services ? services->find(serviceID) : nullptr;
+}
+
+Dictionary* changedService(Dictionary& content, const std::string& serviceID) {
+    return serviceIn(content, serviceID) ? &dictionaryIn(dictionaryIn(content, kServices), serviceID)
+                                         : nullptr;
+}
+
+std::string currentSet(const Dictionary& content) {
+    const PropertyList* name = valueIn(content, kCurrentSet);
+    return name && name->string() ? *name->string() : kAutomaticSet;
+}
+
+} // namespace
+
+namespace networkfile {
+
+std::optional<std::vector<std::string>> services(const Dictionary& content) {
+    const PropertyList* sets = valueIn(content, kSets);
+    const PropertyList* set = sets ? sets->find(currentSet(content)) : nullptr;
+    if (!set && valueIn(content, kCurrentSet)) {
+        return std::nullopt;
+    }
+    std::vector<std::string> found;
+    const PropertyList* list = set ? set->find(kServices) : nullptr;
+    for (const PropertyList& each : list && list->array() ? *list->array() : PropertyList::Array()) {
+        if (each.string() && serviceIn(content, *each.string())) {
+            found.push_back(*each.string());
+        }
+    }
+    return found;
+}
+
+const PropertyList* serviceValue(const Dictionary& content, const std::string& serviceID,
+                                 const std::string& key) {
+    const PropertyList* service = serviceIn(content, serviceID);
+    return service ? service->find(key) : nullptr;
+}
+
+std::optional<std::string> serviceText(const Dictionary& content, const std::string& serviceID,
+                                       const std::string& key) {
+    const PropertyList* value = serviceValue(content, serviceID, key);
+    return value && value->string() ? std::optional(*value->string()) : std::nullopt;
+}
+
+std::optional<std::string> serviceOfDevice(const Dictionary& content, const std::string& device) {
+    for (const std::string& serviceID : services(content).value_or(std::vector<std::string>())) {
+        if (serviceText(content, serviceID, kDevice) == device) {
+            return serviceID;
+        }
+    }
+    return std::nullopt;
+}
+
+std::vector<std::string> protocolTypes(const Dictionary& content, const std::string& serviceID) {
+    std::vector<std::string> types;
+    const PropertyList* protocols = serviceValue(content, serviceID, kProtocols);
+    if (protocols && protocols->dictionary()) {
+        for (const auto& [type, protocol] : *protocols->dictionary()) {
+            types.push_back(type);
+        }
+    }
+    return types;
+}
+
+std::optional<Dictionary> configuration(const Dictionary& content, const std::string& serviceID,
+                                        const std::string& type) {
+    const PropertyList* protocols = serviceValue(content, serviceID, kProtocols);
+    const PropertyList* protocol = protocols ? protocols->find(type) : nullptr;
+    const PropertyList* value = protocol ? protocol->find(kConfiguration) : nullptr;
+    return value && value->dictionary() ? std::optional(*value->dictionary()) : std::nullopt;
+}
+
+void addService(Dictionary& content, const NewService& service) {
+    if (serviceOfDevice(content, service.device)) {
+        return; // somebody else was first
+    }
+    std::string serviceID = service.device;
+    for (int number = 2; serviceIn(content, serviceID); ++number) {
+        serviceID = service.device + "-" + std::to_string(number);
+    }
+    dictionaryIn(content, kServices)[serviceID] = Dictionary{
+        {kName, service.name},
+        {kDevice, service.device},
+        {kEnabled, true},
+        {kProtocols, Dictionary{{platform::kNetworkProtocolDNS, Dictionary()},
+                                {platform::kNetworkProtocolIPv4,
+                                 Dictionary{{kConfiguration, Dictionary{{platform::kNetworkConfigMethod,
+                                                                         platform::kNetworkMethodDHCP}}}}}}},
+    };
+    const std::string setID = currentSet(content);
+    content[kCurrentSet] = setID;
+    Dictionary& set = dictionaryIn(dictionaryIn(content, kSets), setID);
+    set.try_emplace(kName, setID);
+    PropertyList& list = set[kServices];
+    if (!list.isArray()) {
+        list = PropertyList::Array();
+    }
+    list.array()->emplace_back(serviceID);
+}
+
+void setEnabled(Dictionary& content, const std::string& serviceID, bool enabled) {
+    if (Dictionary* service = changedService(content, serviceID)) {
+        (*service)[kEnabled] = enabled;
+    }
+}
+
+void addProtocol(Dictionary& content, const std::string& serviceID, const std::string& type) {
+    if (Dictionary* service = changedService(content, serviceID)) {
+        dictionaryIn(dictionaryIn(*service, kProtocols), type);
+    }
+}
+
+void setConfiguration(Dictionary& content, const std::string& serviceID, const std::string& type,
+                      const Dictionary& configuration) {
+    if (Dictionary* service = changedService(content, serviceID)) {
+        dictionaryIn(dictionaryIn(*service, kProtocols), type)[kConfiguration] = configuration;
+    }
+}
+
+} // namespace networkfile
+
+Dictionary NetworkFile::read() const {
+    return readPreferenceFile(_root.locate(platform::joinPath(kFolder, kFileName))).values;
+}
+
+std::int32_t NetworkFile::change(const std::vector<std::function<void(Dictionary&)>>& changes,
+                                 Dictionary& content) const {
+    for (const char* parent : kParentFolders) {
+        makeDirectory(_root.locate(parent), kFolderMode); // fails where it exists; opening says the rest
+    }
+    const std::string path = _root.locate(kFolder);
+    const LockedPreferenceFolder folder(path, kFolderMode, kFileMode);
+    if (!folder) {
+        return platform::kNetworkConfigWriteFailed;
+    }
+    PreferenceFileContent onDisk = readPreferenceFile(platform::joinPath(path, kFileName));
+    if (onDisk.state == PreferenceFileContent::State::Unreadable) {
+        return platform::kNetworkConfigReadFailed;
+    }
+    if (onDisk.state == PreferenceFileContent::State::Damaged &&
+        folder.setAside(kFileName, onDisk.bytes).empty()) {
+        return platform::kNetworkConfigWriteFailed;
+    }
+    Dictionary changed = onDisk.values;
+    for (const auto& change : changes) {
+        change(changed);
+    }
+    if (changed != onDisk.values && !folder.write(kFileName, changed)) {
+        return platform::kNetworkConfigWriteFailed;
+    }
+    content = std::move(changed);
+    return platform::kNetworkConfigSuccess;
+}
+
+} // namespace welcomer::local
