@@ -15,10 +15,11 @@ void addPluginsCommands(CommandLine& commandLine);
 void addStateCommands(CommandLine& commandLine);
 void addSyncCommands(CommandLine& commandLine);
 void addSwitchCommands(CommandLine& commandLine);
+void addNetworkCommands(CommandLine& commandLine);
 
 // In the order in which --help shows them.
 inline constexpr void (*kCommands[])(CommandLine&) = {
     addTryCommand,      addSetupCommand,  addAccountCommands, addServicesCommands, addReplayCommands,
-    addPluginsCommands, addStateCommands, addSyncCommands,    addSwitchCommands};
+    addPluginsCommands, addStateCommands, addSyncCommands,    addSwitchCommands,   addNetworkCommands};
 
 } // namespace welcomer::tool

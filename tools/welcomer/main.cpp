@@ -3,6 +3,7 @@
 #include "backends/Backends.h"
 #include "backends/simulated/VirtualTime.h"
 #include "tools/welcomer/Tool.h"
+#include "tools/welcomer/ToolBundle.h"
 
 namespace {
 
@@ -21,6 +22,7 @@ tool::PlatformHandle build(const tool::PlatformRequest& request) {
     PlatformOptions options{.root = request.root, .systemLog = request.systemLog};
     options.hostReachability = request.hostReachability;
     options.dispatchQueues = request.dispatchQueues;
+    options.mainBundle = tool::findToolBundle();
     if (request.simulatedTime) {
         owned->simulatedTime = std::make_unique<VirtualTime>(VirtualTime::OutstandingWork::OnRealThreads);
         options.clock = owned->simulatedTime.get();
