@@ -1,0 +1,46 @@
+// Accounts that the embedded service keeps below a root of its own.
+
+#pragma once
+
+#include "backends/local/LocalAccountService.h"
+#include "backends/local/LocalNotificationCenter.h"
+#include "backends/local/NimbusDirectory.h"
+#include "backends/local/PasswordHash.h"
+#include "propertylist/PropertyListWriter.h"
+#include "tests/contract/TemporaryRoot.h"
+#include "tests/fakes/FakeFileSystem.h"
+#include "tests/fakes/FakeProcessIdentity.h"
+
+#include <string>
+
+namespace welcomer::contract {
+
+template <typename Time>
+struct LocalAccounts {
+    LocalAccounts() { root.addDirectory("/home/user/Library"); }
+
+    void addUser(const std::string& name, const std::string& password) {
+        users[name] = PropertyList::Dictionary{
+            {"Password", local::makePasswordHash(password).value()},
+            {"MailAddress", "anna@example.org"},
+            {"Services", PropertyList::Dictionary{
+                             {platform::kSKServiceIDContacts, PropertyList::Dictionary{}},
+                             {platform::kSKServiceIDMail,
+                              PropertyList::Dictionary{{"CanBeEnabled", false},
+                                                       {"Properties", PropertyList::Dictionary{}}}}}}};
+        root.addFile(local::kNimbusDirectoryPath,
+                     *writeXMLPropertyList(PropertyList::Dictionary{{"Users", users}}));
+    }
+
+    Time time;
+    TemporaryRoot root;
+    PropertyList::Dictionary users;
+    fakes::CallRecorder recorder;
+    fakes::FakeFileSystem fileSystem{recorder};
+    fakes::FakeProcessIdentity identity{recorder, fileSystem};
+    local::LocalNotificationCenter center;
+    local::LocalAccountService service{local::RootFolder(root.path()), identity, time.runLoops,
+                                       time.dispatchQueues, center};
+};
+
+} // namespace welcomer::contract
