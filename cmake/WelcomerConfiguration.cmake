@@ -11,6 +11,10 @@ set(WELCOMER_PUBLIC_WEB_HOST "www.example.com" CACHE STRING
     "The public web host that stands for the internet when reachability is probed")
 set(WELCOMER_INTERNAL_ADDRESS_PREFIX "203.0.113." CACHE STRING
     "What the addresses of the maker's own network begin with: whole numbers, each with the dot behind it")
+set(WELCOMER_ONLINE_ACCOUNT_PROVIDER "owncloud" CACHE STRING
+    "The provider type that the cloud service's accounts have in GNOME Online Accounts")
+set(WELCOMER_ONLINE_ACCOUNT_SERVER "https://services.nimbus.example/" CACHE STRING
+    "The address of the server that these accounts are made with: a URL")
 
 # welcomer_read_configuration(VARIABLE COUNT PATTERN): checks a list and gives its entries as C++ string literals.
 function(welcomer_read_configuration variable count pattern)
@@ -40,5 +44,7 @@ welcomer_read_configuration(WELCOMER_RESOLVER_DOMAINS 4 "${host_pattern}")
 welcomer_read_configuration(WELCOMER_TEST_NAMESERVERS 8 "[0-9]+[.][0-9]+[.][0-9]+[.][0-9]+")
 welcomer_read_configuration(WELCOMER_PUBLIC_WEB_HOST 1 "${host_pattern}")
 welcomer_read_configuration(WELCOMER_INTERNAL_ADDRESS_PREFIX 1 "[0-9]+[.]([0-9]+[.])?([0-9]+[.])?")
+welcomer_read_configuration(WELCOMER_ONLINE_ACCOUNT_PROVIDER 1 "[a-z_]+")
+welcomer_read_configuration(WELCOMER_ONLINE_ACCOUNT_SERVER 1 "https?://${host_pattern}(:[0-9]+)?/[A-Za-z0-9./_~-]*")
 configure_file("${CMAKE_CURRENT_LIST_DIR}/WelcomerConfiguration.h.in"
                "${PROJECT_BINARY_DIR}/generated/WelcomerConfiguration.h" @ONLY)

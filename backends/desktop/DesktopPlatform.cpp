@@ -1,5 +1,11 @@
 #include "backends/desktop/DesktopPlatform.h"
 
+#include "backends/local/LocalAccountService.h"
+#include "backends/local/RootFolder.h"
+#include "generated/WelcomerConfiguration.h"
+
+#include <memory>
+
 namespace welcomer::desktop {
 
 namespace {
@@ -11,16 +17,58 @@ PlatformOptions withRunLoops(PlatformOptions options, platform::RunLoops& runLoo
     return options;
 }
 
+// The local platform with the desktop's services in their places.
+platform::Platform withDesktop(const platform::Platform& local, platform::AccountService& accountService) {
+    return {local.systemLog,
+            local.fileSystem,
+            local.processIdentity,
+            local.credentialStore,
+            local.pluginBundle,
+            local.resourceBundles,
+            local.clock,
+            local.runLoops,
+            local.dispatchQueues,
+            local.preferenceStore,
+            local.systemVersionInfo,
+            local.hostReachability,
+            local.notificationCenter,
+            accountService,
+            local.accountDirectory,
+            local.processLauncher,
+            local.networkConfigStore,
+            local.networkStateStore,
+            local.directoryService};
+}
+
 } // namespace
 
 DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
     : _local(withRunLoops(options, _runLoops)),
-      _platform(_local.platform()) {}
+      _accountService(_accountSurroundings(options.root), {std::string(configuration::kOnlineAccountProvider),
+                                                           std::string(configuration::kOnlineAccountServer)}),
+      _platform(withDesktop(_local.platform(), _accountService)) {}
 
 std::vector<platform::BackendReport> DesktopPlatform::backendReports() {
     std::vector<platform::BackendReport> reports;
     reports.push_back(_runLoops.report());
+    platform::BackendReport accounts{"AccountService", "account file", "", ""};
+    _onlineAccounts.describe(accounts);
+    reports.push_back(accounts);
     return reports;
+}
+
+OnlineAccountSurroundings DesktopPlatform::_accountSurroundings(const std::string& root) {
+    const platform::Platform& local = _local.platform();
+    return {[this] { return _onlineAccounts.service(); },
+            [root, &local](platform::NotificationCenter& posts) {
+                return std::make_unique<local::LocalAccountService>(local::RootFolder(root),
+                                                                    local.processIdentity, local.runLoops,
+                                                                    local.dispatchQueues, posts);
+            },
+            local.preferenceStore,
+            local.runLoops,
+            local.dispatchQueues,
+            local.notificationCenter};
 }
 
 } // namespace welcomer::desktop

@@ -4,9 +4,13 @@
 #pragma once
 
 #include "backends/Backends.h"
+#include "backends/desktop/DesktopModule.h"
 #include "backends/desktop/DesktopRunLoops.h"
+#include "backends/desktop/OnlineAccountService.h"
+#include "backends/desktop/OnlineAccountsModule.h"
 #include "backends/local/LocalPlatform.h"
 
+#include <string>
 #include <vector>
 
 namespace welcomer::desktop {
@@ -21,8 +25,12 @@ class DesktopPlatform final : public PlatformOwner {
     std::vector<platform::BackendReport> backendReports() override;
 
   private:
+    OnlineAccountSurroundings _accountSurroundings(const std::string& root);
+
     DesktopRunLoops _runLoops;
     local::LocalPlatform _local; // stands on _runLoops
+    DesktopModule<OnlineAccountsModule> _onlineAccounts{{}};
+    OnlineAccountService _accountService;
     const platform::Platform _platform;
 };
 

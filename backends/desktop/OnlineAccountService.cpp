@@ -1,0 +1,288 @@
+#include "backends/desktop/OnlineAccountService.h"
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <cstddef>
+#include <optional>
+#include <utility>
+
+namespace welcomer::desktop {
+
+namespace {
+
+constexpr char kMailProvider[] = "imap_smtp";
+
+// By OnlineFeature: the cloud service that it stands for.
+constexpr std::array<const char*, kOnlineFeatureCount> kServices = {
+    platform::kSKServiceIDContacts, platform::kSKServiceIDCalendars, platform::kSKServiceMobileDocuments,
+    platform::kSKServiceIDMail};
+
+// The feature that stands for a cloud service; none for a service that the online accounts do not know.
+std::optional<OnlineFeature> featureOf(const std::string& service) {
+    const auto* const found = std::find(kServices.begin(), kServices.end(), service);
+    return found == kServices.end() ? std::nullopt
+                                    : std::optional(static_cast<OnlineFeature>(found - kServices.begin()));
+}
+
+bool looksLikeMailAddress(const std::string& text) {
+    const std::size_t at = text.find('@');
+    return at != std::string::npos && at > 0 && at + 1 < text.size();
+}
+
+bool isText(const std::optional<PropertyList>& value) {
+    return value && value->isString() && !value->string()->empty();
+}
+
+} // namespace
+
+struct OnlineAccountService::Switches {
+    const std::function<OnlineAccounts*()> onlineAccounts;
+    const OnlineAccountServer server;
+
+    std::optional<std::vector<OnlineAccount>> list() const {
+        OnlineAccounts* const accounts = onlineAccounts();
+        return accounts ? accounts->list() : std::nullopt;
+    }
+
+    // The online account that has the switch of a cloud account's service.
+    std::optional<OnlineAccount> find(const std::string& name, OnlineFeature feature) const {
+        const std::string provider = feature == OnlineFeature::Mail ? kMailProvider : server.providerType;
+        std::optional<OnlineAccount> found;
+        std::optional<std::vector<OnlineAccount>> all = list();
+        for (std::size_t i = 0; all && i < all->size(); ++i) {
+            OnlineAccount& account = (*all)[i];
+            if (account.identity == name && account.switchOf(feature).isKnown() &&
+                (!found || (account.providerType == provider && found->providerType != provider))) {
+                found = std::move(account);
+            }
+        }
+        return found;
+    }
+
+    // Whether the online accounts are served and the cloud account has none.
+    bool lack(const std::string& name) const {
+        const auto all = list();
+        return all && std::none_of(all->begin(), all->end(), [&](const OnlineAccount& account) {
+                   return account.identity == name && account.providerType == server.providerType;
+               });
+    }
+
+    // What cannot be switched is in the account file all the same.
+    void set(const OnlineAccount& account, OnlineFeature feature, bool isOn) const {
+        if (OnlineAccounts* const accounts = onlineAccounts()) {
+            accounts->setFeature(account, feature, isOn);
+        }
+    }
+
+    bool makeOnce(const NewOnlineAccount& account) const {
+        OnlineAccounts* const accounts = onlineAccounts();
+        return accounts && accounts->makeOnce(account);
+    }
+};
+
+class OnlineAccountService::Service final : public platform::CloudService {
+  public:
+    Service(std::shared_ptr<const Switches> switches, std::shared_ptr<platform::CloudService> embedded,
+            std::string account, OnlineFeature feature)
+        : _switches(std::move(switches)),
+          _embedded(std::move(embedded)),
+          _account(std::move(account)),
+          _feature(feature) {}
+
+    bool canBeEnabled() override { return _embedded->canBeEnabled(); }
+
+    // A mail account that is switched off does not tell its address; its names may be one.
+    std::optional<PropertyList> propertyValue(const std::string& key) override {
+        std::optional<PropertyList> embedded = _embedded->propertyValue(key);
+        if (_feature != OnlineFeature::Mail || key != platform::kSKPropertyMailEmailAddress) {
+            return embedded;
+        }
+        const auto account = _switches->find(_account, _feature);
+        if (!account || (account->mailAddress.empty() && isText(embedded))) {
+            return embedded;
+        }
+        for (const std::string& text :
+             {account->mailAddress, account->presentationIdentity, account->identity}) {
+            if (looksLikeMailAddress(text)) {
+                return PropertyList(text);
+            }
+        }
+        return embedded;
+    }
+
+    void enableWithWindow(bool enabled, bool creating, platform::Window* window) override {
+        _embedded->enableWithWindow(enabled, creating, window);
+        _switch(enabled);
+    }
+
+    void enableSilently(bool enabled) override {
+        _embedded->enableSilently(enabled);
+        _switch(enabled);
+    }
+
+  private:
+    void _switch(bool enabled) {
+        const auto account = _switches->find(_account, _feature);
+        if (account && account->switchOf(_feature).isOff == enabled) {
+            _switches->set(*account, _feature, enabled);
+        }
+    }
+
+    const std::shared_ptr<const Switches> _switches;
+    const std::shared_ptr<platform::CloudService> _embedded;
+    const std::string _account;
+    const OnlineFeature _feature;
+};
+
+class OnlineAccountService::Account final : public platform::CloudAccount {
+  public:
+    Account(std::shared_ptr<const Switches> switches, std::shared_ptr<platform::CloudAccount> embedded)
+        : _switches(std::move(switches)),
+          _embedded(std::move(embedded)) {}
+
+    std::string accountID() override { return _embedded->accountID(); }
+
+    void suppressFailureDialogs() override { _embedded->suppressFailureDialogs(); }
+
+    std::shared_ptr<platform::CloudService> serviceForID(const std::string& identifier) override {
+        auto service = _embedded->serviceForID(identifier);
+        const auto feature = featureOf(identifier);
+        if (!service || !feature) {
+            return service;
+        }
+        return std::make_shared<Service>(_switches, std::move(service), accountID(), *feature);
+    }
+
+  private:
+    const std::shared_ptr<const Switches> _switches;
+    const std::shared_ptr<platform::CloudAccount> _embedded;
+};
+
+// One sign-in. The embedded service posts its end here; a completed one is passed on when the online account
+// has been made. The embedded service is this one's own, so that no other notification comes here.
+class OnlineAccountService::SignIn final : public platform::NotificationCenter,
+                                           public std::enable_shared_from_this<SignIn> {
+  public:
+    SignIn(const OnlineAccountSurroundings& surroundings, std::shared_ptr<const Switches> switches,
+           const std::string& username, const std::string& password)
+        : _surroundings(surroundings),
+          _switches(std::move(switches)),
+          _account{_switches->server.providerType, username, password, _switches->server.address, {}},
+          _embedded(surroundings.makeEmbedded(*this)) {}
+
+    void start(const PropertyList::Dictionary& delegateRequest) {
+        _embedded->sharedManager().finishSignIn(_account.identity, _account.password, delegateRequest);
+    }
+
+    bool isOver() const { return _isOver; }
+
+    std::unique_ptr<platform::NotificationObservation> addObserver(const std::string& name,
+                                                                   Observer observer) override {
+        return _surroundings.notificationCenter.addObserver(name, std::move(observer));
+    }
+
+    // On the run loop of the thread that asked.
+    void post(const platform::Notification& notification) override {
+        if (notification.name != platform::kSKNotificationSignInCompleted) {
+            _finish(notification);
+            return;
+        }
+        const auto account = _embedded->sharedManager().accountForID(_account.identity, false);
+        for (std::size_t i = 0; i < kServices.size(); ++i) {
+            _account.isOn[i] = _embedded->isServiceEnabled(account.get(), kServices[i]);
+        }
+        const std::shared_ptr<platform::RunLoop> runLoop = _surroundings.runLoops.current();
+        const std::shared_ptr<platform::RunLoopPort> port = runLoop->attachPort();
+        _surroundings.dispatchQueues.global().async(
+            [weak = weak_from_this(), switches = _switches, account = _account, runLoop, port, notification] {
+                const bool isMade = switches->makeOnce(account);
+                runLoop->perform([weak, port, notification, isMade] {
+                    if (const auto self = weak.lock()) {
+                        self->_remember(isMade);
+                        self->_finish(notification);
+                    }
+                });
+            });
+    }
+
+  private:
+    void _remember(bool isMade) {
+        if (isMade) {
+            _surroundings.preferenceStore.setValue(_account.identity, true, kOnlineAccountsDomain);
+            _surroundings.preferenceStore.synchronise(kOnlineAccountsDomain);
+        }
+    }
+
+    void _finish(const platform::Notification& notification) {
+        _account.password.clear();
+        _surroundings.notificationCenter.post(notification);
+        _isOver = true; // an observer that starts the next sign-in must not end this one
+    }
+
+    const OnlineAccountSurroundings& _surroundings;
+    const std::shared_ptr<const Switches> _switches;
+    NewOnlineAccount _account;
+    const std::unique_ptr<platform::AccountService> _embedded;
+    std::atomic<bool> _isOver{false};
+};
+
+OnlineAccountService::OnlineAccountService(OnlineAccountSurroundings surroundings, OnlineAccountServer server)
+    : _surroundings(std::move(surroundings)),
+      _switches(std::make_shared<Switches>(Switches{_surroundings.onlineAccounts, std::move(server)})),
+      _embedded(_surroundings.makeEmbedded(_surroundings.notificationCenter)) {}
+
+OnlineAccountService::~OnlineAccountService() = default;
+
+std::shared_ptr<platform::CloudAccount> OnlineAccountService::loggedInAccount() {
+    auto account = _embedded->loggedInAccount();
+    if (!account) {
+        return nullptr;
+    }
+    const std::string name = account->accountID();
+    const bool wasMade =
+        platform::booleanReading(_surroundings.preferenceStore.copyValue(name, kOnlineAccountsDomain));
+    return wasMade && _switches->lack(name) ? nullptr : _wrap(std::move(account));
+}
+
+bool OnlineAccountService::isServiceEnabled(platform::CloudAccount* account, const std::string& identifier) {
+    const bool isEnabled = _embedded->isServiceEnabled(account, identifier);
+    const auto feature = featureOf(identifier);
+    if (!account || !feature || !account->serviceForID(identifier)) {
+        return isEnabled;
+    }
+    const auto online = _switches->find(account->accountID(), *feature);
+    return online ? !online->switchOf(*feature).isOff : isEnabled;
+}
+
+std::shared_ptr<platform::CloudAccount>
+OnlineAccountService::accountForID(const std::optional<PropertyList>& identifier, bool createIfMissing) {
+    return _wrap(_embedded->sharedManager().accountForID(identifier, createIfMissing));
+}
+
+void OnlineAccountService::authenticate(const std::string& username, const std::string& password,
+                                        const PropertyList::Dictionary& delegateRequest) {
+    _embedded->sharedManager().authenticate(username, password, delegateRequest);
+}
+
+void OnlineAccountService::finishSignIn(const std::string& username, const std::string& password,
+                                        const PropertyList::Dictionary& delegateRequest) {
+    const auto signIn = std::make_shared<SignIn>(_surroundings, _switches, username, password);
+    {
+        const std::lock_guard lock(_mutex);
+        std::erase_if(_signIns, [](const std::shared_ptr<SignIn>& other) { return other->isOver(); });
+        _signIns.push_back(signIn);
+    }
+    signIn->start(delegateRequest);
+}
+
+void OnlineAccountService::markSetupFinished(const std::optional<PropertyList>& information) {
+    _embedded->sharedManager().markSetupFinished(information);
+}
+
+std::shared_ptr<platform::CloudAccount>
+OnlineAccountService::_wrap(std::shared_ptr<platform::CloudAccount> embedded) const {
+    return embedded ? std::make_shared<Account>(_switches, std::move(embedded)) : nullptr;
+}
+
+} // namespace welcomer::desktop

@@ -1,0 +1,40 @@
+// The accounts that the user has with GNOME Online Accounts.
+
+#pragma once
+
+#include "backends/desktop/OnlineAccounts.h"
+
+#include <atomic>
+#include <gio/gio.h>
+#include <memory>
+#include <mutex>
+
+namespace welcomer::desktop {
+
+// Every question asks the daemon anew, which takes about 2 ms, on a connection to the session bus that is
+// this object's own: nothing of it runs on a main context of the process, and the end of the bus does not end
+// the process. A daemon that does not run is started by the bus where it can be. One that has kept a question
+// waiting until the time was up, after 25 s, is not asked again. A switch takes effect after some 300 ms; it
+// is waited for up to ten seconds. Where no keyring takes the password the daemon makes the account all the
+// same, and has the user give it again.
+class GoaOnlineAccounts final : public OnlineAccounts {
+  public:
+    std::optional<std::vector<OnlineAccount>> list() noexcept override;
+    bool setFeature(const OnlineAccount& account, OnlineFeature feature, bool isOn) noexcept override;
+    bool makeOnce(const NewOnlineAccount& account) noexcept override;
+
+  private:
+    struct Unreference {
+        void operator()(GDBusConnection* connection) const { g_object_unref(connection); }
+    };
+    using Connection = std::unique_ptr<GDBusConnection, Unreference>;
+
+    Connection _connection();
+    bool _add(const NewOnlineAccount& account);
+
+    std::mutex _mutex;
+    Connection _bus; // the last one; closed when the bus has gone
+    std::atomic<bool> _isGivenUp{false};
+};
+
+} // namespace welcomer::desktop
