@@ -38,6 +38,13 @@ def mount(source, target, kind=None, flags=0, options=None):
         raise OSError(number, f"mount {source} on {target}: {os.strerror(number)}")
 
 
+def unmount(target):
+    """Lets go of everything mounted on and below a folder."""
+    if _libc.umount2(str(target).encode(), MNT_DETACH) != 0:
+        number = ctypes.get_errno()
+        raise OSError(number, f"umount {target}: {os.strerror(number)}")
+
+
 class Machine:
     """A root folder on a tmpfs. Programs and libraries are this machine's own; everything else is fresh."""
 
@@ -147,7 +154,5 @@ class Machine:
 
     def _unmount(self):
         """Lets go of everything mounted below the root, which leaves an empty folder, and removes that."""
-        if _libc.umount2(str(self.root).encode(), MNT_DETACH) != 0:
-            number = ctypes.get_errno()
-            raise OSError(number, f"umount {self.root}: {os.strerror(number)}")
+        unmount(self.root)
         self.root.rmdir()

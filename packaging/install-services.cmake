@@ -1,0 +1,31 @@
+# Run by `cmake --install`, which has the last word on the prefix, and so on the paths in these files.
+#   PREFIX/lib/systemd   for the prefixes /usr and /usr/local this is on systemd's own search path
+#   /etc/xdg             the only place where sessions look for what they start, whichever of the two it is; with another
+#                        prefix nothing outside it is written
+
+if(IS_ABSOLUTE "${WELCOMER_LIBEXECDIR}")
+    set(WELCOMER_LIBEXEC "${WELCOMER_LIBEXECDIR}")
+else()
+    set(WELCOMER_LIBEXEC "${CMAKE_INSTALL_PREFIX}/${WELCOMER_LIBEXECDIR}")
+endif()
+if(CMAKE_INSTALL_PREFIX MATCHES "^/usr(/local)?/?$")
+    set(WELCOMER_AUTOSTART "/etc/xdg/autostart")
+else()
+    set(WELCOMER_AUTOSTART "${CMAKE_INSTALL_PREFIX}/etc/xdg/autostart")
+endif()
+set(WELCOMER_SYSTEMD "${CMAKE_INSTALL_PREFIX}/lib/systemd")
+
+function(install_service_file name destination)
+    configure_file("${WELCOMER_PACKAGING}/${name}.in" "${WELCOMER_INSTALLED}/${name}" @ONLY)
+    file(INSTALL "${WELCOMER_INSTALLED}/${name}" DESTINATION "${destination}")
+endfunction()
+# install_wish(UNIT TARGET FOLDER): has a target start a unit, without anybody enabling it first.
+function(install_wish unit target folder)
+    file(MAKE_DIRECTORY "${WELCOMER_INSTALLED}/${target}.wants")
+    file(CREATE_LINK "../${unit}" "${WELCOMER_INSTALLED}/${target}.wants/${unit}" SYMBOLIC)
+    file(INSTALL "${WELCOMER_INSTALLED}/${target}.wants/${unit}" DESTINATION "${folder}/${target}.wants")
+endfunction()
+
+install_service_file(welcomer-launch-agents.service "${WELCOMER_SYSTEMD}/user")
+install_wish(welcomer-launch-agents.service graphical-session.target "${WELCOMER_SYSTEMD}/user")
+install_service_file(welcomer-launch-agents.desktop "${WELCOMER_AUTOSTART}")

@@ -1,0 +1,40 @@
+// welcomer-launch-agents, started once or more at each login: starts the user's launch agents once.
+//   --end-of-login   makes the next start a new login's
+
+#include "backends/Backends.h"
+#include "tools/launch-agents/ChildStarter.h"
+#include "tools/launch-agents/UserManagerStarter.h"
+#include "tools/launch-agents/startLaunchAgents.h"
+
+#include <cstdlib>
+#include <iostream>
+#include <string_view>
+
+using namespace welcomer;
+
+int main(int argc, char** argv) {
+    const bool endOfLogin = argc == 2 && argv[1] == std::string_view("--end-of-login");
+    if (argc > 1 && !endOfLogin) {
+        std::cerr << "usage: welcomer-launch-agents [--end-of-login]\n";
+        return 2;
+    }
+    const auto owner = buildPlatform();
+    const platform::ScopedPlatform installed(owner->platform());
+    platform::ProcessIdentity& user = platform::current().processIdentity;
+    const char* const variable = std::getenv("XDG_RUNTIME_DIR");
+    const std::string runtimeFolder = variable ? variable : "";
+    const launch::LoginStamp stamp(runtimeFolder);
+    if (endOfLogin) {
+        stamp.remove();
+        return 0;
+    }
+    const std::string home = user.homeDirectory();
+    launch::startLaunchAgents(home + "/Library/LaunchAgents", user.effectiveUserID(), stamp,
+                              [&]() -> std::unique_ptr<launch::AgentStarter> {
+                                  if (auto manager = launch::UserManagerStarter::connect(runtimeFolder)) {
+                                      return manager;
+                                  }
+                                  return std::make_unique<launch::ChildStarter>(home);
+                              });
+    return 0;
+}
