@@ -8,6 +8,7 @@
 #include "platform/Error.h"
 #include "platform/NetworkConfigStore.h"
 
+#include <algorithm>
 #include <array>
 #include <charconv>
 #include <chrono>
@@ -85,10 +86,14 @@ std::string firstLineOf(const std::string& path) {
     return text.substr(0, text.find('\n'));
 }
 
-// Whether a process is a DHCP client: numbers of processes are used again.
+// Whether a process is a DHCP client: numbers of processes are used again. One that has ended and that nobody
+// has waited for is none any more.
 bool isClient(pid_t process) {
-    const std::string name = firstLineOf("/proc/" + std::to_string(process) + "/comm");
-    return name == kISCName || name == kBusyBoxName;
+    const std::string status = firstLineOf("/proc/" + std::to_string(process) + "/stat");
+    return std::ranges::any_of(std::array{kISCName, kBusyBoxName}, [&](const std::string& name) {
+        const std::string start = std::to_string(process) + " (" + name + ") ";
+        return status.starts_with(start) && !status.substr(start.size()).starts_with('Z');
+    });
 }
 
 int launch(const std::string& program, const std::vector<std::string>& arguments) {
