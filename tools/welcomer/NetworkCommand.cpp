@@ -221,9 +221,10 @@ void registerServices(Session& session) {
 
 void addApplyCommand(CommandLine& commandLine, CLI::App& group) {
     const auto settings = std::make_shared<Settings>();
-    CLI::App& command = commandLine.addCommand(
-        group, "apply", "Configure the network as the user chooses, and check that it works",
-        [=](Session& session) { apply(session, *settings); });
+    CLI::App& command = commandLine.addCommand(group, "apply",
+                                               "Configure the network of this machine, also with --root, as "
+                                               "the user chooses, and check that it works",
+                                               [=](Session& session) { apply(session, *settings); });
     command.add_option("--choice", settings->choice, "lan, wifi or no; only lan configures anything")
         ->required()
         ->check(CLI::IsMember({kUserChoiceLAN, kUserChoiceWiFi, kUserChoiceNoInternet}));
@@ -245,6 +246,9 @@ void addApplyCommand(CommandLine& commandLine, CLI::App& group) {
             "--warning-type", settings->warningType,
             "0: configure and check nothing; 1: wait for the internet; 2: fail; others: check nothing")
         ->type_name("N")
+        ->check([](const std::string& text) {
+            return std::string(text.starts_with('-') ? "a warning type cannot be negative" : "");
+        })
         ->capture_default_str();
     command.add_option("--wait", settings->wait, "How long to wait for the internet")
         ->type_name("SECONDS")

@@ -70,7 +70,9 @@ class ToolTest(unittest.TestCase):
 class CommandLine(ToolTest):
     COMMANDS = [[], ["try"], ["replay"], ["replay", "store"], ["replay", "show"], ["replay", "delete"], ["plugins"],
                 ["plugins", "list"], ["setup"], ["account"], ["account", "add"], ["account", "list"], ["account", "status"],
-                ["account", "sign-in"], ["account", "services"], ["services"], ["services", "list"], ["services", "enable"]]
+                ["account", "sign-in"], ["account", "services"], ["services"], ["services", "list"], ["services", "enable"],
+                ["network"], ["network", "show"], ["network", "ports"], ["network", "probe"], ["network", "apply"],
+                ["network", "register"]]
 
     def test_every_command_explains_itself(self):
         for command in self.COMMANDS:

@@ -1,0 +1,24 @@
+// The tool's own texts.
+
+#include "tools/welcomer/ToolBundle.h"
+
+#include "backends/local/LocalResourceBundles.h"
+
+#include <gtest/gtest.h>
+
+namespace welcomer::tool {
+namespace {
+
+TEST(ToolBundleTest, EveryErrorOfTheNetworkHasATitleAndABody) {
+    const std::string folder = findToolBundle();
+    ASSERT_NE(folder, "");
+    local::LocalResourceBundles bundles{local::RootFolder("/"), folder};
+    for (const char* key :
+         {"NETWORKING_MANAGER_NO_INTERNET_TITLE", "NETWORKING_MANAGER_NO_INTERNET_BODY",
+          "NETWORKING_MANAGER_GENERIC_ERROR_TITLE", "NETWORKING_MANAGER_GENERIC_ERROR_BODY"}) {
+        EXPECT_NE(bundles.openMainBundle()->localizedString(key, ""), "") << key;
+    }
+}
+
+} // namespace
+} // namespace welcomer::tool
