@@ -160,6 +160,7 @@ std::string OnlineAccountsBus::_add(const char* arguments) {
         throw std::runtime_error(std::string("cannot be read: ") + arguments);
     }
     GVariant* const answer = _call(kManagerPath, "org.gnome.OnlineAccounts.Manager", "AddAccount", parsed);
+    g_variant_unref(parsed); // parsing gives a reference, which the call does not take
     const char* path = nullptr;
     g_variant_get(answer, "(&o)", &path);
     std::string result = path;

@@ -1,0 +1,150 @@
+#!/usr/bin/env python3
+"""The installed tool in a user's session with the real daemon of the online accounts, on a machine of its own.
+
+usage: installed_tool_test.py BUILD_DIR
+"""
+
+import json
+import os
+import re
+import shutil
+import sys
+import tempfile
+import unittest
+from pathlib import Path
+
+sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "support"))
+import machine  # noqa: E402
+
+BUILD = None
+PASSWORD = "open sesame"
+RUNTIME = f"/run/user/{machine.UID}"
+SESSION = ["env", f"XDG_RUNTIME_DIR={RUNTIME}", f"DBUS_SESSION_BUS_ADDRESS=unix:path={RUNTIME}/bus",
+           "GIO_USE_VFS=local", "GSETTINGS_BACKEND=memory", "GIO_USE_NETWORK_MONITOR=base"]
+BUS = f"""<!DOCTYPE busconfig PUBLIC "-//freedesktop//DTD D-BUS Bus Configuration 1.0//EN"
+ "http://www.freedesktop.org/standards/dbus/1.0/busconfig.dtd">
+<busconfig><type>session</type><listen>unix:path={RUNTIME}/bus</listen><policy context="default">
+<allow send_destination="*"/><allow receive_sender="*"/><allow own="*"/></policy></busconfig>
+"""
+NAME = "org.gnome.OnlineAccounts"
+ACCOUNTS = "/org/gnome/OnlineAccounts"
+
+
+class InstalledTool(unittest.TestCase):
+    def setUp(self):
+        self.folder = Path(tempfile.mkdtemp(prefix="accounts-tool-"))
+        self.addCleanup(shutil.rmtree, self.folder)
+        self.machine = machine.Machine(self.folder / "machine")
+        self.addCleanup(self.machine.stop)
+        self.machine.install(BUILD)
+        for path in (RUNTIME, "/var/lib/welcomer"):  # the user stands for the server, too
+            folder = self.machine.root / path[1:]
+            folder.mkdir(parents=True)
+            folder.chmod(0o700)
+            os.chown(folder, machine.UID, machine.UID)
+        (self.machine.root / "etc/bus.conf").write_text(BUS, encoding="utf-8")
+        self.start("dbus-daemon", "--nofork", "--config-file=/etc/bus.conf")
+        self.machine.wait_for((self.machine.root / RUNTIME[1:] / "bus").exists, "the bus")
+
+    def start(self, *command, pass_fds=()):
+        daemon = self.machine.start([*SESSION, *command], user=True, pass_fds=pass_fds)
+        self.addCleanup(daemon.wait)
+        self.addCleanup(daemon.kill)
+        return daemon
+
+    def start_daemons(self):
+        reading, writing = os.pipe()
+        os.write(writing, b"keyring")
+        os.close(writing)
+        self.start("sh", "-c", f"exec gnome-keyring-daemon --foreground --unlock --components=secrets <&{reading}",
+                   pass_fds=[reading])
+        os.close(reading)
+        self.start("/usr/libexec/goa-daemon")
+        for name in ("org.freedesktop.secrets", NAME):
+            self.machine.wait_for(lambda: "true" in self.call("org.freedesktop.DBus", "/", "org.freedesktop.DBus."
+                                                              "NameHasOwner", name), name, seconds=60)
+
+    def call(self, name, path, method, *arguments):
+        done = self.machine.run([*SESSION, "gdbus", "call", "--session", "-d", name, "-o", path, "-m", method,
+                                 *arguments], user=True)
+        self.assertEqual(done.returncode, 0, done.stderr)
+        return done.stdout
+
+    def tool(self, *arguments, password=None):
+        """The tool's JSON answer."""
+        files, options = [], []
+        if password:
+            reading, writing = os.pipe()
+            os.write(writing, password.encode() + b"\n")
+            os.close(writing)
+            files, options = [reading], ["--password-fd", str(reading)]
+        done = self.machine.run([*SESSION, "/usr/local/bin/welcomer", "--json", *arguments, *options], user=True,
+                                pass_fds=files)
+        for file in files:
+            os.close(file)
+        self.assertEqual(done.returncode, 0, done.stderr + done.stdout)
+        return json.loads(done.stdout)
+
+    def enabled(self):
+        return {entry["service"] for entry in self.tool("account", "services", "anna")["services"] if entry["enabled"]}
+
+    def online_account(self):
+        """The one account's path, and its interfaces beside the account itself."""
+        objects = self.call(NAME, ACCOUNTS, "org.freedesktop.DBus.ObjectManager.GetManagedObjects")
+        paths = set(re.findall(rf"'({ACCOUNTS}/Accounts/\w+)'", objects))
+        self.assertEqual(len(paths), 1, objects)
+        return paths.pop(), {name for name in ("Calendar", "Contacts", "Files") if f"{NAME}.{name}'" in objects}
+
+    def test_signing_in_makes_the_online_account_and_enabling_switches_it(self):
+        self.start_daemons()
+        self.tool("account", "add", "anna", "--mail", "anna@nimbus.example", password=PASSWORD)
+        self.tool("account", "sign-in", "anna", password=PASSWORD)
+        path, features = self.online_account()
+        self.assertEqual(features, set())
+        self.assertIn(PASSWORD, self.call(NAME, path, f"{NAME}.PasswordBased.GetPassword", "password"))
+        self.assertEqual(self.tool("account", "status")["loggedIn"], "anna")
+        self.assertEqual(self.enabled(), set())
+
+        self.tool("services", "enable", "--account", "anna", "--phase", "pre")
+        self.assertEqual(self.online_account(), (path, {"Files"}))
+        self.assertEqual(self.enabled(), {"photo-stream", "account-sync", "locator", "documents"})
+        self.tool("services", "enable", "--account", "anna", "--phase", "post", "--select", "contacts", "--select",
+                  "reminders")
+        self.assertEqual(self.online_account(), (path, {"Files", "Contacts"}))
+        self.assertEqual(self.enabled(),
+                         {"photo-stream", "account-sync", "locator", "documents", "contacts", "reminders"})
+
+        self.call(NAME, path, f"{NAME}.Account.Remove")
+        self.assertIsNone(self.tool("account", "status")["loggedIn"])
+        self.tool("account", "sign-in", "anna", password=PASSWORD)
+        self.assertEqual(self.online_account()[1], {"Files", "Contacts"}, "what was enabled is on again")
+
+    def test_setting_up_without_a_word_makes_the_online_account_with_what_was_chosen(self):
+        self.start_daemons()
+        self.tool("account", "add", "anna", password=PASSWORD)
+        answers = self.machine.home / "answers.plist"
+        answers.write_text("{ Account = anna; Services = (documents, contacts); }", encoding="utf-8")
+        self.tool("setup", "--answers", f"/home/{machine.USER}/answers.plist", "--bundle",
+                  "/usr/local/share/welcomer/setup-bundle", password=PASSWORD)
+        path, features = self.online_account()
+        self.assertEqual(features, {"Files"}, "contacts wait for the login")
+        self.assertIn("'anna'", self.call(NAME, path, "org.freedesktop.DBus.Properties.Get", f"{NAME}.Account",
+                                          "Identity"))
+        self.assertEqual(self.enabled(), {"documents"})
+
+    def test_without_the_daemon_the_account_file_serves(self):
+        self.tool("account", "add", "anna", password=PASSWORD)
+        self.tool("account", "sign-in", "anna", password=PASSWORD)
+        self.tool("services", "enable", "--account", "anna", "--phase", "pre")
+        self.assertEqual(self.enabled(), {"photo-stream", "account-sync", "locator", "documents"})
+        self.start_daemons()
+        self.assertEqual(self.enabled(), {"photo-stream", "account-sync", "locator", "documents"})
+        self.assertEqual(self.tool("account", "status")["loggedIn"], "anna")
+
+
+if __name__ == "__main__":
+    BUILD = sys.argv.pop(1) if len(sys.argv) > 1 else sys.exit(__doc__)
+    sys.argv.insert(1, BUILD)
+    machine.enter_namespaces()
+    del sys.argv[1]
+    unittest.main(verbosity=2)
