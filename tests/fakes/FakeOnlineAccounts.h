@@ -4,6 +4,7 @@
 
 #include "backends/desktop/OnlineAccounts.h"
 
+#include <functional>
 #include <map>
 #include <optional>
 #include <set>
@@ -30,6 +31,7 @@ class FakeOnlineAccounts final : public desktop::OnlineAccounts {
     // In the order in which they were made, and what each was made with.
     std::vector<desktop::OnlineAccount> accounts;
     std::vector<desktop::NewOnlineAccount> made;
+    std::function<void()> whileMaking; // called when an account is to be made; may be empty
     int writes = 0;
     int questions = 0;
 
@@ -62,6 +64,9 @@ class FakeOnlineAccounts final : public desktop::OnlineAccounts {
     }
 
     bool makeOnce(const desktop::NewOnlineAccount& account) noexcept override {
+        if (whileMaking) {
+            whileMaking();
+        }
         if (!isServing || !canWrite) {
             return false;
         }

@@ -156,9 +156,10 @@ TEST_F(OnlineAccountDaemon, OfDuplicatesTheOneThatWasMadeFirstIsSwitched) {
         EXPECT_EQ(bus.property(paths[i], "ContactsDisabled"), "true") << paths[i];
     }
     bus.remove(paths[0]);
+    bus.remove(paths[1]);
     EXPECT_FALSE(isEnabled(kSKServiceIDContacts));
     enable(kSKServiceIDContacts);
-    EXPECT_EQ(bus.property(paths[1], "ContactsDisabled"), "false");
+    EXPECT_EQ(bus.property(paths[2], "ContactsDisabled"), "false");
     EXPECT_EQ(bus.property(paths[10], "ContactsDisabled"), "true");
 }
 

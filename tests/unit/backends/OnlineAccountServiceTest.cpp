@@ -375,11 +375,20 @@ TEST_F(OnlineAccountServiceTest, AServiceThatEndsDuringASignInTellsNothing) {
     int told = 0;
     const auto observation = backend.center.addObserver(
         kSKNotificationSignInCompleted, [&](const Notification& /*notification*/) { ++told; });
-    auto another = backend.makeService();
-    another->finishSignIn("anna", "secret", {});
-    another.reset();
-    backend.time.runLoops.current()->run(tooLong);
-    EXPECT_EQ(told, 0);
+    for (const bool isLate : {false, true}) {
+        auto another = backend.makeService();
+        online.whileMaking = [&] {
+            another.reset();
+        };
+        another->finishSignIn("anna", "secret", {});
+        if (!isLate) {
+            another.reset();
+        }
+        backend.time.runLoops.current()->run(tooLong);
+        EXPECT_EQ(another, nullptr);
+        EXPECT_EQ(told, 0);
+    }
+    EXPECT_EQ(online.made.size(), 1U);
 }
 
 TEST_F(OnlineAccountServiceTest, AnObserverMayStartTheNextSignIn) {
