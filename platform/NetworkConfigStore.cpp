@@ -32,6 +32,8 @@ std::string networkConfigStatusText(std::int32_t status) {
         return "the name servers are another program's";
     case kNetworkConfigNameServersNotWritten:
         return "the name servers could not be stored";
+    case kNetworkConfigNotActivated:
+        return "the network did not come up with this configuration";
     default:
         break;
     }

@@ -58,6 +58,7 @@ enum NetworkConfigStatus : std::int32_t {
     kNetworkConfigDHCPClientFailed = 10,      // it could not be started
     kNetworkConfigNameServersElsewhere = 11,  // another program decides about the name servers
     kNetworkConfigNameServersNotWritten = 12, // the system refused to store them
+    kNetworkConfigNotActivated = 13,          // the machine's network service could not put it to use
     kNetworkConfigKernelRefused = 1000,       // and above: the kernel refused, with its error number added
 };
 

@@ -18,7 +18,8 @@ PlatformOptions withRunLoops(PlatformOptions options, platform::RunLoops& runLoo
 }
 
 // The local platform with the desktop's services in their places.
-platform::Platform withDesktop(const platform::Platform& local, platform::AccountService& accountService) {
+platform::Platform withDesktop(const platform::Platform& local, platform::AccountService& accountService,
+                               DesktopNetwork& network, platform::HostReachability& hostReachability) {
     return {local.systemLog,
             local.fileSystem,
             local.processIdentity,
@@ -30,13 +31,13 @@ platform::Platform withDesktop(const platform::Platform& local, platform::Accoun
             local.dispatchQueues,
             local.preferenceStore,
             local.systemVersionInfo,
-            local.hostReachability,
+            hostReachability,
             local.notificationCenter,
             accountService,
             local.accountDirectory,
             local.processLauncher,
-            local.networkConfigStore,
-            local.networkStateStore,
+            network.configStore(),
+            network.stateStore(),
             local.directoryService};
 }
 
@@ -46,7 +47,11 @@ DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
     : _local(withRunLoops(options, _runLoops)),
       _accountService(_accountSurroundings(options.root), {std::string(configuration::kOnlineAccountProvider),
                                                            std::string(configuration::kOnlineAccountServer)}),
-      _platform(withDesktop(_local.platform(), _accountService)) {}
+      _network({_local.platform().networkConfigStore, _local.platform().networkStateStore,
+                _local.platform().hostReachability}),
+      _platform(
+          withDesktop(_local.platform(), _accountService, _network,
+                      options.hostReachability ? *options.hostReachability : _network.hostReachability())) {}
 
 std::vector<platform::BackendReport> DesktopPlatform::backendReports() {
     std::vector<platform::BackendReport> reports;
@@ -54,6 +59,8 @@ std::vector<platform::BackendReport> DesktopPlatform::backendReports() {
     platform::BackendReport accounts{"AccountService", "account file", "", ""};
     _onlineAccounts.describe(accounts);
     reports.push_back(accounts);
+    const std::vector<platform::BackendReport> network = _network.reports();
+    reports.insert(reports.end(), network.begin(), network.end());
     return reports;
 }
 

@@ -5,6 +5,7 @@
 
 #include "backends/Backends.h"
 #include "backends/desktop/DesktopModule.h"
+#include "backends/desktop/DesktopNetwork.h"
 #include "backends/desktop/DesktopRunLoops.h"
 #include "backends/desktop/OnlineAccountService.h"
 #include "backends/desktop/OnlineAccountsModule.h"
@@ -31,6 +32,7 @@ class DesktopPlatform final : public PlatformOwner {
     local::LocalPlatform _local; // stands on _runLoops
     DesktopModule<OnlineAccountsModule> _onlineAccounts{{}};
     OnlineAccountService _accountService;
+    DesktopNetwork _network;
     const platform::Platform _platform;
 };
 

@@ -1,8 +1,7 @@
-// What the stores of the network do, on the kernel, in a network namespace of each test's own.
+// What the stores of the network do, whatever they stand on, and what those on the kernel do besides. Each
+// test has a network namespace of its own.
 
-#include "backends/local/KernelNetwork.h"
-#include "backends/local/LocalNetworkConfigStore.h"
-#include "backends/local/LocalNetworkStateStore.h"
+#include "tests/contract/NetworkBackends.h"
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/support/NetworkNamespace.h"
 
@@ -28,18 +27,21 @@ using platform::NetworkEntity;
 
 const std::string kFile = "/var/lib/welcomer/network.plist";
 
-class NetworkStoresTest : public testing::Test {
+class NetworkStoresFixture : public testing::Test {
   protected:
-    void SetUp() override {
+    void start(const NetworkBackendMaker& make) {
         if (!mayHaveNetwork()) {
             GTEST_SKIP() << "needs the right to make a network namespace";
         }
         enterNetworkNamespace();
+        backend = make(root);
         root.addFile("/etc/resolv.conf",
                      "# kept\nnameserver 192.0.2.53\nsearch home.example other.example\n");
     }
 
-    std::optional<Dictionary> value(const Key& key) { return stateStore.open("a test")->copyValue(key); }
+    std::optional<Dictionary> value(const Key& key) {
+        return backend->stateStore().open("a test")->copyValue(key);
+    }
     std::optional<Dictionary> globalIPv4() {
         return value(Key::global(NetworkDomain::State, NetworkEntity::IPv4));
     }
@@ -62,7 +64,7 @@ class NetworkStoresTest : public testing::Test {
     }
     std::vector<std::string> interfaces() {
         std::vector<std::string> all;
-        for (const auto& each : store.copyInterfaces()) {
+        for (const auto& each : store().copyInterfaces()) {
             all.push_back(shown(each.get()));
         }
         return all;
@@ -86,7 +88,7 @@ class NetworkStoresTest : public testing::Test {
     // Sets the protocols of a device's service, commits and applies.
     //  result  the last error of what failed, or 0
     std::int32_t configure(const std::string& device, const Dictionary& ipv4, const Dictionary& dns = {}) {
-        const auto connection = store.open("a test");
+        const auto connection = store().open("a test");
         const auto service = serviceOf(*connection, device);
         if (!service) {
             ADD_FAILURE() << "no service of " << device;
@@ -96,10 +98,10 @@ class NetworkStoresTest : public testing::Test {
         if (!dns.empty()) {
             EXPECT_TRUE(service->copyProtocol("DNS")->setConfiguration(dns));
         }
-        EXPECT_TRUE(connection->commitChanges()) << store.errorText(store.lastErrorCode());
+        EXPECT_TRUE(connection->commitChanges()) << store().errorText(store().lastErrorCode());
         const bool isApplied = connection->applyChanges();
-        EXPECT_EQ(isApplied, store.lastErrorCode() == 0);
-        return store.lastErrorCode();
+        EXPECT_EQ(isApplied, store().lastErrorCode() == 0);
+        return store().lastErrorCode();
     }
 
     static Dictionary manual(const std::string& address, const std::string& mask, const std::string& router) {
@@ -116,21 +118,45 @@ class NetworkStoresTest : public testing::Test {
     static std::string defaultRoutes() {
         return shell("ip -4 route show default | sed 's/ linkdown//; s/ *$//'");
     }
-
-    // A pair whose other end is up too.
-    static void addPair(const std::string& device) {
-        shell("ip link add " + device + " type veth peer name p-" + device + " && ip link set " + device +
-              " up && ip link set p-" + device + " up");
+    // Without what each backend chooses by itself.
+    static std::string plainDefaultRoutes() {
+        return shell("ip -4 route show default | sed 's/ metric.*//; s/ linkdown//; s/ *$//'");
     }
 
+    // A pair whose other end is up too, and which the backend has noticed.
+    void addPair(const std::string& device) {
+        shell("ip link add " + device + " type veth peer name p-" + device + " && ip link set " + device +
+              " up && ip link set p-" + device + " up");
+        backend->waitForDevice(device);
+    }
+    std::string idOf(const std::string& device) {
+        return *serviceOf(*store().open("a test"), device)->serviceID();
+    }
+    platform::NetworkConfigStore& store() { return backend->configStore(); }
+
     TemporaryRoot root;
-    local::LocalNetworkConfigStore store{local::RootFolder(root.path())};
-    local::LocalNetworkStateStore stateStore{local::RootFolder(root.path())};
+    std::unique_ptr<NetworkBackend> backend;
+};
+
+// On every backend.
+class NetworkStoresContractTest : public NetworkStoresFixture,
+                                  public testing::WithParamInterface<NamedNetworkBackend> {
+  protected:
+    void SetUp() override { start(GetParam().make); }
+};
+
+INSTANTIATE_TEST_SUITE_P(Every, NetworkStoresContractTest, testing::ValuesIn(networkBackends()),
+                         [](const auto& each) { return each.param.name; });
+
+// On the kernel alone: what is in the file, and what the kernel has that nobody configured.
+class NetworkStoresTest : public NetworkStoresFixture {
+  protected:
+    void SetUp() override { start(networkBackends().front().make); }
 };
 
 // State
 
-TEST_F(NetworkStoresTest, AMachineWithoutLinksHasNoState) {
+TEST_P(NetworkStoresContractTest, AMachineWithoutLinksHasNoState) {
     EXPECT_EQ(globalIPv4(), std::nullopt);
     EXPECT_EQ(serviceIPv4("eth7"), std::nullopt);
     EXPECT_EQ(link("eth7"), std::nullopt);
@@ -139,17 +165,17 @@ TEST_F(NetworkStoresTest, AMachineWithoutLinksHasNoState) {
     EXPECT_TRUE(interfaces().empty());
 }
 
-TEST_F(NetworkStoresTest, ALinkIsActiveWhileItIsUpAndItsPeerIsToo) {
-    shell("ip link add eth7 type veth peer name peer7");
-    EXPECT_EQ(link("eth7"), active(false));
-    shell("ip link set eth7 up");
-    EXPECT_EQ(link("eth7"), active(false));
-    shell("ip link set peer7 up");
-    EXPECT_EQ(link("eth7"), active(true));
-    shell("ip link set eth7 down");
-    EXPECT_EQ(link("eth7"), active(false));
-    shell("ip link set eth7 up && ip link set peer7 down");
-    EXPECT_EQ(link("eth7"), active(false));
+TEST_P(NetworkStoresContractTest, ALinkIsActiveWhileItIsUpAndItsPeerIsToo) {
+    shell("ip link add p-seven type veth peer name p-eight");
+    EXPECT_EQ(link("p-seven"), active(false));
+    shell("ip link set p-seven up");
+    EXPECT_EQ(link("p-seven"), active(false));
+    shell("ip link set p-eight up");
+    EXPECT_EQ(link("p-seven"), active(true));
+    shell("ip link set p-seven down");
+    EXPECT_EQ(link("p-seven"), active(false));
+    shell("ip link set p-seven up && ip link set p-eight down");
+    EXPECT_EQ(link("p-seven"), active(false));
 }
 
 TEST_F(NetworkStoresTest, TheAddressesOfAServiceAreThoseOfItsDeviceInTheKernelsOrder) {
@@ -201,7 +227,7 @@ TEST_F(NetworkStoresTest, ServersAndDomainComeFromTheResolversFile) {
     EXPECT_EQ(value(key), std::nullopt);
 }
 
-TEST_F(NetworkStoresTest, OtherKeysHaveNoValue) {
+TEST_P(NetworkStoresContractTest, OtherKeysHaveNoValue) {
     addPair("eth7");
     EXPECT_EQ(value(Key::global(NetworkDomain::Setup, NetworkEntity::IPv4)), std::nullopt);
     EXPECT_EQ(value(Key::global(NetworkDomain::State, NetworkEntity::Link)), std::nullopt);
@@ -221,14 +247,14 @@ TEST_F(NetworkStoresTest, TheSetupDomainIsWhatIsStored) {
 
 // Interfaces
 
-TEST_F(NetworkStoresTest, EveryLinkButTheLoopbackIsAnInterfaceWithItsKind) {
+TEST_P(NetworkStoresContractTest, EveryLinkButTheLoopbackIsAnInterfaceWithItsKind) {
     shell("ip link add eth7 type veth peer name eth8 && ip link add br0 type bridge && "
           "ip link set eth7 master br0 && ip link add mac0 link eth8 type macvlan && ip link add br1 type "
           "bridge");
     EXPECT_EQ(interfaces(),
               (std::vector<std::string>{"Ethernet eth8", "Ethernet eth7", "Bridge br0 > Ethernet eth7",
                                         "MACVLAN mac0 > Ethernet eth8", "Bridge br1"}));
-    EXPECT_EQ(store.copyInterfaces().front()->displayName(), "Ethernet (eth8)");
+    EXPECT_EQ(store().copyInterfaces().front()->displayName(), "Ethernet (eth8)");
 }
 
 TEST_F(NetworkStoresTest, ALinkWithAWirelessDeviceIsWireless) {
@@ -241,15 +267,15 @@ TEST_F(NetworkStoresTest, ALinkWithAWirelessDeviceIsWireless) {
 
 TEST_F(NetworkStoresTest, AThousandLinksAreAllListed) {
     shell("for i in $(seq 500); do echo link add v$i type veth peer name w$i; done | ip -batch -");
-    EXPECT_EQ(store.copyInterfaces().size(), 1000U);
-    EXPECT_EQ(store.open("a test")->copyCurrentSet()->copyServices()->size(), 1000U);
+    EXPECT_EQ(store().copyInterfaces().size(), 1000U);
+    EXPECT_EQ(store().open("a test")->copyCurrentSet()->copyServices()->size(), 1000U);
 }
 
 // Configuration
 
 TEST_F(NetworkStoresTest, HardwareHasAServiceThatIsStoredWhenItIsEstablished) {
     addPair("eth7");
-    const auto connection = store.open("a test");
+    const auto connection = store().open("a test");
     const auto set = connection->copyCurrentSet();
     ASSERT_NE(set, nullptr);
     EXPECT_EQ(set->copyServices()->size(), 2U);
@@ -258,9 +284,9 @@ TEST_F(NetworkStoresTest, HardwareHasAServiceThatIsStoredWhenItIsEstablished) {
     EXPECT_TRUE(connection->commitChanges());
     EXPECT_NE(root.content(kFile), std::nullopt);
     EXPECT_FALSE(set->establishDefaultConfiguration());
-    EXPECT_EQ(store.lastErrorCode(), 0);
+    EXPECT_EQ(store().lastErrorCode(), 0);
 
-    const auto other = store.open("a test");
+    const auto other = store().open("a test");
     EXPECT_FALSE(other->copyCurrentSet()->establishDefaultConfiguration());
     const auto service = serviceOf(*other, "eth7");
     ASSERT_NE(service, nullptr);
@@ -271,8 +297,8 @@ TEST_F(NetworkStoresTest, HardwareHasAServiceThatIsStoredWhenItIsEstablished) {
     EXPECT_EQ(service->copyProtocol("Other"), nullptr);
 }
 
-TEST_F(NetworkStoresTest, HardwareThatAppearsLaterIsEstablishedToo) {
-    const auto connection = store.open("a test");
+TEST_P(NetworkStoresContractTest, HardwareThatAppearsLaterIsEstablishedToo) {
+    const auto connection = store().open("a test");
     const auto set = connection->copyCurrentSet();
     EXPECT_FALSE(set->establishDefaultConfiguration());
     addPair("eth7");
@@ -284,7 +310,7 @@ TEST_F(NetworkStoresTest, PortsOfABridgeAndStackedLinksGetNoServiceButTheBridgeD
           "bridge && "
           "ip link set eth7 master br0 && ip link add mac0 link eth8 type macvlan");
     std::vector<std::string> found;
-    const auto services = store.open("a test")->copyCurrentSet()->copyServices();
+    const auto services = store().open("a test")->copyCurrentSet()->copyServices();
     for (const auto& each : *services) {
         found.push_back(shown(each->interface()));
     }
@@ -293,18 +319,18 @@ TEST_F(NetworkStoresTest, PortsOfABridgeAndStackedLinksGetNoServiceButTheBridgeD
 
 TEST_F(NetworkStoresTest, AStoredDefaultConfiguresNothing) {
     addPair("eth7");
-    const auto connection = store.open("a test");
+    const auto connection = store().open("a test");
     connection->copyCurrentSet()->establishDefaultConfiguration();
     EXPECT_TRUE(connection->commitChanges());
     EXPECT_TRUE(connection->applyChanges());
-    EXPECT_EQ(store.lastErrorCode(), 0);
+    EXPECT_EQ(store().lastErrorCode(), 0);
     EXPECT_FALSE(std::filesystem::exists(root.locate("/run/welcomer")));
 }
 
 TEST_F(NetworkStoresTest, ChangesAreSeenHereAtOnceAndByOthersOnceCommitted) {
     addPair("eth7");
-    const auto connection = store.open("a test");
-    const auto other = store.open("another");
+    const auto connection = store().open("a test");
+    const auto other = store().open("another");
     const auto service = serviceOf(*connection, "eth7");
     EXPECT_TRUE(service->copyProtocol("IPv4")->setConfiguration({{"ConfigMethod", "Manual"}}));
     EXPECT_TRUE(service->addProtocolType("IPv6"));
@@ -320,7 +346,7 @@ TEST_F(NetworkStoresTest, ChangesAreSeenHereAtOnceAndByOthersOnceCommitted) {
 
 TEST_F(NetworkStoresTest, SynchronizingDropsChanges) {
     addPair("eth7");
-    const auto connection = store.open("a test");
+    const auto connection = store().open("a test");
     serviceOf(*connection, "eth7")->copyProtocol("IPv4")->setConfiguration({{"ConfigMethod", "Manual"}});
     connection->synchronize();
     EXPECT_TRUE(connection->commitChanges());
@@ -330,24 +356,24 @@ TEST_F(NetworkStoresTest, SynchronizingDropsChanges) {
 
 TEST_F(NetworkStoresTest, TwoConnectionsLoseNoneOfTheirChanges) {
     addPair("eth7");
-    const auto first = store.open("a test");
-    const auto second = store.open("another");
+    const auto first = store().open("a test");
+    const auto second = store().open("another");
     serviceOf(*first, "eth7")->addProtocolType("One");
     serviceOf(*second, "eth7")->addProtocolType("Two");
     serviceOf(*second, "p-eth7")->addProtocolType("Three");
     EXPECT_TRUE(first->commitChanges());
     EXPECT_TRUE(second->commitChanges());
-    const auto read = store.open("a test");
+    const auto read = store().open("a test");
     EXPECT_NE(serviceOf(*read, "eth7")->copyProtocol("One"), nullptr);
     EXPECT_NE(serviceOf(*read, "eth7")->copyProtocol("Two"), nullptr);
     EXPECT_NE(serviceOf(*read, "p-eth7")->copyProtocol("Three"), nullptr);
 }
 
-TEST_F(NetworkStoresTest, AProtocolThatIsThereIsNotAddedAgain) {
+TEST_P(NetworkStoresContractTest, AProtocolThatIsThereIsNotAddedAgain) {
     addPair("eth7");
-    const auto connection = store.open("a test");
+    const auto connection = store().open("a test");
     EXPECT_FALSE(serviceOf(*connection, "eth7")->addProtocolType("IPv4"));
-    EXPECT_EQ(store.lastErrorCode(), platform::kNetworkConfigAlreadyThere);
+    EXPECT_EQ(store().lastErrorCode(), platform::kNetworkConfigAlreadyThere);
     EXPECT_EQ(serviceOf(*connection, "eth7")->copyProtocol("IPv4")->configuration(),
               (Dictionary{{"ConfigMethod", "DHCP"}}));
 }
@@ -362,10 +388,10 @@ TEST_F(NetworkStoresTest, ADamagedFileCountsAsEmptyAndIsSetAside) {
 TEST_F(NetworkStoresTest, AFileWithoutTheSetItNamesHasNoCurrentSet) {
     addPair("eth7");
     root.addFile(kFile, "{ CurrentSet = office; Sets = { home = { Services = (); }; }; }");
-    EXPECT_EQ(store.open("a test")->copyCurrentSet(), nullptr);
+    EXPECT_EQ(store().open("a test")->copyCurrentSet(), nullptr);
     root.addFile(kFile, "{ CurrentSet = home; Sets = { home = { Services = (w, gone, (x)); }; }; "
                         "Services = { w = { Device = eth9; Name = Mine; }; }; }");
-    const auto connection = store.open("a test");
+    const auto connection = store().open("a test");
     const auto services = connection->copyCurrentSet()->copyServices();
     ASSERT_EQ(services->size(), 3U); // and the hardware's
     EXPECT_EQ(services->front()->name(), "Mine");
@@ -379,30 +405,30 @@ TEST_F(NetworkStoresTest, FilesThatMakeNoSenseAreReadAsEmpty) {
          {"()", "{ Sets = (); Services = text; }", "{ Sets = { automatic = ( ); }; }",
           "{ Sets = { automatic = { Services = { }; }; }; Services = { eth7 = text; }; }"}) {
         root.addFile(kFile, text);
-        const auto connection = store.open("a test");
+        const auto connection = store().open("a test");
         ASSERT_NE(connection->copyCurrentSet(), nullptr) << text;
         EXPECT_TRUE(connection->copyCurrentSet()->establishDefaultConfiguration()) << text;
         EXPECT_TRUE(connection->commitChanges()) << text;
-        EXPECT_NE(serviceOf(*store.open("a test"), "eth7"), nullptr) << text;
+        EXPECT_NE(serviceOf(*store().open("a test"), "eth7"), nullptr) << text;
     }
 }
 
 TEST_F(NetworkStoresTest, AFolderThatCannotBeMadeIsAWriteError) {
     addPair("eth7");
     root.addFile("/var/lib", "a file");
-    const auto connection = store.open("a test");
+    const auto connection = store().open("a test");
     connection->copyCurrentSet()->establishDefaultConfiguration();
     EXPECT_FALSE(connection->commitChanges());
-    EXPECT_EQ(store.lastErrorCode(), platform::kNetworkConfigWriteFailed);
+    EXPECT_EQ(store().lastErrorCode(), platform::kNetworkConfigWriteFailed);
 }
 
 TEST_F(NetworkStoresTest, AFileThatIsNoneIsAReadError) {
     addPair("eth7");
     root.addDirectory(kFile);
-    const auto connection = store.open("a test");
+    const auto connection = store().open("a test");
     connection->copyCurrentSet()->establishDefaultConfiguration();
     EXPECT_FALSE(connection->commitChanges());
-    EXPECT_EQ(store.lastErrorCode(), platform::kNetworkConfigReadFailed);
+    EXPECT_EQ(store().lastErrorCode(), platform::kNetworkConfigReadFailed);
 }
 
 TEST_F(NetworkStoresTest, AnOrdinaryUserReadsEverythingAndIsRefusedToChangeAnything) {
@@ -421,13 +447,13 @@ TEST_F(NetworkStoresTest, AnOrdinaryUserReadsEverythingAndIsRefusedToChangeAnyth
             globalIPv4()->at("Router") != PropertyList("192.0.2.1")) {
             ::_exit(2);
         }
-        const auto connection = store.open("a test");
+        const auto connection = store().open("a test");
         const auto protocol = serviceOf(*connection, "eth7")->copyProtocol("IPv4");
         if (protocol->configuration()->at("ConfigMethod") != PropertyList("Manual") ||
             !protocol->setConfiguration(manual("192.0.2.8", "255.255.255.0", ""))) {
             ::_exit(3);
         }
-        if (connection->commitChanges() || store.lastErrorCode() != platform::kNetworkConfigAccessDenied) {
+        if (connection->commitChanges() || store().lastErrorCode() != platform::kNetworkConfigAccessDenied) {
             ::_exit(4);
         }
         ::_exit(0);
@@ -450,7 +476,7 @@ TEST_F(NetworkStoresTest, AManualConfigurationSetsAddressMaskAndRouterAndBringsT
     EXPECT_EQ(link("eth7"), active(true));
 }
 
-TEST_F(NetworkStoresTest, AManualConfigurationReplacesWhatWasThere) {
+TEST_P(NetworkStoresContractTest, AManualConfigurationReplacesWhatWasThere) {
     addPair("eth7");
     const std::vector<std::string> before = {
         "ip addr add 10.0.0.9/8 dev eth7 && ip route add default via 10.0.0.1",
@@ -463,16 +489,16 @@ TEST_F(NetworkStoresTest, AManualConfigurationReplacesWhatWasThere) {
         shell("ip -4 addr flush dev eth7 && " + commands);
         EXPECT_EQ(configure("eth7", manual("192.0.2.7", "255.255.255.0", "192.0.2.1")), 0) << commands;
         EXPECT_EQ(addresses("eth7"), "192.0.2.7/24\n") << commands;
-        EXPECT_EQ(defaultRoutes(), "default via 192.0.2.1 dev eth7 proto static\n") << commands;
+        EXPECT_EQ(plainDefaultRoutes(), "default via 192.0.2.1 dev eth7 proto static\n") << commands;
     }
 }
 
-TEST_F(NetworkStoresTest, ApplyingTheSameAgainChangesNothing) {
+TEST_P(NetworkStoresContractTest, ApplyingTheSameAgainChangesNothing) {
     addPair("eth7");
     for (int round = 0; round < 3; ++round) {
         EXPECT_EQ(configure("eth7", manual("192.0.2.7", "255.255.255.0", "192.0.2.1")), 0);
         EXPECT_EQ(addresses("eth7"), "192.0.2.7/24\n");
-        EXPECT_EQ(defaultRoutes(), "default via 192.0.2.1 dev eth7 proto static\n");
+        EXPECT_EQ(plainDefaultRoutes(), "default via 192.0.2.1 dev eth7 proto static\n");
     }
 }
 
@@ -498,7 +524,7 @@ TEST_F(NetworkStoresTest, TheManualDHCPMethodSetsTheAddressWithTheMaskThatIsTher
     EXPECT_EQ(configure("eth7", inform), platform::kNetworkConfigInvalid);
 }
 
-TEST_F(NetworkStoresTest, WhatMakesNoSenseIsRefusedAndChangesNothing) {
+TEST_P(NetworkStoresContractTest, WhatMakesNoSenseIsRefusedAndChangesNothing) {
     addPair("eth7");
     shell("ip addr add 10.0.0.9/8 dev eth7");
     const std::string good = "255.255.255.0";
@@ -531,21 +557,21 @@ TEST_F(NetworkStoresTest, ARouterThatTheKernelRefusesIsAnErrorAndTheAddressesSta
     shell("ip addr add 10.0.0.9/8 dev eth7 && ip route add default via 10.0.0.1");
     EXPECT_EQ(configure("eth7", manual("192.0.2.7", "255.255.255.0", "198.51.100.1")),
               platform::kNetworkConfigKernelRefused + ENETUNREACH);
-    EXPECT_EQ(store.errorText(store.lastErrorCode()), "the kernel refused: Network is unreachable");
+    EXPECT_EQ(store().errorText(store().lastErrorCode()), "the kernel refused: Network is unreachable");
     EXPECT_EQ(addresses("eth7"), "10.0.0.9/8\n");
     EXPECT_EQ(defaultRoutes(), "default via 10.0.0.1 dev eth7\n");
 }
 
-TEST_F(NetworkStoresTest, ADeviceThatIsGoneIsAnError) {
+TEST_P(NetworkStoresContractTest, ADeviceThatIsGoneIsAnError) {
     addPair("eth7");
-    const auto connection = store.open("a test");
+    const auto connection = store().open("a test");
     serviceOf(*connection, "eth7")
         ->copyProtocol("IPv4")
         ->setConfiguration(manual("192.0.2.7", "255.255.255.0", ""));
     shell("ip link del eth7");
     EXPECT_TRUE(connection->commitChanges());
     EXPECT_FALSE(connection->applyChanges());
-    EXPECT_EQ(store.lastErrorCode(), platform::kNetworkConfigNoDevice);
+    EXPECT_EQ(store().lastErrorCode(), platform::kNetworkConfigNoDevice);
     addPair("eth7");
     EXPECT_TRUE(connection->applyChanges()); // what failed can be tried again
     EXPECT_EQ(addresses("eth7"), "192.0.2.7/24\n");
@@ -616,6 +642,141 @@ TEST_F(NetworkStoresTest, TheLinkLocalMethodAndNoMethodConfigureNothing) {
     EXPECT_EQ(configure("eth7", {{"ConfigMethod", "LinkLocal"}}), 0);
     EXPECT_EQ(configure("eth7", Dictionary()), 0);
     EXPECT_EQ(addresses("eth7"), "10.0.0.9/8\n");
+}
+
+TEST_P(NetworkStoresContractTest, TheServiceThatTheTrafficTakesIsPrimary) {
+    addPair("eth7");
+    addPair("eth8");
+    EXPECT_EQ(configure("eth8", manual("198.51.100.7", "255.255.255.128", "")), 0);
+    EXPECT_EQ(globalIPv4(), std::nullopt);
+    EXPECT_EQ(configure("eth7", manual("192.0.2.7", "255.255.254.0", "192.0.2.1")), 0);
+    const std::string id = idOf("eth7");
+    EXPECT_EQ(globalIPv4(), (Dictionary{{"PrimaryService", id}, {"Router", "192.0.2.1"}}));
+    EXPECT_EQ(serviceIPv4(id),
+              (Dictionary{{"Addresses", Array{"192.0.2.7"}}, {"SubnetMasks", Array{"255.255.254.0"}}}));
+    EXPECT_EQ(serviceIPv4(idOf("eth8"))->at("SubnetMasks"), PropertyList(Array{"255.255.255.128"}));
+    EXPECT_EQ(value(Key::service(NetworkDomain::Setup, id, NetworkEntity::IPv4)),
+              manual("192.0.2.7", "255.255.254.0", "192.0.2.1"));
+    EXPECT_EQ(value(Key::service(NetworkDomain::Setup, "no such", NetworkEntity::IPv4)), std::nullopt);
+}
+
+TEST_P(NetworkStoresContractTest, WithoutServersOfItsOwnTheResolversFileCounts) {
+    addPair("eth7");
+    EXPECT_EQ(configure("eth7", manual("192.0.2.7", "255.255.255.0", "192.0.2.1")), 0);
+    EXPECT_EQ(value(Key::global(NetworkDomain::State, NetworkEntity::DNS)),
+              (Dictionary{{"ServerAddresses", Array{"192.0.2.53"}}, {"DomainName", "home.example"}}));
+}
+
+TEST_P(NetworkStoresContractTest, HardwareHasAServiceWhichEstablishingStores) {
+    addPair("eth7");
+    const auto connection = store().open("a test");
+    const auto set = connection->copyCurrentSet();
+    const std::string id = *serviceOf(*connection, "eth7")->serviceID();
+    EXPECT_TRUE(set->establishDefaultConfiguration());
+    EXPECT_TRUE(connection->commitChanges());
+    EXPECT_FALSE(set->establishDefaultConfiguration());
+    EXPECT_EQ(store().lastErrorCode(), 0);
+    const auto other = store().open("a test");
+    EXPECT_FALSE(other->copyCurrentSet()->establishDefaultConfiguration());
+    const auto service = serviceOf(*other, "eth7");
+    EXPECT_EQ(service->serviceID(), id);
+    EXPECT_EQ(service->name(), "Ethernet (eth7)");
+    EXPECT_EQ(service->copyProtocol("IPv4")->configuration(), (Dictionary{{"ConfigMethod", "DHCP"}}));
+    EXPECT_EQ(service->copyProtocol("DNS")->configuration(), std::nullopt);
+    EXPECT_EQ(service->copyProtocols()->size(), 2U);
+    EXPECT_EQ(service->copyProtocol("Other"), nullptr);
+}
+
+TEST_P(NetworkStoresContractTest, ChangesAreSeenHereAtOnceAndByOthersOnceTheySynchronize) {
+    addPair("eth7");
+    const auto connection = store().open("a test");
+    const auto other = store().open("another");
+    const auto service = serviceOf(*connection, "eth7");
+    EXPECT_TRUE(service->copyProtocol("IPv4")->setConfiguration({{"ConfigMethod", "BOOTP"}}));
+    EXPECT_TRUE(service->addProtocolType("IPv6"));
+    EXPECT_TRUE(service->setEnabled(false));
+    EXPECT_EQ(service->copyProtocol("IPv4")->configuration(), (Dictionary{{"ConfigMethod", "BOOTP"}}));
+    EXPECT_EQ(service->copyProtocol("IPv6")->configuration(), std::nullopt);
+    EXPECT_EQ(serviceOf(*store().open("a test"), "eth7")->copyProtocol("IPv6"), nullptr);
+    EXPECT_TRUE(connection->commitChanges());
+    EXPECT_EQ(serviceOf(*other, "eth7")->copyProtocol("IPv6"), nullptr);
+    other->synchronize();
+    EXPECT_NE(serviceOf(*other, "eth7")->copyProtocol("IPv6"), nullptr);
+    EXPECT_EQ(serviceOf(*other, "eth7")->copyProtocol("IPv4")->configuration(),
+              (Dictionary{{"ConfigMethod", "BOOTP"}}));
+}
+
+TEST_P(NetworkStoresContractTest, SynchronizingDropsWhatIsNotCommitted) {
+    addPair("eth7");
+    const auto connection = store().open("a test");
+    serviceOf(*connection, "eth7")->copyProtocol("IPv4")->setConfiguration({{"ConfigMethod", "Manual"}});
+    connection->synchronize();
+    EXPECT_TRUE(connection->commitChanges());
+    EXPECT_TRUE(connection->applyChanges());
+    EXPECT_EQ(serviceOf(*store().open("a test"), "eth7")->copyProtocol("IPv4")->configuration(),
+              (Dictionary{{"ConfigMethod", "DHCP"}}));
+}
+
+TEST_P(NetworkStoresContractTest, ConnectionsLoseNoneOfTheirChanges) {
+    addPair("eth7");
+    addPair("eth8");
+    const auto first = store().open("a test");
+    const auto second = store().open("another");
+    serviceOf(*first, "eth7")->addProtocolType("One");
+    serviceOf(*second, "eth7")->addProtocolType("Two");
+    serviceOf(*second, "eth8")->addProtocolType("Three");
+    EXPECT_TRUE(first->commitChanges());
+    EXPECT_TRUE(second->commitChanges());
+    const auto read = store().open("a test");
+    EXPECT_NE(serviceOf(*read, "eth7")->copyProtocol("One"), nullptr);
+    EXPECT_NE(serviceOf(*read, "eth7")->copyProtocol("Two"), nullptr);
+    EXPECT_NE(serviceOf(*read, "eth8")->copyProtocol("Three"), nullptr);
+}
+
+TEST_P(NetworkStoresContractTest, AManualConfigurationWithoutARouterHasNoDefaultRoute) {
+    addPair("eth7");
+    EXPECT_EQ(configure("eth7", manual("192.0.2.7", "255.255.254.0", "192.0.2.1")), 0);
+    EXPECT_EQ(addresses("eth7"), "192.0.2.7/23\n");
+    EXPECT_EQ(plainDefaultRoutes(), "default via 192.0.2.1 dev eth7 proto static\n");
+    Dictionary without = manual("192.0.2.7", "255.255.254.0", "");
+    EXPECT_EQ(configure("eth7", without), 0);
+    EXPECT_EQ(plainDefaultRoutes(), "");
+    without.erase("Router");
+    EXPECT_EQ(configure("eth7", without), 0);
+    EXPECT_EQ(addresses("eth7"), "192.0.2.7/23\n");
+}
+
+TEST_P(NetworkStoresContractTest, TheManualDHCPMethodSetsTheAddressThoughNoServerAnswers) {
+    addPair("eth7");
+    Dictionary inform = manual("192.0.2.7", "255.255.255.0", "192.0.2.1");
+    inform["ConfigMethod"] = "INFORM";
+    EXPECT_EQ(configure("eth7", inform), 0);
+    EXPECT_EQ(addresses("eth7"), "192.0.2.7/24\n");
+    inform["Addresses"] = Array{"no address"};
+    EXPECT_EQ(configure("eth7", inform), platform::kNetworkConfigInvalid);
+}
+
+TEST_P(NetworkStoresContractTest, ConfigurationsReadBackAsTheyWereWritten) {
+    addPair("eth7");
+    Dictionary all = manual("192.0.2.7", "255.255.255.0", "");
+    all["DHCPClientID"] = "left over";
+    all["Unknown"] = Array{1, 2.5, true, Dictionary{{"a", "b\n \t"}}};
+    const Dictionary dns = {{"ServerAddresses", Array{"192.0.2.53 "}}, {"DomainName", "home.example"}};
+    EXPECT_EQ(configure("eth7", all, dns), 0);
+    const auto service = serviceOf(*store().open("a test"), "eth7");
+    EXPECT_EQ(service->copyProtocol("IPv4")->configuration(), all);
+    EXPECT_EQ(service->copyProtocol("DNS")->configuration(), dns);
+}
+
+TEST_P(NetworkStoresContractTest, NameServersThatAreNoneAreRefusedBeforeTheDeviceChanges) {
+    addPair("eth7");
+    for (const char* bad : {"no address", "", "192.0.2.1\noptions debug", "1.2.3", "\t192.0.2.1"}) {
+        EXPECT_EQ(configure("eth7", manual("192.0.2.7", "255.255.255.0", ""),
+                            {{"ServerAddresses", Array{"192.0.2.1", bad}}}),
+                  platform::kNetworkConfigInvalid)
+            << bad;
+    }
+    EXPECT_EQ(addresses("eth7"), "\n");
 }
 
 } // namespace

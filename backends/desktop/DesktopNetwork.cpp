@@ -1,0 +1,57 @@
+#include "backends/desktop/DesktopNetwork.h"
+
+#include <utility>
+
+namespace welcomer::desktop {
+
+DesktopNetwork::DesktopNetwork(const Kernel& kernel, const std::string& folder)
+    : _kernel(kernel),
+      _configModule({&kernel.configStore}, folder),
+      _stateModule({&kernel.stateStore, &kernel.hostReachability}, folder) {}
+
+platform::NetworkConfigStore& DesktopNetwork::ConfigStore::_chosen() {
+    platform::NetworkConfigStore* const store = _network._configModule.service();
+    return store ? *store : _network._kernel.configStore;
+}
+
+std::shared_ptr<platform::NetworkConfigConnection>
+DesktopNetwork::ConfigStore::open(const std::string& name) {
+    return _chosen().open(name);
+}
+
+std::vector<std::shared_ptr<platform::NetworkInterface>> DesktopNetwork::ConfigStore::copyInterfaces() {
+    return _network._kernel.configStore.copyInterfaces(); // the same either way
+}
+
+std::int32_t DesktopNetwork::ConfigStore::lastErrorCode() {
+    return _chosen().lastErrorCode();
+}
+
+std::string DesktopNetwork::ConfigStore::errorText(std::int32_t code) {
+    return _chosen().errorText(code);
+}
+
+std::unique_ptr<platform::NetworkStateConnection>
+DesktopNetwork::StateStore::open(const std::string& clientName) {
+    NetworkStateServices* const services = _network._stateModule.service();
+    return (services ? services->stateStore() : _network._kernel.stateStore).open(clientName);
+}
+
+std::unique_ptr<platform::HostReachabilityTarget>
+DesktopNetwork::Reachability::createTarget(const std::string& hostName) {
+    NetworkStateServices* const services = _network._stateModule.service();
+    return (services ? services->hostReachability() : _network._kernel.hostReachability)
+        .createTarget(hostName);
+}
+
+std::vector<platform::BackendReport> DesktopNetwork::reports() {
+    platform::BackendReport config{"NetworkConfigStore", "local file and kernel", "", ""};
+    platform::BackendReport state{"NetworkStateStore", "kernel", "", ""};
+    platform::BackendReport reachability{"HostReachability", "name lookup and routes", "", ""};
+    _configModule.describe(config);
+    _stateModule.describe(state);
+    _stateModule.describe(reachability);
+    return {config, state, reachability};
+}
+
+} // namespace welcomer::desktop
