@@ -7,6 +7,7 @@
 
 #include <algorithm>
 #include <functional>
+#include <iterator>
 #include <set>
 #include <utility>
 
@@ -50,8 +51,10 @@ class Core {
         _links = machineLinks(_root);
         _addHardware();
         const bool isAnythingNew = !_onlyListed.empty();
-        for (const networkfile::NewService& service : std::exchange(_onlyListed, {})) {
-            _change([service](Dictionary& content) { networkfile::addService(content, service); });
+        if (isAnythingNew) {
+            _change([added = std::exchange(_onlyListed, {})](Dictionary& content) {
+                networkfile::addServices(content, added);
+            });
         }
         succeeded(platform::kNetworkConfigSuccess);
         return isAnythingNew;
@@ -67,7 +70,7 @@ class Core {
         if (listed != _onlyListed.end()) {
             const networkfile::NewService service = *listed;
             _onlyListed.erase(listed);
-            _change([service](Dictionary& content) { networkfile::addService(content, service); });
+            _change([service](Dictionary& content) { networkfile::addServices(content, {service}); });
         }
         _change(change);
         return succeeded(platform::kNetworkConfigSuccess);
@@ -116,13 +119,16 @@ class Core {
         if (!hasSet()) {
             return;
         }
+        const std::set<std::string> known = networkfile::devices(_content);
+        std::vector<networkfile::NewService> added;
         for (const MachineLink& link : listHardware(_links)) {
             const std::string& device = link.link.name;
-            if (!networkfile::serviceOfDevice(_content, device)) {
-                _onlyListed.push_back({device, displayNameOf(link.type, device)});
-                networkfile::addService(_content, _onlyListed.back());
+            if (!known.contains(device)) {
+                added.push_back({device, displayNameOf(link.type, device)});
             }
         }
+        networkfile::addServices(_content, added);
+        std::ranges::move(added, std::back_inserter(_onlyListed));
     }
 
     std::int32_t _apply(const std::string& serviceID) const {
@@ -276,7 +282,7 @@ std::vector<std::shared_ptr<platform::NetworkInterface>> LocalNetworkConfigStore
     std::vector<std::shared_ptr<platform::NetworkInterface>> interfaces;
     interfaces.reserve(links.size());
     for (const MachineLink& link : links) {
-        interfaces.push_back(makeInterface(links, link.link.name));
+        interfaces.push_back(makeInterface(links, link));
     }
     return interfaces;
 }

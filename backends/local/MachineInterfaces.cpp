@@ -61,10 +61,16 @@ std::string typeOf(const KernelLink& link, const RootFolder& root, bool mayBeWir
 
 // The link that another one stands on, or null.
 const MachineLink* below(const std::vector<MachineLink>& links, const KernelLink& link) {
-    const auto found = std::ranges::find_if(links, [&](const MachineLink& each) {
-        return hasPorts(link) ? each.link.masterIndex == link.index
-                              : stackedKind(link) && each.link.index == link.linkIndex;
-    });
+    if (!stackedKind(link)) {
+        return nullptr;
+    }
+    const auto found = hasPorts(link) ? std::ranges::find_if(links,
+                                                             [&](const MachineLink& each) {
+                                                                 return each.link.masterIndex == link.index;
+                                                             })
+                                      : std::ranges::find_if(links, [&](const MachineLink& each) {
+                                            return each.link.index == link.linkIndex;
+                                        });
     return found == links.end() ? nullptr : &*found;
 }
 
@@ -126,7 +132,12 @@ std::unique_ptr<platform::NetworkInterface> makeInterface(const std::vector<Mach
     if (found == links.end()) {
         return std::make_unique<LocalInterface>(device);
     }
-    return std::make_unique<LocalInterface>(links, *found, std::set<int>());
+    return makeInterface(links, *found);
+}
+
+std::unique_ptr<platform::NetworkInterface> makeInterface(const std::vector<MachineLink>& links,
+                                                          const MachineLink& link) {
+    return std::make_unique<LocalInterface>(links, link, std::set<int>());
 }
 
 std::string displayNameOf(const std::string& type, const std::string& device) {

@@ -30,9 +30,12 @@ std::vector<MachineLink> listHardware(const std::vector<MachineLink>& links);
 // An interface with what it stands on: a bridge or a bond on its first port, a VLAN and the like on their
 // link.
 //  device  a device of the list, or another one, which then has no type
+//  link    a link of the list
 // Never null.
 std::unique_ptr<platform::NetworkInterface> makeInterface(const std::vector<MachineLink>& links,
                                                           const std::string& device);
+std::unique_ptr<platform::NetworkInterface> makeInterface(const std::vector<MachineLink>& links,
+                                                          const MachineLink& link);
 
 // The name for people of a device: "Ethernet (eth0)".
 std::string displayNameOf(const std::string& type, const std::string& device);

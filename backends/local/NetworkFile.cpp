@@ -56,6 +56,32 @@ std::string currentSet(const Dictionary& content) {
     return name && name->string() ? *name->string() : kAutomaticSet;
 }
 
+// Adds a service of a device that has none to the set in use.
+void addService(Dictionary& content, const networkfile::NewService& service) {
+    std::string serviceID = service.device;
+    for (int number = 2; serviceIn(content, serviceID); ++number) {
+        serviceID = service.device + "-" + std::to_string(number);
+    }
+    dictionaryIn(content, kServices)[serviceID] = Dictionary{
+        {kName, service.name},
+        {kDevice, service.device},
+        {kEnabled, true},
+        {kProtocols, Dictionary{{platform::kNetworkProtocolDNS, Dictionary()},
+                                {platform::kNetworkProtocolIPv4,
+                                 Dictionary{{kConfiguration, Dictionary{{platform::kNetworkConfigMethod,
+                                                                         platform::kNetworkMethodDHCP}}}}}}},
+    };
+    const std::string setID = currentSet(content);
+    content[kCurrentSet] = setID;
+    Dictionary& set = dictionaryIn(dictionaryIn(content, kSets), setID);
+    set.try_emplace(kName, setID);
+    PropertyList& list = set[kServices];
+    if (!list.isArray()) {
+        list = PropertyList::Array();
+    }
+    list.array()->emplace_back(serviceID);
+}
+
 } // namespace
 
 namespace networkfile {
@@ -116,32 +142,24 @@ std::optional<Dictionary> configuration(const Dictionary& content, const std::st
     return value && value->dictionary() ? std::optional(*value->dictionary()) : std::nullopt;
 }
 
-void addService(Dictionary& content, const NewService& service) {
-    if (serviceOfDevice(content, service.device)) {
-        return; // somebody else was first
+std::set<std::string> devices(const Dictionary& content) {
+    std::set<std::string> found;
+    const std::vector<std::string> all = services(content).value_or(std::vector<std::string>());
+    for (const std::string& serviceID : all) {
+        if (auto device = serviceText(content, serviceID, kDevice)) {
+            found.insert(std::move(*device));
+        }
     }
-    std::string serviceID = service.device;
-    for (int number = 2; serviceIn(content, serviceID); ++number) {
-        serviceID = service.device + "-" + std::to_string(number);
+    return found;
+}
+
+void addServices(Dictionary& content, const std::vector<NewService>& added) {
+    std::set<std::string> known = devices(content);
+    for (const NewService& service : added) {
+        if (known.insert(service.device).second) { // otherwise somebody else was first
+            addService(content, service);
+        }
     }
-    dictionaryIn(content, kServices)[serviceID] = Dictionary{
-        {kName, service.name},
-        {kDevice, service.device},
-        {kEnabled, true},
-        {kProtocols, Dictionary{{platform::kNetworkProtocolDNS, Dictionary()},
-                                {platform::kNetworkProtocolIPv4,
-                                 Dictionary{{kConfiguration, Dictionary{{platform::kNetworkConfigMethod,
-                                                                         platform::kNetworkMethodDHCP}}}}}}},
-    };
-    const std::string setID = currentSet(content);
-    content[kCurrentSet] = setID;
-    Dictionary& set = dictionaryIn(dictionaryIn(content, kSets), setID);
-    set.try_emplace(kName, setID);
-    PropertyList& list = set[kServices];
-    if (!list.isArray()) {
-        list = PropertyList::Array();
-    }
-    list.array()->emplace_back(serviceID);
 }
 
 void setEnabled(Dictionary& content, const std::string& serviceID, bool enabled) {

@@ -8,6 +8,7 @@
 #include <cstdint>
 #include <functional>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -45,6 +46,9 @@ std::optional<std::string> serviceText(const PropertyList::Dictionary& content, 
 std::optional<std::string> serviceOfDevice(const PropertyList::Dictionary& content,
                                            const std::string& device);
 
+// The devices that have a service in the set in use.
+std::set<std::string> devices(const PropertyList::Dictionary& content);
+
 // The types of a service's protocols.
 std::vector<std::string> protocolTypes(const PropertyList::Dictionary& content, const std::string& serviceID);
 
@@ -53,7 +57,8 @@ std::optional<PropertyList::Dictionary> configuration(const PropertyList::Dictio
                                                       const std::string& serviceID, const std::string& type);
 
 // Changes. Those of a service that is not there change nothing.
-void addService(PropertyList::Dictionary& content, const NewService& service);
+// A device that has a service keeps it.
+void addServices(PropertyList::Dictionary& content, const std::vector<NewService>& added);
 void setEnabled(PropertyList::Dictionary& content, const std::string& serviceID, bool enabled);
 void addProtocol(PropertyList::Dictionary& content, const std::string& serviceID, const std::string& type);
 void setConfiguration(PropertyList::Dictionary& content, const std::string& serviceID,
