@@ -3,6 +3,7 @@
 import json
 import statistics
 import subprocess
+import time
 
 DOCUMENT_HEAD = """# Benchmarks
 
@@ -64,6 +65,13 @@ def google_benchmark(program, name_filter, repetitions=9):
         if run.get("run_type") == "aggregate" and run["aggregate_name"] == "median":
             times[run["run_name"]] = run["real_time"] * scale[run["time_unit"]]
     return times
+
+
+def timed(command):
+    """How long a command takes as a whole process, in ms; it has to succeed."""
+    start = time.perf_counter()
+    subprocess.run(command, check=True, stdout=subprocess.DEVNULL)
+    return (time.perf_counter() - start) * 1e3
 
 
 def turn_about(first, second, rounds):
