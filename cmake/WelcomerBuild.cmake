@@ -32,8 +32,6 @@ function(welcomer_configure_target target)
     if(WELCOMER_SANITIZE)
         target_compile_options(${target} PRIVATE -fsanitize=${WELCOMER_SANITIZE} -fno-omit-frame-pointer
                                                  -fno-sanitize-recover=all)
-        # Through the instrumentation g++ 12 sees uninitialized reads that are not there. The plain build has the warning on.
-        target_compile_options(${target} PRIVATE $<$<CXX_COMPILER_ID:GNU>:-Wno-maybe-uninitialized>)
         target_link_options(${target} PUBLIC -fsanitize=${WELCOMER_SANITIZE})
         target_compile_definitions(${target} PRIVATE WELCOMER_FLUSH_AT_EXIT=1)
     endif()

@@ -13,7 +13,7 @@
 namespace welcomer {
 
 // Outside the unnamed namespace, so that their signatures read as in the system's own code.
-int logFromAFunction(int, const char**) {
+int logFromAFunction(int, bool) {
     WL_LOG("told by %@", "a function");
     return __LINE__ - 1;
 }
@@ -89,7 +89,7 @@ TEST_F(PCLogManagerTest, UTF8IsWrittenAsItStands) {
 }
 
 TEST_F(PCLogManagerTest, TheRecordIsTheMessageAlone) {
-    logFromAFunction(0, nullptr);
+    logFromAFunction(0, false);
     EXPECT_EQ(fake.systemLog.records(), (Records{{115, "told by a function"}}));
 }
 
@@ -117,15 +117,15 @@ TEST_F(PCLogManagerTest, AnObserverSeesSignatureLineAndType) {
         calls.push_back(std::to_string(call.type) + '|' + call.function + '|' + std::to_string(call.line) +
                         '|' + call.message);
     });
-    const int line = logFromAFunction(0, nullptr);
+    const int line = logFromAFunction(0, false);
     logUnderAFixedName();
     log(2, "unheard");
     PCLogManager::sharedManager().setObserver({});
     log(1, "unobserved");
 
     ASSERT_EQ(calls.size(), 3U);
-    EXPECT_EQ(calls[0], "1|int welcomer::logFromAFunction(int, const char**)|" + std::to_string(line) +
-                            "|told by a function");
+    EXPECT_EQ(calls[0],
+              "1|int welcomer::logFromAFunction(int, bool)|" + std::to_string(line) + "|told by a function");
     EXPECT_EQ(calls[1].substr(0, 19), "1|void fixed(void)|");
     EXPECT_EQ(calls[2], "2|void f()|7|unheard");
     EXPECT_EQ(fake.systemLog.lines(),

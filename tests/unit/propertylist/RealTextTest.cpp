@@ -49,7 +49,7 @@ TEST(RealText, AnyBitsReadBackToTheSameBits) {
 
 TEST(RealText, EveryNotANumberKeepsItsBits) {
     constexpr std::uint64_t sign = std::uint64_t{1} << 63;
-    for (const std::uint64_t bits : {0x7ff8000000000000, 0x7ff8000000000001, 0x7ff0000000000001}) {
+    for (const std::uint64_t bits : {0x7ff8000000000000U, 0x7ff8000000000001U, 0x7ff0000000000001U}) {
         EXPECT_EQ(readBack(bits), bits);
         EXPECT_EQ(readBack(bits | sign), bits | sign);
     }

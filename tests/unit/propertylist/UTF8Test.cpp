@@ -71,7 +71,7 @@ TEST(UTF8, XMLHasNoPlaceForNoncharacters) {
 
 TEST(UTF8, AppendsEveryLength) {
     std::string text;
-    for (const char32_t character : {0x41, 0x7FF, 0x20AC, 0x1F600}) {
+    for (const char32_t character : {U'\x41', U'\x7FF', U'\x20AC', U'\x1F600'}) {
         appendUTF8(text, character);
     }
     EXPECT_EQ(text, "A\xDF\xBF\xE2\x82\xAC\xF0\x9F\x98\x80");
