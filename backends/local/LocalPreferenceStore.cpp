@@ -38,11 +38,10 @@ std::optional<PropertyList> LocalPreferenceStore::copyValue(const std::string& k
     if (!used.isLoaded) {
         _load(domain, used);
     }
-    std::optional<PropertyList> value;
     if (const auto found = used.onDisk.values.find(key); found != used.onDisk.values.end()) {
-        value = found->second;
+        return found->second;
     }
-    return value;
+    return std::nullopt;
 }
 
 void LocalPreferenceStore::setValue(const std::string& key, const PropertyList& value,
