@@ -82,7 +82,7 @@ class PrivateMainContext {
     GMainContext* const _context = g_main_context_new();
 };
 
-// Keeps other processes and threads of the user out. Where the lock cannot be had there is none.
+// Keeps other threads out, and the user's other processes where the runtime folder can be written.
 class UserLock {
   public:
     UserLock() {
@@ -100,6 +100,8 @@ class UserLock {
     UserLock& operator=(const UserLock&) = delete;
 
   private:
+    static inline std::mutex _threads;
+    const std::lock_guard<std::mutex> _guard{_threads};
     int _file = -1;
 };
 
