@@ -29,3 +29,6 @@ endfunction()
 install_service_file(welcomer-launch-agents.service "${WELCOMER_SYSTEMD}/user")
 install_wish(welcomer-launch-agents.service graphical-session.target "${WELCOMER_SYSTEMD}/user")
 install_service_file(welcomer-launch-agents.desktop "${WELCOMER_AUTOSTART}")
+
+install_service_file(welcomer-resolver-sync.service "${WELCOMER_SYSTEMD}/system")
+install_wish(welcomer-resolver-sync.service multi-user.target "${WELCOMER_SYSTEMD}/system")

@@ -1,0 +1,21 @@
+// welcomer-resolver-sync, a system service: has the files in /etc/resolver take effect in systemd-resolved.
+
+#include "backends/Backends.h"
+#include "log/PCLogManager.h"
+#include "tools/resolver-sync/ResolverSync.h"
+
+#include <exception>
+#include <string>
+
+using namespace welcomer;
+
+int main() {
+    const auto owner = buildPlatform();
+    const platform::ScopedPlatform installed(owner->platform());
+    try {
+        return resolver::ResolverSync("/etc/resolver", "/run/welcomer-resolver-sync").run();
+    } catch (const std::exception& error) {
+        WL_LOG("Failed to start: %@", std::string(error.what()));
+        return 1;
+    }
+}
