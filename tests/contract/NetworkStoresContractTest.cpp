@@ -305,6 +305,28 @@ TEST_P(NetworkStoresContractTest, HardwareThatAppearsLaterIsEstablishedToo) {
     EXPECT_TRUE(set->establishDefaultConfiguration());
 }
 
+TEST_F(NetworkStoresTest, HardwareWhoseServiceWasChangedNeedsNoEstablishing) {
+    addPair("eth7");
+    const auto connection = store().open("a test");
+    for (const char* device : {"eth7", "p-eth7"}) {
+        EXPECT_TRUE(serviceOf(*connection, device)->addProtocolType("One"));
+    }
+    EXPECT_FALSE(connection->copyCurrentSet()->establishDefaultConfiguration());
+    EXPECT_TRUE(connection->commitChanges());
+    EXPECT_NE(serviceOf(*store().open("a test"), "eth7")->copyProtocol("One"), nullptr);
+}
+
+TEST_F(NetworkStoresTest, HardwareThatTwoConnectionsEstablishGetsOneService) {
+    addPair("eth7");
+    const auto first = store().open("a test");
+    const auto second = store().open("another");
+    EXPECT_TRUE(first->copyCurrentSet()->establishDefaultConfiguration());
+    EXPECT_TRUE(second->copyCurrentSet()->establishDefaultConfiguration());
+    EXPECT_TRUE(first->commitChanges());
+    EXPECT_TRUE(second->commitChanges());
+    EXPECT_EQ(store().open("a test")->copyCurrentSet()->copyServices()->size(), 2U);
+}
+
 TEST_F(NetworkStoresTest, PortsOfABridgeAndStackedLinksGetNoServiceButTheBridgeDoes) {
     shell("ip link add eth7 type veth peer name eth8 && ip link add br0 type bridge && ip link add br1 type "
           "bridge && "
@@ -540,6 +562,10 @@ TEST_P(NetworkStoresContractTest, WhatMakesNoSenseIsRefusedAndChangesNothing) {
         manual("192.0.2.7", good, "no router"),
         manual("192.0.2.7\n", good, ""),
         {{"ConfigMethod", "Manual"}},
+        {{"ConfigMethod", "Manual"},
+         {"Addresses", Array{"192.0.2.7"}},
+         {"SubnetMasks", Array{good}},
+         {"Router", 7}},
         {{"ConfigMethod", "Manual"}, {"Addresses", "192.0.2.7"}, {"SubnetMasks", good}},
         {{"ConfigMethod", "Manual"}, {"Addresses", Array()}, {"SubnetMasks", Array{good}}},
         {{"ConfigMethod", "Manual"}, {"Addresses", Array{7}}, {"SubnetMasks", Array{good}}},
@@ -550,6 +576,16 @@ TEST_P(NetworkStoresContractTest, WhatMakesNoSenseIsRefusedAndChangesNothing) {
     EXPECT_EQ(configure("eth7", {{"ConfigMethod", "Telepathy"}}), platform::kNetworkConfigUnknownMethod);
     EXPECT_EQ(configure("eth7", {{"ConfigMethod", 4}}), platform::kNetworkConfigUnknownMethod);
     EXPECT_EQ(addresses("eth7"), "10.0.0.9/8\n");
+}
+
+TEST_F(NetworkStoresTest, OfSeveralServicesThatCannotBeAppliedTheFirstOnesErrorCounts) {
+    addPair("eth7");
+    const auto connection = store().open("a test");
+    serviceOf(*connection, "eth7")->copyProtocol("IPv4")->setConfiguration(manual("none", "", ""));
+    serviceOf(*connection, "p-eth7")->copyProtocol("IPv4")->setConfiguration({{"ConfigMethod", "Telepathy"}});
+    EXPECT_TRUE(connection->commitChanges());
+    EXPECT_FALSE(connection->applyChanges());
+    EXPECT_EQ(store().lastErrorCode(), platform::kNetworkConfigInvalid);
 }
 
 TEST_F(NetworkStoresTest, ARouterThatTheKernelRefusesIsAnErrorAndTheAddressesStay) {

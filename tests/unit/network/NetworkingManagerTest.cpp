@@ -550,6 +550,14 @@ TEST_F(DynamicConfigurationTest, AnAddressOfThePrimaryServiceMakesItUnusableWith
     }
 }
 
+TEST_F(DynamicConfigurationTest, AnEmptyAddressOfThePrimaryServiceIsNone) {
+    setWholeState();
+    for (const Array& addresses : {Array{""}, Array{}}) {
+        setState(serviceKey(NetworkDomain::State, "one"), {{"Addresses", addresses}});
+        EXPECT_TRUE(managerWithMethod("DHCP").hasUsableDynamicEthernetConfiguration());
+    }
+}
+
 TEST_F(DynamicConfigurationTest, AnotherMethodIsNotUsable) {
     for (const std::string method : {"Manual", "INFORM", "BootP", "dhcp", ""}) {
         EXPECT_FALSE(managerWithMethod(method).hasUsableDynamicEthernetConfiguration());
