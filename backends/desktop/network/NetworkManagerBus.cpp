@@ -43,8 +43,9 @@ std::int32_t NetworkManagerReply::status(std::int32_t otherwise) const {
     if (last == "UnknownObject" || last == "UnknownMethod" || last == "UnknownInterface") {
         return platform::kNetworkConfigNotFound;
     }
-    if (name.starts_with(NM_DBUS_INTERFACE_SETTINGS_CONNECTION ".") || last == "InvalidConnection" ||
-        last == "InvalidProperty" || last == "InvalidSetting") {
+    // "InvalidConnection" is also what a profile is refused with that cannot be written.
+    if (name.starts_with(NM_DBUS_INTERFACE_SETTINGS_CONNECTION ".") || last == "InvalidProperty" ||
+        last == "InvalidSetting") {
         return platform::kNetworkConfigInvalid;
     }
     return otherwise;

@@ -251,6 +251,27 @@ TEST_F(NetworkManagerTest, WhatIsTooMuchForAProfileIsAWriteErrorAndNoneOfTheServ
     EXPECT_EQ(profiles(), "");
 }
 
+TEST_F(NetworkManagerTest, WhereOneProfileCannotBeWrittenThoseBeforeItArePutBack) {
+    addCable("eth7");
+    addCable("eth8");
+    for (const char* device : {"eth7", "eth8"}) {
+        shell(std::string("nmcli connection add type ethernet autoconnect no con-name ") + device +
+              " ifname " + device + " ipv4.method manual ipv4.addresses 192.0.2.9/24");
+    }
+    const auto connection = store.open("a test");
+    serviceOf(*connection, "eth7")->copyProtocol("IPv4")->setConfiguration(manual("192.0.2.7"));
+    serviceOf(*connection, "eth8")->copyProtocol("IPv4")->setConfiguration(manual("192.0.2.8"));
+    // A folder in a file's place cannot be replaced.
+    shell("cd /run/profiles && rm eth8.nmconnection && mkdir -p eth8.nmconnection/full");
+    EXPECT_FALSE(connection->commitChanges());
+    EXPECT_EQ(store.lastErrorCode(), platform::kNetworkConfigWriteFailed);
+    EXPECT_EQ(profile("eth7", "ipv4.addresses"), "192.0.2.9/24");
+    shell("rm -r /run/profiles/eth8.nmconnection");
+    EXPECT_TRUE(connection->commitChanges()); // what was refused can be tried again
+    EXPECT_EQ(profile("eth7", "ipv4.addresses"), "192.0.2.7/24");
+    EXPECT_EQ(profile("eth8", "ipv4.addresses"), "192.0.2.8/24");
+}
+
 TEST_F(NetworkManagerTest, WhatOthersChangeInTheProfileIsRead) {
     addCable("eth7");
     EXPECT_EQ(configure("eth7", manual("192.0.2.7", "192.0.2.1"), {{"ServerAddresses", Array{"192.0.2.53"}}}),
