@@ -32,7 +32,7 @@ class CallError {
     }
 
   private:
-    sd_bus_error _error = SD_BUS_ERROR_NULL;
+    sd_bus_error _error{};
 };
 
 bool isPlainInUnitName(char character) {

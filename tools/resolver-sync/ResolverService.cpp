@@ -40,7 +40,7 @@ class CallError {
     }
 
   private:
-    sd_bus_error _error = SD_BUS_ERROR_NULL;
+    sd_bus_error _error{};
 };
 
 Message newCall(sd_bus* bus, const char* method) {
