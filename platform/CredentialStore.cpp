@@ -20,6 +20,20 @@ std::string credentialStatusText(std::int32_t status) {
         return "the credential store cannot be written";
     case kCredentialInvalidPath:
         return "a trusted application needs an absolute path";
+    case kCredentialLocked:
+        return "the keyring is locked, and nobody can be asked to unlock it";
+    case kCredentialDismissed:
+        return "the user refused to unlock or to change the keyring";
+    case kCredentialPromptUnanswered:
+        return "the prompt of the keyring was not answered in time";
+    case kCredentialNoService:
+        return "no credential service runs or can be started";
+    case kCredentialNoBus:
+        return "there is no session bus, or it has died";
+    case kCredentialTooLarge:
+        return "the secret is too large for the credential service";
+    case kCredentialServiceFailed:
+        return "the credential service failed";
     default:
         return "unknown credential store status " + std::to_string(status);
     }

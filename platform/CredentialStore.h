@@ -21,6 +21,14 @@ enum CredentialStatus : std::int32_t {
     kCredentialReadFailed = 5,    // the system refused to open or read the store
     kCredentialWriteFailed = 6,   // the system refused to write the store (a full disk, a read-only home)
     kCredentialInvalidPath = 7,   // a trusted application's path that is empty or not absolute
+    // Of a store that is a service of the desktop:
+    kCredentialLocked = 8,            // the keyring is locked, and nobody can be asked to unlock it
+    kCredentialDismissed = 9,         // the user was asked, and refused
+    kCredentialPromptUnanswered = 10, // the user was asked, and did not answer in time
+    kCredentialNoService = 11,        // no such service runs or can be started
+    kCredentialNoBus = 12,            // there is no session bus, or it has died
+    kCredentialTooLarge = 13,         // the secret is larger than the service can take
+    kCredentialServiceFailed = 14,    // the service reports a failure of another kind
 };
 
 // The text of a result code, for people. Any thread.

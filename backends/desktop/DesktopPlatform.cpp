@@ -18,12 +18,13 @@ PlatformOptions withRunLoops(PlatformOptions options, platform::RunLoops& runLoo
 }
 
 // The local platform with the desktop's services in their places.
-platform::Platform withDesktop(const platform::Platform& local, platform::AccountService& accountService,
-                               DesktopNetwork& network, platform::HostReachability& hostReachability) {
+platform::Platform withDesktop(const platform::Platform& local, platform::CredentialStore& credentialStore,
+                               platform::AccountService& accountService, DesktopNetwork& network,
+                               platform::HostReachability& hostReachability) {
     return {local.systemLog,
             local.fileSystem,
             local.processIdentity,
-            local.credentialStore,
+            credentialStore,
             local.pluginBundle,
             local.resourceBundles,
             local.clock,
@@ -45,16 +46,19 @@ platform::Platform withDesktop(const platform::Platform& local, platform::Accoun
 
 DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
     : _local(withRunLoops(options, _runLoops)),
+      _credentialStore(local::RootFolder(options.root), _local.platform().processIdentity,
+                       _local.platform().credentialStore),
       _accountService(_accountSurroundings(options.root), {std::string(configuration::kOnlineAccountProvider),
                                                            std::string(configuration::kOnlineAccountServer)}),
       _network({_local.platform().networkConfigStore, _local.platform().networkStateStore,
                 _local.platform().hostReachability}),
       _platform(
-          withDesktop(_local.platform(), _accountService, _network,
+          withDesktop(_local.platform(), _credentialStore.store(), _accountService, _network,
                       options.hostReachability ? *options.hostReachability : _network.hostReachability())) {}
 
 std::vector<platform::BackendReport> DesktopPlatform::backendReports() {
     std::vector<platform::BackendReport> reports;
+    reports.push_back(_credentialStore.report());
     reports.push_back(_runLoops.report());
     platform::BackendReport accounts{"AccountService", "account file", "", ""};
     _onlineAccounts.describe(accounts);

@@ -4,6 +4,7 @@
 #pragma once
 
 #include "backends/Backends.h"
+#include "backends/desktop/DesktopCredentialStore.h"
 #include "backends/desktop/DesktopModule.h"
 #include "backends/desktop/DesktopNetwork.h"
 #include "backends/desktop/DesktopRunLoops.h"
@@ -30,6 +31,7 @@ class DesktopPlatform final : public PlatformOwner {
 
     DesktopRunLoops _runLoops;
     local::LocalPlatform _local; // stands on _runLoops
+    DesktopCredentialStore _credentialStore;
     DesktopModule<OnlineAccountsModule> _onlineAccounts{{}};
     OnlineAccountService _accountService;
     DesktopNetwork _network;

@@ -1,4 +1,4 @@
-// What every credential store must do.
+#include "tests/contract/CredentialStoreContract.h"
 
 #include "backends/local/LocalCredentialStore.h"
 #include "tests/contract/TemporaryRoot.h"
@@ -6,18 +6,9 @@
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeProcessIdentity.h"
 
-#include <gtest/gtest.h>
-
-#include <thread>
-
 namespace welcomer::contract {
 
 namespace {
-
-using platform::CredentialAccess;
-using platform::CredentialItem;
-using platform::CredentialItemReference;
-using platform::TrustedApplication;
 
 struct LocalCredentials {
     fakes::CallRecorder recorder;
@@ -41,187 +32,10 @@ struct BackendNames {
     }
 };
 
-template <typename Backend>
-class CredentialStoreContract : public testing::Test {
-  protected:
-    // The secret of an item, or the status as text.
-    std::string secret(const std::string& service, const std::string& account) {
-        std::string data;
-        const std::int32_t status = this->credentials.store.findItem(service, account, &data, nullptr);
-        return status == platform::kCredentialSuccess ? data : platform::credentialStatusText(status);
-    }
-
-    std::unique_ptr<CredentialItemReference> find(const std::string& service, const std::string& account) {
-        std::unique_ptr<CredentialItemReference> reference;
-        EXPECT_EQ(this->credentials.store.findItem(service, account, nullptr, &reference),
-                  platform::kCredentialSuccess);
-        return reference;
-    }
-
-    Backend credentials;
-};
-
 using Backends = testing::Types<LocalCredentials, FakeCredentials>;
-TYPED_TEST_SUITE(CredentialStoreContract, Backends, BackendNames);
-
-const std::string kNotFound = platform::credentialStatusText(platform::kCredentialItemNotFound);
-
-CredentialItem item(const std::string& service, const std::string& account, const std::string& label = "") {
-    return {service, account, label, std::nullopt};
-}
 
 } // namespace
 
-TYPED_TEST(CredentialStoreContract, AnEmptyStoreHoldsNothing) {
-    EXPECT_EQ(this->secret("service", "account"), kNotFound);
-}
-
-TYPED_TEST(CredentialStoreContract, AnItemIsFoundByServiceAndAccountTogether) {
-    ASSERT_EQ(this->credentials.store.createItem(item("service", "account"), "secret"), 0);
-
-    EXPECT_EQ(this->secret("service", "account"), "secret");
-    EXPECT_EQ(this->secret("service", "other"), kNotFound);
-    EXPECT_EQ(this->secret("other", "account"), kNotFound);
-    EXPECT_EQ(this->secret("account", "service"), kNotFound);
-}
-
-TYPED_TEST(CredentialStoreContract, ASecretMayBeAnyBytesAndNone) {
-    std::string bytes;
-    for (int byte = 0; byte < 256; ++byte) {
-        bytes += static_cast<char>(byte);
-    }
-    ASSERT_EQ(this->credentials.store.createItem(item("service", "bytes"), bytes), 0);
-    ASSERT_EQ(this->credentials.store.createItem(item("service", "none"), ""), 0);
-
-    EXPECT_EQ(this->secret("service", "bytes"), bytes);
-    EXPECT_EQ(this->secret("service", "none"), "");
-}
-
-TYPED_TEST(CredentialStoreContract, AnExistingItemIsNotReplaced) {
-    ASSERT_EQ(this->credentials.store.createItem(item("service", "account", "first"), "first"), 0);
-
-    EXPECT_EQ(this->credentials.store.createItem(item("service", "account", "second"), "second"),
-              platform::kCredentialDuplicateItem);
-    EXPECT_EQ(this->secret("service", "account"), "first");
-}
-
-TYPED_TEST(CredentialStoreContract, AttributesComeBackAsTheyWereGiven) {
-    CredentialItem stored = item("service", "account", "label \u00e9\u4e16");
-    stored.access = CredentialAccess{"description", {{"/usr/bin/one"}, {"/usr/bin/two"}}};
-    ASSERT_EQ(this->credentials.store.createItem(stored, "secret"), 0);
-
-    CredentialItem read;
-    ASSERT_EQ(this->credentials.store.readAttributes(*this->find("service", "account"), read), 0);
-
-    EXPECT_EQ(read.service, "service");
-    EXPECT_EQ(read.account, "account");
-    EXPECT_EQ(read.label, "label \u00e9\u4e16");
-    EXPECT_EQ(read.access, stored.access);
-}
-
-TYPED_TEST(CredentialStoreContract, AnItemWithoutAnAccessObjectHasTheStoresOwn) {
-    ASSERT_EQ(this->credentials.store.createItem(item("service", "account"), "secret"), 0);
-
-    CredentialItem read;
-    ASSERT_EQ(this->credentials.store.readAttributes(*this->find("service", "account"), read), 0);
-    EXPECT_EQ(read.access, std::nullopt);
-}
-
-TYPED_TEST(CredentialStoreContract, AttributesNeedNotBeText) {
-    const std::string strange("\xff\x01\r\n<&>\0end", 11);
-    CredentialItem stored = item(strange, strange + "account", strange + "label");
-    stored.access = CredentialAccess{strange, {{"/" + strange}}};
-    ASSERT_EQ(this->credentials.store.createItem(stored, "secret"), 0);
-
-    CredentialItem read;
-    ASSERT_EQ(this->credentials.store.readAttributes(*this->find(strange, strange + "account"), read), 0);
-    EXPECT_EQ(read.label, strange + "label");
-    EXPECT_EQ(read.access, stored.access);
-}
-
-TYPED_TEST(CredentialStoreContract, ADeletedItemIsGoneAndTheOthersStay) {
-    ASSERT_EQ(this->credentials.store.createItem(item("service", "one"), "first"), 0);
-    ASSERT_EQ(this->credentials.store.createItem(item("service", "two"), "second"), 0);
-
-    EXPECT_EQ(this->credentials.store.deleteItem(*this->find("service", "one")), 0);
-    EXPECT_EQ(this->secret("service", "one"), kNotFound);
-    EXPECT_EQ(this->secret("service", "two"), "second");
-
-    EXPECT_EQ(this->credentials.store.deleteItem(*this->find("service", "two")), 0);
-    EXPECT_EQ(this->secret("service", "two"), kNotFound);
-    EXPECT_EQ(this->credentials.store.createItem(item("service", "two"), "third"), 0);
-    EXPECT_EQ(this->secret("service", "two"), "third");
-}
-
-TYPED_TEST(CredentialStoreContract, AReferenceToWhatIsGoneFindsNothing) {
-    ASSERT_EQ(this->credentials.store.createItem(item("service", "account"), "secret"), 0);
-    const auto reference = this->find("service", "account");
-    ASSERT_EQ(this->credentials.store.deleteItem(*this->find("service", "account")), 0);
-
-    CredentialItem read{"untouched", "", "", {}};
-    EXPECT_EQ(this->credentials.store.readAttributes(*reference, read), platform::kCredentialItemNotFound);
-    EXPECT_EQ(read.service, "untouched");
-    EXPECT_EQ(this->credentials.store.deleteItem(*reference), platform::kCredentialItemNotFound);
-}
-
-TYPED_TEST(CredentialStoreContract, OutputsAreWrittenOnSuccessOnlyAndMayBeAbsent) {
-    ASSERT_EQ(this->credentials.store.createItem(item("service", "account"), "secret"), 0);
-    std::string data = "untouched";
-    std::unique_ptr<CredentialItemReference> reference;
-
-    EXPECT_EQ(this->credentials.store.findItem("service", "other", &data, &reference),
-              platform::kCredentialItemNotFound);
-    EXPECT_EQ(data, "untouched");
-    EXPECT_EQ(reference, nullptr);
-    EXPECT_EQ(this->credentials.store.findItem("service", "account", nullptr, nullptr), 0);
-    EXPECT_EQ(this->credentials.store.findItem("service", "account", &data, &reference), 0);
-    EXPECT_EQ(data, "secret");
-    EXPECT_NE(reference, nullptr);
-}
-
-TYPED_TEST(CredentialStoreContract, ATrustedApplicationNeedsAnAbsolutePath) {
-    TrustedApplication application{"untouched"};
-
-    EXPECT_EQ(this->credentials.store.createTrustedApplication("", application),
-              platform::kCredentialInvalidPath);
-    EXPECT_EQ(this->credentials.store.createTrustedApplication("bin/agent", application),
-              platform::kCredentialInvalidPath);
-    EXPECT_EQ(application.path, "untouched");
-    EXPECT_EQ(this->credentials.store.createTrustedApplication("/bin/agent", application), 0);
-    EXPECT_EQ(application.path, "/bin/agent");
-}
-
-TYPED_TEST(CredentialStoreContract, AnAccessObjectHoldsItsDescriptionAndItsApplications) {
-    CredentialAccess access;
-
-    EXPECT_EQ(this->credentials.store.createAccess("description", {{"/bin/agent"}}, access), 0);
-    EXPECT_EQ(access, (CredentialAccess{"description", {{"/bin/agent"}}}));
-}
-
-TYPED_TEST(CredentialStoreContract, OfThreadsThatCreateTheSameItemOneSucceeds) {
-    constexpr int kThreads = 8;
-    std::vector<std::int32_t> statuses(kThreads);
-    std::vector<std::thread> threads;
-    for (int index = 0; index < kThreads; ++index) {
-        threads.emplace_back([&, index] {
-            statuses[static_cast<std::size_t>(index)] =
-                this->credentials.store.createItem(item("service", "account"), std::to_string(index));
-        });
-    }
-    for (std::thread& thread : threads) {
-        thread.join();
-    }
-
-    int winner = -1;
-    for (int index = 0; index < kThreads; ++index) {
-        if (statuses[static_cast<std::size_t>(index)] == platform::kCredentialSuccess) {
-            EXPECT_EQ(winner, -1);
-            winner = index;
-        } else {
-            EXPECT_EQ(statuses[static_cast<std::size_t>(index)], platform::kCredentialDuplicateItem);
-        }
-    }
-    EXPECT_EQ(this->secret("service", "account"), std::to_string(winner));
-}
+INSTANTIATE_TYPED_TEST_SUITE_P(Files, CredentialStoreContract, Backends, BackendNames);
 
 } // namespace welcomer::contract

@@ -1,0 +1,54 @@
+#include "backends/desktop/DesktopCredentialStore.h"
+
+#include "platform/Path.h"
+
+#include <cstdlib>
+#include <unistd.h>
+#include <utility>
+
+namespace welcomer::desktop {
+
+namespace {
+
+constexpr char kLockFileName[] = ".Credentials.lock";
+
+bool isSet(const char* value) {
+    return value && *value != '\0';
+}
+
+} // namespace
+
+bool mayHaveSessionBus() {
+    if (isSet(std::getenv("DBUS_SESSION_BUS_ADDRESS"))) {
+        return true;
+    }
+    const char* const runtimeFolder = std::getenv("XDG_RUNTIME_DIR");
+    return isSet(runtimeFolder) && ::access(platform::joinPath(runtimeFolder, "bus").c_str(), F_OK) == 0;
+}
+
+DesktopCredentialStore::DesktopCredentialStore(local::RootFolder root, platform::ProcessIdentity& identity,
+                                               platform::CredentialStore& local,
+                                               CredentialModule::Arguments arguments)
+    : _root(std::move(root)),
+      _identity(identity),
+      _module(arguments),
+      _store([this] { return mayHaveSessionBus() ? _module.service() : nullptr; }, local,
+             [this] {
+                 // Makes the library folder where it is missing.
+                 _identity.userLibraryDirectories();
+                 const std::string library = platform::joinPath(_identity.homeDirectory(), "Library");
+                 return _root.locate(platform::joinPath(library, kLockFileName));
+             }) {}
+
+platform::BackendReport DesktopCredentialStore::report() {
+    platform::BackendReport report{"CredentialStore", "local file", "", ""};
+    if (!mayHaveSessionBus()) {
+        report.reason = "there is no session bus";
+        report.advice = "log in to a desktop session, with a Secret Service such as gnome-keyring";
+        return report;
+    }
+    _module.describe(report);
+    return report;
+}
+
+} // namespace welcomer::desktop

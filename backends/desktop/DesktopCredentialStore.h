@@ -1,0 +1,39 @@
+// The credential store of a desktop: the Secret Service on the session bus, with the local store behind it.
+
+#pragma once
+
+#include "backends/desktop/CredentialModule.h"
+#include "backends/desktop/DesktopModule.h"
+#include "backends/desktop/SearchListCredentialStore.h"
+#include "backends/local/RootFolder.h"
+#include "platform/ProcessIdentity.h"
+
+#include <string>
+
+namespace welcomer::desktop {
+
+// Whether the environment names a session bus that may be there: costs no connection. Any thread.
+bool mayHaveSessionBus();
+
+// The module is loaded at the first operation that finds a session bus.
+class DesktopCredentialStore {
+  public:
+    //  root      the folder below which the lock file is looked up
+    //  identity  says where the user's library is; borrowed
+    //  local     the local store; borrowed
+    DesktopCredentialStore(local::RootFolder root, platform::ProcessIdentity& identity,
+                           platform::CredentialStore& local, CredentialModule::Arguments arguments = {});
+
+    platform::CredentialStore& store() { return _store; }
+
+    // Any thread; may block while the service answers.
+    platform::BackendReport report();
+
+  private:
+    const local::RootFolder _root;
+    platform::ProcessIdentity& _identity;
+    DesktopModule<CredentialModule> _module;
+    SearchListCredentialStore _store;
+};
+
+} // namespace welcomer::desktop

@@ -1,0 +1,37 @@
+// Waiting for a call that may ask the user something.
+
+#pragma once
+
+#include "backends/desktop/GLibPointer.h"
+
+#include <chrono>
+
+namespace welcomer::desktop {
+
+// Runs one asynchronous call on a main context of its own, and gives it up when nobody answers. One call, one
+// thread.
+class PromptWait {
+  public:
+    explicit PromptWait(std::chrono::nanoseconds patience);
+    ~PromptWait();
+    PromptWait(const PromptWait&) = delete;
+    PromptWait& operator=(const PromptWait&) = delete;
+
+    // What the asynchronous call takes.
+    GCancellable* cancellable() const;
+    static void done(GObject* source, GAsyncResult* result, gpointer wait);
+    gpointer argument() const;
+
+    // Waits for the call.
+    //  result  its result, borrowed; null when it had to be given up without one
+    GAsyncResult* wait();
+
+    // Whether nobody has answered in time.
+    bool wasGivenUp() const;
+
+  private:
+    struct State;
+    State* const _state; // shared with the call
+};
+
+} // namespace welcomer::desktop

@@ -1,0 +1,24 @@
+#include "backends/desktop/CredentialModule.h"
+#include "backends/desktop/ModuleEntry.h"
+#include "backends/desktop/credentials/SecretServiceStore.h"
+
+namespace welcomer::desktop {
+
+namespace {
+
+// Whether there is a service is asked at each operation: it may come and go.
+std::unique_ptr<platform::CredentialStore> createCredentialStore(const CredentialModule::Arguments& arguments,
+                                                                 std::string& /*whyNot*/) {
+    return std::make_unique<SecretServiceStore>(arguments);
+}
+
+bool describeCredentialStore(const CredentialModule::Arguments& arguments, platform::BackendReport& report) {
+    return SecretServiceStore(arguments).describe(report);
+}
+
+} // namespace
+
+} // namespace welcomer::desktop
+
+WELCOMER_DESKTOP_MODULE(welcomer::desktop::CredentialModule, welcomer::desktop::createCredentialStore,
+                        welcomer::desktop::describeCredentialStore)

@@ -1,0 +1,285 @@
+// The credential store of a desktop on a real gnome-keyring.
+
+#include "backends/desktop/DesktopCredentialStore.h"
+#include "backends/local/LocalCredentialStore.h"
+#include "tests/contract/CredentialStoreContract.h"
+#include "tests/fakes/FakeFileSystem.h"
+#include "tests/fakes/FakeProcessIdentity.h"
+#include "tests/support/KeyringSession.h"
+
+#include <sys/wait.h>
+#include <type_traits>
+
+namespace welcomer {
+
+namespace {
+
+using namespace std::chrono_literals;
+
+// A user's credential store, and what it stands on.
+struct UsersCredentials {
+    explicit UsersCredentials(const TemporaryRoot& folder, std::chrono::nanoseconds patience = 120s)
+        : root(folder.path()),
+          local(root, identity),
+          desktop(root, identity, local, {patience}) {
+        folder.addDirectory("/home/user/Library");
+    }
+
+    fakes::CallRecorder recorder;
+    fakes::FakeFileSystem fileSystem{recorder};
+    fakes::FakeProcessIdentity identity{recorder, fileSystem};
+    local::RootFolder root;
+    local::LocalCredentialStore local;
+    desktop::DesktopCredentialStore desktop;
+};
+
+struct KeyringCredentials {
+    TemporaryRoot root;
+    KeyringSession session;
+    UsersCredentials credentials{root};
+    platform::CredentialStore& store = credentials.desktop.store();
+
+    KeyringCredentials() { session.startKeyring(); }
+};
+
+const platform::CredentialItem kItem{"service", "account", "a label", std::nullopt};
+
+class KeyringTest : public testing::Test {
+  protected:
+    std::int32_t read() {
+        return credentials.desktop.store().findItem("service", "account", &data, &reference);
+    }
+    std::int32_t create(const std::string& secret) {
+        return credentials.desktop.store().createItem(kItem, secret);
+    }
+
+    // The same for the local store alone.
+    std::int32_t readLocally() { return credentials.local.findItem("service", "account", &data, nullptr); }
+
+    // A store whose prompts wait for less.
+    UsersCredentials impatient() const { return UsersCredentials(root, 300ms); }
+
+    static std::string lookUpOutside() {
+        return outputOf({"secret-tool", "lookup", "service", "service", "account", "account"});
+    }
+
+    TemporaryRoot root;
+    KeyringSession session;
+    UsersCredentials credentials{root};
+    std::string data = "untouched";
+    std::unique_ptr<platform::CredentialItemReference> reference;
+};
+
+} // namespace
+
+namespace contract {
+INSTANTIATE_TYPED_TEST_SUITE_P(Keyring, CredentialStoreContract, KeyringCredentials);
+}
+
+TEST_F(KeyringTest, OtherProgramsFindTheItemByItsAttributesAndSeeItsLabel) {
+    session.startKeyring();
+    ASSERT_EQ(create("the secret"), 0);
+    EXPECT_EQ(lookUpOutside(), "the secret");
+    EXPECT_NE(outputOf({"secret-tool", "search", "service", "service"}).find("label = a label"),
+              std::string::npos);
+    EXPECT_EQ(readLocally(), platform::kCredentialItemNotFound);
+}
+
+TEST_F(KeyringTest, AnItemOfAnotherProgramIsFoundAndNotReplaced) {
+    session.startKeyring();
+    Daemon({"secret-tool", "store", "--label=theirs", "service", "service", "account", "account"},
+           "their secret", "")
+        .waitForLine("-"); // it has ended
+    EXPECT_EQ(create("ours"), platform::kCredentialDuplicateItem);
+    EXPECT_EQ(read(), 0);
+    EXPECT_EQ(data, "their secret");
+}
+
+TEST_F(KeyringTest, WithoutADefaultCollectionOneIsMade) {
+    session.startEmptyKeyring();
+    Daemon prompter = session.startPrompter("ok");
+    EXPECT_EQ(create("the secret"), 0);
+    EXPECT_EQ(lookUpOutside(), "the secret");
+}
+
+TEST_F(KeyringTest, WhoRefusesToHaveACollectionMadeIsHeeded) {
+    session.startEmptyKeyring();
+    Daemon prompter = session.startPrompter("refuse");
+    EXPECT_EQ(create("the secret"), platform::kCredentialDismissed);
+    EXPECT_EQ(readLocally(), platform::kCredentialItemNotFound);
+}
+
+TEST_F(KeyringTest, ALockedKeyringIsUnlockedByWhoAnswers) {
+    session.startKeyring();
+    ASSERT_EQ(create("the secret"), 0);
+    session.lockKeyring();
+    Daemon prompter = session.startPrompter("ok");
+    EXPECT_EQ(read(), 0);
+    EXPECT_EQ(data, "the secret");
+    EXPECT_EQ(credentials.desktop.store().deleteItem(*reference), 0);
+    EXPECT_EQ(read(), platform::kCredentialItemNotFound);
+}
+
+TEST_F(KeyringTest, ALockedKeyringIsUnlockedToCreateAnItem) {
+    session.startKeyring();
+    session.lockKeyring();
+    Daemon prompter = session.startPrompter("ok");
+    EXPECT_EQ(create("the secret"), 0);
+    EXPECT_EQ(read(), 0);
+}
+
+TEST_F(KeyringTest, ALockedItemIsNotCreatedAgain) {
+    session.startKeyring();
+    ASSERT_EQ(create("the secret"), 0);
+    session.lockKeyring();
+    EXPECT_EQ(create("another"), platform::kCredentialDuplicateItem);
+}
+
+TEST_F(KeyringTest, ALockedKeyringWithoutAPrompterIsLocked) {
+    session.startKeyring();
+    ASSERT_EQ(create("the secret"), 0);
+    session.lockKeyring();
+    EXPECT_EQ(read(), platform::kCredentialLocked);
+    EXPECT_EQ(data, "untouched");
+}
+
+TEST_F(KeyringTest, AUserWhoRefusesToUnlockHasDismissedIt) {
+    session.startKeyring();
+    ASSERT_EQ(create("the secret"), 0);
+    session.lockKeyring();
+    Daemon prompter = session.startPrompter("refuse");
+    EXPECT_EQ(read(), platform::kCredentialDismissed);
+    EXPECT_EQ(data, "untouched");
+}
+
+TEST_F(KeyringTest, APromptThatNobodyAnswersIsGivenUp) {
+    session.startKeyring();
+    ASSERT_EQ(create("the secret"), 0);
+    session.lockKeyring();
+    Daemon prompter = session.startPrompter("silent");
+    UsersCredentials store = impatient();
+    EXPECT_EQ(store.desktop.store().findItem("service", "account", &data, &reference),
+              platform::kCredentialPromptUnanswered);
+    EXPECT_TRUE(prompter.waitForLine("BeginPrompting"));
+    EXPECT_EQ(data, "untouched");
+    EXPECT_EQ(reference, nullptr);
+}
+
+TEST(CredentialModuleTest, APromptIsGivenUpAfterTwoMinutes) {
+    EXPECT_EQ(desktop::CredentialModule::Arguments().promptPatience, 2min);
+}
+
+TEST_F(KeyringTest, WhatTheLocalStoreHoldsIsFoundThoughTheKeyringIsLocked) {
+    ASSERT_EQ(credentials.local.createItem(kItem, "local secret"), 0);
+    session.startKeyring();
+    session.lockKeyring();
+    EXPECT_EQ(read(), 0);
+    EXPECT_EQ(data, "local secret");
+}
+
+TEST_F(KeyringTest, ASecretOf48MiBIsTheLargest) {
+    session.startKeyring();
+    std::string large(desktop::kLargestSecret + 1, 'x');
+    EXPECT_EQ(create(large), platform::kCredentialTooLarge);
+    EXPECT_EQ(read(), platform::kCredentialItemNotFound);
+    large.pop_back();
+    EXPECT_EQ(create(large), 0);
+    EXPECT_EQ(read(), 0);
+    EXPECT_EQ(data.size(), large.size());
+    EXPECT_TRUE(data == large);
+}
+
+TEST_F(KeyringTest, WithoutAServiceTheLocalStoreServesAlone) {
+    // Nothing can be activated on this bus.
+    ::unsetenv("DBUS_SESSION_BUS_ADDRESS");
+    const TemporaryRoot folder;
+    folder.addFile("/bus.conf",
+                   "<busconfig><type>session</type><listen>unix:dir=" + folder.path() +
+                       "</listen><policy context='default'><allow send_destination='*' eavesdrop='true'/>"
+                       "<allow eavesdrop='true'/><allow own='*'/></policy></busconfig>");
+    Daemon bus({"dbus-daemon", "--config-file=" + folder.locate("/bus.conf"), "--nofork", "--print-address"},
+               "", "unix:");
+    ::setenv("DBUS_SESSION_BUS_ADDRESS", ("unix:" + bus.answer()).c_str(), 1);
+
+    EXPECT_EQ(create("the secret"), 0);
+    EXPECT_EQ(readLocally(), 0);
+    EXPECT_EQ(read(), 0);
+    EXPECT_EQ(credentials.desktop.store().deleteItem(*reference), 0);
+    EXPECT_EQ(credentials.desktop.report().backend, "local file");
+    EXPECT_EQ(credentials.desktop.report().reason, "no credential service runs or can be started");
+}
+
+TEST_F(KeyringTest, WithoutABusTheLocalStoreServesAloneAndNothingIsLoaded) {
+    ::unsetenv("DBUS_SESSION_BUS_ADDRESS");
+    EXPECT_EQ(create("the secret"), 0);
+    EXPECT_EQ(readLocally(), 0);
+    EXPECT_EQ(read(), 0);
+    EXPECT_EQ(credentials.desktop.report().reason, "there is no session bus");
+    EXPECT_EQ(outputOf({"grep", "-c", "libsecret", "/proc/" + std::to_string(::getpid()) + "/maps"}), "0");
+}
+
+TEST_F(KeyringTest, AnAddressWhereNoBusAnswersIsNoBus) {
+    ::setenv("DBUS_SESSION_BUS_ADDRESS", "unix:path=/nonexistent/bus", 1);
+    EXPECT_EQ(create("the secret"), 0);
+    EXPECT_EQ(readLocally(), 0);
+    EXPECT_EQ(credentials.desktop.report().reason, "the session bus does not answer");
+}
+
+TEST_F(KeyringTest, TheProcessOutlivesTheBusAndTheLocalStoreTakesOver) {
+    session.startKeyring();
+    ASSERT_EQ(create("the secret"), 0);
+    ASSERT_EQ(read(), 0);
+    session.killBus();
+
+    platform::CredentialItem item;
+    EXPECT_NE(credentials.desktop.store().readAttributes(*reference, item), 0);
+    EXPECT_NE(credentials.desktop.store().deleteItem(*reference), 0);
+    EXPECT_EQ(read(), platform::kCredentialItemNotFound);
+    EXPECT_EQ(create("the second secret"), 0);
+    EXPECT_EQ(readLocally(), 0);
+    EXPECT_EQ(data, "the second secret");
+}
+
+TEST_F(KeyringTest, OfTwoProcessesThatCreateAtOnceOneSucceeds) {
+    session.startKeyring();
+    for (int trial = 0; trial < 5; ++trial) {
+        std::vector<pid_t> writers;
+        for (const char* secret : {"one", "other"}) {
+            const pid_t writer = ::fork();
+            if (writer == 0) {
+                // Nothing of GLib has been used in this process so far.
+                UsersCredentials own(root);
+                ::_exit(own.desktop.store().createItem(kItem, secret));
+            }
+            writers.push_back(writer);
+        }
+        int sum = 0;
+        for (const pid_t writer : writers) {
+            int status = 0;
+            ::waitpid(writer, &status, 0);
+            ASSERT_TRUE(WIFEXITED(status));
+            sum += WEXITSTATUS(status);
+        }
+        EXPECT_EQ(sum, platform::kCredentialSuccess + platform::kCredentialDuplicateItem);
+        const std::string found = outputOf({"secret-tool", "search", "--all", "service", "service"});
+        EXPECT_NE(found.find("label = "), std::string::npos);
+        EXPECT_EQ(found.find("label = "), found.rfind("label = "));
+        outputOf({"secret-tool", "clear", "service", "service"});
+    }
+}
+
+TEST_F(KeyringTest, TheReportSaysWhetherTheKeyringIsUnlocked) {
+    session.startKeyring();
+    EXPECT_EQ(credentials.desktop.report(), (platform::BackendReport{"CredentialStore", "Secret Service",
+                                                                     "the default keyring is unlocked", ""}));
+    session.lockKeyring();
+    EXPECT_EQ(credentials.desktop.report().reason, "the default keyring is locked");
+    EXPECT_NE(credentials.desktop.report().advice, "");
+}
+
+TEST_F(KeyringTest, TheReportSaysThatThereIsNoDefaultKeyring) {
+    session.startEmptyKeyring();
+    EXPECT_EQ(credentials.desktop.report().reason, "the service runs; there is no default keyring yet");
+}
+
+} // namespace welcomer
