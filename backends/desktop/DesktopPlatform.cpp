@@ -19,6 +19,7 @@ PlatformOptions withRunLoops(PlatformOptions options, platform::RunLoops& runLoo
 
 // The local platform with the desktop's services in their places.
 platform::Platform withDesktop(const platform::Platform& local, platform::CredentialStore& credentialStore,
+                               platform::PreferenceStore& preferenceStore,
                                platform::AccountService& accountService, DesktopNetwork& network,
                                platform::HostReachability& hostReachability) {
     return {local.systemLog,
@@ -30,7 +31,7 @@ platform::Platform withDesktop(const platform::Platform& local, platform::Creden
             local.clock,
             local.runLoops,
             local.dispatchQueues,
-            local.preferenceStore,
+            preferenceStore,
             local.systemVersionInfo,
             hostReachability,
             local.notificationCenter,
@@ -50,15 +51,17 @@ DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
                        _local.platform().credentialStore),
       _accountService(_accountSurroundings(options.root), {std::string(configuration::kOnlineAccountProvider),
                                                            std::string(configuration::kOnlineAccountServer)}),
+      _preferenceStore(_local.platform().preferenceStore),
       _network({_local.platform().networkConfigStore, _local.platform().networkStateStore,
                 _local.platform().hostReachability}),
-      _platform(
-          withDesktop(_local.platform(), _credentialStore.store(), _accountService, _network,
-                      options.hostReachability ? *options.hostReachability : _network.hostReachability())) {}
+      _platform(withDesktop(
+          _local.platform(), _credentialStore.store(), _preferenceStore, _accountService, _network,
+          options.hostReachability ? *options.hostReachability : _network.hostReachability())) {}
 
 std::vector<platform::BackendReport> DesktopPlatform::backendReports() {
     std::vector<platform::BackendReport> reports;
     reports.push_back(_credentialStore.report());
+    reports.push_back(_preferenceStore.report());
     reports.push_back(_runLoops.report());
     platform::BackendReport accounts{"AccountService", "account file", "", ""};
     _onlineAccounts.describe(accounts);

@@ -7,6 +7,7 @@
 #include "backends/desktop/DesktopCredentialStore.h"
 #include "backends/desktop/DesktopModule.h"
 #include "backends/desktop/DesktopNetwork.h"
+#include "backends/desktop/DesktopPreferenceStore.h"
 #include "backends/desktop/DesktopRunLoops.h"
 #include "backends/desktop/OnlineAccountService.h"
 #include "backends/desktop/OnlineAccountsModule.h"
@@ -34,6 +35,7 @@ class DesktopPlatform final : public PlatformOwner {
     DesktopCredentialStore _credentialStore;
     DesktopModule<OnlineAccountsModule> _onlineAccounts{{}};
     OnlineAccountService _accountService;
+    DesktopPreferenceStore _preferenceStore;
     DesktopNetwork _network;
     const platform::Platform _platform;
 };

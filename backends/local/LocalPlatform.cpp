@@ -39,4 +39,16 @@ LocalPlatform::LocalPlatform(const PlatformOptions& options)
                 _networkStateStore,
                 _directoryService} {}
 
+std::vector<platform::BackendReport> LocalPlatform::backendReports() {
+    const bool isWholeMachine = _root.locate("/") == "/";
+    const std::string reason =
+        isWholeMachine ? "this build has no desktop backends" : "the desktop's services know no root but /";
+    const std::string advice = isWholeMachine ? "build with WELCOMER_DESKTOP" : "";
+    return {
+        {"CredentialStore", "local file", reason, advice}, {"PreferenceStore", "files", reason, advice},
+        {"RunLoop", "standard threads", reason, advice},   {"AccountService", "account file", reason, advice},
+        {"NetworkConfigStore", "file", reason, advice},    {"NetworkStateStore", "kernel", reason, advice},
+        {"HostReachability", "kernel", reason, advice}};
+}
+
 } // namespace welcomer::local

@@ -15,11 +15,13 @@ void addPluginsCommands(CommandLine& commandLine);
 void addStateCommands(CommandLine& commandLine);
 void addSyncCommands(CommandLine& commandLine);
 void addSwitchCommands(CommandLine& commandLine);
+void addDoctorCommand(CommandLine& commandLine);
 void addNetworkCommands(CommandLine& commandLine);
 
 // In the order in which --help shows them.
 inline constexpr void (*kCommands[])(CommandLine&) = {
-    addTryCommand,      addSetupCommand,  addAccountCommands, addServicesCommands, addReplayCommands,
-    addPluginsCommands, addStateCommands, addSyncCommands,    addSwitchCommands,   addNetworkCommands};
+    addTryCommand,     addSetupCommand,    addAccountCommands, addServicesCommands,
+    addReplayCommands, addPluginsCommands, addStateCommands,   addSyncCommands,
+    addSwitchCommands, addNetworkCommands, addDoctorCommand};
 
 } // namespace welcomer::tool

@@ -2,11 +2,13 @@
 
 #pragma once
 
+#include "platform/BackendReport.h"
 #include "platform/Platform.h"
 
 #include <functional>
 #include <memory>
 #include <string>
+#include <vector>
 
 namespace welcomer::tool {
 
@@ -18,6 +20,8 @@ struct PlatformRequest {
     platform::HostReachability* hostReachability =
         nullptr;                                        // in place of the machine's own, or null; borrowed
     platform::DispatchQueues* dispatchQueues = nullptr; // the same; not with simulated time
+    // Where to put how each interface is served, or null; asks the services, and may block. Borrowed.
+    std::vector<platform::BackendReport>* backendReports = nullptr;
 };
 
 // A platform together with what owns it.

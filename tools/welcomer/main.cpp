@@ -30,6 +30,9 @@ tool::PlatformHandle build(const tool::PlatformRequest& request) {
         options.dispatchQueues = owned->simulatedTime.get();
     }
     owned->owner = buildPlatform(options);
+    if (request.backendReports) {
+        *request.backendReports = owned->owner->backendReports();
+    }
     return {owned, &owned->owner->platform()};
 }
 

@@ -1,0 +1,39 @@
+#include "backends/desktop/DesktopPreferenceStore.h"
+
+namespace welcomer::desktop {
+
+std::optional<PropertyList> DesktopPreferenceStore::copyValue(const std::string& key,
+                                                              const std::string& domain) {
+    if (key == "askForPassword" && domain == "com.corvid.screensaver") {
+        ScreenLock* const screenLock = _module.service();
+        if (const std::optional<bool> asks = screenLock ? screenLock->asksForPassword() : std::nullopt) {
+            return PropertyList(*asks);
+        }
+    }
+    return _local.copyValue(key, domain);
+}
+
+void DesktopPreferenceStore::setValue(const std::string& key, const PropertyList& value,
+                                      const std::string& domain) {
+    _local.setValue(key, value, domain);
+}
+
+void DesktopPreferenceStore::removeValue(const std::string& key, const std::string& domain) {
+    _local.removeValue(key, domain);
+}
+
+bool DesktopPreferenceStore::synchronise(const std::string& domain) {
+    return _local.synchronise(domain);
+}
+
+std::vector<platform::DamagedPreferences> DesktopPreferenceStore::damagedPreferences() {
+    return _local.damagedPreferences();
+}
+
+platform::BackendReport DesktopPreferenceStore::report() {
+    platform::BackendReport report{"PreferenceStore", "files", "", ""};
+    _module.describe(report);
+    return report;
+}
+
+} // namespace welcomer::desktop
