@@ -12,18 +12,20 @@ namespace {
 
 constexpr char kLockFileName[] = ".Credentials.lock";
 
-bool isSet(const char* value) {
-    return value && *value != '\0';
+// Empty where it is not set.
+std::string environmentVariable(const char* name) {
+    const char* const value = std::getenv(name);
+    return value ? value : "";
 }
 
 } // namespace
 
 bool mayHaveSessionBus() {
-    if (isSet(std::getenv("DBUS_SESSION_BUS_ADDRESS"))) {
+    if (!environmentVariable("DBUS_SESSION_BUS_ADDRESS").empty()) {
         return true;
     }
-    const char* const runtimeFolder = std::getenv("XDG_RUNTIME_DIR");
-    return isSet(runtimeFolder) && ::access(platform::joinPath(runtimeFolder, "bus").c_str(), F_OK) == 0;
+    const std::string runtimeFolder = environmentVariable("XDG_RUNTIME_DIR");
+    return !runtimeFolder.empty() && ::access(platform::joinPath(runtimeFolder, "bus").c_str(), F_OK) == 0;
 }
 
 DesktopCredentialStore::DesktopCredentialStore(local::RootFolder root, platform::ProcessIdentity& identity,
