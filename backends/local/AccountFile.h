@@ -2,12 +2,16 @@
 
 #pragma once
 
+#include "backends/local/PreferenceFile.h"
 #include "backends/local/RootFolder.h"
 #include "platform/ProcessIdentity.h"
 #include "propertylist/PropertyList.h"
 
 #include <functional>
+#include <mutex>
+#include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace welcomer::local {
@@ -23,8 +27,9 @@ inline constexpr char kAccountsKey[] = "Accounts";
 //     LoggedInAccount  the name of the account that is logged in
 //     SetupFinished    boolean: setup has said so
 // A change takes the folder's lock, merges into what is on disk and replaces the file in one step, so that no
-// change of another process is lost and the file is whole at any time. A damaged file counts as empty and is
-// set aside before the first change. Any thread and any process.
+// change of another process is lost and the file is whole at any time. A question reads the file, and parses
+// it only where its bytes are no longer those of the last time. A damaged file counts as empty and is set
+// aside before the first change. Any thread and any process.
 class AccountFile {
   public:
     // Borrows the identity, which must outlive this.
@@ -32,8 +37,16 @@ class AccountFile {
         : _root(std::move(root)),
           _identity(identity) {}
 
-    // Everything in the file; empty when there is nothing that can be read.
-    PropertyList::Dictionary read();
+    // Asks something of what is in the file now.
+    //  question  is given everything, which is empty when there is nothing that can be read, and is valid
+    //  only
+    //            during the call; must not use this file itself
+    //  result    the question's
+    template <typename Question>
+    auto ask(const Question& question) {
+        const std::lock_guard lock(_mutex);
+        return question(_readContent());
+    }
 
     // The names of the accounts, in order.
     std::vector<std::string> names();
@@ -44,10 +57,14 @@ class AccountFile {
     bool change(const std::function<bool(PropertyList::Dictionary& content)>& change);
 
   private:
+    const PropertyList::Dictionary& _readContent();
     std::string _folder();
 
     const RootFolder _root;
     platform::ProcessIdentity& _identity;
+    std::mutex _mutex;                // guards what follows
+    std::optional<std::string> _path; // of the file, on this machine; none until it is first needed
+    PreferenceFileContent _onDisk;    // as it was when it was last read or written
 };
 
 } // namespace welcomer::local

@@ -2,6 +2,7 @@
 
 #include <chrono>
 #include <cstdint>
+#include <type_traits>
 #include <utility>
 
 namespace welcomer::local {
@@ -15,8 +16,9 @@ constexpr char kCanBeEnabledKey[] = "CanBeEnabled";
 constexpr char kEnabledKey[] = "Enabled";
 constexpr char kPropertiesKey[] = "Properties";
 
-// The dictionary under a key, or null.
-PropertyList::Dictionary* findDictionary(PropertyList::Dictionary& parent, const std::string& key) {
+// The dictionary under a key, or null. As const as its parent, like the ones below.
+template <typename Parent>
+auto findDictionary(Parent& parent, const std::string& key) -> decltype(parent.begin()->second.dictionary()) {
     const auto found = parent.find(key);
     return found == parent.end() ? nullptr : found->second.dictionary();
 }
@@ -30,15 +32,16 @@ PropertyList::Dictionary& makeDictionary(PropertyList::Dictionary& parent, const
     return *value.dictionary();
 }
 
-PropertyList::Dictionary* findAccount(PropertyList::Dictionary& content, const std::string& name) {
-    PropertyList::Dictionary* accounts = findDictionary(content, kAccountsKey);
+template <typename Content>
+Content* findAccount(Content& content, const std::string& name) {
+    Content* accounts = findDictionary(content, kAccountsKey);
     return accounts ? findDictionary(*accounts, name) : nullptr;
 }
 
-PropertyList::Dictionary* findService(PropertyList::Dictionary& content, const std::string& name,
-                                      const std::string& identifier) {
-    PropertyList::Dictionary* account = findAccount(content, name);
-    PropertyList::Dictionary* services = account ? findDictionary(*account, kServicesKey) : nullptr;
+template <typename Content>
+Content* findService(Content& content, const std::string& name, const std::string& identifier) {
+    Content* account = findAccount(content, name);
+    Content* services = account ? findDictionary(*account, kServicesKey) : nullptr;
     return services ? findDictionary(*services, identifier) : nullptr;
 }
 
@@ -58,6 +61,10 @@ std::chrono::nanoseconds nanoseconds(double seconds) {
 } // namespace
 
 struct LocalAccountService::Accounts {
+    Accounts(const RootFolder& root, platform::ProcessIdentity& identity)
+        : file(root, identity),
+          directory(root) {}
+
     AccountFile file;
     NimbusDirectory directory;
 
@@ -84,20 +91,17 @@ class LocalAccountService::Service final : public platform::CloudService {
           _identifier(std::move(identifier)) {}
 
     bool canBeEnabled() override {
-        PropertyList::Dictionary content = _accounts->file.read();
-        const PropertyList::Dictionary* service = findService(content, _account, _identifier);
-        return service && flag(*service, kCanBeEnabledKey, true);
+        return _ask([](const PropertyList::Dictionary* service) {
+            return service && flag(*service, kCanBeEnabledKey, true);
+        });
     }
 
     std::optional<PropertyList> propertyValue(const std::string& key) override {
-        PropertyList::Dictionary content = _accounts->file.read();
-        PropertyList::Dictionary* service = findService(content, _account, _identifier);
-        const PropertyList::Dictionary* properties =
-            service ? findDictionary(*service, kPropertiesKey) : nullptr;
-        if (!properties || !properties->contains(key)) {
-            return std::nullopt;
-        }
-        return properties->at(key);
+        return _ask([&](const PropertyList::Dictionary* service) {
+            const auto* properties = service ? findDictionary(*service, kPropertiesKey) : nullptr;
+            return properties && properties->contains(key) ? std::optional(properties->at(key))
+                                                           : std::nullopt;
+        });
     }
 
     void enableWithWindow(bool enabled, bool /*creating*/, platform::Window* /*window*/) override {
@@ -116,6 +120,14 @@ class LocalAccountService::Service final : public platform::CloudService {
     }
 
   private:
+    // Asks something of the service's dictionary, null where it has gone.
+    template <typename Question>
+    std::invoke_result_t<Question, const PropertyList::Dictionary*> _ask(const Question& question) {
+        return _accounts->file.ask([&](const PropertyList::Dictionary& content) {
+            return question(findService(content, _account, _identifier));
+        });
+    }
+
     const std::shared_ptr<Accounts> _accounts;
     const std::string _account;
     const std::string _identifier;
@@ -134,11 +146,10 @@ class LocalAccountService::Account final : public platform::CloudAccount {
     }
 
     std::shared_ptr<platform::CloudService> serviceForID(const std::string& identifier) override {
-        PropertyList::Dictionary content = _accounts->file.read();
-        if (!findService(content, _name, identifier)) {
-            return nullptr;
-        }
-        return std::make_shared<Service>(_accounts, _name, identifier);
+        const bool isPresent = _accounts->file.ask([&](const PropertyList::Dictionary& content) {
+            return findService(content, _name, identifier) != nullptr;
+        });
+        return isPresent ? std::make_shared<Service>(_accounts, _name, identifier) : nullptr;
     }
 
   private:
@@ -183,28 +194,30 @@ LocalAccountService::LocalAccountService(const RootFolder& root, platform::Proce
                                          platform::RunLoops& runLoops,
                                          platform::DispatchQueues& dispatchQueues,
                                          platform::NotificationCenter& notificationCenter)
-    : _accounts(std::make_shared<Accounts>(Accounts{AccountFile(root, identity), NimbusDirectory(root)})),
+    : _accounts(std::make_shared<Accounts>(root, identity)),
       _runLoops(runLoops),
       _dispatchQueues(dispatchQueues),
       _notificationCenter(notificationCenter),
       _isAlive(std::make_shared<bool>(true)) {}
 
 std::shared_ptr<platform::CloudAccount> LocalAccountService::loggedInAccount() {
-    PropertyList::Dictionary content = _accounts->file.read();
-    const auto name = content.find(kLoggedInAccountKey);
-    if (name == content.end() || !name->second.isString() || !findAccount(content, *name->second.string())) {
-        return nullptr;
-    }
-    return std::make_shared<Account>(_accounts, *name->second.string());
+    const auto name = _accounts->file.ask([](const PropertyList::Dictionary& content) {
+        const auto found = content.find(kLoggedInAccountKey);
+        const std::string* text = found == content.end() ? nullptr : found->second.string();
+        return text && findAccount(content, *text) ? std::optional(*text) : std::nullopt;
+    });
+    return name ? std::make_shared<Account>(_accounts, *name) : nullptr;
 }
 
 bool LocalAccountService::isServiceEnabled(platform::CloudAccount* account, const std::string& identifier) {
     if (!account) {
         return false;
     }
-    PropertyList::Dictionary content = _accounts->file.read();
-    const PropertyList::Dictionary* service = findService(content, account->accountID(), identifier);
-    return service && flag(*service, kEnabledKey, false);
+    const std::string name = account->accountID();
+    return _accounts->file.ask([&](const PropertyList::Dictionary& content) {
+        const auto* service = findService(content, name, identifier);
+        return service && flag(*service, kEnabledKey, false);
+    });
 }
 
 std::shared_ptr<platform::CloudAccount>
@@ -213,8 +226,9 @@ LocalAccountService::accountForID(const std::optional<PropertyList>& identifier,
     if (!name || name->empty()) {
         return nullptr;
     }
-    PropertyList::Dictionary content = _accounts->file.read();
-    if (!findAccount(content, *name) && (!createIfMissing || !_accounts->make(*name))) {
+    const bool isThere = _accounts->file.ask(
+        [&](const PropertyList::Dictionary& content) { return findAccount(content, *name) != nullptr; });
+    if (!isThere && (!createIfMissing || !_accounts->make(*name))) {
         return nullptr;
     }
     return std::make_shared<Account>(_accounts, *name);

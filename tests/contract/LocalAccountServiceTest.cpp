@@ -21,6 +21,7 @@
 #include <cerrno>
 #include <chrono>
 #include <csignal>
+#include <fcntl.h>
 #include <functional>
 #include <memory>
 #include <string>
@@ -345,6 +346,88 @@ TEST_F(LocalAccountServiceTest, NoChangeOfAnotherProcessIsLost) {
     const auto account = service.accountForID("anna", false);
     ASSERT_NE(account, nullptr);
     for (const std::string& identifier : WLNimbusAllSetupServiceIDs()) {
+        EXPECT_TRUE(service.isServiceEnabled(account.get(), identifier)) << identifier;
+    }
+}
+
+TEST_F(LocalAccountServiceTest, AQuestionIsAnsweredFromTheFileAsAnotherProcessHasLeftIt) {
+    const auto account = service.accountForID("anna", true);
+    const auto contacts = account->serviceForID(kSKServiceIDContacts);
+    for (const bool enabled : {true, false, true}) {
+        EXPECT_EQ(waitFor(start([&] {
+                      local::LocalAccountService other{local::RootFolder(root.path()), identity, time, time,
+                                                       center};
+                      other.accountForID("anna", false)
+                          ->serviceForID(kSKServiceIDContacts)
+                          ->enableSilently(enabled);
+                      return 0;
+                  })),
+                  0);
+        EXPECT_EQ(service.isServiceEnabled(account.get(), kSKServiceIDContacts), enabled);
+        // What was known here before is no part of a change that is made here now.
+        account->serviceForID(kSKServiceIDMail)->enableSilently(enabled);
+        EXPECT_EQ(service.isServiceEnabled(account.get(), kSKServiceIDContacts), enabled);
+        EXPECT_EQ(service.isServiceEnabled(account.get(), kSKServiceIDMail), enabled);
+    }
+}
+
+TEST_F(LocalAccountServiceTest, AFileOfTheSameSizeAndTimeIsReadAllTheSame) {
+    const auto account = service.accountForID("anna", true);
+    account->serviceForID(kSKServiceIDContacts)->enableSilently(true);
+    ASSERT_TRUE(service.isServiceEnabled(account.get(), kSKServiceIDContacts));
+    std::string content = root.content(kFile).value();
+    struct stat before = {};
+    ASSERT_EQ(::stat(root.locate(kFile).c_str(), &before), 0);
+    content.replace(content.find("<true/>"), 7, "<real/>"); // what counts is that it is no longer true
+    root.addFile(kFile, content);
+    const timespec times[] = {before.st_atim, before.st_mtim};
+    ASSERT_EQ(::utimensat(AT_FDCWD, root.locate(kFile).c_str(), times, 0), 0);
+    EXPECT_FALSE(service.isServiceEnabled(account.get(), kSKServiceIDContacts));
+}
+
+TEST_F(LocalAccountServiceTest, AFileThatGoesIsDamagedOrIsMendedIsMetAsItIs) {
+    const auto account = service.accountForID("anna", true);
+    const std::string whole = root.content(kFile).value();
+    root.addFile(kFile, "<plist><dict><key>torn");
+    EXPECT_EQ(service.accountForID("anna", false), nullptr);
+    root.addFile(kFile, whole);
+    EXPECT_NE(service.accountForID("anna", false), nullptr);
+    ASSERT_EQ(::unlink(root.locate(kFile).c_str()), 0);
+    EXPECT_EQ(service.accountForID("anna", false), nullptr);
+    root.addDirectory(kFile);
+    EXPECT_EQ(service.accountForID("anna", false), nullptr);
+    ASSERT_EQ(::rmdir(root.locate(kFile).c_str()), 0);
+    root.addFile(kFile, whole);
+    EXPECT_NE(service.accountForID("anna", false), nullptr);
+}
+
+TEST_F(LocalAccountServiceTest, AChangeThatCouldNotBeStoredIsNotRemembered) {
+    const auto account = service.accountForID("anna", true);
+    const std::string before = root.content(kFile).value();
+    root.addDirectory(kFolder + "/.Accounts.plist.new"); // in the place of the new file
+    account->serviceForID(kSKServiceIDContacts)->enableSilently(true);
+    EXPECT_FALSE(service.isServiceEnabled(account.get(), kSKServiceIDContacts));
+    EXPECT_EQ(service.accountForID("bert", true), nullptr);
+    EXPECT_EQ(service.accountForID("bert", false), nullptr);
+    EXPECT_EQ(root.content(kFile), before);
+}
+
+TEST_F(LocalAccountServiceTest, ThreadsAskAndChangeAtTheSameTime) {
+    const auto account = service.accountForID("anna", true);
+    std::vector<std::thread> threads;
+    for (const char* identifier : {kSKServiceIDContacts, kSKServiceIDCalendars, kSKServiceIDReminders}) {
+        threads.emplace_back([&account, identifier] {
+            const auto own = account->serviceForID(identifier);
+            for (int round = 0; round < 21; ++round) {
+                own->enableSilently(round % 2 == 0);
+                EXPECT_TRUE(own->canBeEnabled());
+            }
+        });
+    }
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+    for (const char* identifier : {kSKServiceIDContacts, kSKServiceIDCalendars, kSKServiceIDReminders}) {
         EXPECT_TRUE(service.isServiceEnabled(account.get(), identifier)) << identifier;
     }
 }
