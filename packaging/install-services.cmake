@@ -15,6 +15,10 @@ else()
 endif()
 set(WELCOMER_SYSTEMD "${CMAKE_INSTALL_PREFIX}/lib/systemd")
 
+# A folder of this run's own: installations of one build may run side by side, into different prefixes.
+string(RANDOM LENGTH 16 run)
+set(WELCOMER_INSTALLED "${WELCOMER_INSTALLED}/${run}")
+
 function(install_service_file name destination)
     configure_file("${WELCOMER_PACKAGING}/${name}.in" "${WELCOMER_INSTALLED}/${name}" @ONLY)
     file(INSTALL "${WELCOMER_INSTALLED}/${name}" DESTINATION "${destination}")
@@ -32,3 +36,5 @@ install_service_file(welcomer-launch-agents.desktop "${WELCOMER_AUTOSTART}")
 
 install_service_file(welcomer-resolver-sync.service "${WELCOMER_SYSTEMD}/system")
 install_wish(welcomer-resolver-sync.service multi-user.target "${WELCOMER_SYSTEMD}/system")
+
+file(REMOVE_RECURSE "${WELCOMER_INSTALLED}")
