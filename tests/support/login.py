@@ -64,7 +64,7 @@ class Login:
 
     def start(self, command, environment=None, **options):
         return subprocess.Popen(self.machine._chroot(command, True), env={**self.environment, **(environment or {})},
-                                stdin=subprocess.DEVNULL, **options)
+                                **{"stdin": subprocess.DEVNULL, **options})
 
     def systemctl(self, *arguments, check=True):
         return self.run(["/usr/bin/systemctl", "--user", *arguments], check=check)
