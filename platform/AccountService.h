@@ -95,9 +95,9 @@ class AccountManager {
     virtual ~AccountManager() = default;
 
     // The account with this identifier, or null.
-    //  identifier       as it came from the caller; the manager has no account for none, for what is no
-    //  string
-    //                   and for an empty one
+    //  identifier       as it came from the caller; the manager has no account
+    //                   for none, for an empty text and for what is no
+    //                   text
     //  createIfMissing  whether to make an account that does not exist; null then says that it could not be
     //                   made
     // Any thread.

@@ -13,9 +13,9 @@ namespace welcomer {
 // seconds.
 //  value   the value; only read during the call
 //  error   where to say why there is no result, or null
-//  result  the bytes, or none when the value cannot be written: a string that is no UTF-8 or holds a
-//  character that
-//          XML has no place for, a date out of the calendar's range, or nesting beyond
+//  result  the bytes, or none when the value cannot be written: a string that is no
+//          UTF-8 or holds a character that XML has no place for, a date out of the
+//          calendar's range, or nesting beyond
 //          kPropertyListMaximumDepth
 // Any thread.
 std::optional<std::string> writeXMLPropertyList(const PropertyList& value, std::string* error = nullptr);

@@ -12,9 +12,9 @@
 namespace welcomer::desktop {
 
 // Loads the module NAME.so and checks that it belongs to this program.
-//  folder  where the modules are; empty: beside the program (in a build tree, and in an installed one,
-//  wherever that has
-//          been moved to), then where this build is installed
+//  folder  where the modules are; empty: beside the program (in a build tree, and in
+//          an installed one, wherever that has been moved to), then where this build
+//          is installed
 //  whyNot  one line when there is no result
 //  result  the module's entry, valid until the process ends; or null
 // Any thread. Loading is what takes time: callers keep the result.

@@ -9,14 +9,14 @@
 // every module, has it built in, because loading and binding the shared one takes longer than all that an
 // agent without work does. Hence the rules:
 //
-//  - What crosses is made of the interfaces in platform/ and of standard containers, strings, smart pointers
-//  and
+//  - What crosses is made of the interfaces in platform/ and of standard containers, strings, smart
+//    pointers and
 //    functions: all code that a side runs on them is its own, or is reached through a pointer in the object.
-//  - No exception crosses, in either direction: one runtime cannot count another's. Operations of a module's
-//  service are
+//  - No exception crosses, in either direction: one runtime cannot count another's. Operations of a
+//    module's service are
 //    `noexcept`, or catch everything themselves; what a program hands in for a module to call does not throw.
-//  - A module has its own copy of every static object: platform::current() is not installed there and
-//  thread-local
+//  - A module has its own copy of every static object: platform::current() is not installed there
+//    and thread-local
 //    objects (local::LocalRunLoops) are others. A module takes what it needs from its arguments, and logs
 //    nothing.
 //  - Nothing is ever unloaded.
@@ -28,7 +28,7 @@
 //         WELCOMER_DESKTOP_MODULE(NameModule, createService, describeService)
 //     Say welcomer_desktop_module(name PACKAGES ... SOURCES ...) in backends/desktop/CMakeLists.txt.
 //  3. On the program's side, without the service's library, write DesktopName.h: the interface once more,
-//  each operation
+//     each operation
 //     handed to DesktopModule<NameModule>::service(), or to the local backend where that is null, as
 //     DesktopRunLoops does.
 //  4. Make it a member of DesktopPlatform, and add its report there.
@@ -47,9 +47,9 @@ struct ModuleEntry {
     const char* build; // what the module was built from and with: WELCOMER_MODULE_BUILD
 
     // Makes the service. Called once, on the thread that first asks for it.
-    //  result  Module::Interface, owned by the caller, who deletes it through the interface; null when the
-    //  desktop's
-    //          service is not there: `whyNot` then says why, in one line
+    //  result  Module::Interface, owned by the caller, who deletes it through the
+    //          interface; null when the desktop's service is not there: `whyNot` then
+    //          says why, in one line
     void* (*create)(const void* arguments, std::string& whyNot) noexcept;
 
     // Says how the backend serves now: fills `backend`, `reason` and `advice`. May block while the desktop's

@@ -16,13 +16,13 @@ bool mayChangeNetwork();
 
 // Configures a device as a service says. Everything that can be checked is checked first: what makes no sense
 // changes nothing.
-//  "Manual"           the first address, with the first mask, becomes the device's only IPv4 address, and the
-//  router
+//  "Manual"           the first address, with the first mask, becomes the device's only IPv4
+//                     address, and the router
 //                     its only default route; an empty or missing router means none. What the kernel refuses
 //                     leaves the addresses as they were.
 //  "INFORM"           the same; the DHCP clients that are used here cannot ask for the rest alone
-//  "DHCP", "BOOTP"    the device loses its IPv4 addresses and default routes, and the machine's DHCP client
-//  is started
+//  "DHCP", "BOOTP"    the device loses its IPv4 addresses and default routes, and the
+//                     machine's DHCP client is started
 //                     for it; it waits for no answer
 //  "LinkLocal"        nothing: that is not configured here
 //  no method          nothing

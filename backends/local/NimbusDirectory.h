@@ -19,10 +19,10 @@ inline constexpr char kNimbusDirectoryPath[] = "/var/lib/welcomer/nimbus-directo
 // A property list in any format with one dictionary under "Users", from user name to user. Each user has
 //     Password          the password's hash, as crypt(3) writes it (yescrypt where this system writes it);
 //                       without one no password is right
-//     Response          dictionary: what the server answers to the right password. "status" is an integer, 0
-//     for
-//                       success; "delegates" maps delegate identifiers to their responses, with the aliases
-//                       on offer. Without one the answer is a status of 0.
+//     Response          dictionary: what the server answers to the right password.
+//                       "status" is an integer, 0 for success; "delegates" maps
+//                       delegate identifiers to their responses, with the aliases on
+//                       offer. Without one the answer is a status of 0.
 //     AccountError      integer: has the operation fail with this account error
 //     AccountErrorInfo  anything: goes with the account error
 //     Fails             boolean: has the operation fail although there is no account error
