@@ -25,7 +25,7 @@ namespace welcomer::tool {
 
 namespace {
 
-constexpr int kPasswordAttempts = 3;
+constexpr int kSignInAttempts = 3;
 constexpr const char* kInsteadOfTerminal = "--answers PLIST";
 
 constexpr const char* kAccountKey = "Account";
@@ -170,23 +170,34 @@ class Answers {
     PropertyList::Dictionary _values;
 };
 
-// Asks at the terminal until somebody is signed in.
-std::string signInAtTerminal(Terminal& terminal, SetupFlow& flow, const PasswordSource& source) {
+std::string askForAccount(Terminal& terminal) {
     std::string account;
     while (account.empty()) {
         account = terminal.ask("Your cloud account's name:");
     }
     SetupFlow::checkWhoIsLoggedIn(account);
+    return account;
+}
+
+// Asks at the terminal until somebody is signed in; what may have been mistyped is asked for again.
+std::string signInAtTerminal(Terminal& terminal, SetupFlow& flow, const PasswordSource& source) {
+    std::string account = askForAccount(terminal);
     for (int attempt = 1;; ++attempt) {
         const std::string password = getPassword(source, "Password for " + account + ":");
         try {
             flow.signIn(account, password);
             return account;
         } catch (const SignInFailure& failure) {
-            if (!failure.isWrongPassword() || source || attempt == kPasswordAttempts) {
+            const bool mayBeMistyped = failure.isWrongPassword() || failure.isUnknownUser();
+            if (!mayBeMistyped || source || attempt == kSignInAttempts) {
                 throw;
             }
-            terminal.say("The password is wrong. Please try again.");
+            if (failure.isWrongPassword()) {
+                terminal.say("The password is wrong. Please try again.");
+            } else {
+                terminal.say("There is no user " + account + ". Please try again.");
+                account = askForAccount(terminal);
+            }
         }
     }
 }
@@ -223,7 +234,7 @@ ChosenAliases chooseAliases(Terminal& terminal, const std::vector<AliasOffer>& o
     return chosen;
 }
 
-void confirm(Terminal& terminal, const Decisions& decisions) {
+void confirm(Terminal& terminal, const std::vector<AliasOffer>& offers, const Decisions& decisions) {
     std::vector<std::string> now;
     for (const CatalogueEntry& entry : catalogueOf(false)) {
         if (std::ranges::find(decisions.services, entry.identifier) != decisions.services.end()) {
@@ -232,8 +243,9 @@ void confirm(Terminal& terminal, const Decisions& decisions) {
     }
     terminal.say("");
     terminal.say("Account:        " + decisions.account);
-    for (const auto& [identifier, aliases] : decisions.aliases) {
-        terminal.say("Aliases:        " + joined(aliases) + " (" + identifier + ")");
+    for (const AliasOffer& offer : offers) {
+        terminal.say("Aliases:        " + joined(decisions.aliases.at(offer.identifier)) + " (for " +
+                     offer.purpose + ")");
     }
     terminal.say("Services now:   " + joined(now));
     if (!terminal.confirm("Set up this account?")) {
@@ -295,9 +307,10 @@ void setUp(Session& session, const SetupArguments& arguments) {
     } else {
         terminal->say("This sets up your cloud account for the desktop.");
         decisions.account = signInAtTerminal(*terminal, flow, arguments.password);
-        decisions.aliases = chooseAliases(*terminal, flow.aliasOffers());
+        const std::vector<AliasOffer> offers = flow.aliasOffers();
+        decisions.aliases = chooseAliases(*terminal, offers);
         decisions.services = chooseServices(*terminal);
-        confirm(*terminal, decisions);
+        confirm(*terminal, offers, decisions);
     }
     flow.complete(decisions.services, decisions.justTheAccountAndKVS);
     const auto bundle = platform.resourceBundles.open(arguments.bundle);

@@ -40,9 +40,26 @@ std::string textOf(std::int64_t accountError) {
         return "the server's directory of users is missing or cannot be read";
     case platform::kSKAccountErrorRepair:
         return "the account is to be repaired first";
+    case platform::kSKAccountErrorNotStored:
+        return "the account could not be stored";
     default:
         return "account error " + std::to_string(accountError);
     }
+}
+
+std::optional<std::int64_t> accountErrorOf(const PropertyList::Dictionary& response) {
+    const PropertyList* error = find(response, platform::kSKPropertyAccountError);
+    return error ? error->integer() : std::nullopt;
+}
+
+// Why the account service refused, for people.
+std::string refusal(const PropertyList::Dictionary& response) {
+    const std::optional<std::int64_t> error = accountErrorOf(response);
+    if (!error) {
+        return "the server gave no reason";
+    }
+    const PropertyList* information = find(response, platform::kSKPropertyAccountErrorInfo);
+    return textOf(*error) + (information ? " (" + text::describe(*information) + ")" : "");
 }
 
 } // namespace
@@ -110,11 +127,16 @@ std::vector<std::string> SetupFlow::delegates() {
 
 void SetupFlow::complete(const std::vector<std::string>& services, bool justTheAccountAndKVS) {
     const WaitingLine waiting("Setting up the account", _showsWaiting);
+    std::string reason;
+    const auto observation = platform::current().notificationCenter.addObserver(
+        platform::kSKNotificationSignInFailed,
+        [&](const platform::Notification& notification) { reason = refusal(notification.contents); });
     const PropertyList::Dictionary setup{{platform::kSKPropertyAccountID, _account}};
     if (!_delegate
              ->completeSetupWithUsernamePasswordNimbusDictionarySelectedServicesJustTheAccountAndKVSWindowError(
                  _account, _password, setup, services, justTheAccountAndKVS, nullptr, nullptr)) {
-        throw CommandFailure("the sign-in could not be completed: " + _log.reason());
+        throw CommandFailure("the sign-in could not be completed: " +
+                             (reason.empty() ? _log.reason() : reason));
     }
 }
 
@@ -137,16 +159,9 @@ SignInFailure SetupFlow::_signInFailure() const {
     const std::string who = "cannot sign in " + _account + ": ";
     const auto& response = _delegate->delegatesResponseDict();
     if (!response) {
-        return {who + "the server answered with a status other than 0", false};
+        return {who + "the server answered with a status other than 0", std::nullopt};
     }
-    const PropertyList* error = find(*response, platform::kSKPropertyAccountError);
-    const std::optional<std::int64_t> code = error ? error->integer() : std::nullopt;
-    if (!code) {
-        return {who + "the server gave no reason", false};
-    }
-    const PropertyList* information = find(*response, platform::kSKPropertyAccountErrorInfo);
-    return {who + textOf(*code) + (information ? " (" + text::describe(*information) + ")" : ""),
-            *code == platform::kSKAccountErrorWrongPassword};
+    return {who + refusal(*response), accountErrorOf(*response)};
 }
 
 const PropertyList* SetupFlow::_response(const std::string& delegate) const {

@@ -3,11 +3,15 @@
 #pragma once
 
 #include "cloud/NimbusTesselDelegate.h"
+#include "platform/AccountService.h"
 #include "platform/ResourceBundle.h"
 #include "tools/welcomer/Tool.h"
 
+#include <cstdint>
 #include <iosfwd>
 #include <map>
+#include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -19,15 +23,19 @@ inline constexpr const char* kSetupBundlePath = "/usr/share/welcomer/setup-bundl
 // The account service did not accept the user name and the password.
 class SignInFailure : public CommandFailure {
   public:
-    SignInFailure(const std::string& reason, bool isWrongPassword)
+    //  accountError  what the account service says, or none
+    SignInFailure(const std::string& reason, std::optional<std::int64_t> accountError)
         : CommandFailure(reason),
-          _isWrongPassword(isWrongPassword) {}
+          _accountError(accountError) {}
 
     // Whether another password may help.
-    bool isWrongPassword() const { return _isWrongPassword; }
+    bool isWrongPassword() const { return _accountError == platform::kSKAccountErrorWrongPassword; }
+
+    // Whether another name may help.
+    bool isUnknownUser() const { return _accountError == platform::kSKAccountErrorUnknownUser; }
 
   private:
-    bool _isWrongPassword;
+    std::optional<std::int64_t> _accountError;
 };
 
 // The aliases that the server offers one of the messaging delegates.

@@ -171,7 +171,14 @@ class Account(CloudTest):
     def test_a_failure_with_account_error_0_is_a_success_of_the_check_but_the_sign_in_fails(self):
         self.add()
         self.change_user(AccountError=0)
-        self.fails(self.with_password(PASSWORD, "account", "sign-in", "anna"), 1, "could not be completed")
+        self.fails(self.with_password(PASSWORD, "account", "sign-in", "anna"), 1, "could not be completed: account error 0$")
+
+    def test_an_account_that_cannot_be_stored_is_the_reason_that_the_sign_in_fails(self):
+        self.add()
+        (self.home / "Library").mkdir(parents=True, exist_ok=True)
+        (self.home / "Library/Accounts").write_text("in the folder's place")
+        self.fails(self.with_password(PASSWORD, "account", "sign-in", "anna"), 1,
+                   "could not be completed: the account could not be stored")
 
     def test_somebody_else_who_is_logged_in_is_in_the_way(self):
         self.add()
@@ -482,7 +489,8 @@ class SetupAtTerminal(SetupTest):
         self.assertIn("  1  photo-stream\r\n  2  account-sync\r\n  3  locator\r\n  4  documents\r\n", shown)
         shown = self.answer(r"Set up this account\? \[Y/n\] ", "y")
         self.assertIn("Services now:   photo-stream, locator\r\n", shown)
-        self.assertIn("+1 555 0100 (com.corvid.vidlink)", shown)
+        self.assertIn("Aliases:        +1 555 0100 (for video calling)\r\n"
+                      "Aliases:        anna@nimbus.example, +1 555 0100 (for messaging)\r\n", shown)
         rest, status = self.end()
         self.assertEqual(status, 0, rest)
         self.assertIn("anna is set up.", rest)
@@ -514,6 +522,53 @@ class SetupAtTerminal(SetupTest):
         rest, status = self.end()
         self.assertEqual(os.waitstatus_to_exitcode(status), 1)
         self.assertIn("welcomer: cannot sign in anna: the password is wrong", rest)
+
+    def test_a_mistyped_name_is_asked_for_again(self):
+        self.start("setup")
+        self.answer("account's name: ", "ana")
+        self.answer_password("Password for ana: ", PASSWORD)
+        self.answer("There is no user ana. Please try again.\r\nYour cloud account's name: ", "anna")
+        self.answer_password("Password for anna: ", PASSWORD)
+        for _ in range(3):
+            self.answer(r"none \[all\]: ", "")
+        self.answer(r"\[Y/n\] ", "")
+        rest, status = self.end()
+        self.assertEqual(status, 0, rest)
+        self.assertEqual(self.json("account", "status")["loggedIn"], "anna")
+
+    def test_no_alias_chosen_hands_none_over(self):
+        self.start("setup")
+        self.answer("account's name: ", "anna")
+        self.answer_password("Password for anna: ", PASSWORD)
+        self.answer(r"video calling\?[^$]*none \[all\]: ", "none")
+        self.answer(r"messaging\?[^$]*none \[all\]: ", "none")
+        self.answer(r"turned on now [^$]*none \[all\]: ", "")
+        shown = self.answer(r"\[Y/n\] ", "")
+        self.assertIn("Aliases:        none (for video calling)\r\nAliases:        none (for messaging)\r\n", shown)
+        rest, status = self.end()
+        self.assertEqual(status, 0, rest)
+        replay = self.replay()["replay"]
+        self.assertEqual((replay["vlAliases"], replay["imAliases"]), ([], []))
+
+    def test_terms_of_service_to_be_accepted_end_it_and_say_which(self):
+        self.change_user(AccountError=3, AccountErrorInfo="https://nimbus.example/terms")
+        self.start("setup")
+        self.answer("account's name: ", "anna")
+        self.answer_password("Password for anna: ", PASSWORD)
+        rest, status = self.end()
+        self.assertEqual(os.waitstatus_to_exitcode(status), 1)
+        self.assertIn("the terms of service are to be accepted first (https://nimbus.example/terms)", rest)
+        self.assertNotIn("try again", rest)
+
+    def test_the_end_of_the_input_at_the_password_ends_it_with_the_echo_back(self):
+        self.start("setup")
+        self.answer("account's name: ", "anna")
+        self.expect("Password for anna: ")
+        os.write(self.terminal, b"\x04")
+        self.expect("the input has ended")
+        self.assertTrue(termios.tcgetattr(self.terminal)[3] & termios.ECHO)
+        _, status = self.end()
+        self.assertEqual(os.waitstatus_to_exitcode(status), 1)
 
     def test_the_end_of_the_input_ends_it(self):
         self.start("setup")
