@@ -209,6 +209,61 @@ TEST_F(NimbusTesselDelegateTest, ObserversAreThereBeforeTheRequestIsIssued) {
     EXPECT_EQ(observersThen, 2U);
 }
 
+TEST_F(NimbusTesselDelegateTest, AValidationObservesBeforeItBuildsItsRequestAndASignInAfterwards) {
+    fakes::InProcessPlugin store{"com.corvid.storefront"};
+    installPlugin<0>(store);
+    std::vector<std::size_t> observersThen;
+    store.request = [&](wl_error_slot*) {
+        observersThen.push_back(observers());
+        return static_cast<wl_value*>(nullptr);
+    };
+    validateWith(std::nullopt, std::nullopt);
+    signIn();
+    EXPECT_EQ(observersThen, (std::vector<std::size_t>{2, 0}));
+}
+
+TEST_F(NimbusTesselDelegateTest, AValidationIsLoggedBeforeItsRequestIsBuilt) {
+    fakes::InProcessPlugin store{"com.corvid.storefront"};
+    installPlugin<0>(store);
+    store.request = nullptr;
+    validateWith(std::nullopt, std::nullopt);
+    EXPECT_EQ(
+        lines(),
+        (Strings{"<NimbusTesselDelegate>: -[NimbusTesselDelegate "
+                 "validateNimbusUsername:andPassword:tosVersions:delegates:error:] anna",
+                 "Nimbus Plugins: Delegate com.corvid.storefront omits itself from Nimbus setup",
+                 "<NimbusTesselDelegate>: _validateOK: {com.corvid.nimbus.property.accountID = anna}"}));
+}
+
+TEST_F(NimbusTesselDelegateTest, TheShortValidationAndASignInAreLoggedAfterTheirRequestIsBuilt) {
+    fakes::InProcessPlugin chatter{"com.corvid.chatter"};
+    installPlugin<0>(chatter);
+    chatter.request = nullptr;
+    const std::string omits = "Nimbus Plugins: Delegate com.corvid.chatter omits itself from Nimbus setup";
+    validate();
+    ASSERT_EQ(lines().size(), 3U);
+    EXPECT_EQ(lines()[0], omits);
+    fake.systemLog.clear();
+    signIn();
+    ASSERT_EQ(lines().size(), 3U); // the first operation's notification still counts
+    EXPECT_EQ(lines()[0], omits);
+}
+
+TEST_F(NimbusTesselDelegateTest, BeforeANotificationIsLoggedItIsAskedWhetherItsContentsMayBe) {
+    for (const bool completed : {true, false}) {
+        NimbusTesselDelegate fresh;
+        answerWith(completed, {{"status", 0}});
+        fake.recorder.clear();
+        EXPECT_EQ(fresh.validateNimbusUsernameAndPasswordError("anna", "secret", nullptr), completed);
+        const Strings calls = fake.recorder.calls();
+        const auto asked = std::find(calls.begin(), calls.end(), "FileSystem.exists /CorvidInternal");
+        ASSERT_NE(asked, calls.end());
+        ASSERT_NE(asked + 1, calls.end());
+        EXPECT_EQ(*(asked + 1), std::string("SystemLog.write 115, <NimbusTesselDelegate>: ") +
+                                    (completed ? "_validateOK" : "_validateNotOK") + ": {status = 0}");
+    }
+}
+
 TEST_F(NimbusTesselDelegateTest, ANotificationBeforeTheFirstSliceIsNotLostAndNoSliceIsTurned) {
     answerImmediately(true, {{"status", 0}});
     EXPECT_TRUE(signIn());
@@ -414,6 +469,25 @@ TEST_F(NimbusTesselDelegateTest, CompletingWhileAnAccountIsLoggedInMakesNoSignIn
     EXPECT_EQ(fake.recorder.callsTo("AccountManager."), Strings{"AccountManager.accountForID anna, yes"});
     EXPECT_EQ(slices(), 0U);
     EXPECT_TRUE(fake.accountService.accounts["anna"][kSKServiceIDLOC].enabled);
+}
+
+TEST_F(NimbusTesselDelegateTest, CompletingWhileAnAccountIsLoggedInAwaitsNothingSoThatAValidationStillWaits) {
+    fake.accountService.loggedIn = "anna";
+    EXPECT_TRUE(complete());
+    EXPECT_EQ(delegate.delegatesResponseDict(), std::nullopt);
+    answerWith(false, {{kSKPropertyAccountError, 1}}, 1s);
+    EXPECT_FALSE(validate());
+    EXPECT_EQ(fake.virtualTime.now(), 1s);
+}
+
+TEST_F(NimbusTesselDelegateTest, CompletingWhileAnAccountIsLoggedInForgetsNoEndedOperation) {
+    answerWith(true, {{"status", 0}}, 1s);
+    EXPECT_TRUE(validate());
+    fake.accountService.loggedIn = "anna";
+    EXPECT_TRUE(complete());
+    EXPECT_TRUE(validate()); // at once, with what the completion says of itself
+    EXPECT_EQ(fake.virtualTime.now(), 1s);
+    EXPECT_EQ(delegate.delegatesResponseDict(), (Dictionary{{kSKPropertyAccountID, "anna"}}));
 }
 
 TEST_F(NimbusTesselDelegateTest, CompletingWhileAnAccountIsLoggedInSucceedsAlsoAfterAFailedValidation) {

@@ -11,6 +11,7 @@
 #include <limits>
 #include <memory>
 #include <optional>
+#include <ostream>
 #include <random>
 #include <string>
 #include <vector>
@@ -123,6 +124,7 @@ TEST_F(WLNimbusSetupWithDictionaryTest, AfterLoginEverythingSelected) {
     EXPECT_EQ(enabled(),
               (Strings{kSKServiceIDContacts, kSKServiceIDBookMarks, kSKServiceIDMail, kSKServiceIDNotes}));
     EXPECT_EQ(fake.virtualTime.now(), 0ns);
+    EXPECT_EQ(fake.virtualTime.queueNames(), Strings{}); // what is delayed is on the global queue
     fake.virtualTime.sleep(3s - 1ns);
     EXPECT_FALSE(service(kSKServiceIDCalendars).enabled);
     fake.systemLog.clear();
@@ -331,6 +333,11 @@ struct DelayCase {
     PropertyList value;
     std::string logged;
     std::chrono::nanoseconds delay; // the largest: never
+
+    // Names the test.
+    friend void PrintTo(const DelayCase& delayCase, std::ostream* out) {
+        *out << text::describe(delayCase.value);
+    }
 };
 
 class WLDebugPostLoginDelayTest : public testing::TestWithParam<DelayCase> {};

@@ -170,6 +170,23 @@ TEST_F(WLNimbusDelegatesRequestTest, TheFormerOnlineServiceCanBeOmittedUnlessAnA
     EXPECT_EQ(request({{kSkylark, own}}, {kSkylark}), (Dictionary{{kSkylark, own}}));
 }
 
+TEST_F(WLNimbusDelegatesRequestTest, TheFormerOnlineServicesEmptyRequestReplacesAPluginsOfItsIdentifier) {
+    RequestingPlugin& plugin = add(kSkylark);
+    EXPECT_EQ(request(), (Dictionary{{kSkylark, none}}));
+    EXPECT_EQ(plugin.requests, 1);
+    EXPECT_EQ(request({}, {kSkylark}), none);
+    EXPECT_EQ(plugin.requests, 1);
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, APluginWithoutAnIdentifierThatRaisesOnItsRequestIsUnknown) {
+    add(std::nullopt).request = []() -> std::optional<PropertyList> {
+        throw std::runtime_error("no request");
+    };
+    EXPECT_EQ(request(), (Dictionary{{kSkylark, none}}));
+    EXPECT_EQ(lines(),
+              Strings{"Nimbus Plugins: Exception querying '(unknown)' for setup request: no request"});
+}
+
 TEST_F(WLNimbusDelegatesRequestTest, AdditionsWinOverPluginsAndTheFormerOnlineService) {
     add("com.corvid.vidlink");
     EXPECT_EQ(request({{"com.corvid.vidlink", "added"}, {kSkylark, "added"}, {"new", "added"}}),
