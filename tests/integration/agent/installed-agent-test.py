@@ -7,6 +7,7 @@ usage: installed-agent-test.py BUILD_DIR PLUGIN ...
 import plistlib
 import re
 import shutil
+import signal
 import sys
 import tempfile
 import time
@@ -18,6 +19,7 @@ import machine  # noqa: E402
 
 LABEL = "com.corvid.welcomer.nimbussetup.user"
 ACCOUNT = "newcomer@nimbus.example"
+PREFERENCE_PROCESS = "com.corvid.onlineaccounts"
 AGENT_PRIORITY = (115, "14.3")
 
 REPLAY = {
@@ -68,6 +70,9 @@ class InstalledAgent(unittest.TestCase):
     @classmethod
     def tearDownClass(cls):
         for login in cls.logins:
+            for process in (login.preferences, login.neighbour):
+                process.kill()
+                process.wait()
             login.machine.stop()
         cls.folder.rmdir()
 
@@ -129,6 +134,12 @@ class InstalledAgent(unittest.TestCase):
         self.assertTrue(login.launch_agent(LABEL).exists())
         self.assertFalse(login.launch_agent("org.example.other").exists())
 
+    def test_the_preference_process_is_ended_and_no_other(self):
+        for login in self.logins:
+            with self.subTest(login.name):
+                self.assertEqual(login.preferences.wait(timeout=20), -signal.SIGKILL)
+                self.assertIsNone(login.neighbour.poll(), "its name only begins like the other's")
+
     def test_the_replay_item_is_gone(self):
         for login in self.logins:
             with self.subTest(login.name):
@@ -175,6 +186,16 @@ class Login:
         self.arguments = arguments
         if arguments and arguments[0] != LABEL:
             shutil.copy(self.launch_agent(LABEL), self.launch_agent(arguments[0]))
+        self.preferences = self.start_named(PREFERENCE_PROCESS)
+        self.neighbour = self.start_named(PREFERENCE_PROCESS + "-of-another-kind")
+
+    def start_named(self, name):
+        """A process of the user's with a name of its own, which does nothing for longer than the test takes."""
+        shutil.copy("/bin/sleep", self.machine.root / "tmp" / name)
+        process = self.machine.start([f"/tmp/{name}", "1000"], user=True)
+        command = self.machine.root / "proc" / str(process.pid) / "cmdline"
+        self.machine.wait_for(lambda: command.read_bytes().startswith(f"/tmp/{name}\0".encode()), f"the process {name}")
+        return process
 
     def records_up_to(self, last, begin=0):
         """The agent's records after the first `begin`, once the system log has written the last one."""
