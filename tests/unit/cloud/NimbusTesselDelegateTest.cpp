@@ -416,8 +416,13 @@ TEST_F(NimbusTesselDelegateTest, ASignInAfterAValidationReturnsWithoutWaitingToo
 TEST_F(NimbusTesselDelegateTest, NeedsRepairIsNeverFalseAgain) {
     answerWith(false, {{kSKPropertyAccountError, 5}, {kSKPropertyAccountErrorInfo, "info"}});
     EXPECT_FALSE(validate());
+    answerWith(false, {{kSKPropertyAccountError, 1}});
+    EXPECT_FALSE(complete());
+    EXPECT_FALSE(validate()); // at once, with what has just failed
+    EXPECT_TRUE(delegate.needsRepair());
     answerWith(true, {{kSKPropertyAccountID, "anna"}});
     EXPECT_TRUE(complete());
+    EXPECT_TRUE(validate()); // at once, with what has just succeeded
     EXPECT_TRUE(delegate.needsRepair());
 }
 
