@@ -166,8 +166,7 @@ class Story:
             delegates.setdefault(identifier, {})["delaySeconds"] = seconds
         users.write_bytes(plistlib.dumps(contents))
         (self.machine.root / "tmp/answers.plist").write_bytes(plistlib.dumps({"Account": ACCOUNT}))
-        self.tool(login, "setup", "--answers", "/tmp/answers.plist", "--bundle",
-                  "/usr/local/share/welcomer/setup-bundle", password=True)
+        self.tool(login, "setup", "--answers", "/tmp/answers.plist", password=True)
         self.launch_agent = self.machine.home / f"Library/LaunchAgents/{LABEL}.plist"
         self.installed = self.launch_agent.exists()
         self.replay_after_setup = self.replay(login)

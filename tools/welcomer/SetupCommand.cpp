@@ -13,6 +13,7 @@
 #include "tools/welcomer/SetupFlow.h"
 #include "tools/welcomer/Terminal.h"
 #include "tools/welcomer/Tool.h"
+#include "tools/welcomer/ToolBundle.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
@@ -35,7 +36,7 @@ constexpr const char* kJustTheAccountAndKVSKey = "JustTheAccountAndKVS";
 
 struct SetupArguments {
     std::string answers;
-    std::string bundle = kSetupBundlePath;
+    std::string bundle; // empty: the one that comes with the tool
     PasswordSource password;
 };
 
@@ -280,6 +281,15 @@ void printResult(Session& session, const Decisions& decisions, SetupFlow& flow) 
                 << "  - and ends two minutes after the last of them.\n";
 }
 
+// The path of the setup application's bundle, below the root.
+std::string bundlePath(const Session& session, const SetupArguments& arguments) {
+    if (!arguments.bundle.empty()) {
+        return arguments.bundle;
+    }
+    const std::string found = session.options.rootGiven ? std::string() : findSetupBundle();
+    return found.empty() ? kSetupBundlePath : found;
+}
+
 void setUp(Session& session, const SetupArguments& arguments) {
     const platform::Platform& platform = platform::current();
     std::optional<Answers> answers;
@@ -289,8 +299,9 @@ void setUp(Session& session, const SetupArguments& arguments) {
     } else {
         answers.emplace(arguments.answers);
     }
-    if (!platform.fileSystem.exists(arguments.bundle)) {
-        throw CommandFailure("there is no setup application at " + arguments.bundle +
+    const std::string path = bundlePath(session, arguments);
+    if (!platform.fileSystem.exists(path)) {
+        throw CommandFailure("there is no setup application at " + path +
                              (session.options.rootGiven ? " below " + session.options.root : "") +
                              " (see --bundle)");
     }
@@ -313,7 +324,7 @@ void setUp(Session& session, const SetupArguments& arguments) {
         confirm(*terminal, offers, decisions);
     }
     flow.complete(decisions.services, decisions.justTheAccountAndKVS);
-    const auto bundle = platform.resourceBundles.open(arguments.bundle);
+    const auto bundle = platform.resourceBundles.open(path);
     flow.handOver(decisions.aliases, *bundle);
     printResult(session, decisions, flow);
 }
@@ -337,7 +348,9 @@ void addSetupCommand(CommandLine& commandLine) {
     addPasswordOption(command, arguments->password);
     command
         .add_option("--bundle", arguments->bundle,
-                    "The setup application's bundle, looked up below --root [" + arguments->bundle + "]")
+                    std::string("The setup application's bundle, looked up below --root [the one that comes "
+                                "with the tool; below --root ") +
+                        kSetupBundlePath + "]")
         ->type_name("DIR");
 }
 

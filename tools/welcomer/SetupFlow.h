@@ -17,7 +17,7 @@
 
 namespace welcomer::tool {
 
-// Where the setup application's bundle is installed, below the root.
+// Where the setup application's bundle is expected below a root that was given.
 inline constexpr const char* kSetupBundlePath = "/usr/share/welcomer/setup-bundle";
 
 // The account service did not accept the user name and the password.

@@ -1,4 +1,5 @@
-// The tool's own bundle: the texts that it has as an application.
+// The bundles that come with the tool, beside the running program in the installed tree or in the tree in
+// which it was built. Each function gives the bundle's folder; empty when it is in neither.
 
 #pragma once
 
@@ -6,8 +7,10 @@
 
 namespace welcomer::tool {
 
-// The bundle's folder, beside the running program in the installed tree or in the tree in which it was built;
-// empty when it is in neither.
+// The tool's own: the texts that it has as an application.
 std::string findToolBundle();
+
+// The setup application's: the agent and its launch-agent file.
+std::string findSetupBundle();
 
 } // namespace welcomer::tool

@@ -1,4 +1,4 @@
-// The tool's own texts.
+// What comes with the tool.
 
 #include "tools/welcomer/ToolBundle.h"
 
@@ -18,6 +18,15 @@ TEST(ToolBundleTest, EveryErrorOfTheNetworkHasATitleAndABody) {
           "NETWORKING_MANAGER_GENERIC_ERROR_TITLE", "NETWORKING_MANAGER_GENERIC_ERROR_BODY"}) {
         EXPECT_NE(bundles.openMainBundle()->localizedString(key, ""), "") << key;
     }
+}
+
+TEST(ToolBundleTest, TheSetupApplicationsBundleHasTheAgentAndItsLaunchAgent) {
+    const std::string folder = findSetupBundle();
+    ASSERT_NE(folder, "");
+    local::LocalResourceBundles bundles{local::RootFolder("/"), ""};
+    const auto bundle = bundles.open(folder);
+    EXPECT_TRUE(bundle->pathForResource("wlnimbussetup", ""));
+    EXPECT_TRUE(bundle->pathForResource("com.corvid.welcomer.nimbussetup.user", "plist"));
 }
 
 } // namespace
