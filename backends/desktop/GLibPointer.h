@@ -19,6 +19,7 @@ struct GLibDelete {
 template <class Object>
 using ObjectPointer = std::unique_ptr<Object, GLibDelete<g_object_unref>>;
 using VariantPointer = std::unique_ptr<GVariant, GLibDelete<g_variant_unref>>;
+using CharacterPointer = std::unique_ptr<char, GLibDelete<g_free>>;
 using HashTablePointer = std::unique_ptr<GHashTable, GLibDelete<g_hash_table_unref>>;
 
 // Takes a GError: pass out() where one is expected.

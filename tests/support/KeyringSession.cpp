@@ -181,6 +181,12 @@ void KeyringSession::_waitForKeyring(const std::vector<std::string>& call, const
     throw std::runtime_error("the keyring does not come up");
 }
 
+std::string KeyringSession::keyringOwner() const {
+    return outputOf({"gdbus", "call", "--session", "--dest", "org.freedesktop.DBus", "--object-path",
+                     "/org/freedesktop/DBus", "--method", "org.freedesktop.DBus.GetNameOwner",
+                     "org.freedesktop.secrets"});
+}
+
 void KeyringSession::lockKeyring() {
     outputOf({"gdbus", "call", "--session", "--dest", "org.freedesktop.secrets", "--object-path",
               "/org/freedesktop/secrets", "--method", "org.freedesktop.Secret.Service.Lock",

@@ -50,13 +50,17 @@ class KeyringSession {
     void startKeyring();
     // A running keyring without any collection.
     void startEmptyKeyring();
+    // The bus's name for the running keyring, another one after each start.
+    std::string keyringOwner() const;
     // Locks the login keyring.
     void lockKeyring();
     // Somebody who answers the keyring's questions: "ok", "refuse" or "silent".
     Daemon startPrompter(const std::string& answer) const;
     // The bus dies without a word.
     void killBus() { _bus.kill(); }
+    // The keyring ends, as at a logout, or without a word. It may be started again.
     void stopKeyring() { _keyring.stop(); }
+    void killKeyring() { _keyring.kill(); }
 
     static constexpr const char* kPassword = "the keyring's password";
 

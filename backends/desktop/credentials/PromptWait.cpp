@@ -6,9 +6,6 @@ namespace welcomer::desktop {
 
 namespace {
 
-// A service that does not even answer to being told that the prompt is given up.
-constexpr std::chrono::seconds kPatienceWithDismissal(5);
-
 guint milliseconds(std::chrono::nanoseconds duration) {
     const auto count = std::chrono::ceil<std::chrono::milliseconds>(duration).count();
     return static_cast<guint>(std::clamp<std::int64_t>(count, 0, G_MAXINT));
@@ -18,12 +15,10 @@ guint milliseconds(std::chrono::nanoseconds duration) {
 
 struct PromptWait::State {
     GMainContext* context = g_main_context_new();
-    ObjectPointer<GCancellable> cancellable{g_cancellable_new()};
     ObjectPointer<GAsyncResult> result;
     std::chrono::nanoseconds patience{};
     bool isGivenUp = false;
-    bool isAbandoned = false; // the dismissal has had its time, too
-    int references = 1;       // one of the wait, one of the call
+    int references = 1; // one of the wait, one of the call
 
     void attach(std::chrono::nanoseconds delay, GSourceFunc function) {
         GSource* const source = g_timeout_source_new(milliseconds(delay));
@@ -33,15 +28,7 @@ struct PromptWait::State {
     }
 
     static gboolean giveUp(gpointer data) {
-        auto* const state = static_cast<State*>(data);
-        state->isGivenUp = true;
-        state->attach(kPatienceWithDismissal, abandon);
-        g_cancellable_cancel(state->cancellable.get());
-        return G_SOURCE_REMOVE;
-    }
-
-    static gboolean abandon(gpointer data) {
-        static_cast<State*>(data)->isAbandoned = true;
+        static_cast<State*>(data)->isGivenUp = true;
         return G_SOURCE_REMOVE;
     }
 
@@ -66,10 +53,6 @@ PromptWait::~PromptWait() {
     _state->release();
 }
 
-GCancellable* PromptWait::cancellable() const {
-    return _state->cancellable.get();
-}
-
 gpointer PromptWait::argument() const {
     ++_state->references;
     return _state;
@@ -83,7 +66,7 @@ void PromptWait::done(GObject* /*source*/, GAsyncResult* result, gpointer wait) 
 
 GAsyncResult* PromptWait::wait() {
     _state->attach(_state->patience, State::giveUp);
-    while (!_state->result && !_state->isAbandoned) {
+    while (!_state->result && !_state->isGivenUp) {
         g_main_context_iteration(_state->context, TRUE);
     }
     return _state->result.get();

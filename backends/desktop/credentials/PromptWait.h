@@ -10,6 +10,10 @@ namespace welcomer::desktop {
 
 // Runs one asynchronous call on a main context of its own, and gives it up when nobody answers. One call, one
 // thread.
+//
+// A call that is given up is left as it is, and so is its prompt, which goes with this process at the latest:
+// gnome-keyring (42) ends with a failed assertion when somebody dismisses a prompt to unlock, and with it all
+// that other programs have unlocked.
 class PromptWait {
   public:
     explicit PromptWait(std::chrono::nanoseconds patience);
@@ -18,7 +22,6 @@ class PromptWait {
     PromptWait& operator=(const PromptWait&) = delete;
 
     // What the asynchronous call takes.
-    GCancellable* cancellable() const;
     static void done(GObject* source, GAsyncResult* result, gpointer wait);
     gpointer argument() const;
 

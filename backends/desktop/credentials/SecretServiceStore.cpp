@@ -4,6 +4,7 @@
 #include "backends/desktop/credentials/PromptWait.h"
 
 #include <map>
+#include <string_view>
 #include <utility>
 
 namespace welcomer::desktop {
@@ -12,6 +13,8 @@ namespace {
 
 using platform::CredentialItem;
 using Status = std::int32_t;
+
+constexpr char kNoObject[] = "/"; // the path that stands for none
 
 constexpr char kSchema[] = "com.corvid.welcomer.Credential";
 constexpr char kSchemaKey[] = "xdg:schema";
@@ -24,49 +27,23 @@ constexpr char kTrustedApplicationKey[] = "trusted-application-"; // and its num
 constexpr char kServiceInterface[] = "org.freedesktop.Secret.Service";
 constexpr char kItemInterface[] = "org.freedesktop.Secret.Item";
 constexpr char kCollectionInterface[] = "org.freedesktop.Secret.Collection";
+constexpr char kSessionInterface[] = "org.freedesktop.Secret.Session";
 constexpr char kPropertiesInterface[] = "org.freedesktop.DBus.Properties";
 // What gnome-keyring has ask its questions.
 constexpr char kPrompterName[] = "org.gnome.keyring.SystemPrompter";
 constexpr char kKeyringName[] = "org.gnome.keyring";
 
-using ItemList = std::vector<ObjectPointer<SecretItem>>;
-
-ItemList takeItems(GList* list) {
-    ItemList items;
-    for (GList* entry = list; entry; entry = entry->next) {
-        items.emplace_back(SECRET_ITEM(entry->data));
-    }
-    g_list_free(list);
-    return items;
-}
-
-HashTablePointer newAttributes() {
-    return HashTablePointer(g_hash_table_new_full(g_str_hash, g_str_equal, g_free, g_free));
-}
-
-void setAttribute(GHashTable* attributes, const std::string& key, const std::string& bytes) {
-    g_hash_table_insert(attributes, g_strdup(key.c_str()), g_strdup(attributeText(bytes).c_str()));
-}
-
-HashTablePointer keyAttributes(const std::string& service, const std::string& account) {
-    HashTablePointer attributes = newAttributes();
-    setAttribute(attributes.get(), kServiceKey, service);
-    setAttribute(attributes.get(), kAccountKey, account);
-    return attributes;
-}
-
-HashTablePointer allAttributes(const CredentialItem& item) {
-    HashTablePointer attributes = keyAttributes(item.service, item.account);
-    setAttribute(attributes.get(), kSchemaKey, kSchema);
+std::map<std::string, std::string> allAttributes(const CredentialItem& item) {
+    std::map<std::string, std::string> attributes = {
+        {kServiceKey, item.service}, {kAccountKey, item.account}, {kSchemaKey, kSchema}};
     if (attributeText(item.label) != item.label) {
-        setAttribute(attributes.get(), kLabelKey, item.label);
+        attributes[kLabelKey] = item.label;
     }
     if (item.access) {
-        setAttribute(attributes.get(), kAccessKey, item.access->description);
+        attributes[kAccessKey] = item.access->description;
         int number = 0;
         for (const platform::TrustedApplication& application : item.access->trustedApplications) {
-            setAttribute(attributes.get(), kTrustedApplicationKey + std::to_string(++number),
-                         application.path);
+            attributes[kTrustedApplicationKey + std::to_string(++number)] = application.path;
         }
     }
     return attributes;
@@ -113,20 +90,56 @@ CredentialItem itemFrom(GVariant* properties) {
 
 class Reference final : public platform::CredentialItemReference {
   public:
-    explicit Reference(FoundItem found) : _found(std::move(found)) {}
-    SecretItem* item() const { return _found.item.get(); }
-    const char* path() const { return g_dbus_proxy_get_object_path(G_DBUS_PROXY(item())); }
+    explicit Reference(std::string path) : _path(std::move(path)) {}
+    const char* path() const { return _path.c_str(); }
 
   private:
-    const FoundItem _found;
+    const std::string _path; // of the item's object, the same in a service that was started anew
 };
 
-Status loadSecret(SecretItem* item, std::string& data) {
+// The library's object of the service, made for one operation. What it knows (who the service is, and the
+// session that secrets are encrypted for) ends with the service, and it learns of that end only where a main
+// loop runs: one that was kept would send its calls to nobody once the service has been started anew.
+struct CloseLibrary {
+    void operator()(SecretService* library) const {
+        // Nobody waits for the answer.
+        if (const char* const session = secret_service_get_session_dbus_path(library)) {
+            g_dbus_connection_call(g_dbus_proxy_get_connection(G_DBUS_PROXY(library)), kSecretServiceName,
+                                   session, kSessionInterface, "Close", nullptr, nullptr,
+                                   G_DBUS_CALL_FLAGS_NO_AUTO_START, -1, nullptr, nullptr, nullptr);
+        }
+        g_object_unref(library);
+    }
+};
+using Library = std::unique_ptr<SecretService, CloseLibrary>;
+
+// On the connection that SessionBus keeps.
+Library openLibrary(Status& status) {
     ErrorSlot error;
-    if (!secret_item_load_secret_sync(item, nullptr, error.out())) {
+    Library library(
+        secret_service_open_sync(SECRET_TYPE_SERVICE, nullptr, SECRET_SERVICE_NONE, nullptr, error.out()));
+    status = library ? platform::kCredentialSuccess : statusOf(error.get());
+    return library;
+}
+
+Status loadSecret(GDBusConnection* connection, SecretService* library, const std::string& path,
+                  std::string& data) {
+    ErrorSlot error;
+    if (!secret_service_ensure_session_sync(library, nullptr, error.out())) {
         return statusOf(error.get());
     }
-    SecretValue* const value = secret_item_get_secret(item);
+    Status status = 0;
+    const VariantPointer answer =
+        callMethod(connection, kSecretServiceName, path.c_str(), kItemInterface, "GetSecret",
+                   g_variant_new("(o)", secret_service_get_session_dbus_path(library)), status);
+    if (!answer) {
+        return status;
+    }
+    if (!g_variant_is_of_type(answer.get(), G_VARIANT_TYPE("((oayays))"))) {
+        return platform::kCredentialServiceFailed;
+    }
+    const VariantPointer encrypted(g_variant_get_child_value(answer.get(), 0));
+    SecretValue* const value = secret_service_decode_dbus_secret(library, encrypted.get());
     if (!value) {
         return platform::kCredentialServiceFailed;
     }
@@ -137,11 +150,45 @@ Status loadSecret(SecretItem* item, std::string& data) {
     return platform::kCredentialSuccess;
 }
 
-ObjectPointer<SecretService> connectToService(Status& status) {
-    ErrorSlot error;
-    ObjectPointer<SecretService> service(secret_service_get_sync(SECRET_SERVICE_NONE, nullptr, error.out()));
-    status = service ? platform::kCredentialSuccess : statusOf(error.get());
-    return service;
+// The path that the default collection has now; "/" when there is none.
+Status readDefaultAlias(GDBusConnection* connection, std::string& path) {
+    Status status = 0;
+    const VariantPointer answer =
+        callMethod(connection, kSecretServiceName, kSecretServicePath, kServiceInterface, "ReadAlias",
+                   g_variant_new("(s)", SECRET_COLLECTION_DEFAULT), status);
+    if (!answer) {
+        return status;
+    }
+    if (!g_variant_is_of_type(answer.get(), G_VARIANT_TYPE("(o)"))) {
+        return platform::kCredentialServiceFailed;
+    }
+    const char* text = nullptr;
+    g_variant_get(answer.get(), "(&o)", &text);
+    path = text;
+    return platform::kCredentialSuccess;
+}
+
+// D-Bus properties of an object that is to be made; takes floating references.
+HashTablePointer newProperties() {
+    return HashTablePointer(g_hash_table_new_full(g_str_hash, g_str_equal, g_free,
+                                                  reinterpret_cast<GDestroyNotify>(g_variant_unref)));
+}
+
+void setProperty(GHashTable* properties, const char* interface, const char* name, GVariant* value) {
+    g_hash_table_insert(properties, g_strconcat(interface, ".", name, nullptr), g_variant_ref_sink(value));
+}
+
+HashTablePointer itemProperties(const CredentialItem& item) {
+    GVariantBuilder attributes;
+    g_variant_builder_init(&attributes, G_VARIANT_TYPE("a{ss}"));
+    for (const auto& [key, bytes] : allAttributes(item)) {
+        g_variant_builder_add(&attributes, "{ss}", key.c_str(), attributeText(bytes).c_str());
+    }
+    HashTablePointer properties = newProperties();
+    setProperty(properties.get(), kItemInterface, "Attributes", g_variant_builder_end(&attributes));
+    setProperty(properties.get(), kItemInterface, "Label",
+                g_variant_new_string(attributeText(item.label).c_str()));
+    return properties;
 }
 
 } // namespace
@@ -162,9 +209,8 @@ Status SecretServiceStore::createAccess(const std::string& description,
     return platform::kCredentialSuccess;
 }
 
-// The bare question, without the objects of the library: most of the time there is no item.
-Status SecretServiceStore::_searchPaths(GDBusConnection* connection, const std::string& service,
-                                        const std::string& account, std::size_t& count) {
+Status SecretServiceStore::_search(GDBusConnection* connection, const std::string& service,
+                                   const std::string& account, SearchResult& result) {
     GVariantBuilder attributes;
     g_variant_builder_init(&attributes, G_VARIANT_TYPE("a{ss}"));
     g_variant_builder_add(&attributes, "{ss}", kServiceKey, attributeText(service).c_str());
@@ -180,51 +226,16 @@ Status SecretServiceStore::_searchPaths(GDBusConnection* connection, const std::
     if (!g_variant_is_of_type(answer.get(), G_VARIANT_TYPE("(aoao)"))) {
         return platform::kCredentialServiceFailed;
     }
-    const VariantPointer unlocked(g_variant_get_child_value(answer.get(), 0));
-    const VariantPointer locked(g_variant_get_child_value(answer.get(), 1));
-    count = g_variant_n_children(unlocked.get()) + g_variant_n_children(locked.get());
-    return platform::kCredentialSuccess;
-}
-
-Status SecretServiceStore::_findUnlocked(const std::string& service, const std::string& account,
-                                         FoundItem& found) {
-    GDBusConnection* const connection = _bus.connection();
-    if (!connection) {
-        return platform::kCredentialNoBus;
-    }
-    std::size_t count = 0;
-    Status status = _searchPaths(connection, service, account, count);
-    if (status != platform::kCredentialSuccess) {
-        return status;
-    }
-    if (count == 0) {
-        return platform::kCredentialItemNotFound;
-    }
-    found.library = connectToService(status);
-    if (!found.library) {
-        return status;
-    }
-    ErrorSlot error;
-    const HashTablePointer attributes = keyAttributes(service, account);
-    ItemList items = takeItems(secret_service_search_sync(found.library.get(), nullptr, attributes.get(),
-                                                          SECRET_SEARCH_ALL, nullptr, error.out()));
-    if (error) {
-        return statusOf(error.get());
-    }
-    if (items.empty()) {
-        return platform::kCredentialItemNotFound;
-    }
-    for (ObjectPointer<SecretItem>& item : items) {
-        if (!secret_item_get_locked(item.get())) {
-            found.item = std::move(item);
+    for (const bool isLocked : {false, true}) {
+        const VariantPointer paths(g_variant_get_child_value(answer.get(), isLocked ? 1 : 0));
+        if (g_variant_n_children(paths.get()) > 0) {
+            const char* path = nullptr;
+            g_variant_get_child(paths.get(), 0, "&o", &path);
+            result = {path, isLocked};
             return platform::kCredentialSuccess;
         }
     }
-    status = _unlock(found.library.get(), G_DBUS_PROXY(items.front().get()));
-    if (status == platform::kCredentialSuccess) {
-        found.item = std::move(items.front());
-    }
-    return status;
+    return platform::kCredentialItemNotFound;
 }
 
 // What it means that the user's consent was not given.
@@ -244,42 +255,47 @@ Status SecretServiceStore::_refusal(const PromptWait& wait, const GError* error)
     return nobodyWasAsked ? platform::kCredentialLocked : platform::kCredentialDismissed;
 }
 
-Status SecretServiceStore::_unlock(SecretService* library, GDBusProxy* object) {
+Status SecretServiceStore::_unlock(SecretService* library, const std::string& path) {
     PromptWait wait(_arguments.promptPatience);
-    GList objects{object, nullptr, nullptr};
-    secret_service_unlock(library, &objects, wait.cancellable(), PromptWait::done, wait.argument());
+    const char* paths[] = {path.c_str(), nullptr};
+    secret_service_unlock_dbus_paths(library, paths, nullptr, PromptWait::done, wait.argument());
     GAsyncResult* const result = wait.wait();
     ErrorSlot error;
-    const gint unlocked = result ? secret_service_unlock_finish(library, result, nullptr, error.out()) : 0;
-    return unlocked > 0 ? platform::kCredentialSuccess : _refusal(wait, error.get());
+    char** unlocked = nullptr;
+    const gint count =
+        result ? secret_service_unlock_dbus_paths_finish(library, result, &unlocked, error.out()) : 0;
+    g_strfreev(unlocked);
+    return count > 0 ? platform::kCredentialSuccess : _refusal(wait, error.get());
 }
 
-Status SecretServiceStore::_defaultCollection(SecretService* library,
-                                              ObjectPointer<SecretCollection>& collection) {
-    ErrorSlot error;
-    collection.reset(secret_collection_for_alias_sync(library, SECRET_COLLECTION_DEFAULT,
-                                                      SECRET_COLLECTION_NONE, nullptr, error.out()));
-    if (error) {
-        return statusOf(error.get());
+Status SecretServiceStore::_defaultCollection(GDBusConnection* connection, SecretService* library,
+                                              std::string& path) {
+    const Status status = readDefaultAlias(connection, path);
+    if (status != platform::kCredentialSuccess) {
+        return status;
     }
-    if (collection) {
-        return secret_collection_get_locked(collection.get())
-                   ? _unlock(library, G_DBUS_PROXY(collection.get()))
-                   : platform::kCredentialSuccess;
+    if (path != kNoObject) {
+        // What is unlocked already stays so without a question.
+        return _unlock(library, path);
     }
     // The service asks the user for the new collection's password.
+    const HashTablePointer properties = newProperties();
+    setProperty(properties.get(), kCollectionInterface, "Label", g_variant_new_string("Default"));
     PromptWait wait(_arguments.promptPatience);
-    secret_collection_create(library, "Default", SECRET_COLLECTION_DEFAULT, SECRET_COLLECTION_CREATE_NONE,
-                             wait.cancellable(), PromptWait::done, wait.argument());
+    secret_service_create_collection_dbus_path(library, properties.get(), SECRET_COLLECTION_DEFAULT,
+                                               SECRET_COLLECTION_CREATE_NONE, nullptr, PromptWait::done,
+                                               wait.argument());
     GAsyncResult* const result = wait.wait();
-    collection.reset(result ? secret_collection_create_finish(result, error.out()) : nullptr);
-    if (collection) {
+    ErrorSlot error;
+    const CharacterPointer created(
+        result ? secret_service_create_collection_dbus_path_finish(library, result, error.out()) : nullptr);
+    // To a refusal the service answers with a collection that is not there.
+    if (created && std::string_view(created.get()) != kNoObject) {
+        path = created.get();
         return platform::kCredentialSuccess;
     }
-    // To a refusal the service answers with a collection that is not there.
-    const bool isMissing = error && (statusOf(error.get()) == platform::kCredentialItemNotFound ||
-                                     g_error_matches(error.get(), SECRET_ERROR, SECRET_ERROR_PROTOCOL));
-    return _refusal(wait, isMissing ? nullptr : error.get());
+    return _refusal(wait, g_error_matches(error.get(), SECRET_ERROR, SECRET_ERROR_PROTOCOL) ? nullptr
+                                                                                            : error.get());
 }
 
 Status SecretServiceStore::createItem(const CredentialItem& item, const std::string& data) noexcept {
@@ -288,38 +304,37 @@ Status SecretServiceStore::createItem(const CredentialItem& item, const std::str
     if (!connection) {
         return platform::kCredentialNoBus;
     }
-    std::size_t count = 0;
-    Status status = _searchPaths(connection, item.service, item.account, count);
-    if (status != platform::kCredentialSuccess) {
-        return status;
-    }
-    if (count > 0) {
-        return platform::kCredentialDuplicateItem;
+    SearchResult found;
+    Status status = _search(connection, item.service, item.account, found);
+    if (status != platform::kCredentialItemNotFound) {
+        return status == platform::kCredentialSuccess
+                   ? static_cast<Status>(platform::kCredentialDuplicateItem)
+                   : status;
     }
     if (data.size() > kLargestSecret) {
         return platform::kCredentialTooLarge;
     }
-    const ObjectPointer<SecretService> library = connectToService(status);
+    const Library library = openLibrary(status);
     if (!library) {
         return status;
     }
-    ObjectPointer<SecretCollection> collection;
-    status = _defaultCollection(library.get(), collection);
+    std::string collection;
+    status = _defaultCollection(connection, library.get(), collection);
     if (status != platform::kCredentialSuccess) {
         return status;
     }
-    const HashTablePointer attributes = allAttributes(item);
+    const HashTablePointer properties = itemProperties(item);
     SecretValue* const value =
         secret_value_new(data.data(), static_cast<gssize>(data.size()), "application/octet-stream");
     PromptWait wait(_arguments.promptPatience);
-    secret_item_create(collection.get(), nullptr, attributes.get(), attributeText(item.label).c_str(), value,
-                       SECRET_ITEM_CREATE_NONE, wait.cancellable(), PromptWait::done, wait.argument());
+    secret_service_create_item_dbus_path(library.get(), collection.c_str(), properties.get(), value,
+                                         SECRET_ITEM_CREATE_NONE, nullptr, PromptWait::done, wait.argument());
     secret_value_unref(value);
     GAsyncResult* const result = wait.wait();
     ErrorSlot error;
-    const ObjectPointer<SecretItem> created(result ? secret_item_create_finish(result, error.out())
-                                                   : nullptr);
-    if (created) {
+    const CharacterPointer created(
+        result ? secret_service_create_item_dbus_path_finish(library.get(), result, error.out()) : nullptr);
+    if (created && std::string_view(created.get()) != kNoObject) {
         return platform::kCredentialSuccess;
     }
     status = _refusal(wait, error.get());
@@ -332,11 +347,22 @@ Status SecretServiceStore::createItem(const CredentialItem& item, const std::str
 Status SecretServiceStore::findItem(const std::string& service, const std::string& account, std::string* data,
                                     std::unique_ptr<platform::CredentialItemReference>* reference) noexcept {
     const std::lock_guard lock(_mutex);
-    FoundItem found;
-    Status status = _findUnlocked(service, account, found);
+    GDBusConnection* const connection = _bus.connection();
+    if (!connection) {
+        return platform::kCredentialNoBus;
+    }
+    SearchResult found;
+    Status status = _search(connection, service, account, found);
+    Library library;
+    if (status == platform::kCredentialSuccess && (found.isLocked || data)) {
+        library = openLibrary(status);
+    }
+    if (status == platform::kCredentialSuccess && found.isLocked) {
+        status = _unlock(library.get(), found.path);
+    }
     std::string secret;
     if (status == platform::kCredentialSuccess && data) {
-        status = loadSecret(found.item.get(), secret);
+        status = loadSecret(connection, library.get(), found.path, secret);
     }
     if (status != platform::kCredentialSuccess) {
         return status;
@@ -345,7 +371,7 @@ Status SecretServiceStore::findItem(const std::string& service, const std::strin
         *data = std::move(secret);
     }
     if (reference) {
-        *reference = std::make_unique<Reference>(std::move(found));
+        *reference = std::make_unique<Reference>(std::move(found.path));
     }
     return platform::kCredentialSuccess;
 }
@@ -371,15 +397,21 @@ Status SecretServiceStore::readAttributes(const platform::CredentialItemReferenc
 
 Status SecretServiceStore::deleteItem(const platform::CredentialItemReference& reference) noexcept {
     const std::lock_guard lock(_mutex);
-    if (!_bus.connection()) {
+    GDBusConnection* const connection = _bus.connection();
+    if (!connection) {
         return platform::kCredentialNoBus;
     }
-    SecretItem* const item = static_cast<const Reference&>(reference).item();
+    Status status = 0;
+    const Library library = openLibrary(status);
+    if (!library) {
+        return status;
+    }
     PromptWait wait(_arguments.promptPatience);
-    secret_item_delete(item, wait.cancellable(), PromptWait::done, wait.argument());
+    secret_service_delete_item_dbus_path(library.get(), static_cast<const Reference&>(reference).path(),
+                                         nullptr, PromptWait::done, wait.argument());
     GAsyncResult* const result = wait.wait();
     ErrorSlot error;
-    if (result && secret_item_delete_finish(item, result, error.out())) {
+    if (result && secret_service_delete_item_dbus_path_finish(library.get(), result, error.out())) {
         return platform::kCredentialSuccess;
     }
     return _refusal(wait, error.get());
@@ -393,25 +425,21 @@ bool SecretServiceStore::describe(platform::BackendReport& report) noexcept {
         report.advice = "log in to a desktop session";
         return false;
     }
-    Status status = 0;
-    const VariantPointer alias =
-        callMethod(connection, kSecretServiceName, kSecretServicePath, kServiceInterface, "ReadAlias",
-                   g_variant_new("(s)", SECRET_COLLECTION_DEFAULT), status);
-    if (!alias || !g_variant_is_of_type(alias.get(), G_VARIANT_TYPE("(o)"))) {
-        report.reason = platform::credentialStatusText(alias ? platform::kCredentialServiceFailed : status);
+    std::string path;
+    Status status = readDefaultAlias(connection, path);
+    if (status != platform::kCredentialSuccess) {
+        report.reason = platform::credentialStatusText(status);
         report.advice = "install and start a Secret Service, such as gnome-keyring";
         return false;
     }
     report.backend = "Secret Service";
-    const char* path = nullptr;
-    g_variant_get(alias.get(), "(&o)", &path);
-    if (std::string(path) == "/") {
+    if (path == kNoObject) {
         report.reason = "the service runs; there is no default keyring yet";
         report.advice = "the first item that is stored asks for the new keyring's password";
         return true;
     }
     const VariantPointer locked =
-        callMethod(connection, kSecretServiceName, path, kPropertiesInterface, "Get",
+        callMethod(connection, kSecretServiceName, path.c_str(), kPropertiesInterface, "Get",
                    g_variant_new("(ss)", kCollectionInterface, "Locked"), status);
     if (!locked || !g_variant_is_of_type(locked.get(), G_VARIANT_TYPE("(v)"))) {
         report.reason = "the service runs; its default keyring cannot be looked at";

@@ -3,21 +3,15 @@
 #pragma once
 
 #include "backends/desktop/CredentialModule.h"
+#include "backends/desktop/credentials/LibSecret.h"
 #include "backends/desktop/credentials/SessionBus.h"
 #include "platform/BackendReport.h"
 
-#include <libsecret/secret.h>
 #include <mutex>
 #include <string>
 #include <vector>
 
 namespace welcomer::desktop {
-
-// An item of the library, which is of no use without the library's object of the service.
-struct FoundItem {
-    ObjectPointer<SecretService> library;
-    ObjectPointer<SecretItem> item;
-};
 
 // An item's service and account are the attributes "service" and "account", its name is the label, its data
 // the secret, bytes unchanged, encrypted on their way. New items go to the default collection, which is made
@@ -26,6 +20,9 @@ struct FoundItem {
 //
 // A plain look-up of the service reports a locked item like a missing one: here items are searched for, and
 // then unlocked, which may ask the user. A prompt that nobody answers is given up after a while.
+//
+// Nothing of the service is kept from one operation to the next, nor in a reference but the item's path: the
+// service may end and be started anew in between.
 //
 // Statuses, besides those of every store: kCredentialLocked, kCredentialDismissed,
 // kCredentialPromptUnanswered, kCredentialNoService, kCredentialNoBus, kCredentialTooLarge (more than
@@ -53,12 +50,16 @@ class SecretServiceStore final : public platform::CredentialStore {
     bool describe(platform::BackendReport& report) noexcept;
 
   private:
+    struct SearchResult {
+        std::string path; // of the first item that is not locked, else of the first one
+        bool isLocked = false;
+    };
+
     // All with _mutex held, and with the status of what failed.
-    std::int32_t _searchPaths(GDBusConnection* connection, const std::string& service,
-                              const std::string& account, std::size_t& count);
-    std::int32_t _findUnlocked(const std::string& service, const std::string& account, FoundItem& found);
-    std::int32_t _defaultCollection(SecretService* library, ObjectPointer<SecretCollection>& collection);
-    std::int32_t _unlock(SecretService* library, GDBusProxy* object);
+    static std::int32_t _search(GDBusConnection* connection, const std::string& service,
+                                const std::string& account, SearchResult& result);
+    std::int32_t _defaultCollection(GDBusConnection* connection, SecretService* library, std::string& path);
+    std::int32_t _unlock(SecretService* library, const std::string& path);
     std::int32_t _refusal(const class PromptWait& wait, const GError* error);
 
     const CredentialModule::Arguments _arguments;

@@ -83,7 +83,6 @@ SessionBus::~SessionBus() {
 
 GDBusConnection* SessionBus::connection() {
     if (_connection && g_dbus_connection_is_closed(_connection)) {
-        secret_service_disconnect();
         g_clear_object(&_connection);
     }
     if (!_connection) {

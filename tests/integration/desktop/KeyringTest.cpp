@@ -165,8 +165,88 @@ TEST_F(KeyringTest, APromptThatNobodyAnswersIsGivenUp) {
     EXPECT_EQ(reference, nullptr);
 }
 
+TEST_F(KeyringTest, APromptThatIsGivenUpLeavesTheKeyringRunning) {
+    session.startKeyring();
+    Daemon({"secret-tool", "store", "--label=theirs", "service", "service", "account", "account"},
+           "their secret", "")
+        .waitForLine("-"); // it has ended
+    session.lockKeyring();
+    const std::string owner = session.keyringOwner();
+    ASSERT_NE(owner, "");
+    {
+        Daemon prompter = session.startPrompter("silent");
+        const pid_t reader = ::fork();
+        if (reader == 0) {
+            // Nothing of GLib has been used in this process so far.
+            UsersCredentials own = impatient();
+            ::_exit(own.desktop.store().findItem("service", "account", &data, nullptr));
+        }
+        int status = -1;
+        ASSERT_EQ(::waitpid(reader, &status, 0), reader);
+        ASSERT_TRUE(WIFEXITED(status));
+        EXPECT_EQ(WEXITSTATUS(status), platform::kCredentialPromptUnanswered);
+    }
+    Daemon prompter = session.startPrompter("ok");
+    EXPECT_EQ(read(), 0);
+    EXPECT_EQ(data, "their secret");
+    EXPECT_EQ(session.keyringOwner(), owner);
+}
+
 TEST(CredentialModuleTest, APromptIsGivenUpAfterTwoMinutes) {
     EXPECT_EQ(desktop::CredentialModule::Arguments().promptPatience, 2min);
+}
+
+// How a keyring daemon ends before it is started again.
+class RestartedKeyring : public KeyringTest, public testing::WithParamInterface<void (KeyringSession::*)()> {
+  protected:
+    void restart() {
+        (session.*GetParam())();
+        session.startKeyring();
+    }
+};
+INSTANTIATE_TEST_SUITE_P(Ends, RestartedKeyring,
+                         testing::Values(&KeyringSession::stopKeyring, &KeyringSession::killKeyring),
+                         [](const auto& end) { return end.index == 0 ? "Stopped" : "Killed"; });
+
+TEST_P(RestartedKeyring, ANewProcessFindsTheItem) {
+    session.startKeyring();
+    const pid_t writer = ::fork();
+    if (writer == 0) {
+        // Nothing of GLib has been used in this process so far.
+        UsersCredentials own(root);
+        ::_exit(own.desktop.store().createItem(kItem, "the secret"));
+    }
+    int status = -1;
+    ASSERT_EQ(::waitpid(writer, &status, 0), writer);
+    ASSERT_EQ(status, 0);
+    ASSERT_EQ(lookUpOutside(), "the secret");
+
+    restart();
+    EXPECT_EQ(lookUpOutside(), "the secret");
+    EXPECT_EQ(read(), 0);
+    EXPECT_EQ(data, "the secret");
+}
+
+TEST_P(RestartedKeyring, TheStoreThatKnewTheOldOneFindsReadsAndDeletesTheItem) {
+    session.startKeyring();
+    ASSERT_EQ(create("the secret"), 0);
+    for (int restarts = 0; restarts < 2; ++restarts) {
+        ASSERT_EQ(read(), 0);
+        restart();
+        ASSERT_EQ(lookUpOutside(), "the secret");
+        data.clear();
+        EXPECT_EQ(read(), 0);
+        EXPECT_EQ(data, "the secret");
+    }
+    // A reference from before the restart, too.
+    restart();
+    platform::CredentialItem item;
+    EXPECT_EQ(credentials.desktop.store().readAttributes(*reference, item), 0);
+    EXPECT_EQ(item.label, "a label");
+    EXPECT_EQ(credentials.desktop.store().deleteItem(*reference), 0);
+    EXPECT_EQ(lookUpOutside(), "");
+    EXPECT_EQ(create("another secret"), 0);
+    EXPECT_EQ(lookUpOutside(), "another secret");
 }
 
 TEST_F(KeyringTest, WhatTheLocalStoreHoldsIsFoundThoughTheKeyringIsLocked) {
