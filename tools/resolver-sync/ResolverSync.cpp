@@ -45,8 +45,9 @@ sd_event* ResolverSync::_newEvent() {
     return event;
 }
 
-ResolverSync::ResolverSync(const std::string& folder, const std::string& runtimeFolder)
+ResolverSync::ResolverSync(const std::string& folder, const std::string& runtimeFolder, RunningMark& mark)
     : _folder(folder),
+      _mark(mark),
       _event(_newEvent()),
       _watch(folder),
       _resolver(_event.get(), [this](bool running) { _resolverAppeared(running); }),
@@ -122,6 +123,7 @@ void ResolverSync::_forwarderEnded() {
     _forwarder.hasEnded();
     _forwarderWatch.reset();
     WL_LOG("The forwarder for the resolver's overrides has ended");
+    _mark.note("the forwarder has ended");
     _synchroniseIn(kRetry);
 }
 
@@ -140,12 +142,14 @@ void ResolverSync::_synchronise() {
             WL_LOG("The resolver's overrides have no effect: systemd-resolved does not run");
         }
         _toldOfMissingResolver = !folder.overrides.empty();
+        _mark.note("systemd-resolved does not run");
         return;
     }
     _toldOfMissingResolver = false;
     _forwarderWatch.reset();
     const platform::Outcome applied = _routing().apply(folder.overrides);
     _watchForwarder();
+    _mark.note(applied ? "" : applied.error.message);
     if (!applied) {
         WL_LOG("Failed to route the resolver's overrides: %@", applied.error);
         _synchroniseIn(kRetry);

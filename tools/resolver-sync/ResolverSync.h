@@ -7,6 +7,7 @@
 #include "tools/resolver-sync/Forwarder.h"
 #include "tools/resolver-sync/LinkRouting.h"
 #include "tools/resolver-sync/ResolverService.h"
+#include "tools/resolver-sync/RunningMark.h"
 
 #include <cstdint>
 #include <memory>
@@ -25,7 +26,8 @@ class ResolverSync {
     // Throws std::system_error when it cannot watch or has no bus.
     //  folder         the overrides
     //  runtimeFolder  where our own file lies, and goes with the last override
-    ResolverSync(const std::string& folder, const std::string& runtimeFolder);
+    //  mark           where what keeps the overrides from having an effect is noted; borrowed
+    ResolverSync(const std::string& folder, const std::string& runtimeFolder, RunningMark& mark);
     ~ResolverSync();
     ResolverSync(const ResolverSync&) = delete;
     ResolverSync& operator=(const ResolverSync&) = delete;
@@ -54,6 +56,7 @@ class ResolverSync {
     void _takeBack();
 
     std::string _folder;
+    RunningMark& _mark;
     std::unique_ptr<sd_event, DropEvent> _event;
     FolderWatch _watch;
     ResolverService _resolver;

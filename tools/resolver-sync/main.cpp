@@ -3,6 +3,7 @@
 #include "backends/Backends.h"
 #include "log/PCLogManager.h"
 #include "tools/resolver-sync/ResolverSync.h"
+#include "tools/resolver-sync/RunningMark.h"
 
 #include <exception>
 #include <string>
@@ -13,7 +14,8 @@ int main() {
     const auto owner = buildPlatform();
     const platform::ScopedPlatform installed(owner->platform());
     try {
-        return resolver::ResolverSync("/etc/resolver", "/run/welcomer-resolver-sync").run();
+        resolver::RunningMark mark(resolver::kRunningMark);
+        return resolver::ResolverSync("/etc/resolver", "/run/welcomer-resolver-sync", mark).run();
     } catch (const std::exception& error) {
         WL_LOG("Failed to start: %@", std::string(error.what()));
         return 1;

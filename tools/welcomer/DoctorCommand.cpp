@@ -5,6 +5,7 @@
 #include "tools/welcomer/Commands.h"
 #include "tools/welcomer/Printable.h"
 #include "tools/welcomer/PropertyListOutput.h"
+#include "tools/welcomer/ResolverReport.h"
 #include "tools/welcomer/Tool.h"
 
 #include <CLI/CLI.hpp>
@@ -35,17 +36,6 @@ BackendReport userManagerReport() {
             "log in to a session with systemd, so that each launch agent is a service of its own"};
 }
 
-// Whether the files in /etc/resolver reach the machine's resolver.
-BackendReport overridesReport() {
-    platform::FileSystem& files = platform::current().fileSystem;
-    if (!files.exists("/run/systemd/resolve")) {
-        return {"resolver overrides", "none", "systemd-resolved does not run: the overrides have no effect",
-                "install systemd-resolved, and enable welcomer-resolver-sync"};
-    }
-    return {"resolver overrides", "systemd-resolved",
-            "systemd-resolved runs: the overrides have an effect while welcomer-resolver-sync runs", ""};
-}
-
 std::vector<BackendReport> allReports(Session& session) {
     std::vector<BackendReport> reports;
     PlatformRequest request;
@@ -54,7 +44,7 @@ std::vector<BackendReport> allReports(Session& session) {
     request.backendReports = &reports;
     const PlatformHandle platform = session.buildPlatform(request);
     reports.push_back(userManagerReport());
-    reports.push_back(overridesReport());
+    reports.push_back(resolverReport(session.options.root));
     return reports;
 }
 

@@ -4,6 +4,7 @@
 usage: resolver_sync_test.py BUILD_DIR RESOLVED_DIR
 """
 
+import json
 import os
 import shutil
 import signal
@@ -79,6 +80,12 @@ class ResolverSync(unittest.TestCase):
                 pass
         return found
 
+    def diagnosis(self):
+        result = self.machine.run(["/usr/local/bin/welcomer", "--json", "doctor"], user=True)
+        self.assertEqual(result.returncode, 0, result)
+        [found] = [each for each in json.loads(result.stdout)["backends"] if each["interface"] == "resolver overrides"]
+        return found["reason"]
+
     def records(self):
         return [record[2] for record in self.machine.log_records("welcomer-resolver-sync")]
 
@@ -99,6 +106,29 @@ class ResolverSync(unittest.TestCase):
             self.wait_for_answer(f"probe.{domain}", None)
         self.wait_until_nothing_is_left()
         self.assertEqual(self.records(), [])
+
+    def test_the_tool_tells_an_ordinary_user_whether_they_have_an_effect(self):
+        idle = "welcomer-resolver-sync does not run: the overrides have no effect"
+        works = "systemd-resolved and welcomer-resolver-sync run: the overrides have an effect"
+        self.assertEqual(self.diagnosis(), idle)
+        self.start_service()
+        self.machine.wait_for(lambda: self.diagnosis() == works, "the running service")
+        # Of two services the first one serves.
+        second = self.machine.run([PROGRAM])
+        self.assertEqual(second.returncode, 1)
+        self.assertEqual(self.diagnosis(), works)
+        self.machine.stop_resolver()
+        self.assertEqual(self.diagnosis(), "systemd-resolved does not run: the overrides have no effect")
+        self.machine.start_resolver()
+        self.machine.wait_for(lambda: self.diagnosis() == works, "the running resolver")
+        self.service.kill()
+        self.service.wait(timeout=20)
+        self.assertEqual(self.diagnosis(), idle)
+        self.start_service()
+        self.machine.wait_for(lambda: self.diagnosis() == works, "the next service")
+        self.end_service()
+        self.assertEqual(self.diagnosis(), idle)
+        self.assertFalse((self.machine.root / "run/welcomer-resolver-sync.state").exists())
 
     def test_other_names_are_not_asked_of_the_environment(self):
         self.start_service()

@@ -1,10 +1,13 @@
 """welcomer doctor, on this machine and below a root."""
 
+import fcntl
 import json
 import os
+import socket
 import subprocess
 import tempfile
 import unittest
+from pathlib import Path
 
 TOOL = os.path.join(os.environ["WELCOMER_BUILD"], "bin", "welcomer")
 
@@ -49,12 +52,90 @@ class Doctor(unittest.TestCase):
             self.assertEqual(entry(doctor("--json", XDG_RUNTIME_DIR=runtime), "launch service")["backend"],
                              "user manager")
 
-    def test_without_a_resolver_the_overrides_have_no_effect(self):
-        with tempfile.TemporaryDirectory() as root:
-            self.assertIn("have no effect", entry(doctor("--json", "--root", root), "resolver overrides")["reason"])
-            os.makedirs(os.path.join(root, "run", "systemd", "resolve"))
-            self.assertEqual(entry(doctor("--json", "--root", root), "resolver overrides")["backend"],
-                             "systemd-resolved")
+
+class ResolverOverrides(unittest.TestCase):
+    """Below a root, with files in place of the services; tests/integration/resolver-sync has the real ones."""
+
+    def setUp(self):
+        folder = tempfile.TemporaryDirectory()
+        self.addCleanup(folder.cleanup)
+        self.root = Path(folder.name)
+        for name in ("run/systemd/resolve", "etc"):
+            (self.root / name).mkdir(parents=True)
+
+    def start_resolver(self):
+        listener = socket.socket(socket.AF_UNIX)
+        self.addCleanup(listener.close)
+        listener.bind(str(self.root / "run/systemd/resolve/io.systemd.Resolve"))
+        listener.listen()
+        return listener
+
+    def start_service(self, trouble=""):
+        mark = (self.root / "run/welcomer-resolver-sync.state").open("w+", encoding="utf-8")
+        self.addCleanup(mark.close)
+        fcntl.lockf(mark, fcntl.LOCK_EX | fcntl.LOCK_NB)
+        mark.write(trouble)
+        mark.flush()
+        return mark
+
+    def look_up_through_the_resolver(self):
+        (self.root / "etc/resolv.conf").write_text("# a stub\nnameserver 127.0.0.53\n")
+
+    def check(self, backend, reason, advice):
+        found = entry(doctor("--json", "--root", str(self.root)), "resolver overrides")
+        self.assertEqual((found["backend"], found["reason"], found["advice"]), (backend, reason, advice))
+
+    def test_with_everything_there_they_have_an_effect(self):
+        self.start_resolver()
+        self.start_service()
+        self.look_up_through_the_resolver()
+        self.check("systemd-resolved",
+                   "systemd-resolved and welcomer-resolver-sync run: the overrides have an effect", None)
+
+    def test_the_c_librarys_module_of_the_resolver_will_do(self):
+        self.start_resolver()
+        self.start_service()
+        (self.root / "etc/resolv.conf").write_text("nameserver 192.0.2.1\n")
+        (self.root / "etc/nsswitch.conf").write_text("hosts: files resolve [!UNAVAIL=return] dns\n")
+        self.check("systemd-resolved",
+                   "systemd-resolved and welcomer-resolver-sync run: the overrides have an effect", None)
+
+    def test_without_a_resolver_they_have_none_though_its_folder_is_there(self):
+        self.look_up_through_the_resolver()
+        self.check("none", "systemd-resolved does not run: the overrides have no effect",
+                   "install and start systemd-resolved, and enable welcomer-resolver-sync")
+
+    def test_a_resolver_that_has_died_does_not_run(self):
+        self.start_service()
+        self.start_resolver().close()
+        self.check("none", "systemd-resolved does not run: the overrides have no effect",
+                   "install and start systemd-resolved")
+
+    def test_without_the_service_they_have_none(self):
+        self.start_resolver()
+        self.look_up_through_the_resolver()
+        self.check("none", "welcomer-resolver-sync does not run: the overrides have no effect",
+                   "systemctl enable --now welcomer-resolver-sync")
+
+    def test_a_service_that_has_died_does_not_run(self):
+        self.start_resolver()
+        self.start_service().close()
+        self.check("none", "welcomer-resolver-sync does not run: the overrides have no effect",
+                   "systemctl enable --now welcomer-resolver-sync")
+
+    def test_what_keeps_the_service_from_its_work_is_the_reason(self):
+        self.start_resolver()
+        self.start_service("failed to start /usr/sbin/dnsmasq: No such file or directory")
+        self.check("none", "welcomer-resolver-sync cannot route the overrides: failed to start /usr/sbin/dnsmasq: "
+                   "No such file or directory", "see the system log of welcomer-resolver-sync; its forwarder is dnsmasq")
+
+    def test_names_that_are_looked_up_past_the_resolver_are_told_of(self):
+        self.start_resolver()
+        self.start_service()
+        (self.root / "etc/resolv.conf").write_text("nameserver 192.0.2.1\n# nameserver 127.0.0.53\n")
+        self.check("systemd-resolved",
+                   "the overrides reach systemd-resolved, but programs do not look names up through it",
+                   "link /etc/resolv.conf to /run/systemd/resolve/stub-resolv.conf, or install libnss-resolve")
 
 
 if __name__ == "__main__":
