@@ -48,6 +48,7 @@ class BenchMachine:
         if plugin_count:
             plugins_section.make_plugins(build, self.machine.root, plugin_count)
         self.machine.start_system_log()
+        self.session = []  # what makes a command one of the user's session, if there is one
 
     def store(self, replay):
         path = self.machine.root / "tmp" / "replay.plist"
@@ -55,9 +56,9 @@ class BenchMachine:
         path.chmod(0o644)
         agents = self.machine.home / "Library" / "LaunchAgents"
         shutil.rmtree(agents, ignore_errors=True)
-        result = self.machine.run(["/usr/local/bin/welcomer", "replay", "store", "--account", "bench", "--file",
-                                   "/tmp/replay.plist", "--bundle", "/usr/local/share/welcomer/setup-bundle"], user=True,
-                                  timeout=120)
+        result = self.machine.run([*self.session, "/usr/local/bin/welcomer", "replay", "store", "--account", "bench",
+                                   "--file", "/tmp/replay.plist", "--bundle", "/usr/local/share/welcomer/setup-bundle"],
+                                  user=True, timeout=120)
         if result.returncode:
             raise RuntimeError(result.stderr)
 
@@ -73,7 +74,7 @@ class BenchMachine:
         """The agent, once it lingers, and how long that took."""
         before = len(self.machine.log_records("wlnimbussetup"))
         start = time.monotonic()
-        agent = self.machine.start([AGENT], user=True)
+        agent = self.machine.start([*self.session, AGENT], user=True)
         self.machine.wait_for(lambda: any(text == "delaying exit by two minutes" for _, _, text in
                                           self.machine.log_records("wlnimbussetup")[before:]), "the linger", 60)
         return agent, time.monotonic() - start
