@@ -90,6 +90,13 @@ TEST_F(RemainingSkylarkSetupTest, AFailureToLaunchIsLoggedAndTheServicesAreEnabl
     EXPECT_TRUE(fake.accountService.accounts["anna"][platform::kSKServiceIDContacts].enabled);
 }
 
+TEST_F(RemainingSkylarkSetupTest, EveryStandardExceptionIsLoggedAndTheServicesAreEnabled) {
+    setKillall([]() -> int { throw std::logic_error("not now"); });
+    run();
+    EXPECT_EQ(fake.systemLog.lines()[1], "Exception killing onlineaccounts: not now");
+    EXPECT_TRUE(fake.accountService.accounts["anna"][platform::kSKServiceIDContacts].enabled);
+}
+
 TEST_F(RemainingSkylarkSetupTest, AnyOtherKindOfFailureIsNotCaught) {
     setKillall([]() -> int { throw 42; });
     EXPECT_THROW(run(), int);

@@ -113,7 +113,7 @@ TEST_F(WLSetupProbesTest, AMissingTransitionToolIsLogged) {
 
 TEST_F(WLSetupProbesTest, EveryStandardExceptionOfTheTransitionToolIsLogged) {
     fake.processLauncher.programs[kTransitionTool] = [](const auto&) -> int {
-        throw std::runtime_error("gone");
+        throw std::logic_error("gone");
     };
     EXPECT_FALSE(WLRunTransitionTool());
     EXPECT_EQ(lines(), Strings{"Failed to exec transition tool: gone"});

@@ -165,6 +165,15 @@ TEST_F(WLNimbusDelegatesRequestTest, ARequestWithoutAnIdentifierCannotBeStored) 
                                "a request needs its delegate's identifier"});
 }
 
+TEST_F(WLNimbusDelegatesRequestTest, OmittingTheEmptyIdentifierOmitsNoPluginThatHasNone) {
+    RequestingPlugin& nameless = add(std::nullopt);
+    RequestingPlugin& empty = add("");
+    EXPECT_EQ(request({}, {""}), (Dictionary{{kSkylark, none}}));
+    EXPECT_EQ(nameless.requests, 1);
+    EXPECT_EQ(empty.requests, 0);
+    EXPECT_EQ(lines().size(), 1U);
+}
+
 TEST_F(WLNimbusDelegatesRequestTest, TheFormerOnlineServiceCanBeOmittedUnlessAnAdditionBringsIt) {
     EXPECT_EQ(request({}, {kSkylark}), none);
     EXPECT_EQ(request({{kSkylark, own}}, {kSkylark}), (Dictionary{{kSkylark, own}}));
