@@ -55,11 +55,22 @@ struct CredentialItem {
     std::optional<CredentialAccess> access; // none: the store's default access
 };
 
+// The store that an item lies in, for people.
+struct CredentialStoreDescription {
+    std::string name; // such as "local file"
+    std::string
+        readers; // who can read the item, whatever its access says, such as "every program of this user"
+    friend bool operator==(const CredentialStoreDescription&, const CredentialStoreDescription&) = default;
+};
+
 // A found item. What it refers to may be gone when it is used; the operation then fails with
 // kCredentialItemNotFound.
 class CredentialItemReference {
   public:
     virtual ~CredentialItemReference() = default;
+
+    // Where it was found. Any thread.
+    virtual CredentialStoreDescription store() const = 0;
 };
 
 class CredentialStore {

@@ -17,7 +17,8 @@ class Reference final : public platform::CredentialItemReference {
         : _store(store),
           _item(std::move(item)) {}
 
-    platform::CredentialStore& store() const { return _store; }
+    platform::CredentialStoreDescription store() const override { return _item->store(); }
+    platform::CredentialStore& foundBy() const { return _store; }
     const platform::CredentialItemReference& item() const { return *_item; }
 
   private:
@@ -121,12 +122,12 @@ bool SearchListCredentialStore::_wasReadLocally(const Key& key) {
 std::int32_t SearchListCredentialStore::readAttributes(const platform::CredentialItemReference& reference,
                                                        platform::CredentialItem& item) {
     const auto& found = dynamic_cast<const Reference&>(reference);
-    return found.store().readAttributes(found.item(), item);
+    return found.foundBy().readAttributes(found.item(), item);
 }
 
 std::int32_t SearchListCredentialStore::deleteItem(const platform::CredentialItemReference& reference) {
     const auto& found = dynamic_cast<const Reference&>(reference);
-    return found.store().deleteItem(found.item());
+    return found.foundBy().deleteItem(found.item());
 }
 
 } // namespace welcomer::desktop

@@ -22,6 +22,9 @@ class Reference final : public platform::CredentialItemReference {
         : _service(std::move(service)),
           _account(std::move(account)) {}
 
+    platform::CredentialStoreDescription store() const override {
+        return {"local file", "every program of this user"};
+    }
     const std::string& service() const { return _service; }
     const std::string& account() const { return _account; }
 

@@ -18,7 +18,7 @@ using platform::CredentialItem;
 using platform::CredentialItemReference;
 using platform::TrustedApplication;
 
-// `Backend` is made for each test, with an empty `store`.
+// `Backend` is made for each test, with an empty `store`, whose items say that they lie in `storeName`.
 template <typename Backend>
 class CredentialStoreContract : public testing::Test {
   protected:
@@ -50,6 +50,15 @@ inline CredentialItem item(const std::string& service, const std::string& accoun
 
 TYPED_TEST_P(CredentialStoreContract, AnEmptyStoreHoldsNothing) {
     EXPECT_EQ(this->secret("service", "account"), kNotFound);
+}
+
+TYPED_TEST_P(CredentialStoreContract, AReferenceSaysWhereTheItemLiesAndWhoCanReadIt) {
+    ASSERT_EQ(this->credentials.store.createItem(item("service", "account"), "secret"), 0);
+
+    const auto reference = this->find("service", "account");
+    ASSERT_NE(reference, nullptr);
+    EXPECT_EQ(reference->store().name, this->credentials.storeName);
+    EXPECT_NE(reference->store().readers, "");
 }
 
 TYPED_TEST_P(CredentialStoreContract, AnItemIsFoundByServiceAndAccountTogether) {
@@ -200,14 +209,12 @@ TYPED_TEST_P(CredentialStoreContract, OfThreadsThatCreateTheSameItemOneSucceeds)
     EXPECT_EQ(this->secret("service", "account"), std::to_string(winner));
 }
 
-REGISTER_TYPED_TEST_SUITE_P(CredentialStoreContract, AnEmptyStoreHoldsNothing,
-                            AnItemIsFoundByServiceAndAccountTogether, ASecretMayBeAnyBytesAndNone,
-                            AnExistingItemIsNotReplaced, AttributesComeBackAsTheyWereGiven,
-                            AnItemWithoutAnAccessObjectHasTheStoresOwn, AttributesNeedNotBeText,
-                            ADeletedItemIsGoneAndTheOthersStay, AReferenceToWhatIsGoneFindsNothing,
-                            OutputsAreWrittenOnSuccessOnlyAndMayBeAbsent,
-                            ATrustedApplicationNeedsAnAbsolutePath,
-                            AnAccessObjectHoldsItsDescriptionAndItsApplications,
-                            OfThreadsThatCreateTheSameItemOneSucceeds);
+REGISTER_TYPED_TEST_SUITE_P(
+    CredentialStoreContract, AnEmptyStoreHoldsNothing, AReferenceSaysWhereTheItemLiesAndWhoCanReadIt,
+    AnItemIsFoundByServiceAndAccountTogether, ASecretMayBeAnyBytesAndNone, AnExistingItemIsNotReplaced,
+    AttributesComeBackAsTheyWereGiven, AnItemWithoutAnAccessObjectHasTheStoresOwn, AttributesNeedNotBeText,
+    ADeletedItemIsGoneAndTheOthersStay, AReferenceToWhatIsGoneFindsNothing,
+    OutputsAreWrittenOnSuccessOnlyAndMayBeAbsent, ATrustedApplicationNeedsAnAbsolutePath,
+    AnAccessObjectHoldsItsDescriptionAndItsApplications, OfThreadsThatCreateTheSameItemOneSucceeds);
 
 } // namespace welcomer::contract

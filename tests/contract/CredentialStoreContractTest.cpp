@@ -16,6 +16,7 @@ struct LocalCredentials {
     fakes::FakeProcessIdentity identity{recorder, fileSystem};
     TemporaryRoot root;
     local::LocalCredentialStore store{local::RootFolder(root.path()), identity};
+    const std::string storeName = "local file";
 
     LocalCredentials() { root.addDirectory("/home/user/Library"); }
 };
@@ -23,6 +24,7 @@ struct LocalCredentials {
 struct FakeCredentials {
     fakes::CallRecorder recorder;
     fakes::FakeCredentialStore store{recorder};
+    const std::string storeName = "memory";
 };
 
 struct BackendNames {

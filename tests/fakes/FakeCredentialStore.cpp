@@ -13,6 +13,7 @@ class Reference final : public platform::CredentialItemReference {
         : _service(std::move(service)),
           _account(std::move(account)) {}
 
+    platform::CredentialStoreDescription store() const override { return {"memory", "this process alone"}; }
     const std::string& service() const { return _service; }
     const std::string& account() const { return _account; }
 

@@ -57,33 +57,41 @@ void store(Session& session, const StoreArguments& arguments) {
     }
 }
 
-// The item's attributes; its access is not part of what the reader gives.
-platform::CredentialItem readAttributes() {
+struct FoundItem {
+    platform::CredentialStoreDescription store;
+    platform::CredentialItem item;
+};
+
+// What the reader does not give: where the item lies, and its access.
+FoundItem findItem() {
     platform::CredentialStore& credentialStore = platform::current().credentialStore;
     std::unique_ptr<platform::CredentialItemReference> reference;
-    platform::CredentialItem item;
+    FoundItem found;
     std::int32_t status =
         credentialStore.findItem(kReplayItemService, kReplayItemAccount, nullptr, &reference);
     if (status == platform::kCredentialSuccess) {
-        status = credentialStore.readAttributes(*reference, item);
+        found.store = reference->store();
+        status = credentialStore.readAttributes(*reference, found.item);
     }
     if (status != platform::kCredentialSuccess) {
         throw CommandFailure("cannot read the replay item's access: " +
                              platform::credentialStatusText(status));
     }
-    return item;
+    return found;
 }
 
-void printAccess(std::ostream& out, const std::optional<platform::CredentialAccess>& access) {
-    if (!access) {
-        out << "Access:    the store's default\n";
-        return;
+// No store enforces an item's access: each says who can read the item in truth.
+void printAccess(std::ostream& out, const FoundItem& found) {
+    out << "Stored in: " << found.store.name << '\n';
+    const std::optional<platform::CredentialAccess>& access = found.item.access;
+    out << "Access:    " << (access ? printable(access->description) : "the store's default") << '\n';
+    if (access) {
+        for (const platform::TrustedApplication& application : access->trustedApplications) {
+            out << "Trusted:   " << printable(application.path) << '\n';
+        }
+        out << "           (kept with the item, but the " << found.store.name << " does not enforce it)\n";
     }
-    out << "Access:    " << printable(access->description) << '\n';
-    for (const platform::TrustedApplication& application : access->trustedApplications) {
-        out << "Trusted:   " << printable(application.path) << '\n';
-    }
-    out << "           (kept with the item; the local credential store does not enforce it)\n";
+    out << "Readers:   " << found.store.readers << '\n';
 }
 
 void show(Session& session) {
@@ -97,7 +105,7 @@ void show(Session& session) {
         return;
     }
     session.out << "Account:   " << printable(account) << '\n';
-    printAccess(session.out, readAttributes().access);
+    printAccess(session.out, findItem());
     session.out << "Replay object:\n";
     printOutline(session.out, replayObject, "  ");
 }

@@ -91,6 +91,9 @@ CredentialItem itemFrom(GVariant* properties) {
 class Reference final : public platform::CredentialItemReference {
   public:
     explicit Reference(std::string path) : _path(std::move(path)) {}
+    platform::CredentialStoreDescription store() const override {
+        return {"Secret Service", "every program of the session, while the keyring is unlocked"};
+    }
     const char* path() const { return _path.c_str(); }
 
   private:

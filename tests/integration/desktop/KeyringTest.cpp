@@ -38,6 +38,7 @@ struct KeyringCredentials {
     KeyringSession session;
     UsersCredentials credentials{root};
     platform::CredentialStore& store = credentials.desktop.store();
+    const std::string storeName = "Secret Service";
 
     KeyringCredentials() { session.startKeyring(); }
 };
@@ -194,6 +195,24 @@ TEST_F(KeyringTest, APromptThatIsGivenUpLeavesTheKeyringRunning) {
 
 TEST(CredentialModuleTest, APromptIsGivenUpAfterTwoMinutes) {
     EXPECT_EQ(desktop::CredentialModule::Arguments().promptPatience, 2min);
+}
+
+TEST_F(KeyringTest, ShowingTheReplayItemSaysThatTheKeyringDoesNotEnforceItsAccess) {
+    session.startKeyring();
+    platform::CredentialItem item{"Welcomer Nimbus Replay Data", "Welcomer", "a user",
+                                  platform::CredentialAccess{"an access", {{"/a/program"}}}};
+    ASSERT_EQ(credentials.desktop.store().createItem(item, "{ a = 1; }"), 0);
+    EXPECT_EQ(outputOf({WELCOMER_TOOL, "replay", "show"}),
+              "Account:   a user\n"
+              "Stored in: Secret Service\n"
+              "Access:    an access\n"
+              "Trusted:   /a/program\n"
+              "           (kept with the item, but the Secret Service does not enforce it)\n"
+              "Readers:   every program of the session, while the keyring is unlocked\n"
+              "Replay object:\n"
+              "  a: 1");
+    EXPECT_EQ(outputOf({WELCOMER_TOOL, "--json", "replay", "show"}),
+              "{\n  \"account\": \"a user\",\n  \"replay\": {\n    \"a\": \"1\"\n  }\n}");
 }
 
 // How a keyring daemon ends before it is started again.

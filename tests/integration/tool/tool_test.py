@@ -242,7 +242,9 @@ class Replay(ToolTest):
         self.assertIn(f"Account:   {ACCOUNT}\n", text)
         self.assertIn("Access:    Welcomer Nimbus Access\n", text)
         self.assertRegex(text, rf"Trusted:   {self.BUNDLE}/.*wlnimbussetup\n")
-        self.assertIn("does not enforce", text)
+        self.assertIn("Stored in: local file\n", text)
+        self.assertIn("           (kept with the item, but the local file does not enforce it)\n", text)
+        self.assertIn("Readers:   every program of this user\n", text)
         self.assertIn("  imAliases:\n    - one\n    - two\n", text)
         self.assertIn("token: <00ff6279746573>", text)
 
