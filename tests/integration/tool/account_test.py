@@ -461,9 +461,14 @@ class SetupAtTerminal(SetupTest):
         return before
 
     def end(self):
-        """The rest of what is shown, and the exit status."""
+        """The rest of what is shown, and the exit status. One that asks for more is ended."""
         rest = self.seen
+        end = time.monotonic() + 60
         while True:
+            if not select.select([self.terminal], [], [], max(0, end - time.monotonic()))[0]:
+                os.kill(self.process, signal.SIGKILL)
+                os.waitpid(self.process, 0)
+                self.fail(f"it does not end: {rest}")
             try:
                 part = os.read(self.terminal, 65536).decode()
             except OSError:
