@@ -5,6 +5,7 @@
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeProcessIdentity.h"
+#include "tests/support/MountNamespace.h"
 
 #include <gtest/gtest.h>
 
@@ -13,7 +14,6 @@
 #include <fcntl.h>
 #include <filesystem>
 #include <functional>
-#include <sched.h>
 #include <string>
 #include <sys/mount.h>
 #include <sys/ptrace.h>
@@ -282,14 +282,13 @@ TEST_F(LocalPreferenceStoreTest, ADamagedFileThatCannotBeSetAsideIsLeftAloneAndN
 class MountedPreferenceFileTest : public LocalPreferenceStoreTest {
   protected:
     void SetUp() override {
-        if (::unshare(CLONE_NEWNS) != 0 ||
-            ::mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) {
-            ASSERT_NE(::geteuid(), 0U) << "the superuser must be able to mount";
+        if (!mayMount()) {
             GTEST_SKIP() << "needs the right to mount a file in a namespace of its own";
         }
+        enterMountNamespace();
     }
 
-    ~MountedPreferenceFileTest() override { ::umount2(root.locate(kFile).c_str(), MNT_DETACH); }
+    ~MountedPreferenceFileTest() override { unmount(root.locate(kFile)); }
 
     // Makes the domain's file a mount point.
     void mountFile(const std::string& content) {

@@ -8,7 +8,7 @@
 #include "handoff/WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup.h"
 #include "tests/fakes/CallRecorder.h"
 #include "tests/fakes/FakeSystemLog.h"
-#include "tests/integration/disk/MountNamespace.h"
+#include "tests/support/MountNamespace.h"
 
 #include <array>
 #include <chrono>
