@@ -19,6 +19,9 @@ function(welcomer_add_test name)
     set(environment)
     if(WELCOMER_SANITIZE MATCHES thread)
         set(environment ENVIRONMENT "TSAN_OPTIONS=suppressions=${PROJECT_SOURCE_DIR}/tests/support/tsan.supp")
+    elseif(WELCOMER_SANITIZE MATCHES address AND ARG_LABELS MATCHES desktop)
+        # Only the slow way finds out where in the desktop's libraries something was lost.
+        set(environment ENVIRONMENT "LSAN_OPTIONS=suppressions=${PROJECT_SOURCE_DIR}/tests/support/lsan.supp:fast_unwind_on_malloc=0:print_suppressions=0")
     endif()
     gtest_discover_tests(${name} TEST_PREFIX "${name}." DISCOVERY_TIMEOUT 60
                          PROPERTIES TIMEOUT ${ARG_TIMEOUT} LABELS "${ARG_LABELS}" ${environment})
