@@ -7,6 +7,8 @@
 #include "backends/desktop/DesktopNetwork.h"
 #include "tests/support/MountNamespace.h"
 #include "tests/support/NetworkManagerDaemon.h"
+
+#include <stdexcept>
 #endif
 
 namespace welcomer {
@@ -36,6 +38,12 @@ class NetworkManagerBackend final : public NetworkBackend {
     explicit NetworkManagerBackend(const TemporaryRoot& root) : _kernel(root) {
         enterMountNamespace();
         _daemon = std::make_unique<NetworkManagerDaemon>();
+        // Else this would be the kernel's once more.
+        for (const platform::BackendReport& report : _network.reports()) {
+            if (report.backend != "NetworkManager") {
+                throw std::runtime_error(report.interface + ": " + report.reason);
+            }
+        }
     }
 
     platform::NetworkConfigStore& configStore() override { return _network.configStore(); }
@@ -46,7 +54,8 @@ class NetworkManagerBackend final : public NetworkBackend {
   private:
     KernelBackend _kernel;
     std::unique_ptr<NetworkManagerDaemon> _daemon;
-    desktop::DesktopNetwork _network{{_kernel.configStore(), _kernel.stateStore(), _kernel.reachability()}};
+    desktop::DesktopNetwork _network{{_kernel.configStore(), _kernel.stateStore(), _kernel.reachability()},
+                                     kNetworkModules};
 };
 #endif
 

@@ -7,6 +7,10 @@
 
 namespace welcomer {
 
+// The folder of the modules on NetworkManager. A process with mounts of its own does not always find it by
+// where its program is: in a chroot that is the path outside.
+inline constexpr char kNetworkModules[] = WELCOMER_NETWORK_MODULES;
+
 // Takes over this process's network and mounts, which must be its own (enterNetworkNamespace,
 // enterMountNamespace): /run, /sys and NetworkManager's folder below /var/lib are fresh, and a system bus
 // runs. NetworkManager manages every link but those whose names begin with "p-", makes no profiles by itself,

@@ -35,7 +35,7 @@ class NetworkSpace:
 
     def command(self, *arguments):
         """The command line that runs a program inside."""
-        return ["nsenter", "-t", str(self.process), "-n", "-m", "-p", "--", *map(str, arguments)]
+        return ["nsenter", "-t", str(self.process), "-n", "-m", "-p", "-r", "--", *map(str, arguments)]
 
     def run(self, *arguments, **options):
         return subprocess.run(self.command(*arguments), capture_output=True, text=True, stdin=subprocess.DEVNULL,

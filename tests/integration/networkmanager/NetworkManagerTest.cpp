@@ -129,7 +129,7 @@ class NetworkManagerTest : public testing::Test {
     local::LocalNetworkConfigStore kernelStore{local::RootFolder(root.path())};
     local::LocalNetworkStateStore kernelStateStore{local::RootFolder(root.path())};
     local::LocalHostReachability kernelReachability;
-    desktop::DesktopNetwork network{{kernelStore, kernelStateStore, kernelReachability}};
+    desktop::DesktopNetwork network{{kernelStore, kernelStateStore, kernelReachability}, kNetworkModules};
     platform::NetworkConfigStore& store = network.configStore();
     platform::NetworkStateStore& stateStore = network.stateStore();
     platform::HostReachability& reachability = network.hostReachability();
