@@ -132,6 +132,11 @@ NeighbourNetwork::NeighbourNetwork() : _keeper(startProgram("unshare --net sleep
 }
 
 NeighbourNetwork::~NeighbourNetwork() {
+    for (pid_t process : _started) {
+        if (::waitpid(process, nullptr, WNOHANG) == 0) { // else it has been stopped, or has ended
+            stopProgram(process);
+        }
+    }
     stopProgram(_keeper);
 }
 
@@ -147,8 +152,8 @@ std::string NeighbourNetwork::shell(const std::string& text) const {
     return welcomer::shell(command("sh -c '" + text + "'"));
 }
 
-pid_t NeighbourNetwork::start(const std::string& text) const {
-    return startProgram(command(text));
+pid_t NeighbourNetwork::start(const std::string& text) {
+    return _started.emplace_back(startProgram(command(text)));
 }
 
 } // namespace welcomer

@@ -4,6 +4,7 @@
 
 #include <string>
 #include <sys/types.h>
+#include <vector>
 
 namespace welcomer {
 
@@ -51,12 +52,13 @@ class NeighbourNetwork {
     // Runs a shell command there; throws when it fails.
     std::string shell(const std::string& text) const;
 
-    // Starts a program there, which ends with this process or with the result of this, its process's ID,
-    // being given to stopProgram.
-    pid_t start(const std::string& text) const;
+    // Starts a program there, which ends with this object, or with the result of this, its process's ID,
+    // being given to stopProgram. A program that gives up rights would outlive this process.
+    pid_t start(const std::string& text);
 
   private:
     pid_t _keeper = -1;
+    std::vector<pid_t> _started;
 };
 
 // Starts a shell command that ends with this process.
