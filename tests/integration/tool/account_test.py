@@ -528,17 +528,21 @@ class SetupAtTerminal(SetupTest):
         self.assertEqual(os.waitstatus_to_exitcode(status), 1)
         self.assertIn("welcomer: cannot sign in anna: the password is wrong", rest)
 
+    def accept_everything(self):
+        """All aliases, all services, and the last yes; the setup then ends well."""
+        for _ in range(3):
+            self.answer(r"none \[all\]: ", "")
+        self.answer(r"\[Y/n\] ", "")
+        rest, status = self.end()
+        self.assertEqual(status, 0, rest)
+
     def test_a_mistyped_name_is_asked_for_again(self):
         self.start("setup")
         self.answer("account's name: ", "ana")
         self.answer_password("Password for ana: ", PASSWORD)
         self.answer("There is no user ana. Please try again.\r\nYour cloud account's name: ", "anna")
         self.answer_password("Password for anna: ", PASSWORD)
-        for _ in range(3):
-            self.answer(r"none \[all\]: ", "")
-        self.answer(r"\[Y/n\] ", "")
-        rest, status = self.end()
-        self.assertEqual(status, 0, rest)
+        self.accept_everything()
         self.assertEqual(self.json("account", "status")["loggedIn"], "anna")
 
     def test_no_alias_chosen_hands_none_over(self):
@@ -612,11 +616,7 @@ class SetupAtTerminal(SetupTest):
         self.start("--json", "setup", stdout=file)
         self.answer("account's name: ", "anna")
         self.answer_password("Password for anna: ", PASSWORD)
-        for _ in range(3):
-            self.answer(r"none \[all\]: ", "")
-        self.answer(r"\[Y/n\] ", "")
-        rest, status = self.end()
-        self.assertEqual(status, 0, rest)
+        self.accept_everything()
         self.assertEqual(json.loads(file.read_text())["account"], "anna")
 
     def test_a_new_users_password_is_asked_for_twice(self):
