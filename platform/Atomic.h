@@ -21,7 +21,8 @@ class Atomic {
         return _value;
     }
 
-    void set(Value value) {
+    void set(const Value& value) { set(Value(value)); }
+    void set(Value&& value) {
         const std::lock_guard lock(_mutex);
         _value = std::move(value);
     }

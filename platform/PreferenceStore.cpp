@@ -87,6 +87,15 @@ std::int64_t integerReading(const std::optional<PropertyList>& value) {
     return truncated(realIn(*text).value_or(0));
 }
 
+std::vector<std::optional<PropertyList>> PreferenceStore::copyValues(std::span<const std::string> keys,
+                                                                     const std::string& domain) {
+    std::vector<std::optional<PropertyList>> values;
+    for (const std::string& key : keys) {
+        values.push_back(copyValue(key, domain));
+    }
+    return values;
+}
+
 bool PreferenceStore::booleanDefault(const std::string& key) {
     return booleanReading(copyValue(key, kStandardDefaultsDomain));
 }

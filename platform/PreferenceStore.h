@@ -6,6 +6,7 @@
 
 #include <cstdint>
 #include <optional>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -42,6 +43,13 @@ class PreferenceStore {
 
     // A copy of the value, or none when the domain has no such key. Any thread; may read a file.
     virtual std::optional<PropertyList> copyValue(const std::string& key, const std::string& domain) = 0;
+
+    // Copies of several values as they are at one moment.
+    //  keys    distinct ones
+    //  result  one for each key, in their order; none where the domain has no such key
+    // Any thread; may read a file. Asks for one after the other where a store knows no better.
+    virtual std::vector<std::optional<PropertyList>> copyValues(std::span<const std::string> keys,
+                                                                const std::string& domain);
 
     // Sets or removes a value. Any thread; changes no file.
     virtual void setValue(const std::string& key, const PropertyList& value, const std::string& domain) = 0;

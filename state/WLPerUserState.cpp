@@ -201,14 +201,19 @@ bool WLPerUserState::writeToDefaults() {
 }
 
 void WLPerUserState::_loadFromDefaults() {
+    static const auto* const keys = new std::vector<std::string>(_keys());
+    platform::PreferenceStore& store = platform::current().preferenceStore;
     // A failure only means that others' changes may not be seen yet.
-    static_cast<void>(platform::current().preferenceStore.synchronise(domain()));
+    static_cast<void>(store.synchronise(domain()));
+    std::vector<std::optional<PropertyList>> values = store.copyValues(*keys, domain());
+    auto stored = values.begin();
     for (const Entry& entry : _entries()) {
         if (entry.text) {
-            _setText(entry.text, _stringForKey(entry.key));
+            _setText(entry.text, _stringForKey(std::move(*stored)));
         } else {
-            (this->*entry.flag).set(_boolForKey(entry.key));
+            (this->*entry.flag).set(_boolForKey(*stored));
         }
+        ++stored;
     }
 }
 
@@ -257,7 +262,15 @@ const std::vector<WLPerUserState::Entry>& WLPerUserState::_entries() {
     return *entries;
 }
 
-void WLPerUserState::_setText(Text WLPerUserState::*property, std::optional<PropertyList> value) {
+std::vector<std::string> WLPerUserState::_keys() {
+    std::vector<std::string> keys;
+    for (const Entry& entry : _entries()) {
+        keys.push_back(entry.key);
+    }
+    return keys;
+}
+
+void WLPerUserState::_setText(Text WLPerUserState::*property, std::optional<PropertyList>&& value) {
     if (property == &WLPerUserState::_previousSystemVersion) {
         change(kPreviousSystemVersionProperty, [&] { _previousSystemVersion.set(std::move(value)); });
     } else {
@@ -272,17 +285,12 @@ std::vector<std::string> WLPerUserState::keysAffecting(std::string_view derivedK
     return {};
 }
 
-std::optional<PropertyList> WLPerUserState::_stringForKey(const std::string& key) {
-    std::optional<PropertyList> value = platform::current().preferenceStore.copyValue(key, domain());
-    if (value && !value->isString()) {
-        value.reset();
-    }
-    return value;
+std::optional<PropertyList> WLPerUserState::_stringForKey(std::optional<PropertyList>&& stored) {
+    return stored && stored->isString() ? std::move(stored) : std::nullopt;
 }
 
-bool WLPerUserState::_boolForKey(const std::string& key) {
-    const auto value = platform::current().preferenceStore.copyValue(key, domain());
-    return value && value->boolean().value_or(false);
+bool WLPerUserState::_boolForKey(const std::optional<PropertyList>& stored) {
+    return stored && stored->boolean().value_or(false);
 }
 
 void WLPerUserState::_setStringForKey(const std::optional<PropertyList>& string, const std::string& key) {

@@ -129,15 +129,17 @@ class WLPerUserState final : public platform::Observable {
         bool isTakenFromDictionary;
     };
     static const std::vector<Entry>& _entries(); // in canonical order
+    static std::vector<std::string> _keys();     // theirs
 
     // Every change of a text goes through here.
-    void _setText(Text WLPerUserState::*property, std::optional<PropertyList> value);
+    void _setText(Text WLPerUserState::*property, std::optional<PropertyList>&& value);
 
     std::vector<std::string> keysAffecting(std::string_view derivedKey) const override;
 
     // The store.
-    static std::optional<PropertyList> _stringForKey(const std::string& key); // a string or none
-    static bool _boolForKey(const std::string& key);
+    // What is stored for a key as its property takes it: a string or none, a boolean or false.
+    static std::optional<PropertyList> _stringForKey(std::optional<PropertyList>&& stored);
+    static bool _boolForKey(const std::optional<PropertyList>& stored);
     static void _setStringForKey(const std::optional<PropertyList>& string, const std::string& key);
     static void _setBoolForKey(bool flag, const std::string& key);
 

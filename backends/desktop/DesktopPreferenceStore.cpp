@@ -2,15 +2,27 @@
 
 namespace welcomer::desktop {
 
+namespace {
+
+constexpr char kScreenSaverDomain[] = "com.corvid.screensaver";
+
+} // namespace
+
 std::optional<PropertyList> DesktopPreferenceStore::copyValue(const std::string& key,
                                                               const std::string& domain) {
-    if (key == "askForPassword" && domain == "com.corvid.screensaver") {
+    if (key == "askForPassword" && domain == kScreenSaverDomain) {
         ScreenLock* const screenLock = _module.service();
         if (const std::optional<bool> asks = screenLock ? screenLock->asksForPassword() : std::nullopt) {
             return PropertyList(*asks);
         }
     }
     return _local.copyValue(key, domain);
+}
+
+std::vector<std::optional<PropertyList>> DesktopPreferenceStore::copyValues(std::span<const std::string> keys,
+                                                                            const std::string& domain) {
+    return domain == kScreenSaverDomain ? PreferenceStore::copyValues(keys, domain)
+                                        : _local.copyValues(keys, domain);
 }
 
 void DesktopPreferenceStore::setValue(const std::string& key, const PropertyList& value,

@@ -17,6 +17,8 @@ class DesktopPreferenceStore final : public platform::PreferenceStore {
     explicit DesktopPreferenceStore(platform::PreferenceStore& local) : _local(local) {}
 
     std::optional<PropertyList> copyValue(const std::string& key, const std::string& domain) override;
+    std::vector<std::optional<PropertyList>> copyValues(std::span<const std::string> keys,
+                                                        const std::string& domain) override;
     void setValue(const std::string& key, const PropertyList& value, const std::string& domain) override;
     void removeValue(const std::string& key, const std::string& domain) override;
     bool synchronise(const std::string& domain) override;

@@ -44,6 +44,29 @@ std::optional<PropertyList> LocalPreferenceStore::copyValue(const std::string& k
     return std::nullopt;
 }
 
+std::vector<std::optional<PropertyList>> LocalPreferenceStore::copyValues(std::span<const std::string> keys,
+                                                                          const std::string& domain) {
+    std::vector<std::optional<PropertyList>> values(keys.size());
+    const std::lock_guard lock(_mutex);
+    Domain& used = _use(domain);
+    if (!used.isLoaded) {
+        _load(domain, used);
+    }
+    // One walk past everything, which is little next to having read it, beats a search for each key.
+    const auto take = [&](const std::string& key, const auto& value) {
+        if (const auto found = std::ranges::find(keys, key); found != keys.end()) {
+            values[static_cast<std::size_t>(found - keys.begin())] = value;
+        }
+    };
+    for (const auto& [key, value] : used.onDisk.values) {
+        take(key, value);
+    }
+    for (const auto& [key, value] : used.changes) {
+        take(key, value);
+    }
+    return values;
+}
+
 void LocalPreferenceStore::setValue(const std::string& key, const PropertyList& value,
                                     const std::string& domain) {
     const std::lock_guard lock(_mutex);
@@ -128,7 +151,7 @@ bool LocalPreferenceStore::_storeChanges(const std::string& name, Domain& domain
         if (!bytes) {
             return false;
         }
-        domain.onDisk = {State::Whole, std::move(merged), std::move(*bytes), {}};
+        domain.onDisk = {State::Whole, std::move(merged), std::move(*bytes), {}, {}};
     }
     domain.changes.clear();
     domain.isLoaded = true;

@@ -10,6 +10,7 @@
 #include <map>
 #include <mutex>
 #include <optional>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -30,6 +31,8 @@ class LocalPreferenceStore final : public platform::PreferenceStore {
     LocalPreferenceStore(RootFolder root, platform::ProcessIdentity& identity);
 
     std::optional<PropertyList> copyValue(const std::string& key, const std::string& domain) override;
+    std::vector<std::optional<PropertyList>> copyValues(std::span<const std::string> keys,
+                                                        const std::string& domain) override;
     void setValue(const std::string& key, const PropertyList& value, const std::string& domain) override;
     void removeValue(const std::string& key, const std::string& domain) override;
     bool synchronise(const std::string& domain) override;

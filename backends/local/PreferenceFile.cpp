@@ -32,19 +32,22 @@ std::string damagedName(const std::string& name, int number) {
     return name + kDamagedSuffix + (number == 1 ? std::string() : "-" + std::to_string(number));
 }
 
-PreferenceFileContent parse(std::string bytes) {
-    if (bytes.empty()) {
-        return {};
+// Takes the content from its bytes.
+void parse(PreferenceFileContent& content) {
+    content.state = State::Whole;
+    content.values.clear();
+    content.reason.clear();
+    if (content.bytes.empty()) {
+        return;
     }
-    PropertyListReadResult result = readPropertyList(bytes);
-    if (!result) {
-        return {State::Damaged, {}, std::move(bytes), std::move(result.error)};
+    PropertyListReadResult result = readPropertyList(content.bytes);
+    PropertyList::Dictionary* values = result ? result.value->dictionary() : nullptr;
+    if (values) {
+        content.values = std::move(*values);
+    } else {
+        content.state = State::Damaged;
+        content.reason = result ? "a property list, but no dictionary" : std::move(result.error);
     }
-    PropertyList::Dictionary* values = result.value->dictionary();
-    if (!values) {
-        return {State::Damaged, {}, std::move(bytes), "a property list, but no dictionary"};
-    }
-    return {State::Whole, std::move(*values), std::move(bytes), {}};
 }
 
 } // namespace
@@ -56,17 +59,18 @@ PreferenceFileContent readPreferenceFile(const std::string& path) {
 }
 
 void rereadPreferenceFile(const std::string& path, PreferenceFileContent& content) {
-    std::string bytes;
+    std::string& bytes = content.otherBytes;
     const int error = readFile(path, bytes, kMaximumFileSize);
     if (error != 0 && error != ENOENT) {
-        content = {State::Unreadable, {}, {}, std::generic_category().message(error)};
+        content = {State::Unreadable, {}, {}, std::generic_category().message(error), {}};
         return;
     }
     if (error == ENOENT) {
         bytes.clear();
     }
     if (content.state == State::Unreadable || bytes != content.bytes) {
-        content = parse(std::move(bytes));
+        content.bytes.swap(bytes);
+        parse(content);
     }
 }
 

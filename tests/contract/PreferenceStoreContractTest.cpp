@@ -184,6 +184,29 @@ TYPED_TEST(PreferenceStoreContract, ValuesKeepTheirTypes) {
     }
 }
 
+TYPED_TEST(PreferenceStoreContract, SeveralValuesComeInTheOrderOfTheirKeys) {
+    this->backend.storeElsewhere("B", "text");
+    this->backend.storeElsewhere("A", true);
+    this->backend.storeElsewhere("Not asked for", 1);
+    const std::vector<std::string> keys = {"B", "Missing", "A"};
+    using Values = std::vector<std::optional<PropertyList>>;
+    EXPECT_EQ(this->store.copyValues(keys, kDomain), (Values{"text", std::nullopt, true}));
+    EXPECT_EQ(this->store.copyValues(keys, kOtherDomain), Values(keys.size()));
+    EXPECT_TRUE(this->store.copyValues({}, kDomain).empty());
+}
+
+TYPED_TEST(PreferenceStoreContract, ChangesAreSeenAtOnceAmongSeveralValuesToo) {
+    for (const char* key : {"Kept", "Set", "Removed"}) {
+        this->backend.storeElsewhere(key, "old");
+    }
+    this->store.setValue("Set", "new", kDomain);
+    this->store.removeValue("Removed", kDomain);
+    this->store.setValue("Added", 1, kDomain);
+    const std::vector<std::string> keys = {"Added", "Kept", "Removed", "Set"};
+    using Values = std::vector<std::optional<PropertyList>>;
+    EXPECT_EQ(this->store.copyValues(keys, kDomain), (Values{1, "old", std::nullopt, "new"}));
+}
+
 TYPED_TEST(PreferenceStoreContract, NothingIsDamagedToBeginWith) {
     EXPECT_TRUE(this->store.synchronise(kDomain));
     EXPECT_TRUE(this->store.damagedPreferences().empty());

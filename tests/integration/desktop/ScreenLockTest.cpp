@@ -65,4 +65,15 @@ TEST_F(ScreenLockTest, OtherKeysAndDomainsAreTheLocalStores) {
     EXPECT_EQ(preferences.copyValue("askForPassword", "com.corvid.other"), PropertyList("theirs"));
 }
 
+TEST_F(ScreenLockTest, TheSettingIsTheAnswerAmongSeveralValuesToo) {
+    setTo("true");
+    local.store(kDomain, "askForPassword", "stored");
+    local.store(kDomain, "another", "value");
+    local.store("com.corvid.other", "askForPassword", "theirs");
+    const std::vector<std::string> keys = {"another", "askForPassword"};
+    using Values = std::vector<std::optional<PropertyList>>;
+    EXPECT_EQ(preferences.copyValues(keys, kDomain), (Values{"value", true}));
+    EXPECT_EQ(preferences.copyValues(keys, "com.corvid.other"), (Values{std::nullopt, "theirs"}));
+}
+
 } // namespace welcomer::desktop
