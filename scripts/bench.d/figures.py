@@ -55,16 +55,19 @@ def _number(value):
 
 def google_benchmark(program, name_filter, repetitions=9):
     """Median real times in nanoseconds by benchmark name, the benchmarks run in random turn."""
+    return {name: ours for name, (ours, _) in google_benchmark_pairs(program, name_filter, repetitions).items()}
+
+
+def google_benchmark_pairs(program, name_filter, repetitions=9):
+    """The same, each with the median of the peer that it takes turns with, or None where it has none."""
     result = subprocess.run(
         [program, f"--benchmark_filter={name_filter}", f"--benchmark_repetitions={repetitions}",
          "--benchmark_enable_random_interleaving=true", "--benchmark_min_time=0.05", "--benchmark_format=json"],
         check=True, capture_output=True, text=True)
     scale = {"ns": 1, "us": 1e3, "ms": 1e6, "s": 1e9}
-    times = {}
-    for run in json.loads(result.stdout)["benchmarks"]:
-        if run.get("run_type") == "aggregate" and run["aggregate_name"] == "median":
-            times[run["run_name"]] = run["real_time"] * scale[run["time_unit"]]
-    return times
+    return {run["run_name"].removesuffix("/manual_time"): (run["real_time"] * scale[run["time_unit"]], run.get("peer_ns"))
+            for run in json.loads(result.stdout)["benchmarks"]
+            if run.get("run_type") == "aggregate" and run["aggregate_name"] == "median"}
 
 
 def timed(command):

@@ -15,6 +15,8 @@ import sys
 import tempfile
 import time
 
+import figures
+
 ENVIRONMENTS = {"Nimbus1": "192.0.2.1", "Q1": "198.51.100.1"}
 
 # The same file operations as the command: look at the last domain's override, remove the folder, make it, write four.
@@ -35,12 +37,8 @@ done
 
 
 def record_medians(build, rounds):
-    output = subprocess.run([os.path.join(build, "bench/bench-state"), "--benchmark_format=json",
-                             f"--benchmark_repetitions={rounds}", "--benchmark_enable_random_interleaving=true",
-                             "--benchmark_min_time=0.05", "--benchmark_report_aggregates_only=true"],
-                            check=True, capture_output=True).stdout
-    return {each["run_name"].split("/")[0]: {"median_us": each["real_time"], "peer_us": each["peer_us"]}
-            for each in json.loads(output)["benchmarks"] if each["aggregate_name"] == "median"}
+    pairs = figures.google_benchmark_pairs(os.path.join(build, "bench/bench-state"), ".", rounds)
+    return {name: {"median_us": ours / 1e3, "peer_us": peer / 1e3} for name, (ours, peer) in pairs.items()}
 
 
 def switch_medians(build, rounds):

@@ -2,6 +2,7 @@
 
 #include "backends/Backends.h"
 #include "log/PCLogManager.h"
+#include "tests/bench/TurnAbout.h"
 
 #include <benchmark/benchmark.h>
 #include <string>
@@ -13,23 +14,17 @@ namespace {
 const std::string identifier = "com.corvid.storefront";
 constexpr double kSeconds = 0.125;
 
-void BM_Log_Welcomer(benchmark::State& state) {
+void logCall(benchmark::State& state) {
     const auto owner = buildPlatform();
     const platform::ScopedPlatform installed(owner->platform());
-    for (auto _ : state) {
-        WL_LOG("%@ setup: %@ (%0.3f seconds)", identifier, "completed", kSeconds);
-    }
+    measureTurnAbout(
+        state, [] {}, [] { WL_LOG("%@ setup: %@ (%0.3f seconds)", identifier, "completed", kSeconds); },
+        [] {
+            syslog((14 << 3) | LOG_ERR, "%s setup: %s (%0.3f seconds)", identifier.c_str(), "completed",
+                   kSeconds);
+        });
 }
-
-void BM_Log_Syslog(benchmark::State& state) {
-    for (auto _ : state) {
-        syslog((14 << 3) | LOG_ERR, "%s setup: %s (%0.3f seconds)", identifier.c_str(), "completed",
-               kSeconds);
-    }
-}
-
-BENCHMARK(BM_Log_Welcomer);
-BENCHMARK(BM_Log_Syslog);
+BENCHMARK(logCall)->UseManualTime();
 
 } // namespace
 } // namespace welcomer

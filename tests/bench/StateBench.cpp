@@ -4,11 +4,11 @@
 #include "backends/Backends.h"
 #include "propertylist/PropertyListReader.h"
 #include "state/WLPerUserState.h"
+#include "tests/bench/TurnAbout.h"
 
 #include <benchmark/benchmark.h>
 
 #include <array>
-#include <chrono>
 #include <cstdlib>
 #include <fcntl.h>
 #include <filesystem>
@@ -76,36 +76,13 @@ class Fixture {
     std::string file;
 };
 
-template <class Action>
-double secondsOf(const Action& action) {
-    const auto start = std::chrono::steady_clock::now();
-    action();
-    return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
-}
-
-// Times an action turn about with its peer, so that a machine that slows down slows both: the benchmark's
-// time is the action's, the counter "peer_us" the peer's in microseconds. What comes before each of the two
-// is not timed.
-template <class Before, class Action, class Peer>
-void measure(benchmark::State& benchmarkState, const Before& before, const Action& action, const Peer& peer) {
-    double peerSeconds = 0;
-    for ([[maybe_unused]] auto _ : benchmarkState) {
-        before();
-        benchmarkState.SetIterationTime(secondsOf(action));
-        before();
-        peerSeconds += secondsOf(peer);
-    }
-    benchmarkState.counters["peer_us"] =
-        benchmark::Counter(peerSeconds * 1e6, benchmark::Counter::kAvgIterations);
-}
-
 // The peer stores a file of that size durably, and no more.
 void writeToDefaults(benchmark::State& benchmarkState) {
     Fixture fixture;
     const std::string content(std::filesystem::file_size(fixture.file), 'x');
     const std::string path = fixture.root / "peer";
     int round = 0;
-    measure(
+    measureTurnAbout(
         benchmarkState, [&] { fixture.fill(++round); }, // else there would be nothing to write
         [&] {
             if (!fixture.state->writeToDefaults()) {
@@ -139,7 +116,7 @@ PropertyListReadResult readPlainly(const std::string& path) {
 
 template <class Before>
 void measureLoading(benchmark::State& benchmarkState, Fixture& fixture, const Before& before) {
-    measure(
+    measureTurnAbout(
         benchmarkState, before, [&] { fixture.state->_loadFromDefaults(); },
         [&] {
             const PropertyListReadResult result = readPlainly(fixture.file);
