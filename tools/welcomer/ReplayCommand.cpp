@@ -97,15 +97,17 @@ void printAccess(std::ostream& out, const FoundItem& found) {
 void show(Session& session) {
     PropertyList replayObject;
     std::string account;
-    if (!WLGetNimbusReplayKeychainItem(&replayObject, &account)) {
+    // For people the account's name comes with the rest of what is found.
+    if (!WLGetNimbusReplayKeychainItem(&replayObject, session.options.json ? &account : nullptr)) {
         throw CommandFailure("cannot read the replay item: " + replayReason(session.log));
     }
     if (session.options.json) {
         printJson(session.out, {{"account", account}, {"replay", toJson(replayObject)}});
         return;
     }
-    session.out << "Account:   " << printable(account) << '\n';
-    printAccess(session.out, findItem());
+    const FoundItem found = findItem();
+    session.out << "Account:   " << printable(found.item.label) << '\n';
+    printAccess(session.out, found);
     session.out << "Replay object:\n";
     printOutline(session.out, replayObject, "  ");
 }
