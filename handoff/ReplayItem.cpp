@@ -11,6 +11,28 @@ namespace welcomer {
 
 namespace {
 
+using Reference = std::unique_ptr<platform::CredentialItemReference>;
+
+// The replay item, or null; takes its data.
+Reference findReplayItem(std::string& data) {
+    Reference reference;
+    const std::int32_t status = platform::current().credentialStore.findItem(
+        kReplayItemService, kReplayItemAccount, &data, &reference);
+    if (status != platform::kCredentialSuccess) {
+        WL_LOG("Failed to find replay keychain item: %d", status);
+        return nullptr;
+    }
+    return reference;
+}
+
+bool readItemAttributes(const platform::CredentialItemReference& reference, platform::CredentialItem& item) {
+    if (platform::current().credentialStore.readAttributes(reference, item) != platform::kCredentialSuccess) {
+        WL_LOG("Failed to get account name attribute");
+        return false;
+    }
+    return true;
+}
+
 // Writes to `object` on success only.
 bool deserializeReplayObject(const std::string& data, PropertyList& object) {
     PropertyListReadResult read = readPropertyList(data);
@@ -25,32 +47,37 @@ bool deserializeReplayObject(const std::string& data, PropertyList& object) {
 } // namespace
 
 bool WLGetNimbusReplayKeychainItem(PropertyList* replayObject, std::string* accountName) {
-    platform::CredentialStore& store = platform::current().credentialStore;
     std::string data;
-    std::unique_ptr<platform::CredentialItemReference> reference;
-    const std::int32_t status = store.findItem(kReplayItemService, kReplayItemAccount, &data, &reference);
-    if (status != platform::kCredentialSuccess) {
-        WL_LOG("Failed to find replay keychain item: %d", status);
+    const Reference reference = findReplayItem(data);
+    if (!reference || (replayObject && !deserializeReplayObject(data, *replayObject))) {
         return false;
-    }
-    if (replayObject && !deserializeReplayObject(data, *replayObject)) {
-        return false;
-    }
-    if (!accountName) {
-        return true;
     }
     platform::CredentialItem item;
-    if (store.readAttributes(*reference, item) != platform::kCredentialSuccess) {
-        WL_LOG("Failed to get account name attribute");
+    if (accountName && !readItemAttributes(*reference, item)) {
         return false;
     }
-    *accountName = std::move(item.label);
+    if (accountName) {
+        *accountName = std::move(item.label);
+    }
+    return true;
+}
+
+bool readReplayItem(ReplayItem& found) {
+    std::string data;
+    const Reference reference = findReplayItem(data);
+    ReplayItem read;
+    if (!reference || !deserializeReplayObject(data, read.replayObject) ||
+        !readItemAttributes(*reference, read.item)) {
+        return false;
+    }
+    read.store = reference->store();
+    found = std::move(read);
     return true;
 }
 
 bool WLDeleteNimbusReplayKeychainItem() {
     platform::CredentialStore& store = platform::current().credentialStore;
-    std::unique_ptr<platform::CredentialItemReference> reference;
+    Reference reference;
     std::int32_t status = store.findItem(kReplayItemService, kReplayItemAccount, nullptr, &reference);
     if (status == platform::kCredentialSuccess) {
         status = store.deleteItem(*reference);

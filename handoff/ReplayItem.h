@@ -3,6 +3,7 @@
 
 #pragma once
 
+#include "platform/CredentialStore.h"
 #include "propertylist/PropertyList.h"
 
 #include <string>
@@ -29,6 +30,19 @@ inline constexpr const char* kReplayChatterAliasesKey = "imAliases";
 //  result        whether everything that was asked for was read; else one log line says why
 // The agent calls this on its main thread; may block while another process changes the credential store.
 bool WLGetNimbusReplayKeychainItem(PropertyList* replayObject, std::string* accountName);
+
+// The replay item with all that there is to say of it.
+struct ReplayItem {
+    PropertyList replayObject;
+    platform::CredentialItem item; // its label is the cloud account name
+    platform::CredentialStoreDescription store;
+};
+
+// Reads all of it at once.
+//  found   written on success only
+//  result  as of the reader above
+// Any thread; may block while another process changes the credential store.
+bool readReplayItem(ReplayItem& found);
 
 // Deletes the replay item.
 //  result  whether it was there and is gone now; else one log line with the credential store's status

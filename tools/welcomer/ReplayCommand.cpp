@@ -57,31 +57,8 @@ void store(Session& session, const StoreArguments& arguments) {
     }
 }
 
-struct FoundItem {
-    platform::CredentialStoreDescription store;
-    platform::CredentialItem item;
-};
-
-// What the reader does not give: where the item lies, and its access.
-FoundItem findItem() {
-    platform::CredentialStore& credentialStore = platform::current().credentialStore;
-    std::unique_ptr<platform::CredentialItemReference> reference;
-    FoundItem found;
-    std::int32_t status =
-        credentialStore.findItem(kReplayItemService, kReplayItemAccount, nullptr, &reference);
-    if (status == platform::kCredentialSuccess) {
-        found.store = reference->store();
-        status = credentialStore.readAttributes(*reference, found.item);
-    }
-    if (status != platform::kCredentialSuccess) {
-        throw CommandFailure("cannot read the replay item's access: " +
-                             platform::credentialStatusText(status));
-    }
-    return found;
-}
-
 // No store enforces an item's access: each says who can read the item in truth.
-void printAccess(std::ostream& out, const FoundItem& found) {
+void printAccess(std::ostream& out, const ReplayItem& found) {
     out << "Stored in: " << found.store.name << '\n';
     const std::optional<platform::CredentialAccess>& access = found.item.access;
     out << "Access:    " << (access ? printable(access->description) : "the store's default") << '\n';
@@ -95,21 +72,19 @@ void printAccess(std::ostream& out, const FoundItem& found) {
 }
 
 void show(Session& session) {
-    PropertyList replayObject;
-    std::string account;
-    // For people the account's name comes with the rest of what is found.
-    if (!WLGetNimbusReplayKeychainItem(&replayObject, session.options.json ? &account : nullptr)) {
+    ReplayItem found;
+    if (!readReplayItem(found)) {
         throw CommandFailure("cannot read the replay item: " + replayReason(session.log));
     }
+    const std::string& account = found.item.label;
     if (session.options.json) {
-        printJson(session.out, {{"account", account}, {"replay", toJson(replayObject)}});
+        printJson(session.out, {{"account", account}, {"replay", toJson(found.replayObject)}});
         return;
     }
-    const FoundItem found = findItem();
-    session.out << "Account:   " << printable(found.item.label) << '\n';
+    session.out << "Account:   " << printable(account) << '\n';
     printAccess(session.out, found);
     session.out << "Replay object:\n";
-    printOutline(session.out, replayObject, "  ");
+    printOutline(session.out, found.replayObject, "  ");
 }
 
 void remove(Session& session) {

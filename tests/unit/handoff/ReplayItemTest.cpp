@@ -126,6 +126,39 @@ TEST_F(ReplayItemTest, TheReaderLogsALabelThatCannotBeRead) {
     EXPECT_EQ(accountName, "untouched");
 }
 
+TEST_F(ReplayItemTest, AllOfTheItemIsReadWithOneLookIntoTheStore) {
+    const platform::CredentialAccess access{"for the agent", {{"/usr/libexec/wlnimbussetup"}}};
+    fake.credentialStore.put({kReplayItemService, kReplayItemAccount, "Zo\xC3\xAB", access},
+                             *writeXMLPropertyList(object));
+    ReplayItem found;
+    EXPECT_TRUE(readReplayItem(found));
+    EXPECT_EQ(found.replayObject, object);
+    EXPECT_EQ(found.item.label, "Zo\xC3\xAB");
+    EXPECT_EQ(found.item.access, access);
+    EXPECT_NE(found.store.name, "");
+    EXPECT_EQ(fake.recorder.calls(),
+              (Lines{"CredentialStore.findItem " + kKey, "CredentialStore.readAttributes " + kKey}));
+}
+
+TEST_F(ReplayItemTest, WhatKeepsTheReaderFromItsWorkKeepsTheOtherOneToo) {
+    ReplayItem found;
+    found.item.label = "untouched";
+    EXPECT_FALSE(readReplayItem(found));
+    put("no property list at all <<<");
+    EXPECT_FALSE(readReplayItem(found));
+    fake.credentialStore.put({kReplayItemService, kReplayItemAccount, "anna@example.com", std::nullopt},
+                             *writeXMLPropertyList(object));
+    fake.credentialStore.setStatus(Operation::ReadAttributes, platform::kCredentialReadFailed);
+    EXPECT_FALSE(readReplayItem(found));
+    EXPECT_EQ(found.item.label, "untouched");
+    EXPECT_EQ(found.replayObject, PropertyList());
+    const Lines lines = fake.systemLog.lines();
+    ASSERT_EQ(lines.size(), 3U);
+    EXPECT_EQ(lines[0], "Failed to find replay keychain item: 2");
+    EXPECT_TRUE(lines[1].starts_with("Failed to deserialize replayable data length: ")) << lines[1];
+    EXPECT_EQ(lines[2], "Failed to get account name attribute");
+}
+
 TEST_F(ReplayItemTest, TheReaderTakesAnObjectThatIsNoDictionary) {
     put(*writeXMLPropertyList(PropertyList::Array{1, "two"}));
     PropertyList replayObject;
