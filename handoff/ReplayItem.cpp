@@ -52,13 +52,14 @@ bool WLGetNimbusReplayKeychainItem(PropertyList* replayObject, std::string* acco
     if (!reference || (replayObject && !deserializeReplayObject(data, *replayObject))) {
         return false;
     }
+    if (!accountName) {
+        return true;
+    }
     platform::CredentialItem item;
-    if (accountName && !readItemAttributes(*reference, item)) {
+    if (!readItemAttributes(*reference, item)) {
         return false;
     }
-    if (accountName) {
-        *accountName = std::move(item.label);
-    }
+    *accountName = std::move(item.label);
     return true;
 }
 

@@ -44,10 +44,10 @@ class PreferenceStore {
     // A copy of the value, or none when the domain has no such key. Any thread; may read a file.
     virtual std::optional<PropertyList> copyValue(const std::string& key, const std::string& domain) = 0;
 
-    // Copies of several values as they are at one moment.
+    // Copies of several values; unless a store does better, one `copyValue` after the other.
     //  keys    distinct ones
     //  result  one for each key, in their order; none where the domain has no such key
-    // Any thread; may read a file. Asks for one after the other where a store knows no better.
+    // Any thread; may read a file.
     virtual std::vector<std::optional<PropertyList>> copyValues(std::span<const std::string> keys,
                                                                 const std::string& domain);
 

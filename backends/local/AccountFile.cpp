@@ -56,7 +56,7 @@ bool AccountFile::change(const std::function<bool(PropertyList::Dictionary& cont
     if (!bytes) {
         return false;
     }
-    _onDisk = {State::Whole, std::move(values), std::move(*bytes), {}, {}};
+    _onDisk = {State::Whole, std::move(values), std::move(*bytes), {}};
     return true;
 }
 

@@ -151,7 +151,7 @@ bool LocalPreferenceStore::_storeChanges(const std::string& name, Domain& domain
         if (!bytes) {
             return false;
         }
-        domain.onDisk = {State::Whole, std::move(merged), std::move(*bytes), {}, {}};
+        domain.onDisk = {State::Whole, std::move(merged), std::move(*bytes), {}};
     }
     domain.changes.clear();
     domain.isLoaded = true;

@@ -31,6 +31,7 @@ class LocalPreferenceStore final : public platform::PreferenceStore {
     LocalPreferenceStore(RootFolder root, platform::ProcessIdentity& identity);
 
     std::optional<PropertyList> copyValue(const std::string& key, const std::string& domain) override;
+    // As they are at one moment.
     std::vector<std::optional<PropertyList>> copyValues(std::span<const std::string> keys,
                                                         const std::string& domain) override;
     void setValue(const std::string& key, const PropertyList& value, const std::string& domain) override;

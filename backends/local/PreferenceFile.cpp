@@ -62,7 +62,7 @@ void rereadPreferenceFile(const std::string& path, PreferenceFileContent& conten
     std::string& bytes = content.otherBytes;
     const int error = readFile(path, bytes, kMaximumFileSize);
     if (error != 0 && error != ENOENT) {
-        content = {State::Unreadable, {}, {}, std::generic_category().message(error), {}};
+        content = {State::Unreadable, {}, {}, std::generic_category().message(error)};
         return;
     }
     if (error == ENOENT) {

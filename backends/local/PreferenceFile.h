@@ -22,7 +22,7 @@ struct PreferenceFileContent {
     PropertyList::Dictionary values; // empty unless whole
     std::string bytes;               // the file's own, unless unreadable
     std::string reason;              // one line, unless whole
-    std::string otherBytes;          // of no meaning; the memory for the next reading
+    std::string otherBytes{};        // of no meaning; the memory for the next reading
 };
 
 // Reads a domain's file, in any property-list format, without a lock.

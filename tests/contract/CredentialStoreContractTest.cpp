@@ -1,3 +1,5 @@
+// The credential stores of this machine and of the tests; what each of them keeps is asserted in the header.
+
 #include "tests/contract/CredentialStoreContract.h"
 
 #include "backends/local/LocalCredentialStore.h"
