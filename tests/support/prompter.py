@@ -67,7 +67,9 @@ class Exchange:
 
     def send(self, received, password):
         theirs = next(line.split("=", 1)[1] for line in received.splitlines() if line.startswith("public="))
-        shared = pow(int.from_bytes(base64.b64decode(theirs), "big"), self._private, PRIME).to_bytes(SIZE, "big")
+        shared = pow(int.from_bytes(base64.b64decode(theirs), "big"), self._private, PRIME)
+        # The keyring derives the key from the number's own bytes, and one number in 256 is a byte shorter.
+        shared = shared.to_bytes((shared.bit_length() + 7) // 8, "big")
         derived = hmac.new(bytes(32), shared, hashlib.sha256).digest()
         key = hmac.new(derived, b"\x01", hashlib.sha256).digest()[:16]
         vector = os.urandom(16)
