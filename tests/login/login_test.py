@@ -95,7 +95,7 @@ class Story:
         printed = self.folder / f"{name}.out"
         with open(printed, "wb") as output:
             self.start(login, "/usr/bin/python3", "-B", f"/tmp/{name}", *arguments, stdout=output)
-        self.machine.wait_for(lambda: "ready\n" in printed.read_text(), name, seconds=60)
+        self.machine.wait_for(lambda: "ready\n" in printed.read_text(), name)
         return printed
 
     def start_keyring(self, login, unlocked=True):
@@ -108,7 +108,7 @@ class Story:
         locked = ["gdbus", "call", "--session", "-d", SECRETS, "-o", "/org/freedesktop/secrets/collection/login", "-m",
                   "org.freedesktop.DBus.Properties.Get", "org.freedesktop.Secret.Collection", "Locked"]
         self.wait_for_name(login, SECRETS)
-        self.machine.wait_for(lambda: f"<{str(not unlocked).lower()}>" in login.run(locked).stdout, "the keyring", 60)
+        self.machine.wait_for(lambda: f"<{str(not unlocked).lower()}>" in login.run(locked).stdout, "the keyring")
 
     def start_online_accounts(self, login):
         self.start(login, "/usr/libexec/goa-daemon")
@@ -118,7 +118,7 @@ class Story:
         # Asked of the bus itself, which starts nobody for it.
         asked = ["gdbus", "call", "--session", "-d", "org.freedesktop.DBus", "-o", "/", "-m",
                  "org.freedesktop.DBus.NameHasOwner", name]
-        self.machine.wait_for(lambda: "true" in login.run(asked).stdout, name, seconds=60)
+        self.machine.wait_for(lambda: "true" in login.run(asked).stdout, name)
 
     def end_daemons(self):
         for daemon in reversed(self.daemons):
@@ -277,7 +277,7 @@ class BusDies(Story):
     delays = {"com.corvid.chatter": 8, "com.corvid.deskmate": 8}
 
     def meanwhile(self, login):
-        self.machine.wait_for(lambda: "setting up com.corvid.deskmate" in self.texts(), "the plug-ins' start", 60)
+        self.machine.wait_for(lambda: "setting up com.corvid.deskmate" in self.texts(), "the plug-ins' start")
         process = login.systemctl("show", "dbus.service", "--property=MainPID", "--value").stdout.strip()
         bus = self.machine.root / "proc" / process
         self.bus_ran = bus.exists()

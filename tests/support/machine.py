@@ -137,7 +137,7 @@ class Machine:
                               timeout=timeout, capture_output=True, text=True, check=False, **options)
 
     @staticmethod
-    def wait_for(condition, what, seconds=20):
+    def wait_for(condition, what, seconds=60):
         end = time.monotonic() + seconds
         while not condition():
             if time.monotonic() > end:
@@ -148,7 +148,7 @@ class Machine:
         for daemon in self._daemons:
             daemon.terminate()
         for daemon in self._daemons:
-            daemon.wait(timeout=20)
+            daemon.wait(timeout=60)
         self._daemons.clear()
         self._unmount()
 

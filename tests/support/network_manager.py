@@ -80,4 +80,4 @@ class NetworkManager:
     def stop(self):
         for daemon in reversed(self._daemons):
             daemon.send_signal(signal.SIGTERM)
-            daemon.wait(timeout=20)
+            daemon.wait(timeout=60)

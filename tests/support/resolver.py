@@ -82,7 +82,7 @@ class ResolverMachine(machine.Machine):
     def stop_resolver(self):
         self._daemons.remove(self.resolved)
         self.resolved.terminate()
-        self.resolved.wait(timeout=20)
+        self.resolved.wait(timeout=60)
 
     def resolvectl(self, *arguments):
         done = self.run([f"{RESOLVED}/usr/bin/resolvectl", *arguments])

@@ -62,7 +62,7 @@ class InstalledTool(unittest.TestCase):
         self.start("/usr/libexec/goa-daemon")
         for name in ("org.freedesktop.secrets", NAME):
             self.machine.wait_for(lambda: "true" in self.call("org.freedesktop.DBus", "/", "org.freedesktop.DBus."
-                                                              "NameHasOwner", name), name, seconds=60)
+                                                              "NameHasOwner", name), name)
 
     def call(self, name, path, method, *arguments):
         done = self.machine.run([*SESSION, "gdbus", "call", "--session", "-d", name, "-o", path, "-m", method,

@@ -137,7 +137,7 @@ class InstalledAgent(unittest.TestCase):
     def test_the_preference_process_is_ended_and_no_other(self):
         for login in self.logins:
             with self.subTest(login.name):
-                self.assertEqual(login.preferences.wait(timeout=20), -signal.SIGKILL)
+                self.assertEqual(login.preferences.wait(timeout=60), -signal.SIGKILL)
                 self.assertIsNone(login.neighbour.poll(), "its name only begins like the other's")
 
     def test_the_replay_item_is_gone(self):
@@ -149,7 +149,7 @@ class InstalledAgent(unittest.TestCase):
     def test_a_second_login_ends_at_once(self):
         login = self.login("none")
         before = len(login.machine.log_records("wlnimbussetup"))
-        again = login.machine.run(login.program, user=True, timeout=30)
+        again = login.machine.run(login.program, user=True, timeout=60)
         self.assertEqual((again.returncode, again.stdout, again.stderr), (0, "", ""))
         texts = [text for _, _, text in login.records_up_to("exiting", before)]
         self.assertEqual(texts[0], "Self destructing...")

@@ -50,7 +50,7 @@ class ResolverSync(unittest.TestCase):
 
     def end_service(self):
         self.service.terminate()
-        self.assertEqual(self.service.wait(timeout=20), 0)
+        self.assertEqual(self.service.wait(timeout=60), 0)
         self.service = None
 
     def write(self, name, text):
@@ -122,7 +122,7 @@ class ResolverSync(unittest.TestCase):
         self.machine.start_resolver()
         self.machine.wait_for(lambda: self.diagnosis() == works, "the running resolver")
         self.service.kill()
-        self.service.wait(timeout=20)
+        self.service.wait(timeout=60)
         self.assertEqual(self.diagnosis(), idle)
         self.start_service()
         self.machine.wait_for(lambda: self.diagnosis() == works, "the next service")
@@ -202,7 +202,7 @@ class ResolverSync(unittest.TestCase):
         self.start_service()
         self.wait_for_answer("probe.nimbus.example", resolver.ANSWERS["Nimbus1"])
         self.service.kill()
-        self.service.wait(timeout=20)
+        self.service.wait(timeout=60)
         # The service manager ends what is left of a service's processes before it starts it anew.
         for process in self.forwarders():
             os.kill(process, signal.SIGKILL)

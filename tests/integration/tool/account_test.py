@@ -285,7 +285,7 @@ class Services(CloudTest):
             if "Documents" in line or "documents" in line:
                 break
         process.send_signal(signal.SIGINT)
-        self.assertEqual(process.wait(timeout=30), -signal.SIGINT)
+        self.assertEqual(process.wait(timeout=60), -signal.SIGINT)
         process.stderr.close()
         self.assertNotIn("calendars", self.enabled())
 
@@ -593,7 +593,7 @@ class SetupAtTerminal(SetupTest):
         self.expect("Password for anna: ")
         self.assertFalse(termios.tcgetattr(self.terminal)[3] & termios.ECHO)
         os.write(self.terminal, b"\x03")
-        deadline = time.monotonic() + 30
+        deadline = time.monotonic() + 60
         while not termios.tcgetattr(self.terminal)[3] & termios.ECHO:
             self.assertLess(time.monotonic(), deadline)
             time.sleep(0.01)

@@ -491,7 +491,7 @@ class Try(ToolTest):
             if "Lingering for two minutes" in line:
                 break
         process.send_signal(signal.SIGTERM)
-        self.assertEqual(process.wait(timeout=30), -signal.SIGTERM)
+        self.assertEqual(process.wait(timeout=60), -signal.SIGTERM)
         process.communicate()
         self.assertEqual(list(self.temporary.iterdir()), [])
 
@@ -503,7 +503,7 @@ class Try(ToolTest):
                 break
         agent = int(Path(f"/proc/{process.pid}/task/{process.pid}/children").read_text())
         process.kill()
-        process.communicate(timeout=30)  # ends when the agent, which holds stderr, has ended too
+        process.communicate(timeout=60)  # ends when the agent, which holds stderr, has ended too
         self.assertFalse(Path(f"/proc/{agent}/exe").exists())
 
     def test_a_reader_that_goes_away_leaves_nothing_behind(self):
