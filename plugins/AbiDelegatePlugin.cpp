@@ -40,6 +40,8 @@ void throwIfRaised(const ErrorSlot& slot) {
     }
 }
 
+// An operation that the plug-in leaves null and that is asked for all the same is its failure, as if it had
+// raised.
 template <class Function>
 void throwIfMissing(Function* function, const char* operation) {
     if (!function) {

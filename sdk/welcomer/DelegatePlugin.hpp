@@ -234,7 +234,7 @@ class WLFirstRunDelegateConfiguration {
     virtual void terminateSetupCompletion() {}
 
     // For the video-calling and the messaging delegate, which are called here and not above: the same with
-    // the aliases that the user chose.
+    // the aliases that the user chose. Raises where it is not overridden, which the host logs.
     virtual void
     completeSetupWithResponseChosenAliasesHandler(ValueView /*response*/,
                                                   const std::optional<std::vector<std::string>>& /*aliases*/,
@@ -242,7 +242,7 @@ class WLFirstRunDelegateConfiguration {
         throw std::logic_error("completeSetupWithResponse:chosenAliases:handler: is not implemented");
     }
 
-    // For these two as well: the aliases that the server offers in its response.
+    // For these two as well: the aliases that the server offers in its response. Raises as above.
     virtual std::optional<std::vector<std::string>> messagingAliasesFromResponse(ValueView /*response*/) {
         throw std::logic_error("messagingAliasesFromResponse: is not implemented");
     }

@@ -1,4 +1,4 @@
-// The account services of this machine and of the tests; what each of them keeps is asserted in the contract.
+// The account services of this machine and of the tests; what each of them keeps is asserted in the header.
 
 #include "tests/contract/AccountServiceContract.h"
 #include "tests/contract/LocalAccounts.h"

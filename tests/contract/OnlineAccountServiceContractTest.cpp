@@ -1,4 +1,5 @@
 // The account service on online accounts in memory; tests/integration/accounts has it on the real daemon.
+// What it keeps is asserted in the contract's header.
 
 #include "tests/contract/AccountServiceContract.h"
 #include "tests/contract/OnlineAccountBackend.h"

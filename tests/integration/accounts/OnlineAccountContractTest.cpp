@@ -1,4 +1,4 @@
-// The account service's contract, on the real daemon.
+// The account service's contract, whose header has the assertions, on the real daemon.
 
 #include "tests/contract/AccountServiceContract.h"
 #include "tests/integration/accounts/OnlineAccountSession.h"
