@@ -25,7 +25,6 @@ class KernelBackend final : public NetworkBackend {
     platform::NetworkStateStore& stateStore() override { return _stateStore; }
     platform::HostReachability& reachability() override { return _reachability; }
     void waitForDevice(const std::string&) override {}
-    void waitForOutput(const std::string&, const std::string&) override {}
 
   private:
     local::LocalNetworkConfigStore _configStore;
@@ -51,9 +50,6 @@ class NetworkManagerBackend final : public NetworkBackend {
     platform::NetworkStateStore& stateStore() override { return _network.stateStore(); }
     platform::HostReachability& reachability() override { return _network.hostReachability(); }
     void waitForDevice(const std::string& device) override { waitForManaged(device); }
-    void waitForOutput(const std::string& command, const std::string& expected) override {
-        waitFor("test \"$(" + command + ")\" = \"$(printf %s '" + expected + "')\"");
-    }
 
   private:
     KernelBackend _kernel;

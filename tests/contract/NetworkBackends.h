@@ -24,10 +24,6 @@ class NetworkBackend {
 
     // Returns once the backend has noticed a device that has just been made.
     virtual void waitForDevice(const std::string& device) = 0;
-
-    // Returns once a shell command prints what is expected, where the backend says that it has applied
-    // something a moment before the kernel has all of it; elsewhere at once. Throws when that does not come.
-    virtual void waitForOutput(const std::string& command, const std::string& expected) = 0;
 };
 
 // Makes a backend on a root folder, in this process's own network namespace; may take over its mounts.
