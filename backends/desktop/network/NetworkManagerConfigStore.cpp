@@ -1,6 +1,6 @@
 #include "backends/desktop/network/NetworkManagerConfigStore.h"
 
-#include "backends/desktop/network/NetworkManagerServices.h"
+#include "backends/desktop/network/NetworkManagerActivation.h"
 
 #include <algorithm>
 #include <set>

@@ -1,5 +1,7 @@
 #include "backends/desktop/network/NetworkManagerServices.h"
 
+#include "backends/desktop/network/NetworkManagerDevices.h"
+
 #include <algorithm>
 #include <array>
 #include <iterator>
@@ -14,22 +16,7 @@ namespace {
 
 using platform::kNetworkConfigSuccess;
 
-constexpr std::chrono::milliseconds kActivationLimit{90'000};
 constexpr guint32 kToDisk = 1; // the same bit for adding and for updating
-
-std::string orEmpty(const char* text) {
-    return text ? text : "";
-}
-
-// The elements of one of the client library's lists.
-template <class T>
-std::vector<T*> elements(const GPtrArray* list) {
-    std::vector<T*> found;
-    for (guint index = 0; list && index < list->len; ++index) {
-        found.push_back(static_cast<T*>(g_ptr_array_index(list, index)));
-    }
-    return found;
-}
 
 // Reading
 
@@ -57,19 +44,6 @@ bool isService(NMRemoteConnection* remote) {
            orEmpty(nm_setting_connection_get_connection_type(setting)) != "loopback";
 }
 
-bool isRunning(NMDevice* device) {
-    const NMDeviceState state = nm_device_get_state(device);
-    return state >= NM_DEVICE_STATE_PREPARE && state <= NM_DEVICE_STATE_ACTIVATED;
-}
-
-// The profile that a device runs; empty when there is none.
-std::string runningProfile(NMDevice* device) {
-    NMActiveConnection* const active =
-        device && isRunning(device) ? nm_device_get_active_connection(device) : nullptr;
-    return active ? orEmpty(nm_active_connection_get_uuid(active)) : "";
-}
-
-// What all profiles are compared with.
 struct Devices {
     explicit Devices(NMClient* client) : managed(elements<NMDevice>(nm_client_get_devices(client))) {
         for (NMDevice* const device : managed) {
@@ -273,101 +247,6 @@ void putBack(const NetworkManagerBus& bus, const Draft& draft) {
     }
 }
 
-// Applying
-
-using AddressList = std::vector<std::pair<std::string, unsigned>>;
-
-AddressList addressesOf(NMDevice* device) {
-    AddressList addresses;
-    NMIPConfig* const configuration = nm_device_get_ip4_config(device);
-    for (auto* const each :
-         elements<NMIPAddress>(configuration ? nm_ip_config_get_addresses(configuration) : nullptr)) {
-        addresses.emplace_back(nm_ip_address_get_address(each), nm_ip_address_get_prefix(each));
-    }
-    return addresses;
-}
-
-std::string routerOf(NMDevice* device) {
-    NMIPConfig* const configuration = nm_device_get_ip4_config(device);
-    return configuration ? orEmpty(nm_ip_config_get_gateway(configuration)) : "";
-}
-
-bool hasLease(NMDevice* device) {
-    NMDhcpConfig* const lease = nm_device_get_dhcp4_config(device);
-    return lease && nm_dhcp_config_get_one_option(lease, "ip_address");
-}
-
-// Whether a device has what a plan asks for.
-bool has(NMDevice* device, const IPv4Plan& plan) {
-    AddressList addresses = addressesOf(device);
-    AddressList wanted = plan.addresses;
-    std::ranges::sort(addresses);
-    std::ranges::sort(wanted);
-    switch (plan.method) {
-    case IPv4Plan::Method::Manual:
-        return addresses == wanted && routerOf(device) == plan.router;
-    case IPv4Plan::Method::Automatic:
-        return wanted.empty() ? hasLease(device) : std::ranges::includes(addresses, wanted);
-    case IPv4Plan::Method::LinkLocal:
-        return std::ranges::any_of(addresses,
-                                   [](const auto& each) { return each.first.starts_with("169.254."); });
-    default:
-        return true;
-    }
-}
-
-// The answer to reapplying a profile that the device runs: NetworkManager gives it before it is done.
-std::int32_t reapply(NetworkManagerClient& client, NMDevice* device, const std::string& name,
-                     const IPv4Plan& plan) {
-    const NetworkManagerReply reply = client.bus().call(
-        nm_object_get_path(NM_OBJECT(device)), NM_DBUS_INTERFACE_DEVICE, "Reapply",
-        g_variant_new("(@a{sa{sv}}tu)", g_variant_new_array(G_VARIANT_TYPE("{sa{sv}}"), nullptr, 0),
-                      guint64{0}, guint32{0}));
-    if (!reply) {
-        return reply.status(platform::kNetworkConfigNotActivated);
-    }
-    bool isGone = false;
-    const bool isDone = client.waitUntil(
-        [&] {
-            NMDevice* const now = nm_client_get_device_by_iface(client.get(), name.c_str());
-            isGone = !now || !isRunning(now);
-            return isGone || (nm_device_get_state(now) == NM_DEVICE_STATE_ACTIVATED && has(now, plan));
-        },
-        kActivationLimit);
-    return isDone && !isGone ? kNetworkConfigSuccess : platform::kNetworkConfigNotActivated;
-}
-
-NMActiveConnection* activeAt(NMClient* client, const std::string& path) {
-    const auto all = elements<NMActiveConnection>(nm_client_get_active_connections(client));
-    const auto found = std::ranges::find_if(
-        all, [&](NMActiveConnection* each) { return path == nm_object_get_path(NM_OBJECT(each)); });
-    return found == all.end() ? nullptr : *found;
-}
-
-std::int32_t activate(NetworkManagerClient& client, NMDevice* device, const std::string& profilePath) {
-    const NetworkManagerReply reply = client.bus().call(
-        NM_DBUS_PATH, NM_DBUS_INTERFACE, "ActivateConnection",
-        g_variant_new("(ooo)", profilePath.c_str(), nm_object_get_path(NM_OBJECT(device)), "/"));
-    if (!reply) {
-        return reply.status(platform::kNetworkConfigNotActivated);
-    }
-    const char* path = nullptr;
-    g_variant_get_child(reply.value.get(), 0, "&o", &path);
-    const std::string activePath = path;
-    client.refresh();
-    bool isActive = false;
-    client.waitUntil(
-        [&] {
-            NMActiveConnection* const active = activeAt(client.get(), activePath);
-            const NMActiveConnectionState state =
-                active ? nm_active_connection_get_state(active) : NM_ACTIVE_CONNECTION_STATE_DEACTIVATED;
-            isActive = state == NM_ACTIVE_CONNECTION_STATE_ACTIVATED;
-            return isActive || state >= NM_ACTIVE_CONNECTION_STATE_DEACTIVATING;
-        },
-        kActivationLimit);
-    return isActive ? kNetworkConfigSuccess : platform::kNetworkConfigNotActivated;
-}
-
 } // namespace
 
 void ServiceRecord::forgetChanges() {
@@ -422,27 +301,6 @@ std::int32_t storeServices(NetworkManagerClient& client, std::vector<ServiceReco
         draft.record->forgetChanges();
     }
     return kNetworkConfigSuccess;
-}
-
-std::int32_t activateService(NetworkManagerClient& client, const ServiceRecord& service) {
-    IPv4Plan plan;
-    DNSPlan servers;
-    const std::int32_t status = planAll(service.protocols, plan, servers);
-    if (status != kNetworkConfigSuccess) {
-        return status;
-    }
-    client.refresh();
-    NMDevice* const device =
-        service.device ? nm_client_get_device_by_iface(client.get(), service.device->c_str()) : nullptr;
-    if (!device) {
-        return platform::kNetworkConfigNoDevice;
-    }
-    const bool isRunningIt = runningProfile(device) == service.uuid;
-    if (isRunningIt && reapply(client, device, *service.device, plan) == kNetworkConfigSuccess) {
-        return kNetworkConfigSuccess;
-    }
-    NMDevice* const now = nm_client_get_device_by_iface(client.get(), service.device->c_str());
-    return now ? activate(client, now, service.path) : platform::kNetworkConfigNoDevice;
 }
 
 } // namespace welcomer::desktop

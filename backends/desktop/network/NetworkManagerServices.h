@@ -43,8 +43,4 @@ std::vector<ServiceRecord> readServices(NetworkManagerClient& client,
 //  result  0 or a NetworkConfigStatus
 std::int32_t storeServices(NetworkManagerClient& client, std::vector<ServiceRecord>& services);
 
-// Has a service's device use its profile, and waits for the result.
-//  result  0 or a NetworkConfigStatus
-std::int32_t activateService(NetworkManagerClient& client, const ServiceRecord& service);
-
 } // namespace welcomer::desktop
