@@ -33,8 +33,12 @@ class AccountDirectory {
     // The names of those who can sign in, in order; none when that cannot be known here.
     virtual std::optional<std::vector<std::string>> users() = 0;
 
-    // Has somebody be able to sign in, in place of whoever had that name. Accounts that exist do not change.
+    // Has somebody be able to sign in. Fails with EEXIST when somebody of that name can already, whichever
+    // process made it so.
     //  user  with a name that is not empty
+    virtual Outcome addUser(const CloudUser& user) = 0;
+
+    // The same, in place of whoever had that name. Accounts that exist do not change.
     virtual Outcome storeUser(const CloudUser& user) = 0;
 };
 

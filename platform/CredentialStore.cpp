@@ -34,6 +34,8 @@ std::string credentialStatusText(std::int32_t status) {
         return "the secret is too large for the credential service";
     case kCredentialServiceFailed:
         return "the credential service failed";
+    case kCredentialStoreInUse:
+        return "the credential store is locked by another process: waited 10 seconds";
     default:
         return "unknown credential store status " + std::to_string(status);
     }

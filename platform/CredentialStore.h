@@ -29,6 +29,8 @@ enum CredentialStatus : std::int32_t {
     kCredentialNoBus = 12,            // there is no session bus, or it has died
     kCredentialTooLarge = 13,         // the secret is larger than the service can take
     kCredentialServiceFailed = 14,    // the service reports a failure of another kind
+    // Of a store that is a file:
+    kCredentialStoreInUse = 18, // another process of the user holds it, and did not let go of it in time
 };
 
 // The text of a result code, for people. Any thread.

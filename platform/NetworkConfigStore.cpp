@@ -34,6 +34,8 @@ std::string networkConfigStatusText(std::int32_t status) {
         return "the name servers could not be stored";
     case kNetworkConfigNotActivated:
         return "the network did not come up with this configuration";
+    case kNetworkConfigInUse:
+        return "the configuration is locked by another process: waited 10 seconds";
     default:
         break;
     }

@@ -59,7 +59,8 @@ enum NetworkConfigStatus : std::int32_t {
     kNetworkConfigNameServersElsewhere = 11,  // another program decides about the name servers
     kNetworkConfigNameServersNotWritten = 12, // the system refused to store them
     kNetworkConfigNotActivated = 13,          // the machine's network service could not put it to use
-    kNetworkConfigKernelRefused = 1000,       // and above: the kernel refused, with its error number added
+    kNetworkConfigInUse = 14, // another process holds what is stored, and did not let go of it in time
+    kNetworkConfigKernelRefused = 1000, // and above: the kernel refused, with its error number added
 };
 
 // The text of a code, for people. Any thread.

@@ -6,6 +6,9 @@
 
 namespace welcomer::platform {
 
+// What the backends' own lines are written with: facility 14, severity 3, as all of the system's.
+inline constexpr int kErrorPriority = (14 << 3) | 3;
+
 class SystemLog {
   public:
     virtual ~SystemLog() = default;

@@ -10,7 +10,7 @@ namespace welcomer::desktop {
 
 namespace {
 
-constexpr char kLockFileName[] = ".Credentials.lock";
+constexpr char kLockName[] = "CredentialSearch"; // not the local store's own, which it takes meanwhile
 
 // Empty where it is not set.
 std::string environmentVariable(const char* name) {
@@ -39,7 +39,7 @@ DesktopCredentialStore::DesktopCredentialStore(local::RootFolder root, platform:
                  // Makes the library folder where it is missing.
                  _identity.userLibraryDirectories();
                  const std::string library = platform::joinPath(_identity.homeDirectory(), "Library");
-                 return _root.locate(platform::joinPath(library, kLockFileName));
+                 return local::FileLock(_root, local::userLockPath(library, kLockName));
              }) {}
 
 platform::BackendReport DesktopCredentialStore::report() {

@@ -18,7 +18,7 @@ bool mayHaveSessionBus();
 // The module is loaded at the first operation that finds a session bus.
 class DesktopCredentialStore {
   public:
-    //  root      the folder below which the lock file is looked up
+    //  root      the folder below which the lock is looked up
     //  identity  says where the user's library is; borrowed
     //  local     the local store; borrowed
     DesktopCredentialStore(local::RootFolder root, platform::ProcessIdentity& identity,

@@ -1,5 +1,6 @@
 #include "backends/desktop/DesktopPlatform.h"
 
+#include "backends/local/FileLock.h"
 #include "backends/local/LocalAccountService.h"
 #include "backends/local/RootFolder.h"
 #include "generated/WelcomerConfiguration.h"
@@ -9,6 +10,8 @@
 namespace welcomer::desktop {
 
 namespace {
+
+constexpr char kOnlineAccountsLock[] = "OnlineAccounts";
 
 PlatformOptions withRunLoops(PlatformOptions options, platform::RunLoops& runLoops) {
     if (!options.runLoops) {
@@ -49,6 +52,11 @@ DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
     : _local(withRunLoops(options, _runLoops)),
       _credentialStore(local::RootFolder(options.root), _local.platform().processIdentity,
                        _local.platform().credentialStore),
+      _onlineAccounts(
+          {[root = local::RootFolder(options.root), &identity = _local.platform().processIdentity] {
+              const std::vector<std::string> libraries = identity.userLibraryDirectories();
+              return local::FileLock(root, local::userLockPath(libraries.front(), kOnlineAccountsLock));
+          }}),
       _accountService(_accountSurroundings(options.root), {std::string(configuration::kOnlineAccountProvider),
                                                            std::string(configuration::kOnlineAccountServer)}),
       _preferenceStore(_local.platform().preferenceStore),
@@ -75,9 +83,9 @@ OnlineAccountSurroundings DesktopPlatform::_accountSurroundings(const std::strin
     const platform::Platform& local = _local.platform();
     return {[this] { return _onlineAccounts.service(); },
             [root, &local](platform::NotificationCenter& posts) {
-                return std::make_unique<local::LocalAccountService>(local::RootFolder(root),
-                                                                    local.processIdentity, local.runLoops,
-                                                                    local.dispatchQueues, posts);
+                return std::make_unique<local::LocalAccountService>(
+                    local::RootFolder(root), local.processIdentity, local.runLoops, local.dispatchQueues,
+                    posts, local.systemLog);
             },
             local.preferenceStore,
             local.runLoops,

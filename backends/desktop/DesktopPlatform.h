@@ -33,7 +33,7 @@ class DesktopPlatform final : public PlatformOwner {
     DesktopRunLoops _runLoops;
     local::LocalPlatform _local; // stands on _runLoops
     DesktopCredentialStore _credentialStore;
-    DesktopModule<OnlineAccountsModule> _onlineAccounts{{}};
+    DesktopModule<OnlineAccountsModule> _onlineAccounts;
     OnlineAccountService _accountService;
     DesktopPreferenceStore _preferenceStore;
     DesktopNetwork _network;

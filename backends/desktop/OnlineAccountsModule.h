@@ -3,13 +3,20 @@
 #pragma once
 
 #include "backends/desktop/OnlineAccounts.h"
+#include "backends/local/FileLock.h"
+
+#include <functional>
 
 namespace welcomer::desktop {
 
 struct OnlineAccountsModule {
     static constexpr char kName[] = "onlineaccounts";
     using Interface = OnlineAccounts;
-    struct Arguments {};
+    struct Arguments {
+        // Takes the lock that keeps this user's other processes from making an account; asked when one is to
+        // be made.
+        std::function<local::FileLock()> lock;
+    };
 };
 
 } // namespace welcomer::desktop

@@ -1,10 +1,6 @@
 #include "backends/desktop/SearchListCredentialStore.h"
 
-#include "backends/local/FileDescriptor.h"
-
 #include <cerrno>
-#include <fcntl.h>
-#include <sys/file.h>
 
 namespace welcomer::desktop {
 
@@ -32,18 +28,6 @@ bool leavesItToTheLocalStore(std::int32_t status) {
            status == platform::kCredentialNoBus;
 }
 
-// The lock, held until the descriptor is closed; none when it cannot be taken.
-local::FileDescriptor lockFile(const std::string& path) {
-    constexpr mode_t mode = 0600;
-    local::FileDescriptor file(
-        ::open(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK, mode));
-    int result = -1;
-    do {
-        result = file ? ::flock(file.get(), LOCK_EX) : -1;
-    } while (file && result != 0 && errno == EINTR);
-    return result == 0 ? std::move(file) : local::FileDescriptor();
-}
-
 } // namespace
 
 std::int32_t SearchListCredentialStore::createTrustedApplication(const std::string& path,
@@ -60,9 +44,10 @@ SearchListCredentialStore::createAccess(const std::string& description,
 
 std::int32_t SearchListCredentialStore::createItem(const platform::CredentialItem& item,
                                                    const std::string& data) {
-    const local::FileDescriptor lock = lockFile(_lockFilePath());
+    const local::FileLock lock = _lock();
     if (!lock) {
-        return platform::kCredentialWriteFailed;
+        return lock.error().number == ETIMEDOUT ? platform::kCredentialStoreInUse
+                                                : platform::kCredentialWriteFailed;
     }
     // The service itself refuses what it holds. A local store that cannot be read says so when it is written.
     if (_local.findItem(item.service, item.account, nullptr, nullptr) == platform::kCredentialSuccess) {

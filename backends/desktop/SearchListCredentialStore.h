@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "backends/local/FileLock.h"
 #include "platform/CredentialStore.h"
 
 #include <functional>
@@ -17,18 +18,18 @@ namespace welcomer::desktop {
 // a refusal, a secret too large) it says with a status of its own, unless the local store holds the item that
 // is wanted.
 //
-// Creating an item holds a lock file of the user, because the service itself replaces silently, or makes a
+// Creating an item holds a lock of the user, because the service itself replaces silently, or makes a
 // second item: of two writers at once one succeeds, and the other learns of the duplicate.
 class SearchListCredentialStore final : public platform::CredentialStore {
   public:
-    //  service       gives the service's store, borrowed, or null where there is none; asked at each
-    //  operation local         borrowed lockFilePath  where the lock file of this user lies; asked when an
-    //  item is created
+    //  service  gives the service's store, borrowed, or null where there is none; asked at each operation
+    //  local    borrowed
+    //  lock     takes the lock of this user; asked when an item is created
     SearchListCredentialStore(std::function<platform::CredentialStore*()> service,
-                              platform::CredentialStore& local, std::function<std::string()> lockFilePath)
+                              platform::CredentialStore& local, std::function<local::FileLock()> lock)
         : _service(std::move(service)),
           _local(local),
-          _lockFilePath(std::move(lockFilePath)) {}
+          _lock(std::move(lock)) {}
 
     std::int32_t createTrustedApplication(const std::string& path,
                                           platform::TrustedApplication& application) override;
@@ -52,7 +53,7 @@ class SearchListCredentialStore final : public platform::CredentialStore {
 
     const std::function<platform::CredentialStore*()> _service;
     platform::CredentialStore& _local;
-    const std::function<std::string()> _lockFilePath;
+    const std::function<local::FileLock()> _lock;
     std::mutex _mutex;
     // Where each item's secret was last read: what is then looked up to be deleted is that item, and no
     // other.

@@ -28,49 +28,60 @@ std::vector<std::string> AccountFile::names() {
     });
 }
 
-bool AccountFile::change(const std::function<bool(PropertyList::Dictionary& content)>& change) {
-    const std::string path = _folder();
-    const std::lock_guard lock(_mutex);
-    const LockedPreferenceFolder folder(path);
-    if (!folder) {
-        return false;
+platform::Outcome AccountFile::change(const std::function<bool(PropertyList::Dictionary& content)>& change) {
+    platform::Outcome outcome = _change(change);
+    if (!outcome) {
+        _log.write(platform::kErrorPriority, "The accounts could not be stored: " + outcome.error.message);
     }
-    rereadPreferenceFile(platform::joinPath(path, kFileName), _onDisk);
+    return outcome;
+}
+
+platform::Outcome AccountFile::_change(const std::function<bool(PropertyList::Dictionary& content)>& change) {
+    const std::string library = _library();
+    const std::string path = platform::joinPath(library, kFolderName);
+    const std::lock_guard lock(_mutex);
+    LockedPreferenceFolder folder(_root, path, userLockPath(library, kFolderName));
+    if (!folder) {
+        return platform::Outcome::failure(folder.error());
+    }
+    const std::string filePath = platform::joinPath(path, kFileName);
+    rereadPreferenceFile(_root, filePath, _onDisk);
     switch (_onDisk.state) {
     case State::Whole:
         break;
     case State::Damaged:
         if (folder.setAside(kFileName, _onDisk.bytes).empty()) {
-            return false;
+            return platform::Outcome::failure(folder.error());
         }
         _onDisk = {};
         break;
     case State::Unreadable:
-        return false;
+        return platform::Outcome::failure(
+            {0, "cannot read " + _root.shown(filePath) + ": " + _onDisk.reason});
     }
     PropertyList::Dictionary values = _onDisk.values;
     if (!change(values)) {
-        return false;
+        return platform::Outcome::success();
     }
     std::optional<std::string> bytes = folder.write(kFileName, values);
     if (!bytes) {
-        return false;
+        return platform::Outcome::failure(folder.error());
     }
     _onDisk = {State::Whole, std::move(values), std::move(*bytes), {}};
-    return true;
+    return platform::Outcome::success();
 }
 
 const PropertyList::Dictionary& AccountFile::_readContent() {
     if (!_path) {
-        _path = platform::joinPath(_folder(), kFileName);
+        _path = platform::joinPath(platform::joinPath(_library(), kFolderName), kFileName);
     }
-    rereadPreferenceFile(*_path, _onDisk);
+    rereadPreferenceFile(_root, *_path, _onDisk);
     return _onDisk.values;
 }
 
 // Makes the library folder where it is missing: the platform gives the library folder without a "~".
-std::string AccountFile::_folder() {
-    return _root.locate(platform::joinPath(_identity.userLibraryDirectories().front(), kFolderName));
+std::string AccountFile::_library() {
+    return _identity.userLibraryDirectories().front();
 }
 
 } // namespace welcomer::local

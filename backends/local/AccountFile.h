@@ -4,7 +4,9 @@
 
 #include "backends/local/PreferenceFile.h"
 #include "backends/local/RootFolder.h"
+#include "platform/Error.h"
 #include "platform/ProcessIdentity.h"
+#include "platform/SystemLog.h"
 #include "propertylist/PropertyList.h"
 
 #include <functional>
@@ -26,16 +28,17 @@ inline constexpr char kAccountsKey[] = "Accounts";
 //             Properties       dictionary, for example the mail address
 //     LoggedInAccount  the name of the account that is logged in
 //     SetupFinished    boolean: setup has said so
-// A change takes the folder's lock, merges into what is on disk and replaces the file in one step, so that no
+// A change takes the file's lock, merges into what is on disk and replaces the file in one step, so that no
 // change of another process is lost and the file is whole at any time. A question reads the file, and parses
 // it only where its bytes are no longer those of the last time. A damaged file counts as empty and is set
 // aside before the first change. Any thread and any process.
 class AccountFile {
   public:
-    // Borrows the identity, which must outlive this.
-    AccountFile(RootFolder root, platform::ProcessIdentity& identity)
+    // Borrows the identity and the log, which must outlive this.
+    AccountFile(RootFolder root, platform::ProcessIdentity& identity, platform::SystemLog& log)
         : _root(std::move(root)),
-          _identity(identity) {}
+          _identity(identity),
+          _log(log) {}
 
     // Asks something of what is in the file now.
     //  question  is given everything, which is empty when there is nothing that
@@ -53,17 +56,20 @@ class AccountFile {
 
     // Changes the content.
     //  change  is given what is on disk; its result says whether that is to be stored
-    //  result  whether the file holds the change now; false also when `change` has said no
-    bool change(const std::function<bool(PropertyList::Dictionary& content)>& change);
+    //  result  a failure when it is to be and could not; its error names the path and the reason, and the
+    //          system log has them, too
+    platform::Outcome change(const std::function<bool(PropertyList::Dictionary& content)>& change);
 
   private:
+    platform::Outcome _change(const std::function<bool(PropertyList::Dictionary& content)>& change);
     const PropertyList::Dictionary& _readContent();
-    std::string _folder();
+    std::string _library();
 
     const RootFolder _root;
     platform::ProcessIdentity& _identity;
+    platform::SystemLog& _log;
     std::mutex _mutex;                // guards what follows
-    std::optional<std::string> _path; // of the file, on this machine; none until it is first needed
+    std::optional<std::string> _path; // of the file; none until it is first needed
     PreferenceFileContent _onDisk;    // as it was when it was last read or written
 };
 

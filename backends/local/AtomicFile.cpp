@@ -5,7 +5,6 @@
 
 #include <cerrno>
 #include <fcntl.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -47,14 +46,6 @@ int rewriteInPlace(int folder, const std::string& name, std::string_view content
 }
 
 } // namespace
-
-int lockFolder(int folder) {
-    int result = 0;
-    do {
-        result = ::flock(folder, LOCK_EX);
-    } while (result != 0 && errno == EINTR);
-    return result == 0 ? 0 : errno;
-}
 
 int replaceFile(int folder, const std::string& name, std::string_view content, mode_t mode,
                 AfterCrash afterCrash) {

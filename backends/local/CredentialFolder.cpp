@@ -31,9 +31,10 @@ bool isOwn(const struct stat& status) {
     return status.st_uid == ::geteuid() && (status.st_mode & kWritableByOthers) == 0;
 }
 
-bool isSymbolicLink(const std::string& path) {
+bool isSymbolicLink(const FolderEntry& entry) {
     struct stat status = {};
-    return ::lstat(path.c_str(), &status) == 0 && S_ISLNK(status.st_mode);
+    return entry && ::fstatat(entry.folder(), entry.name(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
+           S_ISLNK(status.st_mode);
 }
 
 bool takeItems(std::string_view bytes, PropertyList::Array& items) {
@@ -53,17 +54,18 @@ bool takeItems(std::string_view bytes, PropertyList::Array& items) {
 
 } // namespace
 
-bool credentialFileIsAbsent(const std::string& folderPath) {
-    return ::access(platform::joinPath(folderPath, kFileName).c_str(), F_OK) != 0 && errno == ENOENT;
+bool credentialFileIsAbsent(const RootFolder& root, const std::string& folderPath) {
+    return !root.exists(platform::joinPath(folderPath, kFileName)) && errno == ENOENT;
 }
 
-std::int32_t CredentialFolder::open(const std::string& path) {
-    _folder = FileDescriptor(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+std::int32_t CredentialFolder::open(const RootFolder& root, const std::string& path) {
+    _folder = root.open(path, O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
     if (!_folder && errno == ENOENT) {
         return platform::kCredentialItemNotFound;
     }
     if (!_folder) {
-        return isSymbolicLink(path) ? platform::kCredentialStoreUnsafe : platform::kCredentialReadFailed;
+        return isSymbolicLink(root.entry(path)) ? platform::kCredentialStoreUnsafe
+                                                : platform::kCredentialReadFailed;
     }
     struct stat status = {};
     if (::fstat(_folder.get(), &status) != 0) {
@@ -72,9 +74,11 @@ std::int32_t CredentialFolder::open(const std::string& path) {
     return isOwn(status) ? platform::kCredentialSuccess : platform::kCredentialStoreUnsafe;
 }
 
-std::int32_t CredentialFolder::lock() {
-    if (lockFolder(_folder.get()) != 0) {
-        return platform::kCredentialWriteFailed;
+std::int32_t CredentialFolder::lock(const RootFolder& root, const std::string& path) {
+    _lock = FileLock(root, path);
+    if (!_lock) {
+        return _lock.error().number == ETIMEDOUT ? platform::kCredentialStoreInUse
+                                                 : platform::kCredentialWriteFailed;
     }
     removeLeftOver(_folder.get(), kFileName);
     return platform::kCredentialSuccess;

@@ -3,6 +3,8 @@
 #pragma once
 
 #include "backends/local/FileDescriptor.h"
+#include "backends/local/FileLock.h"
+#include "backends/local/RootFolder.h"
 #include "propertylist/PropertyList.h"
 
 #include <cstdint>
@@ -13,13 +15,15 @@ namespace welcomer::local {
 // Results are platform::CredentialStatus. One thread at a time.
 class CredentialFolder {
   public:
-    // Opens the folder, a path of this machine.
+    // Opens the folder.
     //  result  kCredentialItemNotFound when there is no folder, kCredentialStoreUnsafe, kCredentialReadFailed
-    std::int32_t open(const std::string& path);
+    std::int32_t open(const RootFolder& root, const std::string& path);
 
     // Waits for the other writers to finish and keeps them out until this object is gone; clears away what a
     // killed one left.
-    std::int32_t lock();
+    //  path    of the lock file
+    //  result  kCredentialStoreInUse when they do not let go of it, kCredentialWriteFailed
+    std::int32_t lock(const RootFolder& root, const std::string& path);
 
     // Reads the items. Each is a dictionary that itemMatches() and the rest of CredentialItemFormat.h
     // understand.
@@ -33,9 +37,11 @@ class CredentialFolder {
 
   private:
     FileDescriptor _folder;
+    FileLock _lock;
 };
 
-// Whether the file of the folder at a path is certainly absent: a single system call. Any thread.
-bool credentialFileIsAbsent(const std::string& folderPath);
+// Whether the file of the folder at a path is certainly absent: a single system call where the root is "/".
+// Any thread.
+bool credentialFileIsAbsent(const RootFolder& root, const std::string& folderPath);
 
 } // namespace welcomer::local

@@ -112,16 +112,18 @@ bool DHCPClient::isInstalled() const {
 
 std::int32_t DHCPClient::start(const DHCPRequest& request) const {
     stop(request.device);
-    makeDirectory(_root.locate("/run"), 0755); // each fails where it exists
-    makeDirectory(_root.locate(kFolder), 0755);
-    const std::string processFile = _path(request.device, ".pid");
+    makeDirectories(_root, kFolder, 0755);
+    const std::optional<std::string> files = _pathOfFiles(request.device);
+    if (!files) {
+        return platform::kNetworkConfigDHCPClientFailed;
+    }
+    const std::string processFile = *files + ".pid";
     int status = -1;
     if (const std::string program = find(kISCName); !program.empty()) {
-        const std::string configuration = _path(request.device, ".conf");
+        const std::string configuration = *files + ".conf";
         if (writeSmallFile(configuration, configurationText(request))) {
-            status =
-                launch(program, {"-4", "-nw", "-pf", processFile, "-lf", _path(request.device, ".leases"),
-                                 "-cf", configuration, request.device});
+            status = launch(program, {"-4", "-nw", "-pf", processFile, "-lf", *files + ".leases", "-cf",
+                                      configuration, request.device});
         }
     } else if (const std::string other = find(kBusyBoxName); !other.empty()) {
         // One attempt of a second in the foreground, then every few seconds in the background.
@@ -138,7 +140,11 @@ std::int32_t DHCPClient::start(const DHCPRequest& request) const {
 }
 
 void DHCPClient::stop(const std::string& device) const {
-    const std::string path = _path(device, ".pid");
+    const std::optional<std::string> files = _pathOfFiles(device);
+    if (!files) {
+        return; // nothing was started
+    }
+    const std::string path = *files + ".pid";
     const std::string text = firstLineOf(path);
     pid_t process = 0;
     const auto read = std::from_chars(text.data(), text.data() + text.size(), process);
@@ -150,8 +156,9 @@ void DHCPClient::stop(const std::string& device) const {
     ::unlink(path.c_str());
 }
 
-std::string DHCPClient::_path(const std::string& device, const char* ending) const {
-    return _root.locate(std::string(kFolder) + "/dhcp-" + device + ending);
+std::optional<std::string> DHCPClient::_pathOfFiles(const std::string& device) const {
+    const std::optional<std::string> folder = _root.resolve(kFolder);
+    return folder ? std::optional(*folder + "/dhcp-" + device) : std::nullopt;
 }
 
 } // namespace welcomer::local

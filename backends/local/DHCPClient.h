@@ -37,7 +37,9 @@ class DHCPClient {
     void stop(const std::string& device) const;
 
   private:
-    std::string _path(const std::string& device, const char* ending) const;
+    // The path on this machine of a device's files, without their endings; none while there is no folder for
+    // them.
+    std::optional<std::string> _pathOfFiles(const std::string& device) const;
 
     const RootFolder _root;
 };

@@ -53,8 +53,8 @@ int readAll(int descriptor, std::string& content, std::size_t maximum) {
     return ::fstat(descriptor, &status) == 0 ? readRest(descriptor, status, content, maximum) : errno;
 }
 
-int readFile(const std::string& path, std::string& content, std::size_t maximum) {
-    const FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+int readFile(const RootFolder& root, const std::string& path, std::string& content, std::size_t maximum) {
+    const FileDescriptor file = root.open(path, O_RDONLY | O_NONBLOCK);
     struct stat status = {};
     if (!file || ::fstat(file.get(), &status) != 0) {
         return errno;

@@ -2,6 +2,8 @@
 
 #pragma once
 
+#include "backends/local/RootFolder.h"
+
 #include <cstddef>
 #include <limits>
 #include <string>
@@ -17,9 +19,8 @@ namespace welcomer::local {
 int readAll(int descriptor, std::string& content,
             std::size_t maximum = std::numeric_limits<std::size_t>::max());
 
-// Opens a file and reads it in the same way; what is no regular file fails with EINVAL, without blocking. The
-// path is one of this machine.
-int readFile(const std::string& path, std::string& content,
+// Opens a file and reads it in the same way; what is no regular file fails with EINVAL, without blocking.
+int readFile(const RootFolder& root, const std::string& path, std::string& content,
              std::size_t maximum = std::numeric_limits<std::size_t>::max());
 
 // Writes at the file's current position.

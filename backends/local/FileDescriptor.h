@@ -27,6 +27,9 @@ class FileDescriptor {
     int get() const { return _descriptor; }
     explicit operator bool() const { return _descriptor >= 0; }
 
+    // Gives the descriptor away.
+    int release() { return std::exchange(_descriptor, -1); }
+
   private:
     int _descriptor;
 };

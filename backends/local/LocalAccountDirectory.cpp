@@ -12,8 +12,12 @@ std::optional<std::vector<std::string>> LocalAccountDirectory::users() {
     return NimbusDirectory(_root).userNames();
 }
 
+platform::Outcome LocalAccountDirectory::addUser(const platform::CloudUser& user) {
+    return NimbusDirectory(_root).writeUser(user, NimbusDirectory::IfThere::Fail);
+}
+
 platform::Outcome LocalAccountDirectory::storeUser(const platform::CloudUser& user) {
-    return NimbusDirectory(_root).storeUser(user);
+    return NimbusDirectory(_root).writeUser(user, NimbusDirectory::IfThere::Replace);
 }
 
 } // namespace welcomer::local

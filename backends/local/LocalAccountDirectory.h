@@ -11,13 +11,15 @@ namespace welcomer::local {
 // made for its owner alone: whoever can read it can try passwords.
 class LocalAccountDirectory final : public platform::AccountDirectory {
   public:
-    // Borrows the identity, which must outlive this.
-    LocalAccountDirectory(const RootFolder& root, platform::ProcessIdentity& identity)
+    // Borrows the identity and the log, which must outlive this.
+    LocalAccountDirectory(const RootFolder& root, platform::ProcessIdentity& identity,
+                          platform::SystemLog& log)
         : _root(root),
-          _accountFile(root, identity) {}
+          _accountFile(root, identity, log) {}
 
     std::vector<std::string> accounts() override;
     std::optional<std::vector<std::string>> users() override;
+    platform::Outcome addUser(const platform::CloudUser& user) override;
     platform::Outcome storeUser(const platform::CloudUser& user) override;
 
   private:

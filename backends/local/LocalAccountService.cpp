@@ -61,15 +61,15 @@ std::chrono::nanoseconds nanoseconds(double seconds) {
 } // namespace
 
 struct LocalAccountService::Accounts {
-    Accounts(const RootFolder& root, platform::ProcessIdentity& identity)
-        : file(root, identity),
+    Accounts(const RootFolder& root, platform::ProcessIdentity& identity, platform::SystemLog& log)
+        : file(root, identity, log),
           directory(root) {}
 
     AccountFile file;
     NimbusDirectory directory;
 
     // Makes an account where it is missing, and then does more to the content, all in one change.
-    bool make(
+    platform::Outcome make(
         const std::string& name,
         const std::function<void(PropertyList::Dictionary&)>& more = [](PropertyList::Dictionary&) {}) {
         return file.change([&](PropertyList::Dictionary& content) {
@@ -109,14 +109,15 @@ class LocalAccountService::Service final : public platform::CloudService {
     }
 
     void enableSilently(bool enabled) override {
-        _accounts->file.change([&](PropertyList::Dictionary& content) {
+        // What became of it is not reported; the file tells the system log.
+        static_cast<void>(_accounts->file.change([&](PropertyList::Dictionary& content) {
             PropertyList::Dictionary* service = findService(content, _account, _identifier);
             if (!service || flag(*service, kEnabledKey, false) == enabled) {
                 return false; // nothing to store
             }
             (*service)[kEnabledKey] = enabled;
             return true;
-        });
+        }));
     }
 
   private:
@@ -172,9 +173,13 @@ struct LocalAccountService::Operation {
         const auto logIn = [this](PropertyList::Dictionary& content) {
             content[kLoggedInAccountKey] = username;
         };
-        if (isSignIn && answer.isCompleted && !accounts->make(username, logIn)) {
+        if (!isSignIn || !answer.isCompleted) {
+            return result;
+        }
+        if (const platform::Outcome outcome = accounts->make(username, logIn); !outcome) {
             result.name = _name(false);
-            result.contents = {{platform::kSKPropertyAccountError, platform::kSKAccountErrorNotStored}};
+            result.contents = {{platform::kSKPropertyAccountError, platform::kSKAccountErrorNotStored},
+                               {platform::kSKPropertyAccountErrorInfo, outcome.error.message}};
         }
         return result;
     }
@@ -193,8 +198,9 @@ struct LocalAccountService::Operation {
 LocalAccountService::LocalAccountService(const RootFolder& root, platform::ProcessIdentity& identity,
                                          platform::RunLoops& runLoops,
                                          platform::DispatchQueues& dispatchQueues,
-                                         platform::NotificationCenter& notificationCenter)
-    : _accounts(std::make_shared<Accounts>(root, identity)),
+                                         platform::NotificationCenter& notificationCenter,
+                                         platform::SystemLog& log)
+    : _accounts(std::make_shared<Accounts>(root, identity, log)),
       _runLoops(runLoops),
       _dispatchQueues(dispatchQueues),
       _notificationCenter(notificationCenter),
@@ -245,10 +251,10 @@ void LocalAccountService::finishSignIn(const std::string& username, const std::s
 }
 
 void LocalAccountService::markSetupFinished(const std::optional<PropertyList>& /*information*/) {
-    _accounts->file.change([](PropertyList::Dictionary& content) {
+    static_cast<void>(_accounts->file.change([](PropertyList::Dictionary& content) {
         content[kSetupFinishedKey] = true;
         return true;
-    });
+    }));
 }
 
 void LocalAccountService::_start(const std::shared_ptr<Operation>& operation) {

@@ -21,7 +21,7 @@ class LocalAccountService final : public platform::AccountService, public platfo
     // Borrows everything, which must outlive this.
     LocalAccountService(const RootFolder& root, platform::ProcessIdentity& identity,
                         platform::RunLoops& runLoops, platform::DispatchQueues& dispatchQueues,
-                        platform::NotificationCenter& notificationCenter);
+                        platform::NotificationCenter& notificationCenter, platform::SystemLog& log);
 
     platform::AccountManager& sharedManager() override { return *this; }
     std::shared_ptr<platform::CloudAccount> loggedInAccount() override;

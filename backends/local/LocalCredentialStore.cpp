@@ -41,26 +41,26 @@ PropertyList::Array::iterator findIn(PropertyList::Array& items, const std::stri
 }
 
 // Opens the folder for the creation of an item, and makes it where it is missing.
-std::int32_t openOrMake(CredentialFolder& folder, const std::string& path) {
-    std::int32_t status = folder.open(path);
+std::int32_t openOrMake(CredentialFolder& folder, const RootFolder& root, const std::string& path) {
+    std::int32_t status = folder.open(root, path);
     if (status == platform::kCredentialItemNotFound) {
         // Another process may make it at the same time.
-        const int error = makeDirectory(path, kFolderMode);
-        status = error == 0 || error == EEXIST ? folder.open(path) : platform::kCredentialWriteFailed;
+        const int error = makeDirectory(root, path, kFolderMode);
+        status = error == 0 || error == EEXIST ? folder.open(root, path) : platform::kCredentialWriteFailed;
     }
     // What cannot be opened, as a file where the folder should be, cannot be written either.
     return status == platform::kCredentialReadFailed ? platform::kCredentialWriteFailed : status;
 }
 
 // Copies the one item out of the store at a path.
-std::int32_t readItem(const std::string& folderPath, const std::string& service, const std::string& account,
-                      PropertyList& item) {
-    if (credentialFileIsAbsent(folderPath)) {
+std::int32_t readItem(const RootFolder& root, const std::string& folderPath, const std::string& service,
+                      const std::string& account, PropertyList& item) {
+    if (credentialFileIsAbsent(root, folderPath)) {
         return platform::kCredentialItemNotFound;
     }
     CredentialFolder folder;
     PropertyList::Array items;
-    std::int32_t status = folder.open(folderPath);
+    std::int32_t status = folder.open(root, folderPath);
     if (status == platform::kCredentialSuccess) {
         status = folder.load(items);
     }
@@ -77,13 +77,17 @@ std::int32_t readItem(const std::string& folderPath, const std::string& service,
 
 } // namespace
 
-std::string LocalCredentialStore::_folderPath(const std::string& library) const {
-    return _root.locate(platform::joinPath(library, kFolderName));
+std::string LocalCredentialStore::_library() {
+    // Not userLibraryDirectories(), which would make a folder.
+    return platform::joinPath(_identity.homeDirectory(), "Library");
 }
 
-std::string LocalCredentialStore::_existingFolderPath() {
-    // Not userLibraryDirectories(), which would make a folder.
-    return _folderPath(platform::joinPath(_identity.homeDirectory(), "Library"));
+std::string LocalCredentialStore::_folderPath() {
+    return platform::joinPath(_library(), kFolderName);
+}
+
+std::int32_t LocalCredentialStore::_lock(CredentialFolder& folder) {
+    return folder.lock(_root, userLockPath(_library(), kFolderName));
 }
 
 std::int32_t LocalCredentialStore::createTrustedApplication(const std::string& path,
@@ -107,9 +111,9 @@ std::int32_t LocalCredentialStore::createItem(const platform::CredentialItem& it
     _identity.userLibraryDirectories();
     CredentialFolder folder;
     PropertyList::Array items;
-    std::int32_t status = openOrMake(folder, _existingFolderPath());
+    std::int32_t status = openOrMake(folder, _root, _folderPath());
     if (status == platform::kCredentialSuccess) {
-        status = folder.lock();
+        status = _lock(folder);
     }
     if (status == platform::kCredentialSuccess) {
         status = folder.load(items);
@@ -128,7 +132,7 @@ std::int32_t LocalCredentialStore::findItem(const std::string& service, const st
                                             std::string* data,
                                             std::unique_ptr<platform::CredentialItemReference>* reference) {
     PropertyList item;
-    const std::int32_t status = readItem(_existingFolderPath(), service, account, item);
+    const std::int32_t status = readItem(_root, _folderPath(), service, account, item);
     if (status != platform::kCredentialSuccess) {
         return status;
     }
@@ -145,7 +149,7 @@ std::int32_t LocalCredentialStore::readAttributes(const platform::CredentialItem
                                                   platform::CredentialItem& item) {
     const auto& key = dynamic_cast<const Reference&>(reference);
     PropertyList stored;
-    const std::int32_t status = readItem(_existingFolderPath(), key.service(), key.account(), stored);
+    const std::int32_t status = readItem(_root, _folderPath(), key.service(), key.account(), stored);
     if (status == platform::kCredentialSuccess) {
         item = credentialItemAttributes(stored);
     }
@@ -156,9 +160,9 @@ std::int32_t LocalCredentialStore::deleteItem(const platform::CredentialItemRefe
     const auto& key = dynamic_cast<const Reference&>(reference);
     CredentialFolder folder;
     PropertyList::Array items;
-    std::int32_t status = folder.open(_existingFolderPath());
+    std::int32_t status = folder.open(_root, _folderPath());
     if (status == platform::kCredentialSuccess) {
-        status = folder.lock();
+        status = _lock(folder);
     }
     if (status == platform::kCredentialSuccess) {
         status = folder.load(items);

@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "backends/local/CredentialFolder.h"
 #include "backends/local/RootFolder.h"
 #include "platform/CredentialStore.h"
 #include "platform/ProcessIdentity.h"
@@ -13,9 +14,10 @@ namespace welcomer::local {
 // kept and shown, but NOT enforced. Every program of the user can read every item.
 //
 // The folder and the file are used only when they are the user's own, no symbolic links, and writable by
-// nobody else. Writers take the folder's lock and replace the file in one step; readers take no lock. A file
-// that cannot be read as what it should be is never written again, until somebody removes it. Deleting the
-// last item removes the file. Looking up an item in a store that does not exist makes one system call.
+// nobody else. Writers take the folder's lock (FileLock.h) and replace the file in one step; readers take no
+// lock. A file that cannot be read as what it should be is never written again, until somebody removes it.
+// Deleting the last item removes the file. Looking up an item in a store that does not exist makes one system
+// call where the root is "/".
 class LocalCredentialStore final : public platform::CredentialStore {
   public:
     // Borrows the identity, which must outlive the store.
@@ -36,9 +38,12 @@ class LocalCredentialStore final : public platform::CredentialStore {
     std::int32_t deleteItem(const platform::CredentialItemReference& reference) override;
 
   private:
-    // The folder of the credentials on this machine.
-    std::string _folderPath(const std::string& library) const;
-    std::string _existingFolderPath();
+    // The library folder, which is not made.
+    std::string _library();
+    // The folder of the credentials.
+    std::string _folderPath();
+    // Keeps other writers out.
+    std::int32_t _lock(CredentialFolder& folder);
 
     const RootFolder _root;
     platform::ProcessIdentity& _identity;

@@ -8,13 +8,9 @@
 
 #include <array>
 #include <cerrno>
-#include <cstdlib>
-#include <dirent.h>
 #include <fcntl.h>
-#include <filesystem>
-#include <memory>
+#include <random>
 #include <sys/stat.h>
-#include <system_error>
 #include <unistd.h>
 #include <utility>
 
@@ -25,6 +21,7 @@ namespace {
 constexpr std::size_t kCopyBufferSize = 65536;
 constexpr mode_t kCopiedPermissions = 0777;
 constexpr mode_t kNewFileMode = 0644;
+constexpr mode_t kPrivateMode = 0600;
 
 int copyContent(int source, int destination) {
     std::array<char, kCopyBufferSize> buffer;
@@ -46,9 +43,8 @@ int copyContent(int source, int destination) {
 }
 
 // Opens a regular file. 0, or the system's error number.
-int openSource(const std::string& path, FileDescriptor& file, mode_t& mode) {
-    // A pipe must not block.
-    file = FileDescriptor(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+int openSource(const RootFolder& root, const std::string& path, FileDescriptor& file, mode_t& mode) {
+    file = root.open(path, O_RDONLY | O_NONBLOCK); // a pipe must not block
     struct stat status = {};
     if (!file || ::fstat(file.get(), &status) != 0) {
         return errno;
@@ -60,117 +56,111 @@ int openSource(const std::string& path, FileDescriptor& file, mode_t& mode) {
     return 0;
 }
 
+// Makes a file under a name that is free. None when that failed; errno then says why.
+FileDescriptor makeTemporary(int folder, std::string& name) {
+    std::random_device random;
+    while (true) {
+        name = ".copy-" + std::to_string(random());
+        FileDescriptor file(
+            ::openat(folder, name.c_str(), O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kPrivateMode));
+        if (file || errno != EEXIST) {
+            return file;
+        }
+    }
+}
+
 // Fills the new file and gives it its name, which must be free. 0, or the system's error number.
-int finishCopy(int source, mode_t mode, int file, const std::string& temporary, const std::string& path) {
+int finishCopy(int source, mode_t mode, int file, int folder, const std::string& temporary,
+               const std::string& name) {
     if (const int error = copyContent(source, file)) {
         return error;
     }
-    const bool finished =
-        ::fchmod(file, mode) == 0 && ::fsync(file) == 0 && ::link(temporary.c_str(), path.c_str()) == 0;
+    const bool finished = ::fchmod(file, mode) == 0 && ::fsync(file) == 0 &&
+                          ::linkat(folder, temporary.c_str(), folder, name.c_str(), 0) == 0;
     return finished ? 0 : errno;
 }
 
-int copyFile(const std::string& from, const std::string& to) {
+int copyFile(const RootFolder& root, const std::string& from, const std::string& to) {
+    const PathParts destination = splitPath(to);
+    const FileDescriptor folder = root.open(destination.folder, O_RDONLY | O_DIRECTORY);
+    const int folderError = folder ? 0 : errno;
     struct stat present = {};
-    if (::lstat(to.c_str(), &present) == 0) {
+    if (folder && ::fstatat(folder.get(), destination.name.c_str(), &present, AT_SYMLINK_NOFOLLOW) == 0) {
         return EEXIST;
     }
     FileDescriptor source;
     mode_t mode = 0;
-    if (const int error = openSource(from, source, mode)) {
+    if (const int error = openSource(root, from, source, mode)) {
         return error;
     }
-    std::string temporary = to.substr(0, to.rfind('/') + 1) + ".copy-XXXXXX";
-    const FileDescriptor file(::mkostemp(temporary.data(), O_CLOEXEC));
+    if (folderError != 0) {
+        return folderError;
+    }
+    std::string temporary;
+    const FileDescriptor file = makeTemporary(folder.get(), temporary);
     if (!file) {
         return errno;
     }
-    const int error = finishCopy(source.get(), mode, file.get(), temporary, to);
-    ::unlink(temporary.c_str());
+    const int error = finishCopy(source.get(), mode, file.get(), folder.get(), temporary, destination.name);
+    ::unlinkat(folder.get(), temporary.c_str(), 0);
     return error;
 }
 
-// Removes whatever is at the path. 0, or the system's error number.
-int removeAll(const std::string& path) {
-    if (::unlink(path.c_str()) == 0) {
-        return 0;
-    }
-    if (errno != EISDIR) {
-        return errno;
-    }
-    std::error_code error;
-    const bool removed = std::filesystem::remove_all(path, error) > 0;
-    return removed || error ? error.value() : ENOENT;
-}
-
 // Opens a file to be written from its start, making it where it is missing. 0, or the system's error number.
-int openToWrite(const std::string& path, FileDescriptor& file) {
-    file = FileDescriptor(::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kNewFileMode));
+int openToWrite(const RootFolder& root, const std::string& path, FileDescriptor& file) {
+    file = root.open(path, O_WRONLY | O_CREAT | O_EXCL, kNewFileMode);
     if (file) {
         return ::fchmod(file.get(), kNewFileMode) == 0 ? 0 : errno;
     }
     if (errno == EEXIST) {
         // A pipe must not block; a dangling link is not followed to make a file elsewhere.
-        file = FileDescriptor(::open(path.c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC | O_NONBLOCK));
+        file = root.open(path, O_WRONLY | O_TRUNC | O_NONBLOCK);
     }
     return file ? 0 : errno;
 }
 
-int writeFile(const std::string& path, std::string_view content) {
+int writeFile(const RootFolder& root, const std::string& path, std::string_view content) {
     FileDescriptor file;
-    const int error = openToWrite(path, file);
+    const int error = openToWrite(root, path, file);
     return error == 0 ? writeAll(file.get(), content) : error;
+}
+
+int removeAll(const FolderEntry& entry) {
+    return entry ? removeTree(entry.folder(), entry.name()) : errno;
 }
 
 } // namespace
 
 bool LocalFileSystem::exists(const std::string& path) {
-    struct stat status = {};
-    return ::stat(_root.locate(path).c_str(), &status) == 0;
+    return _root.exists(path);
 }
 
 platform::Outcome LocalFileSystem::remove(const std::string& path) {
-    return systemOutcome("cannot remove " + path, removeAll(_root.locate(path)));
+    return systemOutcome("cannot remove " + path, removeAll(_root.entry(path)));
 }
 
 platform::Outcome LocalFileSystem::createDirectory(const std::string& path, std::uint32_t mode) {
-    return systemOutcome("cannot create " + path, makeDirectory(_root.locate(path), mode));
+    return systemOutcome("cannot create " + path, makeDirectory(_root, path, mode));
 }
 
 platform::Outcome LocalFileSystem::copy(const std::string& source, const std::string& destination) {
     return systemOutcome("cannot copy " + source + " to " + destination,
-                         copyFile(_root.locate(source), _root.locate(destination)));
+                         copyFile(_root, source, destination));
 }
 
 std::optional<std::vector<std::string>> LocalFileSystem::list(const std::string& path) {
-    const std::unique_ptr<DIR, int (*)(DIR*)> folder(::opendir(_root.locate(path).c_str()), ::closedir);
-    if (!folder) {
-        return std::nullopt;
-    }
-    std::vector<std::string> names;
-    errno = 0;
-    while (const dirent* entry = ::readdir(folder.get())) {
-        const std::string name = static_cast<const char*>(entry->d_name);
-        if (name != "." && name != "..") {
-            names.push_back(name);
-        }
-        errno = 0;
-    }
-    if (errno != 0) {
-        return std::nullopt;
-    }
-    return names;
+    return listDirectory(_root.open(path, O_RDONLY | O_DIRECTORY));
 }
 
 std::optional<std::string> LocalFileSystem::readText(const std::string& path) {
     std::string text;
-    const bool isText = readFile(_root.locate(path), text, platform::kMaximumTextSize) == 0 &&
+    const bool isText = readFile(_root, path, text, platform::kMaximumTextSize) == 0 &&
                         findInvalidUTF8(text) == std::string::npos;
     return isText ? std::optional(std::move(text)) : std::nullopt;
 }
 
 platform::Outcome LocalFileSystem::writeText(const std::string& path, const std::string& text) {
-    return systemOutcome("cannot write " + path, writeFile(_root.locate(path), text));
+    return systemOutcome("cannot write " + path, writeFile(_root, path, text));
 }
 
 } // namespace welcomer::local

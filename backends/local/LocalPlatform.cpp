@@ -17,8 +17,11 @@ Interface& chosen(Interface* replacement, std::type_identity_t<Interface>& servi
 LocalPlatform::LocalPlatform(const PlatformOptions& options)
     : _root(options.root),
       _resourceBundles(_root, options.mainBundle),
+      _preferenceStore(_root, _processIdentity, chosen(options.systemLog, _systemLog)),
       _accountService(_root, _processIdentity, chosen(options.runLoops, _runLoops),
-                      chosen(options.dispatchQueues, _dispatchQueues), _notificationCenter),
+                      chosen(options.dispatchQueues, _dispatchQueues), _notificationCenter,
+                      chosen(options.systemLog, _systemLog)),
+      _accountDirectory(_root, _processIdentity, chosen(options.systemLog, _systemLog)),
       _platform{chosen(options.systemLog, _systemLog),
                 _fileSystem,
                 _processIdentity,
@@ -40,7 +43,7 @@ LocalPlatform::LocalPlatform(const PlatformOptions& options)
                 _directoryService} {}
 
 std::vector<platform::BackendReport> LocalPlatform::backendReports() {
-    const bool isWholeMachine = _root.locate("/") == "/";
+    const bool isWholeMachine = _root.isWholeMachine();
     const std::string reason =
         isWholeMachine ? "this build has no desktop backends" : "the desktop's services know no root but /";
     const std::string advice = isWholeMachine ? "build with WELCOMER_DESKTOP" : "";

@@ -45,12 +45,12 @@ class LocalPlatform final : public PlatformOwner {
     LocalClock _clock;
     LocalRunLoops _runLoops;
     LocalDispatchQueues _dispatchQueues;
-    LocalPreferenceStore _preferenceStore{_root, _processIdentity};
+    LocalPreferenceStore _preferenceStore;
     LocalSystemVersionInfo _systemVersionInfo{_fileSystem};
     LocalHostReachability _hostReachability;
     LocalNotificationCenter _notificationCenter;
     LocalAccountService _accountService;
-    LocalAccountDirectory _accountDirectory{_root, _processIdentity};
+    LocalAccountDirectory _accountDirectory;
     LocalProcessLauncher _processLauncher;
     LocalNetworkConfigStore _networkConfigStore{_root};
     LocalNetworkStateStore _networkStateStore{_root};

@@ -5,9 +5,9 @@
 #include "platform/Path.h"
 #include "propertylist/PropertyListReader.h"
 
-#include <cstdlib>
+#include <cerrno>
 #include <dlfcn.h>
-#include <memory>
+#include <fcntl.h>
 #include <optional>
 #include <sys/stat.h>
 
@@ -17,22 +17,18 @@ namespace {
 
 constexpr std::size_t kMaximumInfoSize = std::size_t{1} << 20;
 
-bool isFolder(const std::string& path) {
+bool isFolder(const RootFolder& root, const std::string& path) {
+    const FileDescriptor file = root.open(path, O_PATH);
     struct stat status = {};
-    return ::stat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
+    return file && ::fstat(file.get(), &status) == 0 && S_ISDIR(status.st_mode);
 }
 
-// A path without symbolic links and dots, or none when nothing is there.
-std::optional<std::string> resolved(const std::string& path) {
-    const std::unique_ptr<char, void (*)(void*)> result(::realpath(path.c_str(), nullptr), ::free);
-    return result ? std::optional<std::string>(result.get()) : std::nullopt;
-}
-
-// The library of a folder, or none with the reason.
-std::optional<std::string> libraryOf(const std::string& folder, std::string& reason) {
+// The library of a folder as a path of this machine, or none with the reason.
+std::optional<std::string> libraryOf(const RootFolder& root, const std::string& path, std::string& reason) {
+    const std::string folder = root.shown(path);
     const std::string infoPath = platform::joinPath(folder, "Info.plist");
     std::string bytes;
-    if (const int error = readFile(infoPath, bytes, kMaximumInfoSize)) {
+    if (const int error = readFile(root, platform::joinPath(path, "Info.plist"), bytes, kMaximumInfoSize)) {
         reason = systemError("cannot read " + infoPath, error).message;
         return std::nullopt;
     }
@@ -47,8 +43,8 @@ std::optional<std::string> libraryOf(const std::string& folder, std::string& rea
         reason = infoPath + ": no Executable";
         return std::nullopt;
     }
-    std::optional<std::string> library = resolved(platform::joinPath(folder, *name));
-    const std::optional<std::string> inside = resolved(folder);
+    std::optional<std::string> library = root.resolve(platform::joinPath(path, *name));
+    const std::optional<std::string> inside = root.resolve(path);
     if (!library || !inside) {
         reason = folder + ": its Executable is missing";
         return std::nullopt;
@@ -68,16 +64,22 @@ std::string lastLoaderError(const std::string& path) {
 } // namespace
 
 platform::PluginSymbol LocalPluginBundle::load(const std::string& path, const char* symbol) {
-    const std::string located = _root.locate(path);
+    const std::string shown = _root.shown(path);
+    // The loader knows libraries by their paths, so that a descriptor's in /proc, whose number is used again,
+    // would be taken for another's. With the root "/" it follows links as the system does.
+    const std::string located = _root.isWholeMachine() ? shown : _root.resolve(path).value_or("");
+    if (located.empty()) {
+        return {nullptr, systemError("cannot load " + shown, errno).message};
+    }
     // A library is loaded without a look at what it is: scanning many plug-ins should cost what loading
     // costs.
     void* library = ::dlopen(located.c_str(), RTLD_NOW | RTLD_LOCAL);
     if (!library) {
         std::string reason = lastLoaderError(located);
-        if (!isFolder(located)) {
+        if (!isFolder(_root, path)) {
             return {nullptr, reason};
         }
-        const std::optional<std::string> inner = libraryOf(located, reason);
+        const std::optional<std::string> inner = libraryOf(_root, path, reason);
         if (!inner) {
             return {nullptr, reason};
         }
@@ -88,7 +90,7 @@ platform::PluginSymbol LocalPluginBundle::load(const std::string& path, const ch
     }
     const void* address = ::dlsym(library, symbol);
     if (!address) {
-        return {nullptr, located + ": no symbol " + symbol};
+        return {nullptr, shown + ": no symbol " + symbol};
     }
     return {address, {}};
 }

@@ -24,9 +24,11 @@ bool isDomainName(const std::string& name) {
 
 } // namespace
 
-LocalPreferenceStore::LocalPreferenceStore(RootFolder root, platform::ProcessIdentity& identity)
+LocalPreferenceStore::LocalPreferenceStore(RootFolder root, platform::ProcessIdentity& identity,
+                                           platform::SystemLog& log)
     : _root(std::move(root)),
-      _identity(identity) {}
+      _identity(identity),
+      _log(log) {}
 
 std::optional<PropertyList> LocalPreferenceStore::copyValue(const std::string& key,
                                                             const std::string& domain) {
@@ -96,17 +98,25 @@ LocalPreferenceStore::Domain& LocalPreferenceStore::_use(const std::string& name
     return _lastUsed->second;
 }
 
-const std::string& LocalPreferenceStore::_folder() {
-    if (!_userFolder) {
+const std::string& LocalPreferenceStore::_library() {
+    if (!_userLibrary) {
         const std::vector<std::string> libraries = _identity.userLibraryDirectories();
-        _userFolder = platform::joinPath(libraries.empty() ? "/Library" : libraries.front(), kFolderName);
+        _userLibrary = libraries.empty() ? "/Library" : libraries.front();
     }
-    return *_userFolder;
+    return *_userLibrary;
+}
+
+std::string LocalPreferenceStore::_folder() {
+    return platform::joinPath(_library(), kFolderName);
+}
+
+LockedPreferenceFolder LocalPreferenceStore::_lockedFolder() {
+    return {_root, _folder(), userLockPath(_library(), kFolderName)};
 }
 
 const std::string& LocalPreferenceStore::_pathOf(const std::string& name, Domain& domain) {
     if (domain.path.empty()) {
-        domain.path = _root.locate(platform::joinPath(_folder(), fileName(name)));
+        domain.path = platform::joinPath(_folder(), fileName(name));
     }
     return domain.path;
 }
@@ -116,10 +126,10 @@ bool LocalPreferenceStore::_load(const std::string& name, Domain& domain) {
     if (!isDomainName(name)) {
         return false;
     }
-    rereadPreferenceFile(_pathOf(name, domain), domain.onDisk);
+    rereadPreferenceFile(_root, _pathOf(name, domain), domain.onDisk);
     if (domain.onDisk.state == State::Damaged) {
         // What was read may be a file that is being rewritten in place; with the lock it is what it is.
-        const LockedPreferenceFolder folder(_root.locate(_folder()));
+        LockedPreferenceFolder folder = _lockedFolder();
         if (folder) {
             _readLocked(name, domain, folder);
         } else {
@@ -133,9 +143,17 @@ bool LocalPreferenceStore::_storeChanges(const std::string& name, Domain& domain
     if (!isDomainName(name)) {
         return false;
     }
-    _userFolder.reset(); // asking makes the library folder where it is missing
-    const LockedPreferenceFolder folder(_root.locate(_folder()));
-    if (!folder || !_readLocked(name, domain, folder)) {
+    _userLibrary.reset(); // asking makes the library folder where it is missing
+    LockedPreferenceFolder folder = _lockedFolder();
+    if (!folder) {
+        _noteNotStored(name, folder.error().message);
+        return false;
+    }
+    if (!_readLocked(name, domain, folder)) {
+        _noteNotStored(name,
+                       domain.onDisk.state == State::Unreadable
+                           ? "cannot read " + _root.shown(_pathOf(name, domain)) + ": " + domain.onDisk.reason
+                           : folder.error().message);
         return false;
     }
     PropertyList::Dictionary merged = domain.onDisk.values;
@@ -149,6 +167,7 @@ bool LocalPreferenceStore::_storeChanges(const std::string& name, Domain& domain
     if (merged != domain.onDisk.values) {
         std::optional<std::string> bytes = folder.write(fileName(name), merged);
         if (!bytes) {
+            _noteNotStored(name, folder.error().message);
             return false;
         }
         domain.onDisk = {State::Whole, std::move(merged), std::move(*bytes), {}};
@@ -159,8 +178,8 @@ bool LocalPreferenceStore::_storeChanges(const std::string& name, Domain& domain
 }
 
 bool LocalPreferenceStore::_readLocked(const std::string& name, Domain& domain,
-                                       const LockedPreferenceFolder& folder) {
-    rereadPreferenceFile(_pathOf(name, domain), domain.onDisk);
+                                       LockedPreferenceFolder& folder) {
+    rereadPreferenceFile(_root, _pathOf(name, domain), domain.onDisk);
     if (domain.onDisk.state != State::Damaged) {
         return domain.onDisk.state == State::Whole;
     }
@@ -171,6 +190,10 @@ bool LocalPreferenceStore::_readLocked(const std::string& name, Domain& domain,
     }
     domain.onDisk = {};
     return true;
+}
+
+void LocalPreferenceStore::_noteNotStored(const std::string& name, const std::string& reason) {
+    _log.write(platform::kErrorPriority, "Preferences " + name + " could not be stored: " + reason);
 }
 
 void LocalPreferenceStore::_noteDamage(const std::string& name, const std::string& reason,

@@ -59,7 +59,7 @@ std::string LocalProcessIdentity::homeDirectory() {
 std::vector<std::string> LocalProcessIdentity::userLibraryDirectories() {
     const std::string library = platform::joinPath(homeDirectory(), "Library");
     // Fails where the folder exists already or the home folder does not; the path is right all the same.
-    makeDirectory(_root.locate(library), kLibraryMode);
+    makeDirectory(_root, library, kLibraryMode);
     return {library};
 }
 

@@ -5,7 +5,6 @@
 
 #include <cstdlib>
 #include <string_view>
-#include <sys/stat.h>
 #include <utility>
 #include <vector>
 
@@ -45,18 +44,13 @@ class LocalResourceBundle final : public platform::ResourceBundle {
         }
         const std::string file = type.empty() ? name : name + "." + type;
         std::string path = platform::joinPath(platform::joinPath(_path, "Resources"), file);
-        struct stat status = {};
-        if (::stat(_root.locate(path).c_str(), &status) != 0) {
-            return std::nullopt;
-        }
-        return path;
+        return _root.exists(path) ? std::optional(std::move(path)) : std::nullopt;
     }
 
     std::string localizedString(const std::string& key, const std::string& fallback) override {
         for (const std::string& folder : languageFolders()) {
             const PropertyList::Dictionary table =
-                readPreferenceFile(_root.locate(platform::joinPath(_path, "Resources") + folder + kTable))
-                    .values;
+                readPreferenceFile(_root, platform::joinPath(_path, "Resources") + folder + kTable).values;
             const auto found = table.find(key);
             if (found != table.end() && found->second.string()) {
                 return *found->second.string();

@@ -1,14 +1,14 @@
 #include "backends/local/MachineInterfaces.h"
 
+#include "backends/local/Directory.h"
+
 #include <algorithm>
 #include <array>
-#include <filesystem>
+#include <fcntl.h>
 #include <net/if.h>
 #include <net/if_arp.h>
 #include <set>
 #include <string_view>
-#include <system_error>
-#include <unistd.h>
 
 namespace welcomer::local {
 
@@ -40,13 +40,12 @@ bool hasPorts(const KernelLink& link) {
 }
 
 bool hasWirelessHardware(const RootFolder& root) {
-    std::error_code error;
-    const std::filesystem::directory_iterator devices(root.locate("/sys/class/ieee80211"), error);
-    return !error && devices != std::filesystem::directory_iterator();
+    const auto devices = listDirectory(root.open("/sys/class/ieee80211", O_RDONLY | O_DIRECTORY));
+    return devices && !devices->empty();
 }
 
 bool isWireless(const KernelLink& link, const RootFolder& root) {
-    return ::access(root.locate("/sys/class/net/" + link.name + "/phy80211").c_str(), F_OK) == 0;
+    return root.exists("/sys/class/net/" + link.name + "/phy80211");
 }
 
 std::string typeOf(const KernelLink& link, const RootFolder& root, bool mayBeWireless) {

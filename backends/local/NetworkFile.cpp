@@ -5,13 +5,14 @@
 #include "platform/NetworkConfigStore.h"
 #include "platform/Path.h"
 
+#include <cerrno>
+
 namespace welcomer::local {
 
 namespace {
 
 using Dictionary = PropertyList::Dictionary;
 
-constexpr const char* kParentFolders[] = {"/var", "/var/lib"};
 constexpr char kFolder[] = "/var/lib/welcomer";
 constexpr char kFileName[] = "network.plist";
 constexpr mode_t kFolderMode = 0755; // everybody may read it
@@ -184,20 +185,18 @@ void setConfiguration(Dictionary& content, const std::string& serviceID, const s
 } // namespace networkfile
 
 Dictionary NetworkFile::read() const {
-    return readPreferenceFile(_root.locate(platform::joinPath(kFolder, kFileName))).values;
+    return readPreferenceFile(_root, platform::joinPath(kFolder, kFileName)).values;
 }
 
 std::int32_t NetworkFile::change(const std::vector<std::function<void(Dictionary&)>>& changes,
                                  Dictionary& content) const {
-    for (const char* parent : kParentFolders) {
-        makeDirectory(_root.locate(parent), kFolderMode); // fails where it exists; opening says the rest
-    }
-    const std::string path = _root.locate(kFolder);
-    const LockedPreferenceFolder folder(path, kFolderMode, kFileMode);
+    makeDirectories(_root, kFolder, kFolderMode);
+    LockedPreferenceFolder folder(_root, kFolder, machineLockPath(kMachineFilesLock), kFolderMode, kFileMode);
     if (!folder) {
-        return platform::kNetworkConfigWriteFailed;
+        return folder.error().number == ETIMEDOUT ? platform::kNetworkConfigInUse
+                                                  : platform::kNetworkConfigWriteFailed;
     }
-    PreferenceFileContent onDisk = readPreferenceFile(platform::joinPath(path, kFileName));
+    PreferenceFileContent onDisk = readPreferenceFile(_root, platform::joinPath(kFolder, kFileName));
     if (onDisk.state == PreferenceFileContent::State::Unreadable) {
         return platform::kNetworkConfigReadFailed;
     }

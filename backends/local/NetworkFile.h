@@ -66,8 +66,9 @@ void setConfiguration(PropertyList::Dictionary& content, const std::string& serv
 
 } // namespace networkfile
 
-// The file itself. A change takes the folder's lock, merges into what is on disk and replaces the file in one
-// step. A damaged file counts as empty and is set aside before the first change. Any thread and any process.
+// The file itself. A change takes the lock of the folder's files (FileLock.h), merges into what is on disk
+// and replaces the file in one step. A damaged file counts as empty and is set aside before the first change.
+// Any thread and any process.
 class NetworkFile {
   public:
     explicit NetworkFile(RootFolder root) : _root(std::move(root)) {}

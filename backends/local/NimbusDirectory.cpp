@@ -3,7 +3,6 @@
 #include "backends/local/Directory.h"
 #include "backends/local/PasswordHash.h"
 #include "backends/local/PreferenceFile.h"
-#include "backends/local/SystemError.h"
 #include "platform/AccountService.h"
 
 #include <algorithm>
@@ -30,15 +29,6 @@ constexpr mode_t kFolderMode = 0755; // the folder is not for the directory alon
 
 platform::Outcome failure(std::string message) {
     return platform::Outcome::failure({0, std::move(message)});
-}
-
-// Makes the folders above the directory that are missing.
-void makeFolders(const RootFolder& root) {
-    const std::string path = kNimbusDirectoryPath;
-    for (std::size_t slash = path.find('/', 1); slash != std::string::npos;
-         slash = path.find('/', slash + 1)) {
-        makeDirectory(root.locate(path.substr(0, slash)), kFolderMode); // most are there
-    }
 }
 
 NimbusAnswer accountError(std::int64_t error) {
@@ -139,7 +129,7 @@ PropertyList::Dictionary NimbusDirectory::servicesOfNewAccount(const std::string
 }
 
 std::optional<std::vector<std::string>> NimbusDirectory::userNames() const {
-    const PreferenceFileContent file = readPreferenceFile(_root.locate(kNimbusDirectoryPath));
+    const PreferenceFileContent file = readPreferenceFile(_root, kNimbusDirectoryPath);
     std::vector<std::string> names;
     const auto users = file.values.find(kUsersKey);
     const bool isAbsent = users == file.values.end();
@@ -154,7 +144,7 @@ std::optional<std::vector<std::string>> NimbusDirectory::userNames() const {
     return names;
 }
 
-platform::Outcome NimbusDirectory::storeUser(const platform::CloudUser& user) const {
+platform::Outcome NimbusDirectory::writeUser(const platform::CloudUser& user, IfThere ifThere) const {
     const std::optional<std::string> hash = makePasswordHash(user.password);
     if (!hash) {
         return failure("the system can make no hash of this password");
@@ -164,31 +154,31 @@ platform::Outcome NimbusDirectory::storeUser(const platform::CloudUser& user) co
         entry[kMailAddressKey] = *user.mailAddress;
     }
 
-    makeFolders(_root);
-    const std::string path = _root.locate(kNimbusDirectoryPath);
-    const std::size_t slash = path.rfind('/');
-    errno = 0;
-    const LockedPreferenceFolder folder(path.substr(0, slash));
+    const PathParts path = splitPath(kNimbusDirectoryPath);
+    makeDirectories(_root, path.folder, kFolderMode);
+    LockedPreferenceFolder folder(_root, path.folder, machineLockPath(kMachineFilesLock), kFolderMode);
     if (!folder) {
-        return systemOutcome("cannot write to " + path.substr(0, slash), errno != 0 ? errno : EIO);
+        return platform::Outcome::failure(folder.error());
     }
-    PreferenceFileContent file = readPreferenceFile(path);
+    const std::string shown = _root.shown(kNimbusDirectoryPath);
+    PreferenceFileContent file = readPreferenceFile(_root, kNimbusDirectoryPath);
     if (file.state != PreferenceFileContent::State::Whole) {
-        return failure(path + ": " + file.reason);
+        return failure(shown + ": " + file.reason);
     }
     PropertyList& users = file.values.emplace(kUsersKey, PropertyList::Dictionary{}).first->second;
     if (!users.isDictionary()) {
-        return failure(path + ": " + kUsersKey + " is no dictionary");
+        return failure(shown + ": " + kUsersKey + " is no dictionary");
     }
-    (*users.dictionary())[user.name] = std::move(entry);
-    errno = 0;
-    return folder.write(path.substr(slash + 1), file.values)
-               ? platform::Outcome::success()
-               : systemOutcome("cannot write " + path, errno != 0 ? errno : EIO);
+    if (ifThere == IfThere::Fail && users.dictionary()->contains(user.name)) {
+        return platform::Outcome::failure({EEXIST, shown + ": the user " + user.name + " exists already"});
+    }
+    users.dictionary()->insert_or_assign(user.name, std::move(entry));
+    return folder.write(path.name, file.values) ? platform::Outcome::success()
+                                                : platform::Outcome::failure(folder.error());
 }
 
 std::optional<PropertyList::Dictionary> NimbusDirectory::_users() const {
-    const PreferenceFileContent file = readPreferenceFile(_root.locate(kNimbusDirectoryPath));
+    const PreferenceFileContent file = readPreferenceFile(_root, kNimbusDirectoryPath);
     const auto users = file.values.find(kUsersKey);
     if (users == file.values.end() || !users->second.isDictionary()) {
         return std::nullopt;

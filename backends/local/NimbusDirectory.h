@@ -52,10 +52,12 @@ class NimbusDirectory {
     // damaged. Any thread.
     std::optional<std::vector<std::string>> userNames() const;
 
-    // Writes a user, in place of all that the directory has about one of that name. A directory that is made
-    // for it is its owner's alone: whoever can read it can try passwords. A damaged one is left as it is. Any
-    // thread and any process.
-    platform::Outcome storeUser(const platform::CloudUser& user) const;
+    // Writes a user. A directory that is made for it is its owner's alone: whoever can read it can try
+    // passwords. A damaged one is left as it is. Any thread and any process.
+    //  ifThere  what is done where the directory has somebody of that name: all that it has about them is
+    //           replaced, or the call fails with EEXIST
+    enum class IfThere { Replace, Fail };
+    platform::Outcome writeUser(const platform::CloudUser& user, IfThere ifThere) const;
 
   private:
     // What the directory has about a user; none when it cannot be read.

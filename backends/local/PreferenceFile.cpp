@@ -3,6 +3,8 @@
 #include "backends/local/AtomicFile.h"
 #include "backends/local/Directory.h"
 #include "backends/local/FileContent.h"
+#include "backends/local/SystemError.h"
+#include "platform/Path.h"
 #include "propertylist/PropertyListReader.h"
 #include "propertylist/PropertyListWriter.h"
 
@@ -52,15 +54,15 @@ void parse(PreferenceFileContent& content) {
 
 } // namespace
 
-PreferenceFileContent readPreferenceFile(const std::string& path) {
+PreferenceFileContent readPreferenceFile(const RootFolder& root, const std::string& path) {
     PreferenceFileContent content;
-    rereadPreferenceFile(path, content);
+    rereadPreferenceFile(root, path, content);
     return content;
 }
 
-void rereadPreferenceFile(const std::string& path, PreferenceFileContent& content) {
+void rereadPreferenceFile(const RootFolder& root, const std::string& path, PreferenceFileContent& content) {
     std::string& bytes = content.otherBytes;
-    const int error = readFile(path, bytes, kMaximumFileSize);
+    const int error = readFile(root, path, bytes, kMaximumFileSize);
     if (error != 0 && error != ENOENT) {
         content = {State::Unreadable, {}, {}, std::generic_category().message(error)};
         return;
@@ -74,29 +76,40 @@ void rereadPreferenceFile(const std::string& path, PreferenceFileContent& conten
     }
 }
 
-LockedPreferenceFolder::LockedPreferenceFolder(const std::string& path, mode_t folderMode, mode_t fileMode)
-    : _fileMode(fileMode) {
-    makeDirectory(path, folderMode); // fails where it exists already; opening says the rest
-    FileDescriptor folder(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    if (folder && lockFolder(folder.get()) == 0) {
-        _folder = std::move(folder);
+LockedPreferenceFolder::LockedPreferenceFolder(const RootFolder& root, const std::string& path,
+                                               const std::string& lockPath, mode_t folderMode,
+                                               mode_t fileMode)
+    : _shownPath(root.shown(path)),
+      _fileMode(fileMode) {
+    makeDirectory(root, path, folderMode); // fails where it exists already; opening says the rest
+    _folder = root.open(path, O_RDONLY | O_DIRECTORY);
+    if (!_folder) {
+        _error = systemError("cannot write to " + _shownPath, errno);
+        return;
     }
+    _lock = FileLock(root, lockPath);
+    _error = _lock.error();
 }
 
 std::optional<std::string> LockedPreferenceFolder::write(const std::string& name,
-                                                         const PropertyList::Dictionary& values) const {
+                                                         const PropertyList::Dictionary& values) {
     std::optional<std::string> bytes = writeXMLPropertyList(values);
+    if (!bytes) {
+        _error = {0, "cannot write " + _shown(name) + ": it would hold a value that XML cannot hold"};
+        return std::nullopt;
+    }
     struct stat present = {};
     const bool isPresent = ::fstatat(_folder.get(), name.c_str(), &present, 0) == 0;
     const mode_t mode = isPresent ? present.st_mode & kPermissions : _fileMode;
     // Syncing the folder too would take as long again, for a change that nothing else relies on.
-    if (bytes && replaceFile(_folder.get(), name, *bytes, mode, AfterCrash::OldOrNew) != 0) {
+    if (const int error = replaceFile(_folder.get(), name, *bytes, mode, AfterCrash::OldOrNew)) {
+        _error = systemError("cannot write " + _shown(name), error);
         bytes.reset();
     }
     return bytes;
 }
 
-std::string LockedPreferenceFolder::setAside(const std::string& name, const std::string& bytes) const {
+std::string LockedPreferenceFolder::setAside(const std::string& name, const std::string& bytes) {
     for (int number = 1; number <= kMaximumDamagedFiles; ++number) {
         std::string other = damagedName(name, number);
         // An empty file of our own takes the name, so that nothing else is overwritten.
@@ -112,10 +125,16 @@ std::string LockedPreferenceFolder::setAside(const std::string& name, const std:
             (errno == EBUSY && _moveContent(name, reserved.get(), bytes))) {
             return other;
         }
+        _error = systemError("cannot set " + _shown(name) + " aside, which is damaged", errno);
         ::unlinkat(_folder.get(), other.c_str(), 0);
-        break;
+        return {};
     }
+    _error = systemError("cannot set " + _shown(name) + " aside, which is damaged", errno);
     return {};
+}
+
+std::string LockedPreferenceFolder::_shown(const std::string& name) const {
+    return platform::joinPath(_shownPath, name);
 }
 
 bool LockedPreferenceFolder::_moveContent(const std::string& name, int destination,

@@ -3,6 +3,9 @@
 #pragma once
 
 #include "backends/local/FileDescriptor.h"
+#include "backends/local/FileLock.h"
+#include "backends/local/RootFolder.h"
+#include "platform/Error.h"
 #include "propertylist/PropertyList.h"
 
 #include <optional>
@@ -26,43 +29,51 @@ struct PreferenceFileContent {
 };
 
 // Reads a domain's file, in any property-list format, without a lock.
-//  path  the file's path on this machine
 // Any thread.
-PreferenceFileContent readPreferenceFile(const std::string& path);
+PreferenceFileContent readPreferenceFile(const RootFolder& root, const std::string& path);
 
 // The same, where it was read before: bytes that did not change are not parsed again.
 //  content  what was there before, replaced by what is there now
 // Any thread.
-void rereadPreferenceFile(const std::string& path, PreferenceFileContent& content);
+void rereadPreferenceFile(const RootFolder& root, const std::string& path, PreferenceFileContent& content);
 
-// The folder of the domains' files, with its lock held for as long as this lives. One thread at a time.
+// The folder of the domains' files, with the lock of all of them held for as long as this lives. One thread
+// at a time.
 class LockedPreferenceFolder {
   public:
-    // Opens the folder, a path of this machine, making it where it is missing, and waits for the other
-    // writers.
+    // Opens the folder, making it where it is missing, and waits for the other writers.
+    //  lockPath              of the lock file (FileLock.h)
     //  folderMode, fileMode  the permissions of a new folder and of its new files; the user's alone unless
     //                        given
-    explicit LockedPreferenceFolder(const std::string& path, mode_t folderMode = 0700,
-                                    mode_t fileMode = 0600);
+    LockedPreferenceFolder(const RootFolder& root, const std::string& path, const std::string& lockPath,
+                           mode_t folderMode = 0700, mode_t fileMode = 0600);
 
-    // Whether all of that succeeded; without it nothing below may be called.
-    explicit operator bool() const { return static_cast<bool>(_folder); }
+    // Whether all of that succeeded; without it nothing below but `error` may be called.
+    explicit operator bool() const { return static_cast<bool>(_lock); }
+
+    // What failed last, with the path and the reason, in one line.
+    const platform::Error& error() const { return _error; }
 
     // Replaces a file's content, all or nothing. The file keeps its permissions.
     //  result  the file's new bytes, none when the values cannot be written
-    std::optional<std::string> write(const std::string& name, const PropertyList::Dictionary& values) const;
+    std::optional<std::string> write(const std::string& name, const PropertyList::Dictionary& values);
 
     // Gives a damaged file another name, one that is free. A mount point keeps its name and its content is
     // moved.
     //  bytes   its content
     //  result  the other name, empty when that failed; the file is then unchanged
-    std::string setAside(const std::string& name, const std::string& bytes) const;
+    std::string setAside(const std::string& name, const std::string& bytes);
 
   private:
     bool _moveContent(const std::string& name, int destination, const std::string& bytes) const;
 
+    std::string _shown(const std::string& name) const;
+
+    const std::string _shownPath; // of the folder
     const mode_t _fileMode;
     FileDescriptor _folder;
+    FileLock _lock;
+    platform::Error _error;
 };
 
 } // namespace welcomer::local

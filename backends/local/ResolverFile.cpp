@@ -1,8 +1,10 @@
 #include "backends/local/ResolverFile.h"
 
 #include "backends/local/AtomicFile.h"
+#include "backends/local/Directory.h"
 #include "backends/local/FileContent.h"
 #include "backends/local/FileDescriptor.h"
+#include "backends/local/FileLock.h"
 #include "platform/FileSystem.h"
 #include "platform/NetworkConfigStore.h"
 
@@ -19,6 +21,8 @@ constexpr char kFolder[] = "/etc";
 constexpr char kName[] = "resolv.conf";
 constexpr char kPath[] = "/etc/resolv.conf";
 constexpr mode_t kMode = 0644;
+constexpr char kLocksParent[] = "/var/lib/welcomer";
+constexpr mode_t kLocksParentMode = 0755;
 constexpr mode_t kPermissions = 07777;
 constexpr std::string_view kBlanks = " \t\r";
 constexpr std::string_view kServer = "nameserver";
@@ -102,16 +106,22 @@ std::string replaceResolverServers(std::string_view text, const std::vector<std:
 
 ResolverConfiguration ResolverFile::read() const {
     std::string text;
-    if (readFile(_root.locate(kPath), text, platform::kMaximumTextSize) != 0) {
+    if (readFile(_root, kPath, text, platform::kMaximumTextSize) != 0) {
         return {};
     }
     return readResolverText(text);
 }
 
 std::int32_t ResolverFile::writeServers(const std::vector<std::string>& servers) const {
-    const FileDescriptor folder(::open(_root.locate(kFolder).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    if (!folder || lockFolder(folder.get()) != 0) {
+    const FileDescriptor folder = _root.open(kFolder, O_RDONLY | O_DIRECTORY);
+    if (!folder) {
         return platform::kNetworkConfigNameServersNotWritten;
+    }
+    makeDirectories(_root, kLocksParent, kLocksParentMode);
+    const FileLock lock(_root, machineLockPath(kName));
+    if (!lock) {
+        return lock.error().number == ETIMEDOUT ? platform::kNetworkConfigInUse
+                                                : platform::kNetworkConfigNameServersNotWritten;
     }
     struct stat status = {};
     const bool isThere = ::fstatat(folder.get(), kName, &status, AT_SYMLINK_NOFOLLOW) == 0;
@@ -119,7 +129,7 @@ std::int32_t ResolverFile::writeServers(const std::vector<std::string>& servers)
         return platform::kNetworkConfigNameServersElsewhere;
     }
     std::string text;
-    const int error = readFile(_root.locate(kPath), text, platform::kMaximumTextSize);
+    const int error = readFile(_root, kPath, text, platform::kMaximumTextSize);
     if (error != 0 && error != ENOENT) {
         return platform::kNetworkConfigNameServersNotWritten;
     }

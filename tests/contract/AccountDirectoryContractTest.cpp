@@ -11,9 +11,11 @@
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeNotificationCenter.h"
 #include "tests/fakes/FakeProcessIdentity.h"
+#include "tests/fakes/FakeSystemLog.h"
 
 #include <gtest/gtest.h>
 
+#include <cerrno>
 #include <string>
 #include <sys/stat.h>
 #include <thread>
@@ -35,9 +37,10 @@ struct Local {
     fakes::FakeProcessIdentity identity{recorder, fileSystem};
     SimulatedTime time;
     local::LocalNotificationCenter center;
-    local::LocalAccountService service{local::RootFolder(root.path()), identity, time.runLoops,
-                                       time.dispatchQueues, center};
-    local::LocalAccountDirectory directory{local::RootFolder(root.path()), identity};
+    fakes::FakeSystemLog log{recorder};
+    local::LocalAccountService service{
+        local::RootFolder(root.path()), identity, time.runLoops, time.dispatchQueues, center, log};
+    local::LocalAccountDirectory directory{local::RootFolder(root.path()), identity, log};
 };
 
 struct Fake {
@@ -84,6 +87,14 @@ TYPED_TEST(AccountDirectoryContract, UsersComeInOrderAndOnceEach) {
     EXPECT_EQ(this->backend.directory.accounts(), Names{});
 }
 
+TYPED_TEST(AccountDirectoryContract, OfTwoThatAddAUserOneSucceeds) {
+    EXPECT_TRUE(this->backend.directory.addUser({"anna", "secret", std::nullopt, {}}));
+    const Outcome outcome = this->backend.directory.addUser({"anna", "other", std::nullopt, {}});
+    EXPECT_FALSE(outcome);
+    EXPECT_EQ(outcome.error.number, EEXIST);
+    EXPECT_EQ(this->backend.directory.users(), Names{"anna"});
+}
+
 class LocalAccountDirectoryTest : public testing::Test {
   protected:
     local::NimbusAnswer answer(const std::string& name, const std::string& password) const {
@@ -124,6 +135,19 @@ TEST_F(LocalAccountDirectoryTest, AStoredUserReplacesAllThatWasThereAboutIt) {
                   ->serviceForID(kSKServiceIDMail)
                   ->propertyValue(kSKPropertyMailEmailAddress),
               std::nullopt);
+}
+
+TEST_F(LocalAccountDirectoryTest, AUserWhoIsThereKeepsThePasswordWhenAddedAgain) {
+    ASSERT_TRUE(local.directory.addUser(anna));
+    ASSERT_FALSE(local.directory.addUser({"anna", "other", std::nullopt, {}}));
+    EXPECT_TRUE(answer("anna", "secret").isCompleted);
+}
+
+TEST_F(LocalAccountDirectoryTest, AValueThatXMLCannotHoldIsTheReason) {
+    const Outcome outcome = local.directory.addUser({"anna", "secret", "a\x01", {}});
+    EXPECT_FALSE(outcome);
+    EXPECT_EQ(outcome.error.message, "cannot write " + local.root.locate(local::kNimbusDirectoryPath) +
+                                         ": it would hold a value that XML cannot hold");
 }
 
 TEST_F(LocalAccountDirectoryTest, ThePasswordIsNotInTheFileWhichIsItsOwnersAlone) {

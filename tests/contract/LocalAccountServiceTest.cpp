@@ -115,7 +115,8 @@ class LocalAccountServiceTest : public testing::Test {
     fakes::FakeFileSystem fileSystem{recorder};
     fakes::FakeProcessIdentity identity{recorder, fileSystem};
     local::LocalNotificationCenter center;
-    local::LocalAccountService service{local::RootFolder(root.path()), identity, time, time, center};
+    fakes::FakeSystemLog log{recorder};
+    local::LocalAccountService service{local::RootFolder(root.path()), identity, time, time, center, log};
     std::vector<Notification> notifications;
     std::vector<std::unique_ptr<NotificationObservation>> observations;
 };
@@ -273,6 +274,9 @@ TEST_F(LocalAccountServiceTest, ASignInThatCannotBeStoredFails) {
     root.addFile(kFolder, "a file in the folder's place");
     EXPECT_EQ(signIn().name, kSKNotificationSignInFailed);
     EXPECT_EQ(accountError(notifications.back()), PropertyList(kSKAccountErrorNotStored));
+    const std::string reason = "cannot write to " + root.locate(kFolder) + ": Not a directory";
+    EXPECT_EQ(notifications.back().contents.at(kSKPropertyAccountErrorInfo), PropertyList(reason));
+    EXPECT_EQ(log.lines(), std::vector<std::string>{"The accounts could not be stored: " + reason});
     EXPECT_EQ(service.loggedInAccount(), nullptr);
 }
 
@@ -293,7 +297,7 @@ TEST_F(LocalAccountServiceTest, AnAnswerThatComesAfterTheServiceIsGoneIsDropped)
     addUser("anna", {{"DelaySeconds", 1}});
     {
         local::LocalNotificationCenter ownCenter;
-        local::LocalAccountService own{local::RootFolder(root.path()), identity, time, time, ownCenter};
+        local::LocalAccountService own{local::RootFolder(root.path()), identity, time, time, ownCenter, log};
         own.authenticate("anna", "secret", {});
     }
     time.current()->run(2s);
@@ -374,8 +378,8 @@ TEST_F(LocalAccountServiceTest, AQuestionIsAnsweredFromTheFileAsAnotherProcessHa
     const auto contacts = account->serviceForID(kSKServiceIDContacts);
     for (const bool enabled : {true, false, true}) {
         EXPECT_EQ(waitFor(start([&] {
-                      local::LocalAccountService other{local::RootFolder(root.path()), identity, time, time,
-                                                       center};
+                      local::LocalAccountService other{
+                          local::RootFolder(root.path()), identity, time, time, center, log};
                       other.accountForID("anna", false)
                           ->serviceForID(kSKServiceIDContacts)
                           ->enableSilently(enabled);
@@ -506,8 +510,6 @@ class LocalSignInTest : public LocalAccountServiceTest {
         return result;
     }
 
-    fakes::CallRecorder logRecorder;
-    fakes::FakeSystemLog log{logRecorder};
     local::LocalPlatform owner;
     ScopedPlatform installed;
 };

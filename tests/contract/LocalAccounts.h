@@ -10,6 +10,7 @@
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeProcessIdentity.h"
+#include "tests/fakes/FakeSystemLog.h"
 
 #include <string>
 
@@ -39,8 +40,9 @@ struct LocalAccounts {
     fakes::FakeFileSystem fileSystem{recorder};
     fakes::FakeProcessIdentity identity{recorder, fileSystem};
     local::LocalNotificationCenter center;
-    local::LocalAccountService service{local::RootFolder(root.path()), identity, time.runLoops,
-                                       time.dispatchQueues, center};
+    fakes::FakeSystemLog log{recorder};
+    local::LocalAccountService service{
+        local::RootFolder(root.path()), identity, time.runLoops, time.dispatchQueues, center, log};
 };
 
 } // namespace welcomer::contract

@@ -5,6 +5,7 @@
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeProcessIdentity.h"
+#include "tests/fakes/FakeSystemLog.h"
 #include "tests/support/MountNamespace.h"
 
 #include <gtest/gtest.h>
@@ -52,7 +53,7 @@ class LocalPreferenceStoreTest : public testing::Test {
 
     // Stores one value as another process.
     bool storeElsewhere(const std::string& key, const PropertyList& value) {
-        local::LocalPreferenceStore other(local::RootFolder(root.path()), identity);
+        local::LocalPreferenceStore other(local::RootFolder(root.path()), identity, log);
         other.setValue(key, value, kDomain);
         return other.synchronise(kDomain);
     }
@@ -77,7 +78,8 @@ class LocalPreferenceStoreTest : public testing::Test {
     fakes::CallRecorder recorder;
     fakes::FakeFileSystem fileSystem{recorder};
     fakes::FakeProcessIdentity identity{recorder, fileSystem};
-    local::LocalPreferenceStore store{local::RootFolder(root.path()), identity};
+    fakes::FakeSystemLog log{recorder};
+    local::LocalPreferenceStore store{local::RootFolder(root.path()), identity, log};
 };
 
 // The file
@@ -146,7 +148,7 @@ TEST_F(LocalPreferenceStoreTest, ANameThatIsNoDomainsIsAlwaysEmptyAndNeverSynchr
         store.setValue("Key", 1, name);
         EXPECT_FALSE(store.synchronise(name));
         EXPECT_EQ(
-            local::LocalPreferenceStore(local::RootFolder(root.path()), identity).copyValue("Key", name),
+            local::LocalPreferenceStore(local::RootFolder(root.path()), identity, log).copyValue("Key", name),
             std::nullopt);
     }
     EXPECT_EQ(root.names("/home/user/Library"), Names());
@@ -332,7 +334,7 @@ TEST_F(LocalPreferenceStoreTest, ProcessesThatSetDifferentKeysThousandsOfTimesLo
     std::vector<pid_t> children;
     for (int process = 0; process < kProcesses; ++process) {
         children.push_back(start([&, process] {
-            local::LocalPreferenceStore own(local::RootFolder(root.path()), identity);
+            local::LocalPreferenceStore own(local::RootFolder(root.path()), identity, log);
             for (int round = 0; round < kRounds; ++round) {
                 own.setValue(keyOf(process, round), round, kDomain);
                 if (!own.synchronise(kDomain)) {
@@ -376,7 +378,7 @@ TEST_F(LocalPreferenceStoreTest, KilledAtAnySystemCallOfSynchronisingItLeavesThe
     int calls = 0;
     for (int current = 0; !finished; ++calls) {
         ASSERT_LT(calls, 1000);
-        local::LocalPreferenceStore own(local::RootFolder(root.path()), identity);
+        local::LocalPreferenceStore own(local::RootFolder(root.path()), identity, log);
         own.setValue("First", current + 1, kDomain);
         own.setValue("Last", current + 1, kDomain);
         const pid_t child = start([&] {

@@ -30,7 +30,7 @@ struct OnlineAccountBackend {
                                                    return std::make_unique<local::LocalAccountService>(
                                                        local::RootFolder(embedded.root.path()),
                                                        embedded.identity, time.runLoops, time.dispatchQueues,
-                                                       posts);
+                                                       posts, embedded.log);
                                                },
                                                preferenceStore, time.runLoops, time.dispatchQueues, center},
             cloud);

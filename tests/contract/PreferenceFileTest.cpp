@@ -26,7 +26,7 @@ std::string fileWith(const std::string& text) {
 // Brings the content from any state into any other.
 class PreferenceFileTest : public testing::Test {
   protected:
-    void reread() { rereadPreferenceFile(root.locate(kName), content); }
+    void reread() { rereadPreferenceFile(RootFolder(root.path()), kName, content); }
     void rereadWith(const std::string& bytes) {
         removeFile();
         root.addFile(kName, bytes);

@@ -5,6 +5,7 @@
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakePreferenceStore.h"
 #include "tests/fakes/FakeProcessIdentity.h"
+#include "tests/fakes/FakeSystemLog.h"
 
 #include <gtest/gtest.h>
 
@@ -49,7 +50,7 @@ class LocalBackend final : public Backend {
     LocalBackend() { _root.addDirectory("/home/user/Library"); }
     platform::PreferenceStore& store() override { return _store; }
     void storeElsewhere(const std::string& key, const std::optional<PropertyList>& value) override {
-        local::LocalPreferenceStore other(local::RootFolder(_root.path()), _identity);
+        local::LocalPreferenceStore other(local::RootFolder(_root.path()), _identity, _log);
         if (value) {
             other.setValue(key, *value, kDomain);
         } else {
@@ -58,7 +59,7 @@ class LocalBackend final : public Backend {
         ASSERT_TRUE(other.synchronise(kDomain));
     }
     std::optional<PropertyList> readElsewhere(const std::string& key) override {
-        return local::LocalPreferenceStore(local::RootFolder(_root.path()), _identity)
+        return local::LocalPreferenceStore(local::RootFolder(_root.path()), _identity, _log)
             .copyValue(key, kDomain);
     }
 
@@ -67,7 +68,8 @@ class LocalBackend final : public Backend {
     fakes::CallRecorder _recorder;
     fakes::FakeFileSystem _fileSystem{_recorder};
     fakes::FakeProcessIdentity _identity{_recorder, _fileSystem};
-    local::LocalPreferenceStore _store{local::RootFolder(_root.path()), _identity};
+    fakes::FakeSystemLog _log{_recorder};
+    local::LocalPreferenceStore _store{local::RootFolder(_root.path()), _identity, _log};
 };
 
 template <class BackendType>

@@ -5,6 +5,7 @@
 #include "platform/AccountDirectory.h"
 #include "tests/fakes/FakeAccountService.h"
 
+#include <cerrno>
 #include <map>
 #include <string>
 
@@ -19,6 +20,11 @@ class FakeAccountDirectory final : public platform::AccountDirectory {
 
     std::vector<std::string> accounts() override { return _names(_service.accounts); }
     std::optional<std::vector<std::string>> users() override { return _names(cloudUsers); }
+    platform::Outcome addUser(const platform::CloudUser& user) override {
+        return cloudUsers.try_emplace(user.name, user).second
+                   ? platform::Outcome::success()
+                   : platform::Outcome::failure({EEXIST, "the user " + user.name + " exists already"});
+    }
     platform::Outcome storeUser(const platform::CloudUser& user) override {
         cloudUsers.insert_or_assign(user.name, user);
         return platform::Outcome::success();

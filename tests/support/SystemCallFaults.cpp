@@ -83,14 +83,14 @@ using welcomer::real;
 
 extern "C" {
 
-int access(const char* path, int type) noexcept {
-    static const auto next = real<int(const char*, int)>("access");
-    return mustFail("access") ? -1 : next(path, type);
+int stat(const char* path, struct stat* status) noexcept {
+    static const auto next = real<int(const char*, struct stat*)>("stat");
+    return mustFail("stat") ? -1 : next(path, status);
 }
 
-int chmod(const char* path, mode_t mode) noexcept {
-    static const auto next = real<int(const char*, mode_t)>("chmod");
-    return mustFail("chmod") ? -1 : next(path, mode);
+int fchmodat(int folder, const char* path, mode_t mode, int flags) noexcept {
+    static const auto next = real<int(int, const char*, mode_t, int)>("fchmodat");
+    return mustFail("fchmodat") ? -1 : next(folder, path, mode, flags);
 }
 
 int fchmod(int file, mode_t mode) noexcept {
@@ -118,19 +118,14 @@ int ftruncate(int file, off_t size) noexcept {
     return mustFail("ftruncate") ? -1 : next(file, size);
 }
 
-int link(const char* from, const char* to) noexcept {
-    static const auto next = real<int(const char*, const char*)>("link");
-    return mustFail("link") ? -1 : next(from, to);
+int linkat(int fromFolder, const char* from, int toFolder, const char* to, int flags) noexcept {
+    static const auto next = real<int(int, const char*, int, const char*, int)>("linkat");
+    return mustFail("linkat") ? -1 : next(fromFolder, from, toFolder, to, flags);
 }
 
-int mkdir(const char* path, mode_t mode) noexcept {
-    static const auto next = real<int(const char*, mode_t)>("mkdir");
-    return mustFail("mkdir") ? -1 : next(path, mode);
-}
-
-int mkostemp(char* pattern, int flags) {
-    static const auto next = real<int(char*, int)>("mkostemp");
-    return mustFail("mkostemp") ? -1 : next(pattern, flags);
+int mkdirat(int folder, const char* path, mode_t mode) noexcept {
+    static const auto next = real<int(int, const char*, mode_t)>("mkdirat");
+    return mustFail("mkdirat") ? -1 : next(folder, path, mode);
 }
 
 int open(const char* path, int flags, ...) {

@@ -1,8 +1,8 @@
 // Has the system calls of this test program fail, or the process end, at a chosen one.
 //
-// A program that links SystemCallFaults.cpp makes its own calls of access, chmod, fchmod, fstat, fsync,
-// flock, ftruncate, link, mkdir, mkostemp, open, openat, posix_fallocate, read, renameat, unlink, unlinkat
-// and write through this counter; those that the C library makes within itself are not seen. One thread at a
+// A program that links SystemCallFaults.cpp makes its own calls of fchmod, fchmodat, fstat, fsync, flock,
+// ftruncate, linkat, mkdirat, open, openat, posix_fallocate, read, renameat, stat, unlink, unlinkat and
+// write through this counter; those that the C library makes within itself are not seen. One thread at a
 // time.
 
 #pragma once

@@ -2,10 +2,12 @@
 
 #include <array>
 #include <cerrno>
+#include <cstdio>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <system_error>
 #include <unistd.h>
+#include <utility>
 
 namespace welcomer::resolver {
 
@@ -19,26 +21,62 @@ struct flock wholeFile(short type) {
     return lock;
 }
 
+// A descriptor that closes itself unless it is taken.
+class File {
+  public:
+    explicit File(int descriptor) : _descriptor(descriptor) {}
+    ~File() {
+        if (_descriptor >= 0) {
+            ::close(_descriptor);
+        }
+    }
+    File(const File&) = delete;
+    File& operator=(const File&) = delete;
+
+    int get() const { return _descriptor; }
+    int take() { return std::exchange(_descriptor, -1); }
+
+  private:
+    int _descriptor;
+};
+
+bool isAt(int file, const std::string& path) {
+    struct stat opened = {};
+    struct stat present = {};
+    return ::fstat(file, &opened) == 0 && ::lstat(path.c_str(), &present) == 0 &&
+           opened.st_ino == present.st_ino && opened.st_dev == present.st_dev;
+}
+
 int openLocked(const std::string& path) {
-    const int file = ::open(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_CLOEXEC, 0644);
-    if (file < 0) {
-        throw std::system_error(errno, std::generic_category(), path);
+    // Until it has its own name the file is its owner's alone, and its lock the right to take that name.
+    const std::string fresh = path + ".new";
+    while (true) {
+        File file(::open(fresh.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_CLOEXEC, 0600));
+        if (file.get() < 0) {
+            throw std::system_error(errno, std::generic_category(), path);
+        }
+        struct flock lock = wholeFile(F_WRLCK);
+        if (::fcntl(file.get(), F_OFD_SETLK, &lock) != 0) {
+            throw std::system_error(errno, std::generic_category(), path + " is held by another service");
+        }
+        if (!isAt(file.get(), fresh)) {
+            continue; // another service has had it meanwhile
+        }
+        if (readRunningMark(path).runs) {
+            ::unlink(fresh.c_str());
+            throw std::system_error(EAGAIN, std::generic_category(), path + " is held by another service");
+        }
+        if (::ftruncate(file.get(), 0) != 0 || ::rename(fresh.c_str(), path.c_str()) != 0 ||
+            ::fchmod(file.get(), 0644) != 0) {
+            throw std::system_error(errno, std::generic_category(), path);
+        }
+        return file.take();
     }
-    struct flock lock = wholeFile(F_WRLCK);
-    if (::fcntl(file, F_OFD_SETLK, &lock) != 0) {
-        const int number = errno;
-        ::close(file);
-        throw std::system_error(number, std::generic_category(), path + " is held by another service");
-    }
-    return file;
 }
 
 } // namespace
 
-RunningMark::RunningMark(const std::string& path) : _path(path), _file(openLocked(path)) {
-    // What one that was killed has left.
-    static_cast<void>(::ftruncate(_file, 0));
-}
+RunningMark::RunningMark(const std::string& path) : _path(path), _file(openLocked(path)) {}
 
 RunningMark::~RunningMark() {
     ::unlink(_path.c_str());

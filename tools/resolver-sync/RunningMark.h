@@ -9,7 +9,8 @@ namespace welcomer::resolver {
 inline constexpr const char* kRunningMark = "/run/welcomer-resolver-sync.state";
 
 // A file that the service holds locked as long as it lives, so that a service that was killed is not taken
-// for one that runs. It is removed at the service's own end.
+// for one that runs. Everybody may read it, and so may lock it for reading: it is made anew by each service,
+// and locked before anybody else can open it. It is removed at the service's own end.
 class RunningMark {
   public:
     // Throws std::system_error when the file cannot be made, or when another service holds it.

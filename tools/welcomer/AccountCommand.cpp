@@ -4,6 +4,7 @@
 #include "platform/Platform.h"
 #include "plugins/DelegateIdentifiers.h"
 #include "plugins/WLNimbusDelegatesRequest.h"
+#include "propertylist/UTF8.h"
 #include "tools/welcomer/Commands.h"
 #include "tools/welcomer/Password.h"
 #include "tools/welcomer/Printable.h"
@@ -14,6 +15,7 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
+#include <cerrno>
 #include <memory>
 #include <ostream>
 #include <set>
@@ -40,6 +42,38 @@ void refuseEmpty(const std::string& user) {
     }
 }
 
+// Whether a text that is UTF-8 has a control character: U+0000 to U+001F and U+007F to U+009F.
+bool hasControlCharacter(const std::string& text) {
+    bool isAfterC2 = false; // the lead byte of U+0080 to U+00BF
+    return std::ranges::any_of(text, [&](char each) {
+        const auto byte = static_cast<unsigned char>(each);
+        const bool isControl = byte < 0x20 || byte == 0x7F || (isAfterC2 && byte < 0xA0);
+        isAfterC2 = byte == 0xC2;
+        return isControl;
+    });
+}
+
+// Refuses names that nobody could type, or that would be taken for an option or a path.
+void refuseUnusable(const std::string& user) {
+    refuseEmpty(user);
+    if (user.starts_with('-')) {
+        throw UsageError("a user's name does not begin with \"-\": " + user);
+    }
+    if (user.find('/') != std::string::npos) {
+        throw UsageError("a user's name holds no slash: " + user);
+    }
+    if (const std::size_t offset = findInvalidXMLText(user); offset != std::string::npos) {
+        throw UsageError("a user's name cannot hold " + describeInvalidXMLText(user, offset) + ": " + user);
+    }
+    if (hasControlCharacter(user)) {
+        throw UsageError("a user's name holds no control character: " + user);
+    }
+}
+
+CommandFailure existsAlready(const std::string& user) {
+    return CommandFailure("the user " + user + " exists already");
+}
+
 // What the server will answer: a response for every delegate that the system knows, with the aliases on offer
 // for those that have aliases.
 PropertyList::Dictionary responseFor(const std::vector<std::string>& aliases) {
@@ -55,11 +89,12 @@ PropertyList::Dictionary responseFor(const std::vector<std::string>& aliases) {
 }
 
 void add(Session& session, const AddArguments& arguments) {
-    refuseEmpty(arguments.user);
+    refuseUnusable(arguments.user);
     platform::AccountDirectory& directory = platform::current().accountDirectory;
+    // So that nobody is asked for a password in vain; adding decides.
     const auto users = directory.users();
     if (users && std::ranges::find(*users, arguments.user) != users->end()) {
-        throw CommandFailure("the user " + arguments.user + " exists already");
+        throw existsAlready(arguments.user);
     }
     const std::string password =
         getNewPassword(arguments.password, "New password for " + arguments.user + ":");
@@ -67,8 +102,10 @@ void add(Session& session, const AddArguments& arguments) {
     if (!arguments.mailAddress.empty()) {
         user.mailAddress = arguments.mailAddress;
     }
-    if (const platform::Outcome outcome = directory.storeUser(user); !outcome) {
-        throw CommandFailure("cannot add " + arguments.user + ": " + outcome.error.message);
+    if (const platform::Outcome outcome = directory.addUser(user); !outcome) {
+        throw outcome.error.number == EEXIST
+            ? existsAlready(arguments.user)
+            : CommandFailure("cannot add " + arguments.user + ": " + outcome.error.message);
     }
     if (session.options.json) {
         printJson(session.out, {{"user", arguments.user}, {"added", true}});

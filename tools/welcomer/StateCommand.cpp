@@ -71,9 +71,9 @@ WLPerUserState& recordToChange() {
     return WLPerUserState::currentPerUserState();
 }
 
-void storeRecord() {
+void storeRecord(const Session& session) {
     if (!WLPerUserState::currentPerUserState().writeToDefaults()) {
-        throw CommandFailure("the record could not be stored in the preferences");
+        throw CommandFailure("the record could not be stored: " + session.log.reason());
     }
 }
 
@@ -121,7 +121,7 @@ void set(Session& session, const std::string& name, const std::string& value) {
     } else {
         (state.*key.setText)(value);
     }
-    storeRecord();
+    storeRecord(session);
     if (session.options.json) {
         printJson(session.out, {{"key", name}, {"value", stored}});
     } else {
@@ -137,7 +137,7 @@ void remove(Session& session, const std::string& name) {
     } else {
         (state.*key.setText)(std::nullopt);
     }
-    storeRecord();
+    storeRecord(session);
     if (session.options.json) {
         printJson(session.out, {{"key", name}, {"removed", true}});
     } else {
@@ -152,7 +152,7 @@ void recordSeen(Session& session, const std::string& setup) {
     } else {
         WLRecordSyncSetupSeen();
     }
-    storeRecord();
+    storeRecord(session);
     if (session.options.json) {
         printJson(session.out, {{"seen", setup}});
     } else {

@@ -2,10 +2,6 @@
 
 #include <algorithm>
 #include <array>
-#include <cerrno>
-#include <fcntl.h>
-#include <sys/file.h>
-#include <unistd.h>
 #include <utility>
 
 #define GOA_API_IS_SUBJECT_TO_CHANGE
@@ -20,7 +16,6 @@ constexpr char kObjectManagerPath[] = "/org/gnome/OnlineAccounts";
 constexpr char kManagerPath[] = "/org/gnome/OnlineAccounts/Manager";
 constexpr char kManagerInterface[] = "org.gnome.OnlineAccounts.Manager";
 constexpr char kAccountInterface[] = "org.gnome.OnlineAccounts.Account";
-constexpr char kLockFileName[] = "welcomer-online-accounts.lock";
 
 constexpr int kWriteMilliseconds = 25 * 1000;
 constexpr int kMakeMilliseconds = 120 * 1000;
@@ -80,29 +75,6 @@ class PrivateMainContext {
 
   private:
     GMainContext* const _context = g_main_context_new();
-};
-
-// Keeps other threads out, and the user's other processes where the runtime folder can be written.
-class UserLock {
-  public:
-    UserLock() {
-        const CString path(g_build_filename(g_get_user_runtime_dir(), kLockFileName, nullptr));
-        _file = ::open(path.get(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
-        while (_file >= 0 && ::flock(_file, LOCK_EX) != 0 && errno == EINTR) {
-        }
-    }
-    ~UserLock() {
-        if (_file >= 0) {
-            ::close(_file);
-        }
-    }
-    UserLock(const UserLock&) = delete;
-    UserLock& operator=(const UserLock&) = delete;
-
-  private:
-    static inline std::mutex _threads;
-    const std::lock_guard<std::mutex> _guard{_threads};
-    int _file = -1;
 };
 
 // By OnlineFeature: what the account's switch, the feature's interface, and the detail of a new account are
@@ -237,7 +209,11 @@ bool GoaOnlineAccounts::makeOnce(const NewOnlineAccount& account) noexcept {
     if (!canBeSent(account.identity) || !canBeSent(account.password)) {
         return false;
     }
-    const UserLock lock;
+    const std::lock_guard threads(_making);
+    const local::FileLock lock = _lock();
+    if (!lock) {
+        return false;
+    }
     const auto accounts = list();
     if (!accounts) {
         return false;

@@ -3,11 +3,14 @@
 #pragma once
 
 #include "backends/desktop/OnlineAccounts.h"
+#include "backends/local/FileLock.h"
 
 #include <atomic>
+#include <functional>
 #include <gio/gio.h>
 #include <memory>
 #include <mutex>
+#include <utility>
 
 namespace welcomer::desktop {
 
@@ -19,6 +22,9 @@ namespace welcomer::desktop {
 // same, and has the user give it again.
 class GoaOnlineAccounts final : public OnlineAccounts {
   public:
+    //  lock  keeps the user's other processes out, asked when an account is to be made
+    explicit GoaOnlineAccounts(std::function<local::FileLock()> lock) : _lock(std::move(lock)) {}
+
     std::optional<std::vector<OnlineAccount>> list() noexcept override;
     bool setFeature(const OnlineAccount& account, OnlineFeature feature, bool isOn) noexcept override;
     bool makeOnce(const NewOnlineAccount& account) noexcept override;
@@ -32,6 +38,8 @@ class GoaOnlineAccounts final : public OnlineAccounts {
     Connection _connection();
     bool _add(const NewOnlineAccount& account);
 
+    const std::function<local::FileLock()> _lock;
+    std::mutex _making; // keeps other threads out
     std::mutex _mutex;
     Connection _bus; // the last one; closed when the bus has gone
     std::atomic<bool> _isGivenUp{false};

@@ -7,14 +7,14 @@ namespace welcomer::desktop {
 namespace {
 
 // Whether the daemon serves is asked with every question.
-std::unique_ptr<OnlineAccounts> createOnlineAccounts(const OnlineAccountsModule::Arguments& /*arguments*/,
+std::unique_ptr<OnlineAccounts> createOnlineAccounts(const OnlineAccountsModule::Arguments& arguments,
                                                      std::string& /*whyNot*/) {
-    return std::make_unique<GoaOnlineAccounts>();
+    return std::make_unique<GoaOnlineAccounts>(arguments.lock);
 }
 
-bool describeOnlineAccounts(const OnlineAccountsModule::Arguments& /*arguments*/,
+bool describeOnlineAccounts(const OnlineAccountsModule::Arguments& arguments,
                             platform::BackendReport& report) {
-    const auto accounts = GoaOnlineAccounts().list();
+    const auto accounts = GoaOnlineAccounts(arguments.lock).list();
     if (!accounts) {
         report.reason = "no daemon of GNOME Online Accounts answers on the session bus";
         report.advice = "install gnome-online-accounts, and run within a desktop session";

@@ -25,7 +25,9 @@ struct OnlineAccountSession {
 
     TemporaryRoot folder;
     DesktopSession session{folder.path()};
-    desktop::DesktopModule<desktop::OnlineAccountsModule> module{{}};
+    desktop::DesktopModule<desktop::OnlineAccountsModule> module{{[this] {
+        return local::FileLock(local::RootFolder(folder.path()), "/locks/online-accounts");
+    }}};
 };
 
 // Everything runs.

@@ -17,12 +17,16 @@ int main(int argumentCount, char** arguments) {
     fakes::FakeFileSystem fileSystem(recorder);
     fakes::FakeProcessIdentity identity(recorder, fileSystem);
     fakes::FakePreferenceStore preferenceStore(recorder);
+    fakes::FakeSystemLog log(recorder);
     local::LocalNotificationCenter center;
-    desktop::DesktopModule<desktop::OnlineAccountsModule> module({});
+    desktop::DesktopModule<desktop::OnlineAccountsModule> module({[&] {
+        return local::FileLock(root, "/online-accounts/lock");
+    }});
     desktop::OnlineAccountService service({[&] { return module.service(); },
                                            [&](platform::NotificationCenter& posts) {
                                                return std::make_unique<local::LocalAccountService>(
-                                                   root, identity, time.runLoops, time.dispatchQueues, posts);
+                                                   root, identity, time.runLoops, time.dispatchQueues, posts,
+                                                   log);
                                            },
                                            preferenceStore, time.runLoops, time.dispatchQueues, center},
                                           {"owncloud", "http://127.0.0.1:9/"});

@@ -136,14 +136,16 @@ TEST_F(LocalCredentialStoreWithLibraryTest, FindingInAStoreThatDoesNotExistCreat
 }
 
 TEST_F(LocalCredentialStoreWithLibraryTest, FindingInAStoreThatDoesNotExistIsOneSystemCall) {
+    LocalCredentialStore whole{RootFolder("/"), identity};
+    identity.setHomeDirectory(root.locate(kHome));
     SystemCallFaults::count();
-    statusOf("account");
-    EXPECT_EQ(SystemCallFaults::stop(), Names{"access"});
+    whole.findItem("service", "account", nullptr, nullptr);
+    EXPECT_EQ(SystemCallFaults::stop(), Names{"stat"});
 
     root.addDirectory(kFolder);
     SystemCallFaults::count();
-    statusOf("account");
-    EXPECT_EQ(SystemCallFaults::stop(), Names{"access"});
+    whole.findItem("service", "account", nullptr, nullptr);
+    EXPECT_EQ(SystemCallFaults::stop(), Names{"stat"});
 }
 
 TEST_F(LocalCredentialStoreWithLibraryTest, TheFileIsSyncedBeforeItGetsItsNameAndTheFolderAfterwards) {

@@ -35,10 +35,10 @@ const std::string kContent(200000, 'c');
 } // namespace
 
 TEST_F(LocalFileSystemTest, TheDefaultRootLeavesPathsAsTheyAre) {
-    EXPECT_EQ(RootFolder("/").locate("/etc/passwd"), "/etc/passwd");
-    EXPECT_EQ(RootFolder("/").locate("/"), "/");
-    EXPECT_EQ(RootFolder("/some/root/").locate("/etc/"), "/some/root/etc");
-    EXPECT_EQ(RootFolder("/some/root").locate("/"), "/some/root");
+    EXPECT_EQ(RootFolder("/").shown("/etc/passwd"), "/etc/passwd");
+    EXPECT_EQ(RootFolder("/").shown("/"), "/");
+    EXPECT_EQ(RootFolder("/some/root/").shown("/etc/"), "/some/root/etc");
+    EXPECT_EQ(RootFolder("/some/root").shown("/"), "/some/root");
 }
 
 TEST_F(LocalFileSystemTest, AFoldersModeIsExactWhateverTheMask) {
@@ -54,8 +54,9 @@ TEST_F(LocalFileSystemTest, AFoldersModeIsExactWhateverTheMask) {
 }
 
 TEST_F(LocalFileSystemTest, AFolderThatCannotGetItsModeIsNotLeftBehind) {
-    SystemCallFaults::failAt(2, EPERM); // mkdir, then chmod
-    const platform::Outcome outcome = fileSystem.createDirectory("/folder", 0755);
+    LocalFileSystem whole{RootFolder("/")};
+    SystemCallFaults::failAt(2, EPERM); // mkdirat, then fchmodat
+    const platform::Outcome outcome = whole.createDirectory(root.locate("/folder"), 0755);
     SystemCallFaults::stop();
 
     EXPECT_EQ(outcome.error.number, EPERM);
@@ -94,7 +95,7 @@ TEST_F(LocalFileSystemTest, ACopyIsSyncedBeforeItGetsItsName) {
     ASSERT_TRUE(fileSystem.copy("/file", "/copy"));
     const Names calls = SystemCallFaults::stop();
 
-    EXPECT_EQ(Names(calls.end() - 3, calls.end()), (Names{"fsync", "link", "unlink"}));
+    EXPECT_EQ(Names(calls.end() - 3, calls.end()), (Names{"fsync", "linkat", "unlinkat"}));
 }
 
 TEST_F(LocalFileSystemTest, ACopyLeavesNothingBehindWhicheverCallFails) {

@@ -34,7 +34,8 @@ class SearchListCredentialStoreTest : public testing::Test {
     bool serviceIsThere = true;
     SearchListCredentialStore store{[this] { return serviceIsThere ? &service : nullptr; }, local,
                                     [this] {
-                                        return root.locate("/lock");
+                                        return local::FileLock(local::RootFolder(root.path()),
+                                                               "/locks/search");
                                     }};
     std::string data = "untouched";
     std::unique_ptr<platform::CredentialItemReference> reference;
@@ -88,14 +89,15 @@ TEST_F(SearchListCredentialStoreTest, AnItemOfTheLocalStoreIsNotCreatedAgain) {
 }
 
 TEST_F(SearchListCredentialStoreTest, WithoutALockFileNothingIsCreated) {
-    root.addDirectory("/lock");
+    root.addDirectory("/locks/search"); // in the file's place
     EXPECT_EQ(store.createItem(item, "secret"), platform::kCredentialWriteFailed);
     EXPECT_TRUE(service.items().empty());
     EXPECT_TRUE(local.items().empty());
 }
 
 TEST_F(SearchListCredentialStoreTest, ALockFileIsNeverASymbolicLink) {
-    std::filesystem::create_symlink(root.locate("/elsewhere"), root.locate("/lock"));
+    root.addDirectory("/locks");
+    std::filesystem::create_symlink(root.locate("/elsewhere"), root.locate("/locks/search"));
     EXPECT_EQ(store.createItem(item, "secret"), platform::kCredentialWriteFailed);
     EXPECT_FALSE(std::filesystem::exists(root.locate("/elsewhere")));
 }
