@@ -5,11 +5,9 @@ usage: other_users_test.py BUILD_DIR
 """
 
 import ctypes
-import fcntl
 import os
 import plistlib
 import shutil
-import signal
 import struct
 import subprocess
 import sys
@@ -45,10 +43,9 @@ signal.pause()
 
 class InstalledTest(unittest.TestCase):
     build = None
-    number = 0
+    ports = 0
 
     def setUp(self):
-        InstalledTest.number += 1
         self.folder = Path(tempfile.mkdtemp(prefix="other-users-"))
         self.addCleanup(self.folder.rmdir)
         self.machine = machine.Machine(self.folder / "machine")
@@ -67,6 +64,12 @@ class InstalledTest(unittest.TestCase):
             return self.machine.run([TOOL, *arguments, *wanted], user=user, pass_fds=[reading], **options)
         finally:
             os.close(reading)
+
+    def add_port(self):
+        """A network port for which there is no service yet."""
+        InstalledTest.ports += 1
+        subprocess.run(["ip", "link", "add", f"eth{self.ports}", "type", "veth", "peer", "name", f"peer{self.ports}"],
+                       check=True)
 
     def succeeds(self, result):
         self.assertEqual((result.returncode, result.stderr), (0, ""), result)
@@ -110,6 +113,13 @@ class Locks(InstalledTest):
             held.append(line)
         return held
 
+    def log_out(self):
+        """Whoever is logged in already is not signed in, and so not stored, again."""
+        path = self.home / "Library/Accounts/Accounts.plist"
+        accounts = plistlib.loads(path.read_bytes())
+        del accounts["LoggedInAccount"]
+        path.write_bytes(plistlib.dumps(accounts))
+
     def store_replay(self):
         replay = self.root / "tmp/replay.plist"
         replay.write_bytes(plistlib.dumps(REPLAY))
@@ -134,6 +144,7 @@ class Locks(InstalledTest):
 
     def test_what_others_lock_keeps_nobody_waiting(self):
         self.add_anna()
+        self.add_port()
         self.succeeds(self.tool("network", "register"))
         self.succeeds(self.tool("account", "sign-in", "anna", user=True))
         self.store_replay()
@@ -147,9 +158,11 @@ class Locks(InstalledTest):
                     self.assertIn(path, held)
             self.assertFalse([path for path in held if "ocks/" in path], held)
             self.succeeds(self.tool("account", "add", "bert-" + kind))
+            self.add_port()
             self.succeeds(self.tool("network", "register"))
             self.succeeds(self.tool("switch", "select", "Q1"))
             self.succeeds(self.tool("switch", "select", "Prod"))
+            self.log_out()
             self.succeeds(self.tool("account", "sign-in", "anna", user=True))
             self.succeeds(self.tool("state", "set", "PreviousBuildVersion", kind, user=True))
         self.start_agent()
@@ -179,11 +192,15 @@ class Locks(InstalledTest):
         self.succeeds(self.tool("account", "sign-in", "anna", user=True))
         self.succeeds(self.tool("state", "set", "PreviousBuildVersion", "1", user=True))
         self.store_replay()
-        self.hold("exclusive", 0, ("var/lib/welcomer/locks",))
-        self.hold("exclusive", machine.UID, (f"home/{machine.USER}/Library/Locks",))
+        self.log_out()
+        self.assertIn("/var/lib/welcomer/locks/welcomer", self.hold("exclusive", 0, ("var/lib/welcomer/locks",)))
+        held = self.hold("exclusive", machine.UID, (f"home/{machine.USER}/Library/Locks",))
+        for name in ("Accounts", "Credentials", "Preferences"):
+            self.assertIn(f"/home/{machine.USER}/Library/Locks/{name}", held)
         reason = "locked by another process: waited 10 seconds"
         self.fails(self.tool("account", "add", "bert"), 1, f"cannot add bert: /var/lib/welcomer/locks/welcomer is {reason}")
         self.assertEqual(self.users(), ["anna"])
+        self.add_port()
         self.fails(self.tool("network", "register"), 1, reason)
         library = f"/home/{machine.USER}/Library"
         self.fails(self.tool("account", "sign-in", "anna", user=True), 1, f"{library}/Locks/Accounts is {reason}")
@@ -281,6 +298,7 @@ class BelowRoot(InstalledTest):
                 (self.dir / "outside/home").mkdir()
                 (self.dir / "root").symlink_to("/outside/home")
                 before = self.snapshot()
+                self.add_port()
                 self.succeeds(self.below("account", "add", "anna", **options))
                 self.succeeds(self.below("account", "sign-in", "anna", **options))
                 self.succeeds(self.below("network", "register", **options))

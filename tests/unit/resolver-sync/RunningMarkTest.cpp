@@ -4,8 +4,12 @@
 
 #include <gtest/gtest.h>
 
+#include <fcntl.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <system_error>
+#include <unistd.h>
+#include <vector>
 
 namespace welcomer::resolver {
 
@@ -61,6 +65,28 @@ TEST_F(RunningMarkTest, AServiceThatDiedIsOverAndTheNextOneTakesItsPlace) {
     const RunningMark mark(path);
     EXPECT_TRUE(runs());
     EXPECT_EQ(readRunningMark(path).trouble, "");
+}
+
+TEST_F(RunningMarkTest, WhoLocksTheFileForReadingKeepsNoServiceFromStarting) {
+    folder.addFile("/mark", "an old trouble"); // of a service that was killed
+    const int file = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    struct flock lock {};
+    lock.l_type = F_RDLCK;
+    lock.l_whence = SEEK_SET;
+    ASSERT_EQ(::fcntl(file, F_OFD_SETLK, &lock), 0);
+    const RunningMark mark(path);
+    EXPECT_TRUE(runs());
+    EXPECT_EQ(readRunningMark(path).trouble, "");
+    ::close(file);
+}
+
+TEST_F(RunningMarkTest, EverybodyMayReadTheFileAndNothingElseIsLeft) {
+    const RunningMark mark(path);
+    struct stat status = {};
+    ASSERT_EQ(::stat(path.c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777U, 0644U);
+    EXPECT_THROW(RunningMark another(path), std::system_error);
+    EXPECT_EQ(folder.names("/"), std::vector<std::string>{"mark"});
 }
 
 TEST_F(RunningMarkTest, WhatWasNotedLastIsRead) {
