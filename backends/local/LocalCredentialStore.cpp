@@ -112,6 +112,12 @@ std::int32_t LocalCredentialStore::createItem(const platform::CredentialItem& it
     CredentialFolder folder;
     PropertyList::Array items;
     std::int32_t status = openOrMake(folder, _root, _folderPath());
+    // Also where nothing can be locked, as in a home that is read-only.
+    if (PropertyList present;
+        status == platform::kCredentialSuccess &&
+        readItem(_root, _folderPath(), item.service, item.account, present) == platform::kCredentialSuccess) {
+        return platform::kCredentialDuplicateItem;
+    }
     if (status == platform::kCredentialSuccess) {
         status = _lock(folder);
     }

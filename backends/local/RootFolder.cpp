@@ -44,7 +44,8 @@ FileDescriptor RootFolder::open(const std::string& path, int flags, mode_t mode)
 
 bool RootFolder::exists(const std::string& path) const {
     struct stat status = {};
-    return isWholeMachine() ? ::stat(path.c_str(), &status) == 0 : static_cast<bool>(open(path, O_PATH));
+    return isWholeMachine() ? ::stat(withoutTrailingSlashes(path).c_str(), &status) == 0
+                            : static_cast<bool>(open(path, O_PATH));
 }
 
 FolderEntry RootFolder::entry(const std::string& path) const {

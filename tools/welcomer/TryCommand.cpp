@@ -159,7 +159,15 @@ class Story {
         }
     }
 
-    fs::path _below(const fs::path& path) const { return _root / path.relative_path(); }
+    // Where a path of the story's machine lies. What is there is put there as the machine's maker would, and
+    // follows links as this machine has them: none may lead out.
+    fs::path _below(const fs::path& path) const {
+        fs::path below = _root / path.relative_path();
+        if (!fs::weakly_canonical(below).string().starts_with(fs::canonical(_root).string() + "/")) {
+            throw CommandFailure("a link leads from " + below.string() + " out of " + _root.string());
+        }
+        return below;
+    }
 
     std::string _launchAgentPath() const {
         return _home + "/Library/LaunchAgents/" + kLaunchAgentLabel + ".plist";

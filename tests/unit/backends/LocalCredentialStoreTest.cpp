@@ -204,7 +204,7 @@ TEST_F(LocalCredentialStoreWithLibraryTest, ASymbolicLinkInPlaceOfTheFileIsRefus
     root.addFile("/elsewhere", "untouched");
     root.addDirectory(kFolder);
     std::filesystem::permissions(root.locate(kFolder), std::filesystem::perms::owner_all);
-    std::filesystem::create_symlink(root.locate("/elsewhere"), root.locate(kFile));
+    std::filesystem::create_symlink("/elsewhere", root.locate(kFile));
 
     EXPECT_EQ(statusOf("account"), platform::kCredentialStoreUnsafe);
     EXPECT_EQ(create("account", "secret"), platform::kCredentialStoreUnsafe);
@@ -224,7 +224,7 @@ TEST_F(LocalCredentialStoreWithLibraryTest, ADanglingSymbolicLinkInPlaceOfTheFil
 TEST_F(LocalCredentialStoreWithLibraryTest, ASymbolicLinkInPlaceOfTheFolderIsRefused) {
     ASSERT_EQ(create("account", "secret"), 0);
     std::filesystem::rename(root.locate(kFolder), root.locate("/elsewhere"));
-    std::filesystem::create_symlink(root.locate("/elsewhere"), root.locate(kFolder));
+    std::filesystem::create_symlink("/elsewhere", root.locate(kFolder));
 
     EXPECT_EQ(statusOf("account"), platform::kCredentialStoreUnsafe);
     EXPECT_EQ(create("other", "secret"), platform::kCredentialStoreUnsafe);

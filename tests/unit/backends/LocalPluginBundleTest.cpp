@@ -55,7 +55,7 @@ TEST_F(LocalPluginBundleTest, AnExecutableOutsideOfItsFolderIsRefused) {
 
     for (const std::string& executable : {std::string("../outside.so"), std::string("link.so"),
                                           std::string("../folder.ncdplugin-too/library.so"),
-                                          "../../../../../../../../.." + root.locate("/outside.so")}) {
+                                          std::string("../../../../../../../../../outside.so")}) {
         root.addFile("/folder.ncdplugin/Info.plist", info(executable));
         const platform::PluginSymbol symbol = load("/folder.ncdplugin");
         EXPECT_EQ(symbol.address, nullptr) << executable;
