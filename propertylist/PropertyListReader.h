@@ -10,8 +10,10 @@
 
 namespace welcomer {
 
-// How deep dictionaries and arrays may be nested, in reading and in writing.
-inline constexpr int kPropertyListMaximumDepth = 512;
+// How deep dictionaries and arrays may be nested, in reading and in writing; empty ones count like all
+// others. A plug-in may build 512 levels (WL_VALUE_DEPTH_LIMIT). The rest is for what is wrapped around them:
+// the account request and its answer have two levels more, the replay object three.
+inline constexpr int kPropertyListMaximumDepth = 520;
 
 // The value that was read, or why there is none.
 struct PropertyListReadResult {

@@ -5,20 +5,18 @@
 #include "propertylist/PropertyListReader.h"
 #include "propertylist/RealText.h"
 #include "propertylist/UTF8.h"
+#include "propertylist/UnwritableValue.h"
 
 #include <algorithm>
 #include <array>
 #include <charconv>
-#include <stdexcept>
 
 namespace welcomer {
 
 namespace {
 
-// Why a value cannot be written; thrown within the writer only.
-class WriteError : public std::runtime_error {
-    using std::runtime_error::runtime_error;
-};
+// The value cannot be written; thrown within the writer only.
+struct Unwritable {};
 
 // The bytes of a text that cannot be copied as they stand. A carriage return is written as a reference
 // because a reader takes a bare one for a line feed.
@@ -71,12 +69,13 @@ class XMLPropertyListWriter {
     }
 
     void writeDictionary(const PropertyList::Dictionary& dictionary) {
+        requireRoomBelow();
         if (dictionary.empty()) {
             _text += "<dict/>\n";
             return;
         }
         _text += "<dict>\n";
-        enter();
+        ++_depth;
         for (const auto& [key, value] : dictionary) {
             indent();
             writeTextElement("<key>", key, "</key>\n");
@@ -87,12 +86,13 @@ class XMLPropertyListWriter {
     }
 
     void writeArray(const PropertyList::Array& array) {
+        requireRoomBelow();
         if (array.empty()) {
             _text += "<array/>\n";
             return;
         }
         _text += "<array>\n";
-        enter();
+        ++_depth;
         for (const PropertyList& value : array) {
             writeValue(value);
         }
@@ -101,9 +101,8 @@ class XMLPropertyListWriter {
     }
 
     void writeTextElement(std::string_view opening, std::string_view text, std::string_view closing) {
-        if (const std::size_t offset = findInvalidXMLText(text); offset != std::string_view::npos) {
-            throw WriteError("a string holds " + describeInvalidXMLText(text, offset) +
-                             ", for which XML has no place");
+        if (findInvalidXMLText(text) != std::string_view::npos) {
+            throw Unwritable();
         }
         _text += opening;
         auto written = text.begin();
@@ -174,16 +173,16 @@ class XMLPropertyListWriter {
     void writeDate(PropertyList::Date date) {
         const std::optional<std::string> text = formatCalendarDate(date);
         if (!text) {
-            throw WriteError("a date lies outside the years 0000 to 9999");
+            throw Unwritable();
         }
         writePlainElement("<date>", *text, "</date>\n");
     }
 
-    void enter() {
+    // Before a dictionary or array.
+    void requireRoomBelow() const {
         if (_depth == kPropertyListMaximumDepth) {
-            throw WriteError("nested more than " + std::to_string(kPropertyListMaximumDepth) + " deep");
+            throw Unwritable();
         }
-        ++_depth;
     }
 
     // Ends the content of a container and stands where its closing tag goes.
@@ -203,9 +202,9 @@ class XMLPropertyListWriter {
 std::optional<std::string> writeXMLPropertyList(const PropertyList& value, std::string* error) {
     try {
         return XMLPropertyListWriter().write(value);
-    } catch (const WriteError& failure) {
+    } catch (const Unwritable&) {
         if (error) {
-            *error = failure.what();
+            *error = findUnwritableValue(value).value_or(std::string());
         }
         return std::nullopt;
     }

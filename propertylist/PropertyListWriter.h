@@ -12,11 +12,10 @@ namespace welcomer {
 // Serialises a value in the XML format, version 1.0. Reals read back to the same bits; a date is cut to whole
 // seconds.
 //  value   the value; only read during the call
-//  error   where to say why there is no result, or null
-//  result  the bytes, or none when the value cannot be written: a string that is no
-//          UTF-8 or holds a character that XML has no place for, a date out of the
-//          calendar's range, or nesting beyond
-//          kPropertyListMaximumDepth
+//  error   where to say what cannot be written and why, or null
+//  result  the bytes, or none when the value cannot be written; UnwritableValue.h says what that is, and
+//  finds it
+//          beforehand
 // Any thread.
 std::optional<std::string> writeXMLPropertyList(const PropertyList& value, std::string* error = nullptr);
 

@@ -561,10 +561,11 @@ class XMLPropertyListReader {
 
     PropertyList readDictionary(const Tag& tag) {
         PropertyList::Dictionary dictionary;
+        enter(tag);
         if (tag.kind == Tag::Kind::Empty) {
+            --_depth;
             return PropertyList(std::move(dictionary));
         }
-        enter(tag);
         for (;;) {
             skipToTag(Element::Dictionary);
             const Tag keyTag = readTag();
@@ -588,10 +589,11 @@ class XMLPropertyListReader {
 
     PropertyList readArray(const Tag& tag) {
         PropertyList::Array array;
+        enter(tag);
         if (tag.kind == Tag::Kind::Empty) {
+            --_depth;
             return PropertyList(std::move(array));
         }
-        enter(tag);
         for (;;) {
             skipToTag(Element::Array);
             const Tag valueTag = readTag();

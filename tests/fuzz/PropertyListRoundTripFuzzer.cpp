@@ -2,6 +2,7 @@
 
 #include "propertylist/PropertyListReader.h"
 #include "propertylist/PropertyListWriter.h"
+#include "propertylist/UnwritableValue.h"
 #include "propertylist/XMLPropertyListReader.h"
 #include "tests/fuzz/Require.h"
 
@@ -18,6 +19,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
     }
     std::string error;
     const std::optional<std::string> written = writeXMLPropertyList(*first.value, &error);
+    require(findUnwritableValue(*first.value).has_value() == !written,
+            "what cannot be written is found beforehand");
     if (!written) {
         require(!error.empty(), "no result has a reason");
         require(!readXMLPropertyList(input), "what the XML format holds can be written");

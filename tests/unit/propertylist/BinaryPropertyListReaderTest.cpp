@@ -342,11 +342,11 @@ std::string chain(std::size_t depth) {
 
 TEST(BinaryPropertyListReader, ReadsTheGreatestDepthAndRefusesMore) {
     EXPECT_TRUE(readBinaryPropertyList(chain(kPropertyListMaximumDepth)));
-    EXPECT_EQ(errorOf(chain(kPropertyListMaximumDepth + 1)), "byte 2568: nested more than 512 deep");
+    EXPECT_EQ(errorOf(chain(kPropertyListMaximumDepth + 1)), "byte 2608: nested more than 520 deep");
 }
 
 TEST(BinaryPropertyListReader, RefusesAHundredThousandLevels) {
-    EXPECT_EQ(errorOf(chain(100000)), "byte 2568: nested more than 512 deep");
+    EXPECT_EQ(errorOf(chain(100000)), "byte 2608: nested more than 520 deep");
 }
 
 TEST(BinaryPropertyListReader, DepthIsNesting) {

@@ -125,21 +125,22 @@ TEST(PropertyListWriter, DataOfEveryLengthReadsBackEqual) {
 }
 
 TEST(PropertyListWriter, RefusesStringsThatAreNoUTF8) {
-    EXPECT_EQ(errorOf("a\xFF"), "a string holds invalid UTF-8, for which XML has no place");
+    EXPECT_EQ(errorOf("a\xFF"), "the value holds invalid UTF-8, for which XML has no place");
     EXPECT_EQ(errorOf(PropertyList::Dictionary{{"\x80", 1}}),
-              "a string holds invalid UTF-8, for which XML has no place");
+              "? is a key that holds invalid UTF-8, for which XML has no place");
 }
 
 TEST(PropertyListWriter, RefusesCharactersThatXMLHasNoPlaceFor) {
-    EXPECT_EQ(errorOf("a\x01"), "a string holds U+0001, for which XML has no place");
-    EXPECT_EQ(errorOf(std::string(1, '\0')), "a string holds U+0000, for which XML has no place");
-    EXPECT_EQ(errorOf("\xEF\xBF\xBF"), "a string holds U+FFFF, for which XML has no place");
+    EXPECT_EQ(errorOf("a\x01"), "the value holds U+0001, for which XML has no place");
+    EXPECT_EQ(errorOf(std::string(1, '\0')), "the value holds U+0000, for which XML has no place");
+    EXPECT_EQ(errorOf("\xEF\xBF\xBF"), "the value holds U+FFFF, for which XML has no place");
 }
 
 TEST(PropertyListWriter, RefusesDatesBeyondTheCalendar) {
-    EXPECT_EQ(errorOf(PropertyList::Date{253402300800.0}), "a date lies outside the years 0000 to 9999");
+    EXPECT_EQ(errorOf(PropertyList::Date{253402300800.0}),
+              "the value is a date outside the years 0000 to 9999");
     EXPECT_EQ(errorOf(PropertyList::Date{std::numeric_limits<double>::quiet_NaN()}),
-              "a date lies outside the years 0000 to 9999");
+              "the value is a date outside the years 0000 to 9999");
 }
 
 TEST(PropertyListWriter, WritesTheGreatestDepthAndRefusesMore) {
@@ -147,7 +148,8 @@ TEST(PropertyListWriter, WritesTheGreatestDepthAndRefusesMore) {
     const std::optional<std::string> text = writeXMLPropertyList(value);
     ASSERT_TRUE(text);
     EXPECT_EQ(readPropertyList(*text).value, value);
-    EXPECT_EQ(errorOf(nested(kPropertyListMaximumDepth + 1)), "nested more than 512 deep");
+    EXPECT_EQ(errorOf(nested(kPropertyListMaximumDepth + 1)),
+              "k/0/k/0/k/0/k/0/... is nested more than 520 deep");
 }
 
 } // namespace

@@ -147,11 +147,11 @@ TEST(TextPropertyListReader, ReadsTheGreatestDepthAndRefusesMore) {
     EXPECT_TRUE(readTextPropertyList(repeated("(", most) + repeated(")", most)));
     EXPECT_TRUE(readTextPropertyList(repeated("{a=", most) + "b" + repeated(";}", most)));
     EXPECT_EQ(errorOf(repeated("(", most + 1) + repeated(")", most + 1)),
-              "line 1, column 513: nested more than 512 deep");
+              "line 1, column 521: nested more than 520 deep");
     EXPECT_EQ(errorOf(repeated("{a=", most + 1) + "b" + repeated(";}", most + 1)),
-              "line 1, column 1537: nested more than 512 deep");
+              "line 1, column 1561: nested more than 520 deep");
     EXPECT_EQ(errorOf("a=" + repeated("(", most) + repeated(")", most) + ";"),
-              "line 1, column 514: nested more than 512 deep");
+              "line 1, column 522: nested more than 520 deep");
 }
 
 TEST(TextPropertyListReader, DepthIsNesting) {
@@ -159,8 +159,8 @@ TEST(TextPropertyListReader, DepthIsNesting) {
 }
 
 TEST(TextPropertyListReader, RefusesAHundredThousandLevels) {
-    EXPECT_EQ(errorOf(repeated("(", 100000)), "line 1, column 513: nested more than 512 deep");
-    EXPECT_EQ(errorOf(repeated("{a=", 100000)), "line 1, column 1537: nested more than 512 deep");
+    EXPECT_EQ(errorOf(repeated("(", 100000)), "line 1, column 521: nested more than 520 deep");
+    EXPECT_EQ(errorOf(repeated("{a=", 100000)), "line 1, column 1561: nested more than 520 deep");
 }
 
 TEST(TextPropertyListReader, RefusesEveryTruncatedDocument) {

@@ -371,11 +371,20 @@ TEST(XMLPropertyListReader, ReadsTheGreatestDepthAndRefusesMore) {
     constexpr int most = kPropertyListMaximumDepth;
     EXPECT_TRUE(readXMLPropertyList(inPlist(repeated("<array>", most) + repeated("</array>", most))));
     EXPECT_EQ(errorIn(repeated("<array>", most + 1) + repeated("</array>", most + 1)),
-              "3585: nested more than 512 deep");
+              "3641: nested more than 520 deep");
     const std::string dictionaries = repeated("<dict><key>k</key>", most - 1);
     EXPECT_TRUE(readXMLPropertyList(inPlist(dictionaries + "<dict></dict>" + repeated("</dict>", most - 1))));
     EXPECT_EQ(errorIn(dictionaries + "<array><dict></dict></array>" + repeated("</dict>", most - 1)),
-              "9206: nested more than 512 deep");
+              "9350: nested more than 520 deep");
+}
+
+TEST(XMLPropertyListReader, EmptyElementsAreALevelToo) {
+    const std::string arrays = repeated("<array>", kPropertyListMaximumDepth - 1);
+    const std::string end = repeated("</array>", kPropertyListMaximumDepth - 1);
+    for (const char* empty : {"<array/>", "<dict/>"}) {
+        EXPECT_TRUE(readXMLPropertyList(inPlist(arrays + empty + empty + end)));
+        EXPECT_EQ(errorIn("<array>" + arrays + empty + end + "</array>"), "3641: nested more than 520 deep");
+    }
 }
 
 TEST(XMLPropertyListReader, DepthIsNesting) {
@@ -384,8 +393,8 @@ TEST(XMLPropertyListReader, DepthIsNesting) {
 }
 
 TEST(XMLPropertyListReader, RefusesAHundredThousandLevels) {
-    EXPECT_EQ(errorIn(repeated("<array>", 100000)), "3585: nested more than 512 deep");
-    EXPECT_EQ(errorIn(repeated("<dict><key>k</key>", 100000)), "9217: nested more than 512 deep");
+    EXPECT_EQ(errorIn(repeated("<array>", 100000)), "3641: nested more than 520 deep");
+    EXPECT_EQ(errorIn(repeated("<dict><key>k</key>", 100000)), "9361: nested more than 520 deep");
 }
 
 TEST(XMLPropertyListReader, LinesAndColumnsCountCharacters) {
