@@ -3,7 +3,8 @@
 #include "plugins/CompletionHandlers.h"
 #include "plugins/PluginText.h"
 #include "plugins/PropertyListHandles.h"
-#include "propertylist/UTF8.h"
+#include "propertylist/PropertyListReader.h"
+#include "propertylist/UnwritableValue.h"
 
 #include <cstddef>
 #include <exception>
@@ -32,6 +33,19 @@ auto callPlugin(ErrorSlot& slot, Call call) -> decltype(call(slot.handle())) {
         slot.raise("unknown exception");
     }
     return decltype(call(slot.handle()))();
+}
+
+// The account request wraps a plug-in's request twice ("delegates", identifier), the replay object a response
+// once more ("delegatesResponseDict"): both can be written, as deep as a plug-in may build them.
+static_assert(WL_VALUE_DEPTH_LIMIT + 3 <= kPropertyListMaximumDepth);
+
+// What goes into the account request or the replay object must be fit to be written there. The host lets a
+// plug-in build nothing else, but a copy of a response may hold anything.
+void throwIfUnwritable(const PropertyList& value, const char* operation) {
+    if (const auto unwritable = findUnwritableValue(value)) {
+        throw DelegatePluginException(std::string(operation) +
+                                      " returned what cannot be written: " + *unwritable);
+    }
 }
 
 void throwIfRaised(const ErrorSlot& slot) {
@@ -122,9 +136,7 @@ std::optional<std::string> AbiDelegatePlugin::delegateIdentifier() {
     if (!identifier) {
         return std::nullopt;
     }
-    if (findInvalidUTF8(identifier) != std::string_view::npos) {
-        throw DelegatePluginException("delegateIdentifier returned no UTF-8");
-    }
+    throwIfUnwritable(identifier, "delegateIdentifier");
     return identifier;
 }
 
@@ -137,6 +149,9 @@ std::optional<PropertyList> AbiDelegatePlugin::delegateSetupRequest() {
     throwIfRaised(slot);
     if (request && !request->isDictionary()) {
         throw DelegatePluginException("delegateSetupRequest returned no dictionary");
+    }
+    if (request) {
+        throwIfUnwritable(*request, "delegateSetupRequest");
     }
     return request;
 }
@@ -188,6 +203,7 @@ AbiDelegatePlugin::messagingAliasesFromResponse(const PropertyList& response) {
     if (!aliases->isArray()) {
         throw DelegatePluginException("messagingAliasesFromResponse: returned no array");
     }
+    throwIfUnwritable(*aliases, "messagingAliasesFromResponse:");
     std::vector<std::string> texts;
     for (PropertyList& alias : *aliases->array()) {
         if (!alias.isString()) {

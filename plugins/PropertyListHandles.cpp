@@ -2,10 +2,12 @@
 
 #include "plugins/PluginText.h"
 #include "propertylist/UTF8.h"
+#include "propertylist/UnwritableValue.h"
 
 #include <algorithm>
 #include <cstring>
 #include <memory>
+#include <stdexcept>
 #include <string_view>
 #include <utility>
 
@@ -44,7 +46,7 @@ int depthOf(const PropertyList& value) {
     return below + 1;
 }
 
-// A new owned value, or null without memory: no exception may reach a plug-in.
+// A new owned value, or null where that cannot be made: no exception may reach a plug-in.
 template <class Make>
 wl_value* makeOwned(int depth, Make make) noexcept {
     try {
@@ -54,13 +56,13 @@ wl_value* makeOwned(int depth, Make make) noexcept {
     }
 }
 
-// A text from a plug-in, or none when it is null or no UTF-8.
+// A text from a plug-in, or none when it is null or cannot be written.
 std::optional<std::string_view> textOf(const char* text, std::size_t length) {
     if (!text) {
         return std::nullopt;
     }
     const std::string_view view(text, length == WL_NUL_TERMINATED ? std::strlen(text) : length);
-    if (findInvalidUTF8(view) != std::string_view::npos) {
+    if (findInvalidXMLText(view) != std::string_view::npos) {
         return std::nullopt;
     }
     return view;
@@ -254,7 +256,13 @@ static wl_value* hostNewData(const void* bytes, std::size_t length) {
 }
 
 static wl_value* hostNewDate(double secondsSince1970) {
-    return makeOwned(0, [=] { return PropertyList::Date{secondsSince1970}; });
+    const PropertyList::Date date{secondsSince1970};
+    return makeOwned(0, [=] {
+        if (findUnwritableValue(date)) {
+            throw std::invalid_argument("a date that cannot be written");
+        }
+        return date;
+    });
 }
 
 static wl_value* hostCopy(const wl_value* value) {

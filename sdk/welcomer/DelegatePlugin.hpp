@@ -121,7 +121,8 @@ class ValueView {
 };
 
 // A property-list value of one's own. Throws std::invalid_argument when it cannot be built: text that is no
-// UTF-8, nesting beyond WL_VALUE_DEPTH_LIMIT, an entry for what is no dictionary.
+// UTF-8 or holds a character that XML cannot hold (control characters), a date outside the years 0000 to
+// 9999, nesting beyond WL_VALUE_DEPTH_LIMIT, an entry for what is no dictionary.
 class Value {
   public:
     Value(std::string_view text) : _handle(host().new_string(text.data() ? text.data() : "", text.size())) {

@@ -13,7 +13,9 @@
  *  - Ownership. A `const wl_value *` and a `const char *` are borrowed: the receiver reads them until its
  * call returns, or until the time that is given, and copies what it needs longer. A `wl_value *` is owned by
  *    who holds it, and returning it or giving it to a function that says so passes it on.
- *  - Text is UTF-8.
+ *  - Text is UTF-8. What a plug-in builds can be written as an XML property list: its text has no control
+ * characters but tab, line feed and carriage return, and neither U+FFFE nor U+FFFF; its dates lie in the
+ * years 0000 to 9999. A borrowed value can hold anything.
  *  - Failure. No C++ exception, and no other kind of unwinding, may leave a function of either side. A
  * plug-in raises through the error slot that it is given. The host catches C++ exceptions that leave a
  * plug-in's function all the same and takes them as raised; a plug-in written in C++ does better to catch
@@ -72,7 +74,8 @@ enum {
     WL_VALUE_DATE = 8
 };
 
-/* The deepest nesting that a plug-in may build, containers within containers. */
+/* The deepest nesting that a plug-in may build, containers within containers; empty ones count too. A request
+ * and a response that are nested as deep can be sent, stored and read back. */
 #define WL_VALUE_DEPTH_LIMIT 512
 
 /*
@@ -126,20 +129,24 @@ typedef struct wl_host {
      * is no memory. A length may be WL_NUL_TERMINATED for strings. */
     wl_value* (*new_dictionary)(void);
     wl_value* (*new_array)(void);
-    wl_value* (*new_string)(const char* text, size_t length); /* null when the text is no UTF-8 */
+    /* Null when the text is no UTF-8 or holds a character that XML cannot hold. */
+    wl_value* (*new_string)(const char* text, size_t length);
     wl_value* (*new_integer)(int64_t value);
     wl_value* (*new_unsigned)(uint64_t value);
     wl_value* (*new_real)(double value);
     wl_value* (*new_boolean)(bool value);
     wl_value* (*new_data)(const void* bytes, size_t length);
-    wl_value* (*new_date)(double seconds_since_1970);
-    /* Everything below the value is copied too. Null also for a value that is nested too deep. */
+    wl_value* (*new_date)(
+        double seconds_since_1970); /* null outside the years 0000 to 9999, and for no number */
+    /* Everything below the value is copied too, also what could not be built; a request or aliases that hold
+     * such a copy count as raising. Null also for a value that is nested too deep. */
     wl_value* (*copy)(const wl_value* value);
 
     /* Adds an element, or an entry in place of one with the same key. The element or entry becomes the
      * container's whatever the result, so that a builder's result can be given at once; its pointer is no
      * longer valid. False when the container is of another type, the element or key is null, the key is no
-     * UTF-8, the container is its own element (which is then not released), or it would be nested too deep.
+     * text that new_string() takes, the container is its own element (which is then not released), or it
+     * would be nested too deep.
      */
     bool (*array_append)(wl_value* array, wl_value* element);
     bool (*dictionary_set)(wl_value* dictionary, const char* key, size_t key_length, wl_value* entry);
@@ -178,8 +185,8 @@ struct wl_delegate {
     const char* (*delegate_identifier)(wl_delegate* self, wl_error_slot* slot);
 
     /* This delegate's part of the account setup request: a dictionary that passes to the host, or null when
-     * the delegate leaves itself out of setup. Another type of value counts as raising. The thread of the
-     * setup application that builds the request. Optional: no. */
+     * the delegate leaves itself out of setup. Another type of value, and one that cannot be written, counts
+     * as raising. The thread of the setup application that builds the request. Optional: no. */
     wl_value* (*delegate_setup_request)(wl_delegate* self, wl_error_slot* slot);
 
     /* Finishes the delegate's setup from the server's response, which is handed over as it stands, whatever

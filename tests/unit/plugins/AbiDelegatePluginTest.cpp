@@ -176,6 +176,48 @@ TEST_F(AbiDelegatePluginTest, RaisesForARequestThatIsNoDictionary) {
               "delegateSetupRequest returned no dictionary");
 }
 
+// A value that a plug-in can only have from a response.
+const PropertyList kUnwritable = PropertyList::Array{"good", "a\x01"};
+
+TEST_F(AbiDelegatePluginTest, RaisesForARequestThatCannotBeWritten) {
+    plugin.request = [this](wl_error_slot*) {
+        wl_value* request = host.new_dictionary();
+        host.dictionary_set(request, "names", 5, host.copy(borrowedHandle(kUnwritable)));
+        return request;
+    };
+    EXPECT_EQ(
+        thrown([&] { create()->delegateSetupRequest(); }),
+        "delegateSetupRequest returned what cannot be written: names/1 holds U+0001, for which XML has no "
+        "place");
+}
+
+TEST_F(AbiDelegatePluginTest, RaisesForAliasesThatCannotBeWritten) {
+    plugin.aliases = [this](const wl_value* response, wl_error_slot*) {
+        return host.copy(response);
+    };
+    EXPECT_EQ(
+        thrown([&] { create()->messagingAliasesFromResponse(kUnwritable); }),
+        "messagingAliasesFromResponse: returned what cannot be written: 1 holds U+0001, for which XML has no "
+        "place");
+}
+
+TEST_F(AbiDelegatePluginTest, RaisesForAnIdentifierThatCannotBeWritten) {
+    plugin.identifier = "com.corvid.\x01";
+    EXPECT_EQ(
+        thrown([&] { create()->delegateIdentifier(); }),
+        "delegateIdentifier returned what cannot be written: the value holds U+0001, for which XML has no "
+        "place");
+}
+
+TEST_F(AbiDelegatePluginTest, AResponseThatCannotBeWrittenIsHandedOverAsItStands) {
+    std::optional<PropertyList> received;
+    plugin.complete = [&](const wl_value* response, const wl_value*, wl_completion_handler, wl_error_slot*) {
+        received = takeHandle(host.copy(response));
+    };
+    create()->completeSetupWithResponseHandler(kUnwritable, handler());
+    EXPECT_EQ(received, kUnwritable);
+}
+
 TEST_F(AbiDelegatePluginTest, RaisesAndReleasesTheRequestThatCameAllTheSame) {
     plugin.request = [this](wl_error_slot* slot) {
         host.raise(slot, "rather not");

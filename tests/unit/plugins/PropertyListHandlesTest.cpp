@@ -130,8 +130,10 @@ TEST(PropertyListHandles, BuildEveryType) {
     set("large", host.new_unsigned(std::numeric_limits<std::uint64_t>::max()));
     set("real", host.new_real(0));
     set("real", host.new_real(2.5)); // in place of the one before
-    set("string", host.new_string("a\0b", 3));
-    EXPECT_EQ(takeHandle(value), everyType());
+    set("string", host.new_string("a\tb", 3));
+    PropertyList expected = everyType();
+    expected.dictionary()->insert_or_assign("string", "a\tb"); // a plug-in cannot build a NUL
+    EXPECT_EQ(takeHandle(value), expected);
 }
 
 TEST(PropertyListHandles, CopyEverythingBelowAValue) {
@@ -191,6 +193,43 @@ TEST(PropertyListHandles, ReleaseWhatAContainerRefuses) { // the leak check of a
 TEST(PropertyListHandles, RefuseTextThatIsNoUtf8) {
     EXPECT_EQ(host.new_string("\xC3", 1), nullptr);
     EXPECT_EQ(host.new_string("\xED\xA0\x80", WL_NUL_TERMINATED), nullptr);
+}
+
+TEST(PropertyListHandles, RefuseTextThatCannotBeWritten) {
+    for (const std::string& text : {std::string(1, '\0'), std::string("a\x01"), std::string("\x1B[2J"),
+                                    std::string("\xEF\xBF\xBE"), std::string("\xEF\xBF\xBF")}) {
+        EXPECT_EQ(host.new_string(text.data(), text.size()), nullptr) << text;
+        wl_value* dictionary = host.new_dictionary();
+        EXPECT_FALSE(host.dictionary_set(dictionary, text.data(), text.size(), host.new_integer(1))) << text;
+        EXPECT_EQ(host.count(dictionary), 0U);
+        host.release(dictionary);
+    }
+    wl_value* text = host.new_string("\t\r\n\x7F\xC2\x9B", WL_NUL_TERMINATED);
+    EXPECT_NE(text, nullptr);
+    host.release(text);
+}
+
+TEST(PropertyListHandles, RefuseDatesThatCannotBeWritten) {
+    using Limits = std::numeric_limits<double>;
+    for (const double seconds :
+         {1e15, -1e15, 253402300800.0, -62167219201.0, Limits::infinity(), Limits::quiet_NaN()}) {
+        EXPECT_EQ(host.new_date(seconds), nullptr) << seconds;
+    }
+    for (const double seconds : {-62167219200.0, 0.0, 253402300799.0}) {
+        wl_value* date = host.new_date(seconds);
+        EXPECT_NE(date, nullptr) << seconds;
+        host.release(date);
+    }
+}
+
+TEST(PropertyListHandles, GiveAndCopyWhatCouldNotBeBuilt) { // a response may hold anything
+    const PropertyList response =
+        PropertyList::Dictionary{{"text", "a\x01"}, {"date", PropertyList::Date{1e15}}};
+    std::size_t length = 0;
+    EXPECT_STREQ(host.get_string(get(response, "text"), &length), "a\x01");
+    double seconds = 0;
+    EXPECT_TRUE(host.get_date(get(response, "date"), &seconds));
+    EXPECT_EQ(takeHandle(host.copy(borrowedHandle(response))), response);
 }
 
 TEST(PropertyListHandles, BoundTheNesting) {

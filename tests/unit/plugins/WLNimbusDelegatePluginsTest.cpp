@@ -200,7 +200,8 @@ TEST_F(WLNimbusDelegatePluginsTest, SkipsAPluginWhoseIdentifierIsNoUtf8) {
     add("a.ncdplugin", first.exportAs<0>());
     EXPECT_TRUE(WLNimbusDelegatePlugins().empty());
     EXPECT_EQ(lines(), Strings{"Nimbus Plugins: Exception querying 'a.ncdplugin' for id on load: "
-                               "delegateIdentifier returned no UTF-8"});
+                               "delegateIdentifier returned what cannot be written: the value "
+                               "holds invalid UTF-8, for which XML has no place"});
 }
 
 TEST_F(WLNimbusDelegatePluginsTest, SkipsAPluginWithoutAnIdentifier) {

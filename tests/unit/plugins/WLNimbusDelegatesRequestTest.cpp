@@ -1,6 +1,11 @@
 #include "plugins/WLNimbusDelegatesRequest.h"
 
+#include "plugins/AbiDelegatePlugin.h"
+#include "plugins/PropertyListHandles.h"
+#include "propertylist/PropertyListReader.h"
+#include "propertylist/PropertyListWriter.h"
 #include "tests/fakes/FakePlatform.h"
+#include "tests/unit/plugins/InProcessPlugin.h"
 
 #include <functional>
 #include <gtest/gtest.h>
@@ -99,6 +104,40 @@ TEST_F(WLNimbusDelegatesRequestTest, HoldsTheRequestOfEveryPlugin) {
                                      {"com.corvid.vidlink", own},
                                      {"com.corvid.storefront", "not a dictionary"}}));
     EXPECT_EQ(lines(), Strings{});
+}
+
+// Dictionaries within one another, the innermost empty.
+wl_value* nestedRequest(int depth) {
+    const wl_host& host = delegatePluginHost();
+    wl_value* value = host.new_dictionary();
+    for (int level = 1; level < depth; ++level) {
+        wl_value* outer = host.new_dictionary();
+        EXPECT_TRUE(host.dictionary_set(outer, "k", 1, value)) << level;
+        value = outer;
+    }
+    return value;
+}
+
+TEST_F(WLNimbusDelegatesRequestTest, ARequestOfTheGreatestDepthCanBeWrittenAndReadBack) {
+    fakes::InProcessPlugin deepest{"com.corvid.deep"};
+    deepest.request = [](wl_error_slot*) {
+        return nestedRequest(WL_VALUE_DEPTH_LIMIT);
+    };
+    const DelegatePluginArray plugins{AbiDelegatePlugin::create(*deepest.exportAs<0>())};
+    const DelegatePluginSource onlyDeepest = [&]() -> const DelegatePluginArray& {
+        return plugins;
+    };
+    const PropertyList whole = WLNimbusDelegatesRequest({}, {}, onlyDeepest);
+    EXPECT_TRUE(delegates(*whole.dictionary()).contains("com.corvid.deep"));
+    std::string error;
+    const std::optional<std::string> written = writeXMLPropertyList(whole, &error);
+    ASSERT_TRUE(written) << error;
+    EXPECT_EQ(readPropertyList(*written).value, whole);
+    EXPECT_EQ(lines(), Strings{});
+
+    // The server's answer, as deep as the request, is wrapped once more for the replay item.
+    const PropertyList replay = Dictionary{{"delegatesResponseDict", whole}};
+    EXPECT_EQ(readPropertyList(writeXMLPropertyList(replay).value_or("")).value, replay);
 }
 
 TEST_F(WLNimbusDelegatesRequestTest, AnOmittedPluginIsNotAskedAndNotLogged) {
