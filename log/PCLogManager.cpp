@@ -6,6 +6,8 @@
 
 namespace welcomer {
 
+static_assert(PCLogManager::kPriorityNormal == platform::kErrorPriority);
+
 PCLogManager& PCLogManager::sharedManager() {
     static auto* const manager = new PCLogManager;
     return *manager;

@@ -25,7 +25,8 @@ bool booleanReading(const std::optional<PropertyList>& value);
 // their range. Anything else, booleans among it, and no value is 0. Any thread.
 std::int64_t integerReading(const std::optional<PropertyList>& value);
 
-// What a store found in place of a domain: something that is no property list or holds no dictionary.
+// What a store found in place of a domain: something that is no property list or holds no dictionary, or a
+// dictionary with a value that cannot be written back.
 struct DamagedPreferences {
     std::string domain;
     std::string reason;       // one line
@@ -37,6 +38,12 @@ struct DamagedPreferences {
 // after `synchronise`, and when a domain is first used. A domain that is damaged counts as empty; it is never
 // overwritten, but set aside. A domain's name is a reverse-domain name; one that is empty or holds a slash
 // names a domain that is always empty and never synchronises.
+//
+// What is stored is what propertylist/UnwritableValue.h finds no fault with. A domain whose stored content
+// holds something else (another tool wrote it in another format) can be read, every value of it. It is left
+// as it is, and does not synchronise with changes, until they set or remove the key in question: no value is
+// lost, or changes its type, for the sake of another. Refusals and damage are told in the system log, one
+// line each.
 class PreferenceStore {
   public:
     virtual ~PreferenceStore() = default;
@@ -51,7 +58,8 @@ class PreferenceStore {
     virtual std::vector<std::optional<PropertyList>> copyValues(std::span<const std::string> keys,
                                                                 const std::string& domain);
 
-    // Sets or removes a value. Any thread; changes no file.
+    // Sets or removes a value. One that cannot be written is refused with a line that names domain and key;
+    // what was there stays. Any thread; changes no file.
     virtual void setValue(const std::string& key, const PropertyList& value, const std::string& domain) = 0;
     virtual void removeValue(const std::string& key, const std::string& domain) = 0;
 

@@ -50,10 +50,9 @@ platform::Outcome AccountFile::_change(const std::function<bool(PropertyList::Di
     case State::Whole:
         break;
     case State::Damaged:
-        if (folder.setAside(kFileName, _onDisk.bytes).empty()) {
+        if (!_setAside(folder, path)) {
             return platform::Outcome::failure(folder.error());
         }
-        _onDisk = {};
         break;
     case State::Unreadable:
         return platform::Outcome::failure(
@@ -69,6 +68,20 @@ platform::Outcome AccountFile::_change(const std::function<bool(PropertyList::Di
     }
     _onDisk = {State::Whole, std::move(values), std::move(*bytes), {}};
     return platform::Outcome::success();
+}
+
+// Gives a damaged file another name.
+//  path    the folder's
+//  result  false when it is still in its place
+bool AccountFile::_setAside(LockedPreferenceFolder& folder, const std::string& path) {
+    const std::string other = folder.setAside(kFileName, _onDisk.bytes);
+    _log.write(platform::kErrorPriority,
+               "The accounts in " + path + " are damaged (" + _onDisk.reason + ") and " +
+                   (other.empty() ? "still in their place" : "now at " + platform::joinPath(path, other)));
+    if (!other.empty()) {
+        _onDisk = {};
+    }
+    return !other.empty();
 }
 
 const PropertyList::Dictionary& AccountFile::_readContent() {

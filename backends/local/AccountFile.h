@@ -31,7 +31,8 @@ inline constexpr char kAccountsKey[] = "Accounts";
 // A change takes the file's lock, merges into what is on disk and replaces the file in one step, so that no
 // change of another process is lost and the file is whole at any time. A question reads the file, and parses
 // it only where its bytes are no longer those of the last time. A damaged file counts as empty and is set
-// aside before the first change. Any thread and any process.
+// aside before the first change; one that holds what XML cannot hold is left as it is, and no change is
+// stored. Both are told in the system log. Any thread and any process.
 class AccountFile {
   public:
     // Borrows the identity and the log, which must outlive this.
@@ -63,6 +64,7 @@ class AccountFile {
   private:
     platform::Outcome _change(const std::function<bool(PropertyList::Dictionary& content)>& change);
     const PropertyList::Dictionary& _readContent();
+    bool _setAside(LockedPreferenceFolder& folder, const std::string& path);
     std::string _library();
 
     const RootFolder _root;

@@ -1,6 +1,7 @@
 #include "backends/local/LocalPreferenceStore.h"
 
 #include "platform/Path.h"
+#include "propertylist/UnwritableValue.h"
 
 #include <algorithm>
 #include <utility>
@@ -71,6 +72,11 @@ std::vector<std::optional<PropertyList>> LocalPreferenceStore::copyValues(std::s
 
 void LocalPreferenceStore::setValue(const std::string& key, const PropertyList& value,
                                     const std::string& domain) {
+    if (const auto unwritable = findUnwritableEntry(key, value)) {
+        _log.write(platform::kErrorPriority,
+                   "Preferences " + domain + " refuse a value that cannot be written: " + *unwritable);
+        return;
+    }
     const std::lock_guard lock(_mutex);
     _use(domain).changes.insert_or_assign(key, value);
 }
@@ -167,7 +173,11 @@ bool LocalPreferenceStore::_storeChanges(const std::string& name, Domain& domain
     if (merged != domain.onDisk.values) {
         std::optional<std::string> bytes = folder.write(fileName(name), merged);
         if (!bytes) {
-            _noteNotStored(name, folder.error().message);
+            if (const auto unwritable = findUnwritableValue(merged)) {
+                _noteDamage(name, "nothing can be stored while " + *unwritable, {});
+            } else {
+                _noteNotStored(name, folder.error().message);
+            }
             return false;
         }
         domain.onDisk = {State::Whole, std::move(merged), std::move(*bytes), {}};
@@ -203,7 +213,12 @@ void LocalPreferenceStore::_noteDamage(const std::string& name, const std::strin
     // What cannot be set aside is met again by each reading.
     if (std::ranges::count(_damaged, damage) == 0) {
         _damaged.push_back(damage);
+        _log.write(platform::kErrorPriority,
+                   "Preferences " + name + " are damaged (" + reason + ") and " +
+                       (setAsideName.empty() ? "still in their place" : "now at " + damage.setAsidePath));
     }
 }
+
+// The changes themselves have been looked at: what stands in the way came with the file.
 
 } // namespace welcomer::local

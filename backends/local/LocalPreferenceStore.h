@@ -24,7 +24,8 @@ namespace welcomer::local {
 // damaged. A symbolic link in a file's place is read through, and replaced when the domain is written.
 //
 // Files of every property-list format are read, so that those of other tools are understood. A damaged file
-// is renamed to "<domain>.plist.damaged", with a number where that name is taken.
+// is renamed to "<domain>.plist.damaged", with a number where that name is taken. One that holds what XML
+// cannot hold is left alone.
 class LocalPreferenceStore final : public platform::PreferenceStore {
   public:
     //  root      the folder below which every path is looked up

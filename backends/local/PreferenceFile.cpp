@@ -7,6 +7,7 @@
 #include "platform/Path.h"
 #include "propertylist/PropertyListReader.h"
 #include "propertylist/PropertyListWriter.h"
+#include "propertylist/UnwritableValue.h"
 
 #include <cerrno>
 #include <fcntl.h>
@@ -95,7 +96,8 @@ std::optional<std::string> LockedPreferenceFolder::write(const std::string& name
                                                          const PropertyList::Dictionary& values) {
     std::optional<std::string> bytes = writeXMLPropertyList(values);
     if (!bytes) {
-        _error = {0, "cannot write " + _shown(name) + ": it would hold a value that XML cannot hold"};
+        _error = {0, "cannot write " + _shown(name) + ": " +
+                         findUnwritableValue(values).value_or("it would hold a value that XML cannot hold")};
         return std::nullopt;
     }
     struct stat present = {};

@@ -349,6 +349,37 @@ TEST_F(LocalAccountServiceTest, ADamagedFileCountsAsEmptyAndIsSetAsideBeforeTheF
     ASSERT_NE(service.accountForID("anna", true), nullptr);
     EXPECT_EQ(root.names(kFolder), (Names{"Accounts.plist", "Accounts.plist.damaged"}));
     EXPECT_EQ(root.content(kFolder + "/Accounts.plist.damaged"), "<plist><dict><key>torn");
+    const std::string folder = root.locate(kFolder);
+    ASSERT_EQ(log.records().size(), 1U);
+    EXPECT_EQ(log.records().front().priority, 115);
+    EXPECT_EQ(log.lines().front(),
+              "The accounts in " + folder +
+                  " are damaged (line 1, column 14: unterminated element <key>) and now at " + folder +
+                  "/Accounts.plist.damaged");
+}
+
+TEST_F(LocalAccountServiceTest, ADamagedFileThatCannotBeSetAsideIsLeftAsItIsWithALine) {
+    root.addFile(kFile, "<plist><dict><key>torn");
+    root.addFile(kFile + ".damaged", "");
+    for (int number = 2; number <= 1000; ++number) {
+        root.addFile(kFile + ".damaged-" + std::to_string(number), "");
+    }
+    EXPECT_EQ(service.accountForID("anna", true), nullptr);
+    EXPECT_EQ(root.content(kFile), "<plist><dict><key>torn");
+    ASSERT_EQ(log.lines().size(), 2U);
+    EXPECT_TRUE(log.lines()[0].ends_with(" and still in their place")) << log.lines()[0];
+    EXPECT_TRUE(log.lines()[1].starts_with("The accounts could not be stored: cannot set "))
+        << log.lines()[1];
+}
+
+TEST_F(LocalAccountServiceTest, WhatCannotBeWrittenLeavesTheFileAsItIsWithALine) {
+    ASSERT_NE(service.accountForID("anna", true), nullptr);
+    const Dictionary before = stored();
+    EXPECT_EQ(service.accountForID("bad\x01", true), nullptr);
+    EXPECT_EQ(stored(), before);
+    EXPECT_EQ(log.lines(), std::vector<std::string>{
+                               "The accounts could not be stored: cannot write " + root.locate(kFile) +
+                               ": Accounts/bad? is a key that holds U+0001, for which XML has no place"});
 }
 
 TEST_F(LocalAccountServiceTest, NoChangeOfAnotherProcessIsLost) {

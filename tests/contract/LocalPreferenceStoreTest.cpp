@@ -182,13 +182,62 @@ TEST_F(LocalPreferenceStoreTest, AWriteThatFailsLeavesTheOldFileAndKeepsTheChang
     EXPECT_EQ(stored().size(), 2U);
 }
 
-TEST_F(LocalPreferenceStoreTest, AValueThatHasNoXMLFormIsNotStored) {
-    ASSERT_TRUE(storeElsewhere("Old", 1));
-    store.setValue("New", "\x01", kDomain);
+TEST_F(LocalPreferenceStoreTest, AValueThatCannotBeWrittenIsRefusedInTheLogWithItsKey) {
+    store.setValue("New", PropertyList::Array{"\x01"}, kDomain);
+    store.setValue("When", PropertyList::Date{1e15}, kDomain);
+    EXPECT_EQ(
+        log.records(),
+        (std::vector<fakes::FakeSystemLog::Record>{
+            {115, "Preferences com.corvid.FirstRun refuse a value that cannot be written: New/0 holds "
+                  "U+0001, for which XML has no place"},
+            {115, "Preferences com.corvid.FirstRun refuse a value that cannot be written: When is a date "
+                  "outside the years 0000 to 9999"}}));
+}
+
+// { Bad = "a\x01"; Name = "x"; When = a date at 1e15; }, which no XML property list can hold.
+std::string unwritableFile() {
+    return {"bplist00\xd3\x01\x02\x03\x04\x05\x06\x53"
+            "Bad\x54"
+            "Name\x54"
+            "When\x52"
+            "a\x01\x51x\x33\x43\x0c\x6b\xf5\x26\x34\0\0\x08\x0f\x13\x18\x1d\x20\x22\0\0\0\0\0\0\x01\x01"
+            "\0\0\0\0\0\0\0\x07\0\0\0\0\0\0\0\0\0\0\0\0\0\0\0\x2b",
+            82};
+}
+
+TEST_F(LocalPreferenceStoreTest, AFileThatHoldsWhatCannotBeWrittenIsReadInFull) {
+    root.addFile(kFile, unwritableFile());
+    EXPECT_EQ(store.copyValue("Bad", kDomain), PropertyList("a\x01"));
+    EXPECT_EQ(store.copyValue("Name", kDomain), PropertyList("x"));
+    ASSERT_TRUE(store.copyValue("When", kDomain));
+    EXPECT_GT(store.copyValue("When", kDomain)->date()->secondsSince1970, 9e14);
+    EXPECT_TRUE(store.synchronise(kDomain)); // there is nothing to store
+    EXPECT_EQ(log.lines(), std::vector<std::string>());
+}
+
+TEST_F(LocalPreferenceStoreTest, AFileThatHoldsWhatCannotBeWrittenIsLeftAsItIsWithOneLine) {
+    root.addFile(kFile, unwritableFile());
+    store.setValue("Name", "y", kDomain);
     EXPECT_FALSE(store.synchronise(kDomain));
-    EXPECT_EQ(stored(), (PropertyList::Dictionary{{"Old", 1}}));
-    store.setValue("New", "text", kDomain);
+    EXPECT_FALSE(store.synchronise(kDomain));
+    EXPECT_EQ(root.content(kFile), unwritableFile());
+    EXPECT_EQ(root.names(kFolder), (Names{"com.corvid.FirstRun.plist"}));
+    EXPECT_EQ(store.copyValue("Name", kDomain), PropertyList("y")); // the change is kept
+    EXPECT_EQ(log.lines(), std::vector<std::string>{
+                               "Preferences com.corvid.FirstRun are damaged (nothing can be stored while "
+                               "Bad holds U+0001, for which XML has no place) and still in their place"});
+    ASSERT_EQ(store.damagedPreferences().size(), 1U);
+    EXPECT_EQ(store.damagedPreferences().front().setAsidePath, "");
+}
+
+TEST_F(LocalPreferenceStoreTest, OnceWhatCannotBeWrittenIsReplacedOrRemovedEverythingIsStored) {
+    root.addFile(kFile, unwritableFile());
+    store.setValue("Name", "y", kDomain);
+    store.setValue("Bad", "good", kDomain);
+    EXPECT_FALSE(store.synchronise(kDomain));
+    store.removeValue("When", kDomain);
     EXPECT_TRUE(store.synchronise(kDomain));
+    EXPECT_EQ(stored(), (PropertyList::Dictionary{{"Bad", "good"}, {"Name", "y"}}));
 }
 
 TEST_F(LocalPreferenceStoreTest, WhatIsNoFileIsUnreadableAndLeftAlone) {
@@ -235,6 +284,8 @@ TEST_P(DamagedPreferencesTest, CountAsEmptyAndAreSetAsideWhenTheyAreRead) {
     EXPECT_EQ(damage.setAsidePath, kFile + ".damaged");
     EXPECT_FALSE(damage.reason.empty());
     EXPECT_EQ(damage.reason.find('\n'), std::string::npos);
+    EXPECT_EQ(log.lines(), std::vector<std::string>{"Preferences com.corvid.FirstRun are damaged (" +
+                                                    damage.reason + ") and now at " + kFile + ".damaged"});
     EXPECT_TRUE(store.synchronise(kDomain));
     EXPECT_EQ(store.damagedPreferences().size(), 1U);
 }

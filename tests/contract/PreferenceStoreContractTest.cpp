@@ -186,6 +186,28 @@ TYPED_TEST(PreferenceStoreContract, ValuesKeepTheirTypes) {
     }
 }
 
+TYPED_TEST(PreferenceStoreContract, AValueThatCannotBeWrittenIsRefusedAndTheOthersAreStored) {
+    this->backend.storeElsewhere("Key", "old");
+    this->store.setValue("Other", "first", kDomain);
+    const std::vector<PropertyList> unwritable = {"a\x01", PropertyList::Date{1e15},
+                                                  PropertyList::Array{PropertyList::Dictionary{{"\x02", 1}}}};
+    for (const PropertyList& value : unwritable) {
+        this->store.setValue("Key", value, kDomain);
+        EXPECT_EQ(this->store.copyValue("Key", kDomain), PropertyList("old"));
+        this->store.setValue("New", value, kDomain);
+        EXPECT_EQ(this->store.copyValue("New", kDomain), std::nullopt);
+    }
+    this->store.setValue("\x03", 1, kDomain);
+    EXPECT_EQ(this->store.copyValue("\x03", kDomain), std::nullopt);
+    this->store.setValue("Last", 1, kDomain);
+    EXPECT_TRUE(this->store.synchronise(kDomain));
+    EXPECT_EQ(this->backend.readElsewhere("Key"), PropertyList("old"));
+    EXPECT_EQ(this->backend.readElsewhere("New"), std::nullopt);
+    EXPECT_EQ(this->backend.readElsewhere("Other"), PropertyList("first"));
+    EXPECT_EQ(this->backend.readElsewhere("Last"), PropertyList(1));
+    EXPECT_TRUE(this->store.damagedPreferences().empty());
+}
+
 TYPED_TEST(PreferenceStoreContract, SeveralValuesComeInTheOrderOfTheirKeys) {
     this->backend.storeElsewhere("B", "text");
     this->backend.storeElsewhere("A", true);

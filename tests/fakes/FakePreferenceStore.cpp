@@ -1,5 +1,6 @@
 #include "tests/fakes/FakePreferenceStore.h"
 
+#include "propertylist/UnwritableValue.h"
 #include "text/Describe.h"
 
 #include <utility>
@@ -42,6 +43,9 @@ std::optional<PropertyList> FakePreferenceStore::copyValue(const std::string& ke
 void FakePreferenceStore::setValue(const std::string& key, const PropertyList& value,
                                    const std::string& domain) {
     _recorder.record("PreferenceStore.setValue " + domain + ", " + key + " = " + text::describe(value));
+    if (findUnwritableEntry(key, value)) {
+        return;
+    }
     const std::lock_guard lock(_mutex);
     use(domain).changes.insert_or_assign(key, value);
 }
