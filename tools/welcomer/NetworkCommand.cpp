@@ -157,6 +157,13 @@ void checkSettings(const Settings& settings) {
     }
 }
 
+// Whether the choice and the warning type leave nothing to configure and nothing to check.
+bool leaveNothingToDo(const Settings& settings) {
+    constexpr std::uint64_t lastCheckingType = 2;
+    return settings.warningType == 0 ||
+           (settings.warningType > lastCheckingType && settings.choice != kUserChoiceLAN);
+}
+
 void apply(Session& session, const Settings& settings) {
     checkSettings(settings);
     PropertyList::Dictionary error;
@@ -182,10 +189,12 @@ void apply(Session& session, const Settings& settings) {
     if (!succeeded) {
         throw CommandFailure(entry(error, "title") + ". " + entry(error, "body"));
     }
+    const bool applied = !leaveNothingToDo(settings);
     if (session.options.json) {
-        printJson(session.out, {{"applied", true}});
+        printJson(session.out, {{"applied", applied}});
     } else {
-        session.out << "Done.\n";
+        session.out << (applied ? "Done.\n"
+                                : "Nothing was to be done: nothing is configured, and nothing checked.\n");
     }
 }
 

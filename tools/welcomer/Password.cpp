@@ -15,7 +15,8 @@ namespace {
 constexpr std::size_t kLongestPassword = 4096;
 constexpr const char* kInsteadOfTerminal = "--password-fd N";
 
-// One byte at a time: what follows the line is somebody else's.
+// One byte at a time: what follows the line is somebody else's. A carriage return before the line's end
+// belongs to that.
 std::string readLine(int descriptor) {
     const std::string option = "--password-fd " + std::to_string(descriptor) + ": ";
     std::string line;
@@ -29,9 +30,14 @@ std::string readLine(int descriptor) {
             throw CommandFailure(option + std::generic_category().message(errno));
         }
         if (count == 0 || byte == '\n') {
-            return line;
+            if (line.ends_with('\r')) {
+                line.pop_back();
+            }
+            if (line.size() <= kLongestPassword) {
+                return line;
+            }
         }
-        if (line.size() == kLongestPassword) {
+        if (line.size() > kLongestPassword) {
             throw CommandFailure(option + "the password is too long");
         }
         line += byte;

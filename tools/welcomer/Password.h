@@ -17,7 +17,8 @@ using PasswordSource = std::optional<int>;
 // Gives a command the option --password-fd.
 void addPasswordOption(CLI::App& command, PasswordSource& source);
 
-// Gets the password: the descriptor's first line, or what is typed. Nothing beyond the line is read.
+// Gets the password: the descriptor's first line, ended by LF or CR LF, or what is typed. Nothing beyond the
+// line is read.
 //  question  for the terminal
 // Throws CommandFailure when there is none, and UsageError where there is neither descriptor nor terminal.
 std::string getPassword(const PasswordSource& source, const std::string& question);

@@ -49,7 +49,8 @@ Json toJson(const PropertyList& value) {
 }
 
 void printJson(std::ostream& out, const Json& document) {
-    out << document.dump(2, ' ', false, Json::error_handler_t::replace) << '\n';
+    // In ASCII: of what lies beyond, some characters control the terminal.
+    out << document.dump(2, ' ', true, Json::error_handler_t::replace) << '\n';
 }
 
 void printOutline(std::ostream& out, const PropertyList& value, const std::string& indent) {

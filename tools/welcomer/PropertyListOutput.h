@@ -16,7 +16,8 @@ using Json = nlohmann::ordered_json;
 // The value in JSON: data as base64 text, dates as ISO 8601 text in UTC.
 Json toJson(const PropertyList& value);
 
-// Prints a JSON document, with a line end. Bytes that are no UTF-8 become the replacement character.
+// Prints a JSON document in ASCII, with a line end: what could control a terminal is escaped, and so is every
+// character beyond. Bytes that are no UTF-8 become the replacement character.
 void printJson(std::ostream& out, const Json& document);
 
 // Prints the value as an indented outline, one entry per line.

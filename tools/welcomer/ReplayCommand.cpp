@@ -2,6 +2,7 @@
 
 #include "handoff/ReplayItem.h"
 #include "handoff/WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup.h"
+#include "propertylist/UnwritableValue.h"
 #include "tools/welcomer/Commands.h"
 #include "tools/welcomer/Printable.h"
 #include "tools/welcomer/PropertyListFile.h"
@@ -39,6 +40,10 @@ void store(Session& session, const StoreArguments& arguments) {
     const platform::Platform& platform = platform::current();
     const std::string bundlePath = systemPath(session.options, arguments.bundle);
     const PropertyList replayObject = readPropertyListFile(arguments.file);
+    // The writer would store an item without content in its place.
+    if (const auto unwritable = findUnwritableValue(replayObject)) {
+        throw CommandFailure(arguments.file + " cannot be stored: " + *unwritable);
+    }
     if (!platform.fileSystem.exists(bundlePath)) {
         throw CommandFailure("there is no bundle at " + bundlePath +
                              (session.options.root == "/" ? "" : " below " + session.options.root));

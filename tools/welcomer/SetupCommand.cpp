@@ -323,6 +323,7 @@ void setUp(Session& session, const SetupArguments& arguments) {
         decisions.services = chooseServices(*terminal);
         confirm(*terminal, offers, decisions);
     }
+    flow.checkHandOver(decisions.aliases);
     flow.complete(decisions.services, decisions.justTheAccountAndKVS);
     const auto bundle = platform.resourceBundles.open(path);
     flow.handOver(decisions.aliases, *bundle);

@@ -9,6 +9,7 @@
 #include "platform/Platform.h"
 #include "plugins/DelegateIdentifiers.h"
 #include "plugins/WLNimbusDelegatesRequest.h"
+#include "propertylist/UnwritableValue.h"
 #include "text/Describe.h"
 #include "tools/welcomer/ReplayReason.h"
 #include "tools/welcomer/StandardOutputGuard.h"
@@ -125,6 +126,12 @@ std::vector<std::string> SetupFlow::delegates() {
     return identifiers;
 }
 
+void SetupFlow::checkHandOver(const ChosenAliases& aliases) const {
+    if (const auto unwritable = findUnwritableValue(_replayObject(aliases))) {
+        throw CommandFailure("cannot hand over to the next login what the server answered: " + *unwritable);
+    }
+}
+
 void SetupFlow::complete(const std::vector<std::string>& services, bool justTheAccountAndKVS) {
     const WaitingLine waiting("Setting up the account", _showsWaiting);
     std::string reason;
@@ -141,6 +148,14 @@ void SetupFlow::complete(const std::vector<std::string>& services, bool justTheA
 }
 
 void SetupFlow::handOver(const ChosenAliases& aliases, platform::ResourceBundle& bundle) {
+    if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(_account, _replayObject(aliases),
+                                                                      bundle)) {
+        throw CommandFailure("cannot hand over to the next login: " + replayReason(_log));
+    }
+    WLCallTesselFinishedSetup();
+}
+
+PropertyList::Dictionary SetupFlow::_replayObject(const ChosenAliases& aliases) const {
     PropertyList::Dictionary replay{{kReplayResponsesKey, *_delegate->delegatesResponseDict()}};
     for (const auto& [identifier, key] : {std::pair{kVidlinkIdentifier, kReplayVidlinkAliasesKey},
                                           std::pair{kChatterIdentifier, kReplayChatterAliasesKey}}) {
@@ -149,10 +164,7 @@ void SetupFlow::handOver(const ChosenAliases& aliases, platform::ResourceBundle&
             replay[key] = PropertyList::Array(chosen->second.begin(), chosen->second.end());
         }
     }
-    if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(_account, replay, bundle)) {
-        throw CommandFailure("cannot hand over to the next login: " + replayReason(_log));
-    }
-    WLCallTesselFinishedSetup();
+    return replay;
 }
 
 SignInFailure SetupFlow::_signInFailure() const {

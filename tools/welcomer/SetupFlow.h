@@ -79,6 +79,10 @@ class SetupFlow {
     // The identifiers of the delegates that have a plug-in and a response, in order.
     std::vector<std::string> delegates();
 
+    // Refuses, before anything is set up, what the hand-over could not store: what the server answered or the
+    // chosen aliases hold a value that cannot be written.
+    void checkHandOver(const ChosenAliases& aliases) const;
+
     // Signs in for good, unless that is so already, and enables the selected pre-login services.
     //  services              their identifiers
     //  justTheAccountAndKVS  documents and data alone
@@ -89,6 +93,7 @@ class SetupFlow {
     void handOver(const ChosenAliases& aliases, platform::ResourceBundle& bundle);
 
   private:
+    PropertyList::Dictionary _replayObject(const ChosenAliases& aliases) const;
     SignInFailure _signInFailure() const;
     const PropertyList* _response(const std::string& delegate) const;
 

@@ -1,6 +1,7 @@
 // welcomer state: the per-user record of what setup has done and shown.
 
 #include "platform/Platform.h"
+#include "propertylist/UnwritableValue.h"
 #include "state/WLPerUserState.h"
 #include "state/WLRecordSetupSeen.h"
 #include "text/Describe.h"
@@ -114,6 +115,9 @@ void show(Session& session) {
 
 void set(Session& session, const std::string& name, const std::string& value) {
     const Key& key = keyNamed(name);
+    if (const auto unwritable = findUnwritableEntry(name, value)) {
+        throw CommandFailure("the value could not be stored: " + *unwritable);
+    }
     const Json stored = key.setFlag ? Json(flagIn(value, name)) : Json(value);
     WLPerUserState& state = recordToChange();
     if (key.setFlag) {

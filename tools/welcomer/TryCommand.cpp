@@ -73,6 +73,7 @@ ChildLife setupLife(const std::string& password) {
             for (const AliasOffer& offer : flow.aliasOffers()) {
                 aliases[offer.identifier] = offer.aliases;
             }
+            flow.checkHandOver(aliases);
             flow.complete(WLNimbusAllSetupServiceIDs(), false);
             const auto bundle = platform::current().resourceBundles.open(kSetupBundlePath);
             flow.handOver(aliases, *bundle);

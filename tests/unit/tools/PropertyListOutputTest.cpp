@@ -38,7 +38,19 @@ TEST(ToJson, ContainersKeepTheirOrder) {
 TEST(PrintJson, BytesThatAreNoUTF8DoNotBreakTheDocument) {
     std::ostringstream out;
     printJson(out, toJson("a\xff"));
-    EXPECT_EQ(out.str(), "\"a\xef\xbf\xbd\"\n");
+    EXPECT_EQ(out.str(), "\"a\\ufffd\"\n");
+}
+
+TEST(PrintJson, NothingInItCanControlATerminal) {
+    std::string every; // control characters, and what reorders or ends a line
+    for (const char* character : {"\x01", "\x1b", "\x7f", "\xc2\x80", "\xc2\x9b", "\xc2\x9f", "\xe2\x80\xa8",
+                                  "\xe2\x80\xae", "\xe2\x81\xa6"}) {
+        every += character;
+    }
+    std::ostringstream out;
+    printJson(out, toJson(Dictionary{{every, every}}));
+    const std::string escaped = "\"\\u0001\\u001b\\u007f\\u0080\\u009b\\u009f\\u2028\\u202e\\u2066\"";
+    EXPECT_EQ(out.str(), "{\n  " + escaped + ": " + escaped + "\n}\n");
 }
 
 TEST(PrintOutline, ShowsOneEntryPerLine) {
