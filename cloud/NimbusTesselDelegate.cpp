@@ -6,6 +6,7 @@
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
 #include "plugins/WLNimbusDelegatesRequest.h"
+#include "propertylist/PropertyListReadings.h"
 
 #include <chrono>
 
@@ -168,7 +169,9 @@ void NimbusTesselDelegate::_validateNotOK(const platform::Notification& notifica
 
 void NimbusTesselDelegate::_processAuthenticateResponse() {
     if (_succeeded) {
-        if (platform::integerReading(entry(_userInfo, kStatusKey)) == 0) {
+        // A status that is there and is no number is none that says success.
+        const std::optional<PropertyList> status = entry(_userInfo, kStatusKey);
+        if (!status || integerIn(*status) == 0) {
             _delegatesResponseDict = _userInfo;
         } else {
             _succeeded = false;
@@ -181,7 +184,12 @@ void NimbusTesselDelegate::_processAuthenticateResponse() {
         WL_LOG("Nimbus: No accountError for validate failure");
         return;
     }
-    switch (platform::integerReading(accountError)) {
+    const std::optional<std::int64_t> code = integerIn(*accountError);
+    if (!code) {
+        WL_LOG("Nimbus: accountError '%@' for validate failure is no number", accountError);
+        return;
+    }
+    switch (*code) {
     case platform::kSKAccountErrorTermsOfService:
     case platform::kSKAccountErrorRepair:
         if (entry(_userInfo, platform::kSKPropertyAccountErrorInfo)) {

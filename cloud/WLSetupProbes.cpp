@@ -2,6 +2,7 @@
 
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
+#include "propertylist/PropertyListReadings.h"
 
 #include <exception>
 #include <optional>
@@ -26,7 +27,7 @@ bool WLScreenLockRequiresPassword() {
     if (screenLockOverride) {
         return *screenLockOverride;
     }
-    return platform::booleanReading(
+    return booleanReading(
         platform::current().preferenceStore.copyValue(kAskForPasswordKey, kScreensaverDomain));
 }
 

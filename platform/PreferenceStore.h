@@ -15,16 +15,6 @@ namespace welcomer::platform {
 // The domain of the application's standard defaults.
 inline constexpr char kStandardDefaultsDomain[] = "com.corvid.welcomer";
 
-// How a value reads where a boolean is wanted: a boolean as itself, a number as whether it differs from 0, a
-// string as whether it is "yes" or "true" in any case or a number that differs from 0. Anything else, and no
-// value, is false. Any thread.
-bool booleanReading(const std::optional<PropertyList>& value);
-
-// How a value reads where an integer is wanted: an integer as itself, a real truncated towards 0, a string
-// that is a decimal number from end to end as that number. What lies beyond 64 bits is the nearest end of
-// their range. Anything else, booleans among it, and no value is 0. Any thread.
-std::int64_t integerReading(const std::optional<PropertyList>& value);
-
 // What a store found in place of a domain: something that is no property list or holds no dictionary, or a
 // dictionary with a value that cannot be written back.
 struct DamagedPreferences {

@@ -3,6 +3,7 @@
 #include "cloud/WLSetupProbes.h"
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
+#include "propertylist/PropertyListReadings.h"
 
 namespace welcomer {
 
@@ -15,6 +16,7 @@ constexpr char kFakeComplexRecoveryMarker[] = "/var/db/.WLFakeComplexRecovery";
 
 constexpr std::int64_t kNoCircle = 0;
 constexpr std::int64_t kCircleExists = 1;
+constexpr std::int64_t kUnknownCircle = -1; // any number that is none of the above
 
 bool screenLockIsSecured(SetupStateManager& manager) {
     return manager.isMiniGreeter() ? WLScreenLockRequiresPassword()
@@ -65,13 +67,13 @@ bool prepareKeychain(SetupStateManager& manager) {
     return helper.seedKeychainComponentsWithIDPassword(seedName, seedPassword);
 }
 
+// A missing status says that there is no circle; one that is no number says nothing that is known.
 std::int64_t circleStatus(WLLoginHelper& helper) {
     const auto answer = helper.queryKeychainSyncStatus(std::nullopt);
-    std::optional<PropertyList> status;
-    if (answer && answer->contains("status")) {
-        status = answer->at("status");
+    if (!answer || !answer->contains("status")) {
+        return kNoCircle;
     }
-    return platform::integerReading(status); // 0 when there is none
+    return integerIn(answer->at("status")).value_or(kUnknownCircle);
 }
 
 // Where to go when no circle exists.

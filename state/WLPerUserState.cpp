@@ -2,6 +2,7 @@
 
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
+#include "propertylist/PropertyListReadings.h"
 
 #include <cstddef>
 #include <functional>
@@ -68,7 +69,7 @@ WLPerUserState::initWithDictionaryRepresentation(const PropertyList::Dictionary&
         if (entry.text) {
             state->_setText(entry.text, found->second);
         } else {
-            (*state.*entry.flag).set(platform::booleanReading(found->second));
+            (*state.*entry.flag).set(booleanReading(found->second));
         }
     }
     return state;

@@ -1,5 +1,7 @@
 #include "backends/desktop/OnlineAccountService.h"
 
+#include "propertylist/PropertyListReadings.h"
+
 #include <algorithm>
 #include <array>
 #include <atomic>
@@ -240,8 +242,7 @@ std::shared_ptr<platform::CloudAccount> OnlineAccountService::loggedInAccount() 
         return nullptr;
     }
     const std::string name = account->accountID();
-    const bool wasMade =
-        platform::booleanReading(_surroundings.preferenceStore.copyValue(name, kOnlineAccountsDomain));
+    const bool wasMade = booleanReading(_surroundings.preferenceStore.copyValue(name, kOnlineAccountsDomain));
     return wasMade && _switches->lack(name) ? nullptr : _wrap(std::move(account));
 }
 

@@ -1,5 +1,7 @@
 #include "backends/local/LocalAccountService.h"
 
+#include "propertylist/PropertyListReadings.h"
+
 #include <chrono>
 #include <cstdint>
 #include <type_traits>
@@ -45,9 +47,10 @@ Content* findService(Content& content, const std::string& name, const std::strin
     return services ? findDictionary(*services, identifier) : nullptr;
 }
 
+// What is there and reads as no boolean is false.
 bool flag(const PropertyList::Dictionary& dictionary, const char* key, bool ifMissing) {
     const auto found = dictionary.find(key);
-    return found == dictionary.end() ? ifMissing : found->second.boolean().value_or(ifMissing);
+    return found == dictionary.end() ? ifMissing : booleanReading(found->second);
 }
 
 std::chrono::nanoseconds nanoseconds(double seconds) {

@@ -4,6 +4,7 @@
 #include "backends/local/PasswordHash.h"
 #include "backends/local/PreferenceFile.h"
 #include "platform/AccountService.h"
+#include "propertylist/PropertyListReadings.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -48,18 +49,22 @@ double delaySeconds(const PropertyList& user) {
     return std::max(0.0, delay->real().value_or(static_cast<double>(delay->integer().value_or(0))));
 }
 
+// Whatever is no plain "no" has the operation fail.
 bool fails(const PropertyList& user) {
     const PropertyList* setting = user.find(kFailsKey);
-    return user.find(kAccountErrorKey) || (setting && setting->boolean().value_or(false));
+    return user.find(kAccountErrorKey) || (setting && integerIn(*setting) != 0);
 }
 
 // The answer to the right password.
 NimbusAnswer answerOf(const std::string& username, const PropertyList& user) {
+    const PropertyList* response = user.find(kResponseKey);
+    if (response && !response->isDictionary()) {
+        return accountError(platform::kSKAccountErrorServerUnavailable);
+    }
     NimbusAnswer answer;
     answer.isCompleted = !fails(user);
     answer.delaySeconds = delaySeconds(user);
-    const PropertyList* response = user.find(kResponseKey);
-    if (response && response->isDictionary()) {
+    if (response) {
         answer.contents = *response->dictionary();
     } else if (answer.isCompleted) {
         answer.contents = {{kStatusKey, 0}};

@@ -22,10 +22,12 @@ inline constexpr char kNimbusDirectoryPath[] = "/var/lib/welcomer/nimbus-directo
 //     Response          dictionary: what the server answers to the right password.
 //                       "status" is an integer, 0 for success; "delegates" maps
 //                       delegate identifiers to their responses, with the aliases on
-//                       offer. Without one the answer is a status of 0.
+//                       offer. Without one the answer is a status of 0; what is there and is no
+//                       dictionary cannot be read
 //     AccountError      integer: has the operation fail with this account error
 //     AccountErrorInfo  anything: goes with the account error
-//     Fails             boolean: has the operation fail although there is no account error
+//     Fails             boolean: has the operation fail although there is no account error; so does what
+//                       is there and reads as none
 //     DelaySeconds      number: how long the answer takes
 //     MailAddress       string: the mail service's address in an account that is made for the user
 //     Services          dictionary from service identifier to service, as the account file has them: the

@@ -238,6 +238,23 @@ TEST_F(LocalAccountServiceTest, AFailureMayComeWithoutAnAccountErrorAndWithAResp
     EXPECT_EQ(notifications.back().contents, (Dictionary{{"status", 1}, {kSKPropertyAccountID, "anna"}}));
 }
 
+TEST_F(LocalAccountServiceTest, AResponseThatIsNoDictionaryIsNoSuccess) {
+    addUser("anna", {{"Response", "fine"}});
+    EXPECT_EQ(authenticate().name, kSKNotificationAuthenticationFailed);
+    EXPECT_EQ(accountError(notifications.back()), PropertyList(kSKAccountErrorServerUnavailable));
+}
+
+TEST_F(LocalAccountServiceTest, AnOperationFailsUnlessItsFailureReadsAsFalse) {
+    for (const PropertyList& fails : {PropertyList("yes"), PropertyList(1), PropertyList(Dictionary{})}) {
+        addUser("anna", {{"Fails", fails}});
+        EXPECT_EQ(authenticate().name, kSKNotificationAuthenticationFailed);
+    }
+    for (const PropertyList& fails : {PropertyList(false), PropertyList(0), PropertyList("0")}) {
+        addUser("anna", {{"Fails", fails}});
+        EXPECT_EQ(authenticate().name, kSKNotificationAuthenticationCompleted);
+    }
+}
+
 TEST_F(LocalAccountServiceTest, AnErrorOfTheUsersIsToldOnlyToTheRightPassword) {
     addUser("anna", {{"AccountError", 5}});
     EXPECT_EQ(accountError(authenticate("anna", "wrong")), PropertyList(kSKAccountErrorWrongPassword));

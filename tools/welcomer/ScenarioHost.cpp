@@ -1,6 +1,6 @@
 #include "tools/welcomer/ScenarioHost.h"
 
-#include "platform/PreferenceStore.h"
+#include "propertylist/PropertyListReadings.h"
 #include "tools/welcomer/Tool.h"
 
 #include <map>
@@ -241,7 +241,7 @@ std::optional<PropertyList::Dictionary> ScenarioHost::_dictionary(const char* pa
 
 bool ScenarioHost::_flag(const char* part, const char* name) const {
     const PropertyList* value = _find(part, name);
-    return value && platform::booleanReading(*value);
+    return value && booleanReading(*value);
 }
 
 bool ScenarioHost::_answer(const char* part, const char* name) {

@@ -9,6 +9,7 @@
 #include "platform/Platform.h"
 #include "plugins/DelegateIdentifiers.h"
 #include "plugins/WLNimbusDelegatesRequest.h"
+#include "propertylist/PropertyListReadings.h"
 #include "propertylist/UnwritableValue.h"
 #include "text/Describe.h"
 #include "tools/welcomer/ReplayReason.h"
@@ -50,17 +51,21 @@ std::string textOf(std::int64_t accountError) {
 
 std::optional<std::int64_t> accountErrorOf(const PropertyList::Dictionary& response) {
     const PropertyList* error = find(response, platform::kSKPropertyAccountError);
-    return error ? error->integer() : std::nullopt;
+    return error ? integerIn(*error) : std::nullopt;
 }
 
 // Why the account service refused, for people.
 std::string refusal(const PropertyList::Dictionary& response) {
-    const std::optional<std::int64_t> error = accountErrorOf(response);
+    const PropertyList* error = find(response, platform::kSKPropertyAccountError);
     if (!error) {
         return "the server gave no reason";
     }
+    const std::optional<std::int64_t> code = integerIn(*error);
+    if (!code) {
+        return "the server's account error is no number: " + text::describe(*error);
+    }
     const PropertyList* information = find(response, platform::kSKPropertyAccountErrorInfo);
-    return textOf(*error) + (information ? " (" + text::describe(*information) + ")" : "");
+    return textOf(*code) + (information ? " (" + text::describe(*information) + ")" : "");
 }
 
 } // namespace

@@ -325,7 +325,7 @@ TEST_F(NimbusTesselDelegateTest, AHourIsWaitedForWithoutATimeOut) {
 
 TEST_F(NimbusTesselDelegateTest, ACompletedValidationWithANonZeroStatusFailsAndKeepsNoResponse) {
     for (const PropertyList& status :
-         {PropertyList(2), PropertyList(-1), PropertyList("2"), PropertyList(2.5)}) {
+         {PropertyList(2), PropertyList(-1), PropertyList("2"), PropertyList(2.5), PropertyList(true)}) {
         NimbusTesselDelegate fresh;
         answerWith(true, {{"status", status}, {kSKPropertyAccountError, 0}});
         EXPECT_FALSE(fresh.validateNimbusUsernameAndPasswordError("anna", "secret", nullptr));
@@ -334,9 +334,20 @@ TEST_F(NimbusTesselDelegateTest, ACompletedValidationWithANonZeroStatusFailsAndK
     }
 }
 
-TEST_F(NimbusTesselDelegateTest, AStatusThatIsMissingOrNoNumberReadsAsZero) {
+TEST_F(NimbusTesselDelegateTest, ACompletedValidationWhoseStatusIsNoNumberIsNoSuccess) {
+    for (const PropertyList& status : {PropertyList("fine"), PropertyList(""), PropertyList(Dictionary{}),
+                                       PropertyList(PropertyList::Array{0})}) {
+        NimbusTesselDelegate fresh;
+        answerWith(true, {{"status", status}});
+        EXPECT_FALSE(fresh.validateNimbusUsernameAndPasswordError("anna", "secret", nullptr));
+        EXPECT_FALSE(fresh.succeeded());
+        EXPECT_EQ(fresh.delegatesResponseDict(), std::nullopt);
+    }
+}
+
+TEST_F(NimbusTesselDelegateTest, AStatusThatIsMissingReadsAsZero) {
     for (const Dictionary& contents :
-         {Dictionary{}, Dictionary{{"status", "fine"}}, Dictionary{{"status", 0.5}}}) {
+         {Dictionary{}, Dictionary{{"status", 0.5}}, Dictionary{{"status", false}}}) {
         NimbusTesselDelegate fresh;
         answerWith(true, contents);
         EXPECT_TRUE(fresh.validateNimbusUsernameAndPasswordError("anna", "secret", nullptr));
@@ -382,6 +393,27 @@ TEST_F(NimbusTesselDelegateTest, AFailureWithAccountErrorZeroIsASuccess) {
     EXPECT_TRUE(delegate.succeeded());
     EXPECT_EQ(delegate.delegatesResponseDict(), (Dictionary{{kSKPropertyAccountError, 0}, {"status", 9}}));
     EXPECT_EQ(lines().back(), "Nimbus: validation 'NoError'");
+}
+
+TEST_F(NimbusTesselDelegateTest, AnAccountErrorThatIsNoNumberIsAFailureWithALineOfItsOwn) {
+    const std::pair<PropertyList, std::string> errors[] = {
+        {"wrong", "wrong"}, {Dictionary{{"code", 0}}, "{code = 0}"}, {PropertyList::Array{0}, "(0)"}};
+    for (const auto& [code, shown] : errors) {
+        NimbusTesselDelegate fresh;
+        const Dictionary contents{{kSKPropertyAccountError, code}, {kSKPropertyAccountErrorInfo, "info"}};
+        answerWith(false, contents);
+        EXPECT_FALSE(fresh.validateNimbusUsernameAndPasswordError("anna", "secret", nullptr));
+        EXPECT_FALSE(fresh.succeeded());
+        EXPECT_FALSE(fresh.needsRepair());
+        EXPECT_EQ(fresh.delegatesResponseDict(), contents);
+        EXPECT_EQ(lines().back(), "Nimbus: accountError '" + shown + "' for validate failure is no number");
+    }
+}
+
+TEST_F(NimbusTesselDelegateTest, AnAccountErrorOfTrueIsOneAndNoSuccess) {
+    answerWith(false, {{kSKPropertyAccountError, true}});
+    EXPECT_FALSE(signIn());
+    EXPECT_EQ(std::ranges::count(lines(), "Nimbus: validation 'NoError'"), 0);
 }
 
 TEST_F(NimbusTesselDelegateTest, AnyOtherAccountErrorFailsWithoutALine) {

@@ -151,8 +151,7 @@ TEST_F(WLKeychainSyncDestinationTest, AnUnknownCircleStatusIsNeitherLoggedNorFla
 
 TEST_F(WLKeychainSyncDestinationTest, AMissingCircleStatusMeansNoCircle) {
     for (const auto& answer :
-         {std::optional(PropertyList::Dictionary()), std::optional<PropertyList::Dictionary>(),
-          std::optional(PropertyList::Dictionary{{"status", PropertyList::Array()}})}) {
+         {std::optional(PropertyList::Dictionary()), std::optional<PropertyList::Dictionary>()}) {
         destinations.clear();
         host.answers.keychainSyncStatus = answer;
         EXPECT_TRUE(determine());
@@ -160,8 +159,21 @@ TEST_F(WLKeychainSyncDestinationTest, AMissingCircleStatusMeansNoCircle) {
     }
 }
 
+TEST_F(WLKeychainSyncDestinationTest, ACircleStatusThatIsNoNumberIsUnknown) {
+    for (const PropertyList& status : {PropertyList(PropertyList::Array()), PropertyList("none"),
+                                       PropertyList(PropertyList::Dictionary())}) {
+        destinations.clear();
+        host.answers.keychainSyncStatus = PropertyList::Dictionary{{"status", status}};
+        EXPECT_FALSE(determine());
+        EXPECT_EQ(destinations, (std::vector<std::int64_t>{3}));
+        EXPECT_EQ(host.flags, HostFlags());
+        EXPECT_EQ(fake.systemLog.lines(), Lines());
+    }
+}
+
 TEST_F(WLKeychainSyncDestinationTest, TheCircleStatusIsItsIntegerValue) {
-    for (const PropertyList& status : {PropertyList(1), PropertyList(1.9), PropertyList("1")}) {
+    for (const PropertyList& status :
+         {PropertyList(1), PropertyList(1.9), PropertyList("1"), PropertyList(true)}) {
         destinations.clear();
         host.answers.keychainSyncStatus = PropertyList::Dictionary{{"status", status}};
         EXPECT_TRUE(determine());
