@@ -20,7 +20,7 @@ std::optional<NCUtils::Services> servicesOf(platform::NetworkSet* set) {
 
 std::shared_ptr<platform::NetworkService>
 NCUtils::serviceInSetWithName(platform::NetworkSet* set, const std::optional<std::string>& name) {
-    if (!name) {
+    if (!name || name->empty()) {
         return nullptr;
     }
     const Services services = servicesOf(set).value_or(Services());
@@ -32,7 +32,7 @@ NCUtils::serviceInSetWithName(platform::NetworkSet* set, const std::optional<std
 std::optional<NCUtils::Services>
 NCUtils::servicesInSetWithHardwareKey(platform::NetworkSet* set,
                                       const std::optional<std::string>& hardwareKey) {
-    if (!hardwareKey) {
+    if (!hardwareKey || hardwareKey->empty()) {
         return std::nullopt;
     }
     std::optional<Services> services = servicesOf(set);

@@ -11,8 +11,8 @@
 
 namespace welcomer {
 
-// Class operations without state. A null set, service or list entry has nothing in it; missing arguments give
-// none. One thread at a time for each connection of the store.
+// Class operations without state. A null set, service or list entry has nothing in it; missing arguments, an
+// empty name, key or ID among them, give none. One thread at a time for each connection of the store.
 class NCUtils {
   public:
     using Services = std::vector<std::shared_ptr<platform::NetworkService>>;
@@ -33,8 +33,7 @@ class NCUtils {
     static std::shared_ptr<platform::NetworkService>
     serviceInSetWithHardwareKey(platform::NetworkSet* set, const std::optional<std::string>& hardwareKey);
 
-    // The first service with this ID, compared character by character, or null; null also for an empty ID.
-    // Borrowed from the list.
+    // The first service with this ID, compared character by character, or null. Borrowed from the list.
     static platform::NetworkService* serviceInArrayWithID(const std::optional<Services>& services,
                                                           const std::optional<std::string>& serviceID);
 

@@ -100,6 +100,13 @@ TEST_F(NCUtilsTest, NoSetAndNoKeyFindNothing) {
     EXPECT_EQ(NCUtils::serviceInSetWithName(nullptr, "Wired"), nullptr);
 }
 
+TEST_F(NCUtilsTest, AnEmptyNameAndAnEmptyKeyFindNothing) {
+    services = {service("", "1", {{"", "eth0", "Port without a type"}})};
+    EXPECT_EQ(NCUtils::serviceInSetWithName(set().get(), ""), nullptr);
+    EXPECT_EQ(idsOf(NCUtils::servicesInSetWithHardwareKey(set().get(), "")), std::nullopt);
+    EXPECT_EQ(NCUtils::serviceInSetWithHardwareKey(set().get(), ""), nullptr);
+}
+
 TEST_F(NCUtilsTest, ServicesAreFoundByTheTypeOfAnyInterfaceOfTheirChainInTheSetsOrder) {
     services = {service("Radio", "1", {kWireless}), service("Bridge", "2", {kBridge, kEthernet}),
                 service("Nothing", "3", {}), service("Wired", "4")};
