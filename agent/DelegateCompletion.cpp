@@ -2,6 +2,7 @@
 
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
+#include "plugins/PluginText.h"
 
 #include <utility>
 
@@ -16,9 +17,10 @@ std::string describeOutcome(bool succeeded, const std::optional<platform::Error>
 
 } // namespace
 
-DelegateCompletion::DelegateCompletion(std::string identifier, std::shared_ptr<platform::WorkGroup> group,
+DelegateCompletion::DelegateCompletion(const std::string& identifier,
+                                       std::shared_ptr<platform::WorkGroup> group,
                                        std::shared_ptr<platform::DispatchQueue> queue)
-    : _identifier(std::move(identifier)),
+    : _identifier(pluginText(identifier)),
       _group(std::move(group)),
       _queue(std::move(queue)),
       _start(platform::current().clock.now()) {

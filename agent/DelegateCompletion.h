@@ -23,7 +23,7 @@ class DelegateCompletion : public std::enable_shared_from_this<DelegateCompletio
     // Takes the time and enters the group; the completion's outcome leaves it.
     //  queue  held until there is an outcome
     // Main thread.
-    DelegateCompletion(std::string identifier, std::shared_ptr<platform::WorkGroup> group,
+    DelegateCompletion(const std::string& identifier, std::shared_ptr<platform::WorkGroup> group,
                        std::shared_ptr<platform::DispatchQueue> queue);
 
     // Puts the job that completes the delegate on the queue. A queue without the means to take it counts as
@@ -46,7 +46,7 @@ class DelegateCompletion : public std::enable_shared_from_this<DelegateCompletio
     bool _claimOutcome();
     void _leave();
 
-    const std::string _identifier;
+    const std::string _identifier; // as log lines have it
     const std::shared_ptr<platform::WorkGroup> _group;
     std::shared_ptr<platform::DispatchQueue> _queue;
     const std::chrono::nanoseconds _start;

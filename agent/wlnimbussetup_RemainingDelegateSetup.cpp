@@ -5,6 +5,7 @@
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
 #include "plugins/DelegateIdentifiers.h"
+#include "plugins/PluginText.h"
 #include "text/Format.h"
 
 #include <map>
@@ -73,7 +74,8 @@ void wlnimbussetup_RemainingDelegateSetup(const PropertyList& replayObject,
         if (const PropertyList* response = findResponse(replayObject, identifier)) {
             work.insert_or_assign(*identifier, DelegateWork{plugin, *response});
         } else {
-            WL_LOG("no cached response for %@", identifier);
+            WL_LOG("no cached response for %@",
+                   identifier ? std::optional(pluginText(*identifier)) : std::nullopt);
         }
     }
 
@@ -86,7 +88,7 @@ void wlnimbussetup_RemainingDelegateSetup(const PropertyList& replayObject,
         const auto queue =
             isMessaging ? messagingQueue
                         : queues.createSerial(text::format("com.corvid.wlnimbussetup -- %@", identifier));
-        WL_LOG("setting up %@", identifier);
+        WL_LOG("setting up %@", pluginText(identifier));
         const auto completion = std::make_shared<DelegateCompletion>(identifier, group, queue);
         if (isMessaging) {
             completion->queue([completion, delegate = std::move(delegate),

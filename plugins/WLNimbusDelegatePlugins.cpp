@@ -3,6 +3,7 @@
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
 #include "plugins/AbiDelegatePlugin.h"
+#include "plugins/PluginText.h"
 
 #include <exception>
 #include <string_view>
@@ -51,32 +52,33 @@ makeInstance(const wl_delegate_plugin_descriptor& principalClass, std::string& r
 
 // Loads and checks one entry. On return either the plug-in and its identifier are set, or the reason.
 void loadEntry(PluginScanEntry& entry) {
+    const std::string shownName = pluginText(entry.fileName);
     const auto* principalClass =
         loadPrincipalClass(std::string(kPluginDirectory) + "/" + entry.fileName, entry.reason);
     if (!principalClass) {
-        WL_LOG("Nimbus Plugins: Failed to get principal class for %@", entry.fileName);
+        WL_LOG("Nimbus Plugins: Failed to get principal class for %@", shownName);
         return;
     }
     if (!AbiDelegatePlugin::conformsToProtocol(*principalClass)) {
-        WL_LOG("Nimbus Plugins: Principal class for %@ does not conform to protocol", entry.fileName);
+        WL_LOG("Nimbus Plugins: Principal class for %@ does not conform to protocol", shownName);
         entry.reason = "does not conform to " WL_DELEGATE_PLUGIN_PROTOCOL;
         return;
     }
     auto plugin = makeInstance(*principalClass, entry.reason);
     if (!plugin) {
-        WL_LOG("Nimbus Plugins: Failed to init plugin object for %@", entry.fileName);
+        WL_LOG("Nimbus Plugins: Failed to init plugin object for %@", shownName);
         return;
     }
     try {
         entry.identifier = plugin->delegateIdentifier();
     } catch (...) {
         const std::exception_ptr exception = std::current_exception();
-        WL_LOG("Nimbus Plugins: Exception querying '%@' for id on load: %@", entry.fileName, exception);
+        WL_LOG("Nimbus Plugins: Exception querying '%@' for id on load: %@", shownName, exception);
         entry.reason = text::describe(exception);
         return;
     }
     if (!entry.identifier) {
-        WL_LOG("Nimbus Plugins: '%@' does not specify a plugin identifier", entry.fileName);
+        WL_LOG("Nimbus Plugins: '%@' does not specify a plugin identifier", shownName);
         entry.reason = "has no identifier";
         return;
     }
@@ -108,7 +110,7 @@ std::vector<PluginScanEntry> scanDelegatePlugins() {
         loadEntry(entry);
         if (entry.plugin && !identifiers.insert(*entry.identifier).second) {
             WL_LOG("Nimbus Plugins: duplicate plugins with id '%@', only one will be used",
-                   *entry.identifier);
+                   pluginText(*entry.identifier));
             entry.plugin.reset();
             entry.reason = "another plug-in has the same identifier";
         }

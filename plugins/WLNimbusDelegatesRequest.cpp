@@ -2,6 +2,7 @@
 
 #include "log/PCLogManager.h"
 #include "plugins/DelegateIdentifiers.h"
+#include "plugins/PluginText.h"
 
 #include <algorithm>
 #include <stdexcept>
@@ -30,7 +31,8 @@ PropertyList::Dictionary requestsOfPlugins(const DelegatePluginSource& plugins, 
             }
             std::optional<PropertyList> request = plugin->delegateSetupRequest();
             if (!request) {
-                WL_LOG("Nimbus Plugins: Delegate %@ omits itself from Nimbus setup", identifier);
+                WL_LOG("Nimbus Plugins: Delegate %@ omits itself from Nimbus setup",
+                       identifier ? std::optional(pluginText(*identifier)) : std::nullopt);
                 continue;
             }
             if (!identifier) {
@@ -39,7 +41,7 @@ PropertyList::Dictionary requestsOfPlugins(const DelegatePluginSource& plugins, 
             requests.insert_or_assign(*identifier, *std::move(request));
         } catch (...) {
             WL_LOG("Nimbus Plugins: Exception querying '%@' for setup request: %@",
-                   identifier.value_or(kUnknownIdentifier), std::current_exception());
+                   pluginText(identifier.value_or(kUnknownIdentifier)), std::current_exception());
         }
     }
     return requests;
@@ -88,7 +90,7 @@ WLNimbusGetMessagingAliasesFromDelegateResponse(const std::string& delegateIdent
             }
         } catch (...) {
             WL_LOG("Nimbus Plugins: Exception querying '%@' for aliases: %@",
-                   delegateIdentifier.empty() ? kUnknownIdentifier : delegateIdentifier.c_str(),
+                   pluginText(delegateIdentifier.empty() ? kUnknownIdentifier : delegateIdentifier),
                    std::current_exception());
         }
     }

@@ -1,6 +1,7 @@
 #include "text/Describe.h"
 
 #include "propertylist/CalendarDate.h"
+#include "text/OneLine.h"
 
 #include <array>
 #include <charconv>
@@ -36,11 +37,16 @@ std::string describeDate(PropertyList::Date date) {
     return formatCalendarDate(date).value_or(toDecimal(date.secondsSince1970));
 }
 
+// A value inside another one: its text is no line of its own, and whoever wrote it must not end the line.
+std::string describeInside(const PropertyList& value) {
+    return value.string() ? oneLine(*value.string()) : describe(value);
+}
+
 std::string describeArray(const PropertyList::Array& array) {
     std::string text = "(";
     std::string_view separator;
     for (const PropertyList& element : array) {
-        text.append(separator).append(describe(element));
+        text.append(separator).append(describeInside(element));
         separator = ", ";
     }
     return text += ')';
@@ -50,7 +56,7 @@ std::string describeDictionary(const PropertyList::Dictionary& dictionary) {
     std::string text = "{";
     std::string_view separator;
     for (const auto& [key, value] : dictionary) {
-        text.append(separator).append(key).append(" = ").append(describe(value));
+        text.append(separator).append(oneLine(key)).append(" = ").append(describeInside(value));
         separator = "; ";
     }
     return text += '}';

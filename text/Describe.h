@@ -34,7 +34,8 @@ std::string describe(double value);
 std::string describe(const std::exception& value);
 std::string describe(const std::exception_ptr& value);
 
-// Data as <hex>, a date in ISO 8601 UTC, an array as (a, b), a dictionary as {key = value; other = (1, 2)}.
+// Data as <hex>, a date in ISO 8601 UTC, an array as (a, b), a dictionary as {key = value; other = (1, 2)},
+// with the texts inside them on one line (text/OneLine.h).
 std::string describe(const PropertyList& value);
 
 template <class T>

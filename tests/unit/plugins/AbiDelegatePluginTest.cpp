@@ -301,6 +301,26 @@ TEST_F(AbiDelegatePluginTest, AHandlerThatIsCalledAfterARaiseDoesNothing) {
     EXPECT_EQ(handlerCalls, 0);
 }
 
+TEST_F(AbiDelegatePluginTest, TextsOfThePluginAreOneLineOfBoundedLength) {
+    const std::string text = "broken\n<115>forged\x1b[2J" + std::string(100000, 'x');
+    const std::string shown = ("broken\\n<115>forged\\x1b[2J" + std::string(1024, 'x')).substr(0, 1021) + "…";
+    plugin.complete = [&](const wl_value*, const wl_value*, wl_completion_handler, wl_error_slot* slot) {
+        host.raise(slot, text.c_str());
+    };
+    EXPECT_EQ(thrown([&] { create()->completeSetupWithResponseHandler({}, handler()); }), shown);
+    plugin.complete = [&](const wl_value*, const wl_value*, wl_completion_handler, wl_error_slot*) {
+        throw std::runtime_error(text);
+    };
+    EXPECT_EQ(thrown([&] { create()->completeSetupWithResponseHandler({}, handler()); }), shown);
+    plugin.complete = [&](const wl_value*, const wl_value*, wl_completion_handler issued, wl_error_slot*) {
+        issued.call(issued.context, false, 5, text.c_str());
+    };
+    std::optional<platform::Error> received;
+    create()->completeSetupWithResponseHandler(
+        {}, [&](bool, const std::optional<platform::Error>& given) { received = given; });
+    EXPECT_EQ(received, (platform::Error{5, shown}));
+}
+
 TEST_F(AbiDelegatePluginTest, AHandlerThatIsCalledBeforeARaiseHasCounted) {
     plugin.complete = [&](const wl_value*, const wl_value*, wl_completion_handler issued,
                           wl_error_slot* slot) {

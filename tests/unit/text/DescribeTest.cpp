@@ -63,6 +63,13 @@ TEST(Describe, CollectionsAreOnOneLineInKeyOrder) {
     EXPECT_EQ(describe(std::vector<std::string>{"a", "b"}), "(a, b)");
 }
 
+TEST(Describe, TextsInACollectionEndNoLine) {
+    EXPECT_EQ(describe(PropertyList(
+                  PropertyList::Dictionary{{"a\nb", PropertyList::Array{"c\nd", "\x1b"}}, {"e", "f\ng"}})),
+              "{a\\nb = (c\\nd, \\x1b); e = f\\ng}");
+    EXPECT_EQ(describe(PropertyList("as\nit stands")), "as\nit stands");
+}
+
 TEST(Describe, ExceptionsAreTheirText) {
     EXPECT_EQ(describe(std::runtime_error("no room")), "no room");
     EXPECT_EQ(describe(std::make_exception_ptr(std::runtime_error("no room"))), "no room");

@@ -22,6 +22,7 @@ TEST(Printable, ControlCharactersBeyondAsciiCannotEither) {
               "\\x9b2J");
     EXPECT_EQ(printable("\xc2\xa0"), "\xc2\xa0"); // the first one that is none
     EXPECT_EQ(printable("\xc2"), "\xc2");
+    EXPECT_EQ(printable("\u2028"), "\\u{2028}");
 }
 
 TEST(Printable, ColumnsCountCharactersNotBytes) {
