@@ -1,13 +1,16 @@
 #include "backends/local/LocalSystemLog.h"
 
 #include <exception>
+#include <string_view>
 #include <syslog.h>
 
 namespace welcomer::local {
 
 namespace {
 
-std::string withVisibleNulls(const std::string& message) {
+constexpr std::string_view kEllipsis = "…";
+
+std::string withVisibleNulls(std::string_view message) {
     std::string text;
     for (const char character : message) {
         if (character == '\0') {
@@ -19,18 +22,40 @@ std::string withVisibleNulls(const std::string& message) {
     return text;
 }
 
+bool isContinuation(char byte) {
+    return (static_cast<unsigned char>(byte) & 0xc0) == 0x80;
+}
+
+// Cuts a text that is too long where a character begins, as far as it has characters.
+void cut(std::string& text) {
+    constexpr std::size_t kLongestCharacter = 4;
+    if (text.size() <= kMaximumLogMessage) {
+        return;
+    }
+    std::size_t end = kMaximumLogMessage - kEllipsis.size();
+    const std::size_t earliest = end - kLongestCharacter;
+    while (end > earliest && isContinuation(text[end])) {
+        --end;
+    }
+    text.resize(end);
+    text += kEllipsis;
+}
+
 } // namespace
 
 void LocalSystemLog::write(int priority, const std::string& message) {
-    if (message.find('\0') == std::string::npos) {
+    if (message.size() <= kMaximumLogMessage && message.find('\0') == std::string::npos) {
         ::syslog(priority, "%s", message.c_str());
         return;
     }
     try {
-        ::syslog(priority, "%s", withVisibleNulls(message).c_str());
+        // No byte becomes less than one.
+        std::string text = withVisibleNulls(std::string_view(message).substr(0, kMaximumLogMessage + 1));
+        cut(text);
+        ::syslog(priority, "%s", text.c_str());
     } catch (const std::exception&) {
         // No memory for another copy: the text up to the first NUL has to do.
-        ::syslog(priority, "%s", message.c_str());
+        ::syslog(priority, "%.*s", static_cast<int>(kMaximumLogMessage), message.c_str());
     }
 }
 

@@ -6,6 +6,7 @@
 
 #include <cerrno>
 #include <optional>
+#include <string>
 #include <unistd.h>
 
 namespace welcomer::local {
@@ -41,6 +42,35 @@ TEST_F(LocalSystemLogTest, ANulIsShownAndDoesNotEndTheMessage) {
     const auto records = socket->take();
     ASSERT_EQ(records.size(), 1U);
     EXPECT_EQ(records.front().message, "before\\0after\\0");
+}
+
+TEST_F(LocalSystemLogTest, AMessageIsWholeUpToTheLongestOneAndThenCut) {
+    const std::string longest(kMaximumLogMessage, 'x');
+    log.write(115, longest);
+    log.write(115, longest + "x");
+    log.write(115, std::string(std::size_t{1} << 20U, 'x'));
+
+    const auto records = socket->take();
+    ASSERT_EQ(records.size(), 3U); // none is lost
+    EXPECT_EQ(records[0].message, longest);
+    const std::string cut = longest.substr(0, kMaximumLogMessage - 3) + "…";
+    EXPECT_EQ(records[1].message, cut);
+    EXPECT_EQ(records[2].message, cut);
+}
+
+TEST_F(LocalSystemLogTest, ACutSplitsNoCharacterAndNulsCountAsTheyAreShown) {
+    std::string birds;
+    for (int i = 0; i < 100000; ++i) {
+        birds += "\U0001f426";
+    }
+    log.write(115, birds);
+    log.write(115, std::string(kMaximumLogMessage, '\0'));
+
+    const auto records = socket->take();
+    ASSERT_EQ(records.size(), 2U);
+    EXPECT_EQ(records[0].message, birds.substr(0, kMaximumLogMessage - 4) + "…");
+    EXPECT_EQ(records[1].message.size(), kMaximumLogMessage);
+    EXPECT_TRUE(records[1].message.ends_with("…"));
 }
 
 TEST_F(LocalSystemLogTest, WithoutASystemLogNothingHappens) {
