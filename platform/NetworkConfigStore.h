@@ -176,7 +176,7 @@ class NetworkConfigStore {
     virtual std::vector<std::shared_ptr<NetworkInterface>> copyInterfaces() = 0;
 
     // The code of this thread's last operation on any of the store's objects, 0 when that succeeded, and a
-    // text for a code.
+    // text for a code; that of the last one's also names what it was about, where the store knows.
     // Any thread.
     virtual std::int32_t lastErrorCode() = 0;
     virtual std::string errorText(std::int32_t code) = 0;

@@ -18,10 +18,13 @@ namespace {
 using Dictionary = PropertyList::Dictionary;
 
 thread_local std::int32_t lastError = platform::kNetworkConfigSuccess;
+thread_local std::string lastDetail; // of that error, for people
 
 // Keeps the status of an operation as the last error.
-bool succeeded(std::int32_t status) {
+//  detail  what it was about and what the system said, where that is known
+bool succeeded(std::int32_t status, const std::string& detail = {}) {
     lastError = status;
+    lastDetail = detail;
     return status == platform::kNetworkConfigSuccess;
 }
 
@@ -83,8 +86,9 @@ class Core {
             return succeeded(platform::kNetworkConfigAccessDenied);
         }
         if (!_changes.empty()) {
-            const std::int32_t status = _file.change(_changes, _content);
-            if (!succeeded(status)) {
+            platform::Error error;
+            const std::int32_t status = _file.change(_changes, _content, error);
+            if (!succeeded(status, error.message)) {
                 return false;
             }
             _changes.clear();
@@ -98,14 +102,19 @@ class Core {
 
     bool apply() {
         std::int32_t first = platform::kNetworkConfigSuccess;
+        std::string firstDetail;
         for (const std::string& serviceID : std::exchange(_committed, {})) {
-            const std::int32_t status = _apply(serviceID);
+            std::string detail;
+            const std::int32_t status = _apply(serviceID, detail);
             if (status != platform::kNetworkConfigSuccess) {
                 _committed.insert(serviceID); // to be tried again
-                first = first == platform::kNetworkConfigSuccess ? status : first;
+                if (first == platform::kNetworkConfigSuccess) {
+                    first = status;
+                    firstDetail = detail;
+                }
             }
         }
-        return succeeded(first);
+        return succeeded(first, firstDetail);
     }
 
   private:
@@ -131,14 +140,15 @@ class Core {
         std::ranges::move(added, std::back_inserter(_onlyListed));
     }
 
-    std::int32_t _apply(const std::string& serviceID) const {
+    std::int32_t _apply(const std::string& serviceID, std::string& detail) const {
         const auto device = networkfile::serviceText(_content, serviceID, "Device");
         if (!device) {
+            detail = serviceID;
             return platform::kNetworkConfigNotFound;
         }
         return applyNetworkConfiguration(
             _root, *device, networkfile::configuration(_content, serviceID, platform::kNetworkProtocolIPv4),
-            networkfile::configuration(_content, serviceID, platform::kNetworkProtocolDNS));
+            networkfile::configuration(_content, serviceID, platform::kNetworkProtocolDNS), detail);
     }
 
     const RootFolder _root;
@@ -292,7 +302,8 @@ std::int32_t LocalNetworkConfigStore::lastErrorCode() {
 }
 
 std::string LocalNetworkConfigStore::errorText(std::int32_t code) {
-    return platform::networkConfigStatusText(code);
+    const std::string text = platform::networkConfigStatusText(code);
+    return code != lastError || lastDetail.empty() ? text : text + " (" + lastDetail + ")";
 }
 
 } // namespace welcomer::local

@@ -195,7 +195,8 @@ bool mayChangeNetwork() {
 
 std::int32_t applyNetworkConfiguration(const RootFolder& root, const std::string& device,
                                        const std::optional<Dictionary>& ipv4,
-                                       const std::optional<Dictionary>& dns) {
+                                       const std::optional<Dictionary>& dns, std::string& detail) {
+    detail = device;
     Plan plan;
     std::int32_t status = ipv4 ? planMethod(*ipv4, plan) : kNetworkConfigSuccess;
     if (status == kNetworkConfigSuccess && dns) {
@@ -218,7 +219,7 @@ std::int32_t applyNetworkConfiguration(const RootFolder& root, const std::string
         }
     }
     if (status == kNetworkConfigSuccess && !plan.servers.empty()) {
-        status = ResolverFile(root).writeServers(plan.servers);
+        status = ResolverFile(root).writeServers(plan.servers, detail);
     }
     return status;
 }

@@ -28,10 +28,12 @@ bool mayChangeNetwork();
 //  no method          nothing
 // Name servers, where the DNS configuration has some, go to /etc/resolv.conf.
 //  ipv4, dns  the configurations, or none
+//  detail     receives on failure the device or the file that it is about
 //  result     0 or a NetworkConfigStatus
 // Blocks for up to a few seconds. One thread at a time for each device.
 std::int32_t applyNetworkConfiguration(const RootFolder& root, const std::string& device,
                                        const std::optional<PropertyList::Dictionary>& ipv4,
-                                       const std::optional<PropertyList::Dictionary>& dns);
+                                       const std::optional<PropertyList::Dictionary>& dns,
+                                       std::string& detail);
 
 } // namespace welcomer::local

@@ -189,19 +189,22 @@ Dictionary NetworkFile::read() const {
 }
 
 std::int32_t NetworkFile::change(const std::vector<std::function<void(Dictionary&)>>& changes,
-                                 Dictionary& content) const {
+                                 Dictionary& content, platform::Error& error) const {
     makeDirectories(_root, kFolder, kFolderMode);
     LockedPreferenceFolder folder(_root, kFolder, machineLockPath(kMachineFilesLock), kFolderMode, kFileMode);
     if (!folder) {
-        return folder.error().number == ETIMEDOUT ? platform::kNetworkConfigInUse
-                                                  : platform::kNetworkConfigWriteFailed;
+        error = folder.error();
+        return error.number == ETIMEDOUT ? platform::kNetworkConfigInUse : platform::kNetworkConfigWriteFailed;
     }
-    PreferenceFileContent onDisk = readPreferenceFile(_root, platform::joinPath(kFolder, kFileName));
+    const std::string path = platform::joinPath(kFolder, kFileName);
+    PreferenceFileContent onDisk = readPreferenceFile(_root, path);
     if (onDisk.state == PreferenceFileContent::State::Unreadable) {
+        error = {0, "cannot read " + _root.shown(path) + ": " + onDisk.reason};
         return platform::kNetworkConfigReadFailed;
     }
     if (onDisk.state == PreferenceFileContent::State::Damaged &&
         folder.setAside(kFileName, onDisk.bytes).empty()) {
+        error = folder.error();
         return platform::kNetworkConfigWriteFailed;
     }
     Dictionary changed = onDisk.values;
@@ -209,6 +212,7 @@ std::int32_t NetworkFile::change(const std::vector<std::function<void(Dictionary
         change(changed);
     }
     if (changed != onDisk.values && !folder.write(kFileName, changed)) {
+        error = folder.error();
         return platform::kNetworkConfigWriteFailed;
     }
     content = std::move(changed);

@@ -3,6 +3,7 @@
 #pragma once
 
 #include "backends/local/RootFolder.h"
+#include "platform/Error.h"
 #include "propertylist/PropertyList.h"
 
 #include <cstdint>
@@ -78,9 +79,10 @@ class NetworkFile {
 
     // Makes changes to what is on disk.
     //  content  receives what the file holds now, on success
+    //  error    receives what failed, with the path and the reason, otherwise
     //  result   0 or a NetworkConfigStatus
     std::int32_t change(const std::vector<std::function<void(PropertyList::Dictionary&)>>& changes,
-                        PropertyList::Dictionary& content) const;
+                        PropertyList::Dictionary& content, platform::Error& error) const;
 
   private:
     const RootFolder _root;

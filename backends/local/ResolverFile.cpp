@@ -5,6 +5,7 @@
 #include "backends/local/FileContent.h"
 #include "backends/local/FileDescriptor.h"
 #include "backends/local/FileLock.h"
+#include "backends/local/SystemError.h"
 #include "platform/FileSystem.h"
 #include "platform/NetworkConfigStore.h"
 
@@ -112,7 +113,8 @@ ResolverConfiguration ResolverFile::read() const {
     return readResolverText(text);
 }
 
-std::int32_t ResolverFile::writeServers(const std::vector<std::string>& servers) const {
+std::int32_t ResolverFile::writeServers(const std::vector<std::string>& servers, std::string& detail) const {
+    detail = _root.shown(kPath);
     const FileDescriptor folder = _root.open(kFolder, O_RDONLY | O_DIRECTORY);
     if (!folder) {
         return platform::kNetworkConfigNameServersNotWritten;
@@ -120,6 +122,7 @@ std::int32_t ResolverFile::writeServers(const std::vector<std::string>& servers)
     makeDirectories(_root, kLocksParent, kLocksParentMode);
     const FileLock lock(_root, machineLockPath(kName));
     if (!lock) {
+        detail = lock.error().message;
         return lock.error().number == ETIMEDOUT ? platform::kNetworkConfigInUse
                                                 : platform::kNetworkConfigNameServersNotWritten;
     }
@@ -131,15 +134,19 @@ std::int32_t ResolverFile::writeServers(const std::vector<std::string>& servers)
     std::string text;
     const int error = readFile(_root, kPath, text, platform::kMaximumTextSize);
     if (error != 0 && error != ENOENT) {
+        detail = systemError("cannot read " + detail, error).message;
         return platform::kNetworkConfigNameServersNotWritten;
     }
     const std::string changed = replaceResolverServers(error == 0 ? text : std::string(), servers);
     const mode_t mode = isThere ? status.st_mode & kPermissions : kMode;
-    if ((error == 0 && changed == text) ||
-        replaceFile(folder.get(), kName, changed, mode, AfterCrash::OldOrNew) == 0) {
-        return platform::kNetworkConfigSuccess;
+    const int written = error == 0 && changed == text
+                            ? 0
+                            : replaceFile(folder.get(), kName, changed, mode, AfterCrash::OldOrNew);
+    if (written != 0) {
+        detail = systemError("cannot write " + detail, written).message;
+        return platform::kNetworkConfigNameServersNotWritten;
     }
-    return platform::kNetworkConfigNameServersNotWritten;
+    return platform::kNetworkConfigSuccess;
 }
 
 } // namespace welcomer::local

@@ -25,6 +25,8 @@ namespace {
 using Text = NetworkingManager::Text;
 using TextList = NetworkingManager::TextList;
 
+constexpr const char* kStoreFailed = "failed error code"; // in the log lines that tell of the store's error
+
 constexpr std::uint64_t kDefaultWarningType = 1;
 constexpr std::int64_t kDefaultWait = 10;
 
@@ -164,6 +166,13 @@ bool leaveNothingToDo(const Settings& settings) {
            (settings.warningType > lastCheckingType && settings.choice != kUserChoiceLAN);
 }
 
+// Why the configuration could not be stored or put to use, to go behind the text for people; nothing when the
+// last line of the log tells of something else.
+std::string storeFailure(const KeptLog& log) {
+    const std::string line = log.reason();
+    return line.find(kStoreFailed) == std::string::npos ? "" : " (" + line + ")";
+}
+
 void apply(Session& session, const Settings& settings) {
     checkSettings(settings);
     PropertyList::Dictionary error;
@@ -187,7 +196,7 @@ void apply(Session& session, const Settings& settings) {
         succeeded = manager.applySettings(&error);
     }
     if (!succeeded) {
-        throw CommandFailure(entry(error, "title") + ". " + entry(error, "body"));
+        throw CommandFailure(entry(error, "title") + ". " + entry(error, "body") + storeFailure(session.log));
     }
     const bool applied = !leaveNothingToDo(settings);
     if (session.options.json) {
@@ -215,7 +224,7 @@ void registerServices(Session& session) {
     }
     // The last line says what came of it.
     const std::string outcome = session.log.reason();
-    if (outcome.find("failed error code") != std::string::npos) {
+    if (outcome.find(kStoreFailed) != std::string::npos) {
         throw CommandFailure(outcome);
     }
     if (session.options.json) {

@@ -308,7 +308,7 @@ std::int32_t NetworkManagerConfigStore::lastErrorCode() noexcept {
 }
 
 std::string NetworkManagerConfigStore::errorText(std::int32_t code) noexcept {
-    return platform::networkConfigStatusText(code);
+    return isServedByKernel ? _kernel.errorText(code) : platform::networkConfigStatusText(code);
 }
 
 } // namespace welcomer::desktop

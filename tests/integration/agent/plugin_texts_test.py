@@ -77,7 +77,7 @@ class PluginTexts(unittest.TestCase):
         self.log = LogSocket(self.machine.root / "dev/log")
         self.addCleanup(self.log.close)
 
-    def agents_lines(self):
+    def agents_lines(self, account=ACCOUNT):
         """The lines of a login, up to the two minutes that nobody needs to wait for."""
         replay = self.machine.root / "tmp/replay.plist"
         replay.write_bytes(plistlib.dumps(REPLAY))
@@ -86,6 +86,9 @@ class PluginTexts(unittest.TestCase):
             ["/usr/local/bin/welcomer", "replay", "store", "--account", ACCOUNT, "--file", "/tmp/replay.plist",
              "--bundle", "/usr/local/share/welcomer/setup-bundle"], user=True)
         self.assertEqual(stored.returncode, 0, stored)
+        # No command line is long enough for every name.
+        items = self.machine.home / "Library/Credentials/Items.plist"
+        items.write_bytes(items.read_bytes().replace(f"<string>{ACCOUNT}<".encode(), f"<string>{account}<".encode()))
         definition = plistlib.loads((self.machine.home / "Library/LaunchAgents" / f"{LABEL}.plist").read_bytes())
         agent = self.machine.start(definition["ProgramArguments"], user=True)
         try:
@@ -111,6 +114,13 @@ class PluginTexts(unittest.TestCase):
         for text in texts:
             self.assertTrue(text.isprintable(), text)
             self.assertFalse(text.startswith(("<115>", "forged")), text)
+
+    def test_a_line_of_the_agents_own_that_no_datagram_holds_is_cut(self):
+        begin = "Enabling post-login services for account "
+        line = next((text for text in self.agents_lines("é" * 150_000) if text.startswith(begin)), "lost")
+        self.assertRegex(line, begin + "é+…$")
+        self.assertLess(64 * 1024 - 4, len(line.encode()))
+        self.assertLessEqual(len(line.encode()), 64 * 1024)
 
 
 if __name__ == "__main__":
