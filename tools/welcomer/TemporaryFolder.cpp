@@ -4,14 +4,20 @@
 
 #include <cerrno>
 #include <cstdlib>
+#include <string>
 #include <system_error>
 
 namespace welcomer::tool {
 
 TemporaryFolder::TemporaryFolder() {
-    std::string name = (std::filesystem::temp_directory_path() / "welcomer-try.XXXXXX").string();
+    const char* const folder = std::getenv("TMPDIR");
+    std::string name =
+        (std::filesystem::path(folder && *folder != '\0' ? folder : "/tmp") / "welcomer-try.XXXXXX").string();
     if (!mkdtemp(name.data())) {
-        throw CommandFailure("cannot make a temporary folder: " + std::generic_category().message(errno));
+        const int number = errno;
+        throw CommandFailure("cannot make a temporary folder in " +
+                             std::filesystem::path(name).parent_path().string() + ": " +
+                             std::generic_category().message(number));
     }
     _path = name;
 }

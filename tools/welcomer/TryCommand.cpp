@@ -9,6 +9,7 @@
 #include "tools/welcomer/Commands.h"
 #include "tools/welcomer/DelegateReport.h"
 #include "tools/welcomer/ExampleFiles.h"
+#include "tools/welcomer/FolderCopy.h"
 #include "tools/welcomer/FolderSnapshot.h"
 #include "tools/welcomer/Printable.h"
 #include "tools/welcomer/ProgressLine.h"
@@ -177,17 +178,16 @@ class Story {
     // The home folder, the plug-ins and the setup application, as a machine would have them.
     void _prepare() {
         const ExampleFiles examples = findExampleFiles();
-        if (fs::create_directories(_below(_home))) {
+        if (makeFolders(_below(_home))) {
             fs::permissions(_below(_home), fs::perms::owner_all);
         }
-        const auto replace = fs::copy_options::recursive | fs::copy_options::overwrite_existing;
         const fs::path plugins = _below(kPluginDirectory);
-        fs::create_directories(plugins);
+        makeFolders(plugins);
         for (const fs::path& plugin : examples.plugins) {
-            fs::copy(plugin, plugins / plugin.filename(), replace);
+            copyTree(plugin, plugins / plugin.filename());
         }
-        fs::create_directories(_below(kSetupBundlePath));
-        fs::copy(examples.setupBundle, _below(kSetupBundlePath), replace);
+        makeFolders(_below(kSetupBundlePath).parent_path());
+        copyTree(examples.setupBundle, _below(kSetupBundlePath));
 
         const platform::CloudUser user = exampleUser();
         if (const platform::Outcome outcome = _platform->accountDirectory.storeUser(user); !outcome) {
