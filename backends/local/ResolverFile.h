@@ -36,8 +36,8 @@ class ResolverFile {
 
     // Puts other servers in, all or nothing.
     //  servers  addresses, checked before
-    //  detail   receives on failure what the file is called here and, where that is known, what the system said
-    //  result   0, or a NetworkConfigStatus: the file is another program's, or cannot be written
+    //  detail   receives on failure what the file is called here and, where that is known, what the system
+    //  said result   0, or a NetworkConfigStatus: the file is another program's, or cannot be written
     std::int32_t writeServers(const std::vector<std::string>& servers, std::string& detail) const;
 
   private:
