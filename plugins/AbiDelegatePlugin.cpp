@@ -21,8 +21,8 @@ constexpr std::size_t kDescriptorSize =
 constexpr std::size_t kInstanceSize = offsetof(wl_delegate, messaging_aliases_from_response) +
                                       sizeof(wl_delegate::messaging_aliases_from_response);
 
-// Calls into a plug-in: `call` gets the error slot. Whatever leaves the plug-in's function, also an exception
-// of another runtime, ends here as a raise.
+// Calls into a plug-in: `call` gets the error slot. Whatever exception leaves the plug-in's function ends
+// here as a raise.
 template <class Call>
 auto callPlugin(ErrorSlot& slot, Call call) -> decltype(call(slot.handle())) {
     try {

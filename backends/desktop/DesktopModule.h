@@ -12,9 +12,8 @@
 namespace welcomer::desktop {
 
 // Loads the module NAME.so and checks that it belongs to this program.
-//  folder  where the modules are; empty: beside the program (in a build tree, and in
-//          an installed one, wherever that has been moved to), then where this build
-//          is installed
+//  folder  where the modules are; empty: beside the program (in a build tree, and in an installed one,
+//          wherever that has been moved to), then where this build is installed
 //  whyNot  one line when there is no result
 //  result  the module's entry, valid until the process ends; or null
 // Any thread. Loading is what takes time: callers keep the result.
@@ -33,7 +32,7 @@ class DesktopModule {
           _folder(std::move(folder)) {}
 
     // The service, borrowed; null when there is none, and then there never will be: another backend serves.
-    // Any thread.
+    // Throws what making it throws, once. Any thread.
     Interface* service() {
         const std::lock_guard lock(_mutex);
         if (!_isSettled) {
@@ -46,8 +45,9 @@ class DesktopModule {
     }
 
     // Has the module say how it serves now.
-    //  report  `backend`, `reason` and `advice` are filled in where the module can be loaded, else `reason`
-    //  and `advice` result  whether the desktop's service serves
+    //  report  filled in: `backend`, `reason` and `advice` where the module can be loaded, else `reason` and
+    //          `advice`
+    //  result  whether the desktop's service serves
     // Any thread.
     bool describe(platform::BackendReport& report) {
         const std::lock_guard lock(_mutex);

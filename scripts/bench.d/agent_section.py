@@ -98,7 +98,7 @@ def figures_of(bench):
     times = json.loads(result.stdout)
     found.append(("ratio", ("the agent without a replay item, whole process",
                             "an empty C++ program, dynamically linked", times["ns"] / 1e6, times["peer_ns"] / 1e6,
-                            1.5, "ms")))
+                            1.35, "ms")))
     bench.store(replay_with(f"com.corvid.bench.number{n:04d}" for n in range(10)))
     agent, _ = bench.lingering()
     asleep = bench.machine.start(["/tmp/empty-program", "60"], user=True)

@@ -3,6 +3,7 @@
 
 #include <gtest/gtest.h>
 
+#include <exception>
 #include <thread>
 
 namespace welcomer::desktop {
@@ -80,11 +81,21 @@ TEST(DesktopModuleTest, ObjectsCrossBothWays) {
     EXPECT_EQ(text.use_count(), 1);
 }
 
-TEST(DesktopModuleTest, AModuleCatchesWhatItThrows) {
+TEST(DesktopModuleTest, ExceptionsCrossBothWaysAndAreOver) {
     Counts counts;
     auto module = moduleWith<0>(counts);
     ASSERT_NE(module.service(), nullptr);
-    EXPECT_EQ(module.service()->survive(), "thrown and caught in the module");
+    std::string caught;
+    try {
+        module.service()->refuse();
+    } catch (const fixtures::Refusal& refusal) {
+        caught = refusal.what();
+        EXPECT_EQ(std::uncaught_exceptions(), 0);
+    }
+    EXPECT_EQ(caught, "thrown in the module");
+    EXPECT_EQ(module.service()->survive([] { throw fixtures::Refusal("thrown in the program"); }),
+              "thrown in the program");
+    EXPECT_EQ(std::uncaught_exceptions(), 0);
 }
 
 TEST(DesktopModuleTest, AModuleSpeaksForItself) {
