@@ -24,8 +24,8 @@ class NetworkStateServices {
     virtual ~NetworkStateServices() = default;
 
     // Borrowed: live as long as this object.
-    virtual platform::NetworkStateStore& stateStore() noexcept = 0;
-    virtual platform::HostReachability& hostReachability() noexcept = 0;
+    virtual platform::NetworkStateStore& stateStore() = 0;
+    virtual platform::HostReachability& hostReachability() = 0;
 };
 
 struct NetworkStateModule {

@@ -52,18 +52,18 @@ class OnlineAccounts {
     virtual ~OnlineAccounts() = default;
 
     // The accounts, those that were made first in front; none where nobody serves.
-    virtual std::optional<std::vector<OnlineAccount>> list() noexcept = 0;
+    virtual std::optional<std::vector<OnlineAccount>> list() = 0;
 
     // Switches a feature of an account on or off, and returns when that has taken effect: until then another
     // process cannot tell whether the switch has any. May block for some seconds.
     //  result  whether it has taken effect
-    virtual bool setFeature(const OnlineAccount& account, OnlineFeature feature, bool isOn) noexcept = 0;
+    virtual bool setFeature(const OnlineAccount& account, OnlineFeature feature, bool isOn) = 0;
 
     // Makes an account, unless there is one of that provider with that identity, whichever process makes it
     // at the same time. May block for two minutes, while the user is asked to unlock the keyring that takes
     // the password.
     //  result  whether there is such an account now
-    virtual bool makeOnce(const NewOnlineAccount& account) noexcept = 0;
+    virtual bool makeOnce(const NewOnlineAccount& account) = 0;
 };
 
 } // namespace welcomer::desktop

@@ -197,7 +197,7 @@ HashTablePointer itemProperties(const CredentialItem& item) {
 } // namespace
 
 Status SecretServiceStore::createTrustedApplication(const std::string& path,
-                                                    platform::TrustedApplication& application) noexcept {
+                                                    platform::TrustedApplication& application) {
     if (!path.starts_with('/')) {
         return platform::kCredentialInvalidPath;
     }
@@ -207,7 +207,7 @@ Status SecretServiceStore::createTrustedApplication(const std::string& path,
 
 Status SecretServiceStore::createAccess(const std::string& description,
                                         std::vector<platform::TrustedApplication> trustedApplications,
-                                        platform::CredentialAccess& access) noexcept {
+                                        platform::CredentialAccess& access) {
     access = {description, std::move(trustedApplications)};
     return platform::kCredentialSuccess;
 }
@@ -301,7 +301,7 @@ Status SecretServiceStore::_defaultCollection(GDBusConnection* connection, Secre
                                                                                             : error.get());
 }
 
-Status SecretServiceStore::createItem(const CredentialItem& item, const std::string& data) noexcept {
+Status SecretServiceStore::createItem(const CredentialItem& item, const std::string& data) {
     const std::lock_guard lock(_mutex);
     GDBusConnection* const connection = _bus.connection();
     if (!connection) {
@@ -348,7 +348,7 @@ Status SecretServiceStore::createItem(const CredentialItem& item, const std::str
 }
 
 Status SecretServiceStore::findItem(const std::string& service, const std::string& account, std::string* data,
-                                    std::unique_ptr<platform::CredentialItemReference>* reference) noexcept {
+                                    std::unique_ptr<platform::CredentialItemReference>* reference) {
     const std::lock_guard lock(_mutex);
     GDBusConnection* const connection = _bus.connection();
     if (!connection) {
@@ -380,7 +380,7 @@ Status SecretServiceStore::findItem(const std::string& service, const std::strin
 }
 
 Status SecretServiceStore::readAttributes(const platform::CredentialItemReference& reference,
-                                          CredentialItem& item) noexcept {
+                                          CredentialItem& item) {
     const std::lock_guard lock(_mutex);
     GDBusConnection* const connection = _bus.connection();
     if (!connection) {
@@ -398,7 +398,7 @@ Status SecretServiceStore::readAttributes(const platform::CredentialItemReferenc
     return platform::kCredentialSuccess;
 }
 
-Status SecretServiceStore::deleteItem(const platform::CredentialItemReference& reference) noexcept {
+Status SecretServiceStore::deleteItem(const platform::CredentialItemReference& reference) {
     const std::lock_guard lock(_mutex);
     GDBusConnection* const connection = _bus.connection();
     if (!connection) {
@@ -420,7 +420,7 @@ Status SecretServiceStore::deleteItem(const platform::CredentialItemReference& r
     return _refusal(wait, error.get());
 }
 
-bool SecretServiceStore::describe(platform::BackendReport& report) noexcept {
+bool SecretServiceStore::describe(platform::BackendReport& report) {
     const std::lock_guard lock(_mutex);
     GDBusConnection* const connection = _bus.connection();
     if (!connection) {

@@ -32,22 +32,22 @@ class SecretServiceStore final : public platform::CredentialStore {
     explicit SecretServiceStore(CredentialModule::Arguments arguments) : _arguments(arguments) {}
 
     std::int32_t createTrustedApplication(const std::string& path,
-                                          platform::TrustedApplication& application) noexcept override;
+                                          platform::TrustedApplication& application) override;
     std::int32_t createAccess(const std::string& description,
                               std::vector<platform::TrustedApplication> trustedApplications,
-                              platform::CredentialAccess& access) noexcept override;
+                              platform::CredentialAccess& access) override;
     // Refuses an item that is there already, locked or not. That and the creation are two steps: the caller
     // sees to it that nobody comes in between.
-    std::int32_t createItem(const platform::CredentialItem& item, const std::string& data) noexcept override;
+    std::int32_t createItem(const platform::CredentialItem& item, const std::string& data) override;
     std::int32_t findItem(const std::string& service, const std::string& account, std::string* data,
-                          std::unique_ptr<platform::CredentialItemReference>* reference) noexcept override;
+                          std::unique_ptr<platform::CredentialItemReference>* reference) override;
     std::int32_t readAttributes(const platform::CredentialItemReference& reference,
-                                platform::CredentialItem& item) noexcept override;
-    std::int32_t deleteItem(const platform::CredentialItemReference& reference) noexcept override;
+                                platform::CredentialItem& item) override;
+    std::int32_t deleteItem(const platform::CredentialItemReference& reference) override;
 
     // In what state the keyring is: asks the service, never the user. Any thread.
     //  result  whether the service serves
-    bool describe(platform::BackendReport& report) noexcept;
+    bool describe(platform::BackendReport& report);
 
   private:
     struct SearchResult {

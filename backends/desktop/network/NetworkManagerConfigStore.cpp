@@ -161,12 +161,12 @@ class AbsentInterface final : public platform::NetworkInterface {
         : _type(std::move(type)),
           _device(std::move(device)) {}
 
-    std::optional<std::string> type() const noexcept override { return _type; }
-    std::optional<std::string> deviceName() const noexcept override { return _device; }
-    std::optional<std::string> displayName() const noexcept override {
+    std::optional<std::string> type() const override { return _type; }
+    std::optional<std::string> deviceName() const override { return _device; }
+    std::optional<std::string> displayName() const override {
         return _device ? _type + " (" + *_device + ")" : _type;
     }
-    platform::NetworkInterface* underlyingInterface() const noexcept override { return nullptr; }
+    platform::NetworkInterface* underlyingInterface() const override { return nullptr; }
 
   private:
     const std::string _type;
@@ -180,15 +180,15 @@ class Protocol final : public platform::NetworkProtocol {
           _serviceID(std::move(serviceID)),
           _type(std::move(type)) {}
 
-    std::optional<std::string> type() noexcept override { return _type; }
+    std::optional<std::string> type() override { return _type; }
 
-    std::optional<Dictionary> configuration() noexcept override {
+    std::optional<Dictionary> configuration() override {
         const ServiceRecord* const record = _core->find(_serviceID);
         const auto found = record ? record->protocols.find(_type) : Protocols::const_iterator();
         return record && found != record->protocols.end() ? found->second : std::nullopt;
     }
 
-    bool setConfiguration(const Dictionary& configuration) noexcept override {
+    bool setConfiguration(const Dictionary& configuration) override {
         return _core->changeProtocol(_serviceID, _type, configuration);
     }
 
@@ -211,22 +211,22 @@ class Service final : public platform::NetworkService {
         }
     }
 
-    std::optional<std::string> name() noexcept override {
+    std::optional<std::string> name() override {
         const ServiceRecord* const record = _core->find(_serviceID);
         return record ? std::optional(record->name) : std::nullopt;
     }
-    std::optional<std::string> serviceID() noexcept override { return _serviceID; }
-    platform::NetworkInterface* interface() noexcept override { return _interface.get(); }
-    bool setEnabled(bool enabled) noexcept override { return _core->enable(_serviceID, enabled); }
+    std::optional<std::string> serviceID() override { return _serviceID; }
+    platform::NetworkInterface* interface() override { return _interface.get(); }
+    bool setEnabled(bool enabled) override { return _core->enable(_serviceID, enabled); }
 
-    std::shared_ptr<platform::NetworkProtocol> copyProtocol(const std::string& type) noexcept override {
+    std::shared_ptr<platform::NetworkProtocol> copyProtocol(const std::string& type) override {
         const ServiceRecord* const record = _core->find(_serviceID);
         return record && record->protocols.contains(type)
                    ? std::make_shared<Protocol>(_core, _serviceID, type)
                    : nullptr;
     }
 
-    bool addProtocolType(const std::string& type) noexcept override {
+    bool addProtocolType(const std::string& type) override {
         const ServiceRecord* const record = _core->find(_serviceID);
         if (record && record->protocols.contains(type)) {
             return succeeded(platform::kNetworkConfigAlreadyThere);
@@ -234,7 +234,7 @@ class Service final : public platform::NetworkService {
         return _core->changeProtocol(_serviceID, type, std::nullopt);
     }
 
-    std::optional<std::vector<std::shared_ptr<platform::NetworkProtocol>>> copyProtocols() noexcept override {
+    std::optional<std::vector<std::shared_ptr<platform::NetworkProtocol>>> copyProtocols() override {
         const ServiceRecord* const record = _core->find(_serviceID);
         if (!record) {
             succeeded(platform::kNetworkConfigNotFound);
@@ -257,7 +257,7 @@ class Set final : public platform::NetworkSet {
   public:
     explicit Set(std::shared_ptr<Core> core) : _core(std::move(core)) {}
 
-    std::optional<std::vector<std::shared_ptr<platform::NetworkService>>> copyServices() noexcept override {
+    std::optional<std::vector<std::shared_ptr<platform::NetworkService>>> copyServices() override {
         std::vector<std::shared_ptr<platform::NetworkService>> services;
         for (const std::string& serviceID : _core->serviceIDs()) {
             services.push_back(std::make_shared<Service>(_core, serviceID));
@@ -265,7 +265,7 @@ class Set final : public platform::NetworkSet {
         return services;
     }
 
-    bool establishDefaultConfiguration() noexcept override { return _core->establish(); }
+    bool establishDefaultConfiguration() override { return _core->establish(); }
 
   private:
     const std::shared_ptr<Core> _core;
@@ -275,12 +275,10 @@ class Connection final : public platform::NetworkConfigConnection {
   public:
     explicit Connection(std::shared_ptr<Core> core) : _core(std::move(core)) {}
 
-    std::shared_ptr<platform::NetworkSet> copyCurrentSet() noexcept override {
-        return std::make_shared<Set>(_core);
-    }
-    bool commitChanges() noexcept override { return _core->commit(); }
-    bool applyChanges() noexcept override { return _core->apply(); }
-    void synchronize() noexcept override { _core->reload(); }
+    std::shared_ptr<platform::NetworkSet> copyCurrentSet() override { return std::make_shared<Set>(_core); }
+    bool commitChanges() override { return _core->commit(); }
+    bool applyChanges() override { return _core->apply(); }
+    void synchronize() override { _core->reload(); }
 
   private:
     const std::shared_ptr<Core> _core;
@@ -288,8 +286,7 @@ class Connection final : public platform::NetworkConfigConnection {
 
 } // namespace
 
-std::shared_ptr<platform::NetworkConfigConnection>
-NetworkManagerConfigStore::open(const std::string& name) noexcept {
+std::shared_ptr<platform::NetworkConfigConnection> NetworkManagerConfigStore::open(const std::string& name) {
     auto client = NetworkManagerClient::open(NetworkManagerBus::open());
     isServedByKernel = client == nullptr;
     if (isServedByKernel) {
@@ -298,16 +295,15 @@ NetworkManagerConfigStore::open(const std::string& name) noexcept {
     return std::make_shared<Connection>(std::make_shared<Core>(std::move(client), _kernel));
 }
 
-std::vector<std::shared_ptr<platform::NetworkInterface>>
-NetworkManagerConfigStore::copyInterfaces() noexcept {
+std::vector<std::shared_ptr<platform::NetworkInterface>> NetworkManagerConfigStore::copyInterfaces() {
     return _kernel.copyInterfaces();
 }
 
-std::int32_t NetworkManagerConfigStore::lastErrorCode() noexcept {
+std::int32_t NetworkManagerConfigStore::lastErrorCode() {
     return isServedByKernel ? _kernel.lastErrorCode() : lastError;
 }
 
-std::string NetworkManagerConfigStore::errorText(std::int32_t code) noexcept {
+std::string NetworkManagerConfigStore::errorText(std::int32_t code) {
     return isServedByKernel ? _kernel.errorText(code) : platform::networkConfigStatusText(code);
 }
 

@@ -22,10 +22,10 @@ class NetworkManagerConfigStore final : public platform::NetworkConfigStore {
     //  kernel  lists the interfaces, and serves where NetworkManager does not run; borrowed
     explicit NetworkManagerConfigStore(platform::NetworkConfigStore& kernel) : _kernel(kernel) {}
 
-    std::shared_ptr<platform::NetworkConfigConnection> open(const std::string& name) noexcept override;
-    std::vector<std::shared_ptr<platform::NetworkInterface>> copyInterfaces() noexcept override;
-    std::int32_t lastErrorCode() noexcept override;
-    std::string errorText(std::int32_t code) noexcept override;
+    std::shared_ptr<platform::NetworkConfigConnection> open(const std::string& name) override;
+    std::vector<std::shared_ptr<platform::NetworkInterface>> copyInterfaces() override;
+    std::int32_t lastErrorCode() override;
+    std::string errorText(std::int32_t code) override;
 
   private:
     platform::NetworkConfigStore& _kernel;

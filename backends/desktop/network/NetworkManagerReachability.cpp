@@ -31,7 +31,7 @@ class Target final : public platform::HostReachabilityTarget {
   public:
     explicit Target(std::unique_ptr<platform::HostReachabilityTarget> kernel) : _kernel(std::move(kernel)) {}
 
-    std::optional<std::uint32_t> flags() noexcept override {
+    std::optional<std::uint32_t> flags() override {
         std::optional<std::uint32_t> flags = _kernel->flags();
         if (flags && (*flags & platform::kHostReachable) != 0 && isBehindPortal()) {
             *flags |= platform::kHostConnectionRequired;
@@ -46,7 +46,7 @@ class Target final : public platform::HostReachabilityTarget {
 } // namespace
 
 std::unique_ptr<platform::HostReachabilityTarget>
-NetworkManagerReachability::createTarget(const std::string& hostName) noexcept {
+NetworkManagerReachability::createTarget(const std::string& hostName) {
     return std::make_unique<Target>(_kernel.createTarget(hostName));
 }
 

@@ -14,8 +14,7 @@ class NetworkManagerReachability final : public platform::HostReachability {
     //  kernel  looks up names and routes; borrowed, must outlive the targets, too
     explicit NetworkManagerReachability(platform::HostReachability& kernel) : _kernel(kernel) {}
 
-    std::unique_ptr<platform::HostReachabilityTarget>
-    createTarget(const std::string& hostName) noexcept override;
+    std::unique_ptr<platform::HostReachabilityTarget> createTarget(const std::string& hostName) override;
 
   private:
     platform::HostReachability& _kernel;

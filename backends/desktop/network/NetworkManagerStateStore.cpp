@@ -76,7 +76,7 @@ class Connection final : public platform::NetworkStateConnection {
           _kernelStore(kernel),
           _clientName(std::move(clientName)) {}
 
-    Value copyValue(const NetworkStateKey& key) noexcept override {
+    Value copyValue(const NetworkStateKey& key) override {
         const std::lock_guard lock(_mutex);
         Value value = _ownValue(key);
         return value ? value : _kernelValue(key);
@@ -236,7 +236,7 @@ class Connection final : public platform::NetworkStateConnection {
 } // namespace
 
 std::unique_ptr<platform::NetworkStateConnection>
-NetworkManagerStateStore::open(const std::string& clientName) noexcept {
+NetworkManagerStateStore::open(const std::string& clientName) {
     auto bus = NetworkManagerBus::open();
     if (!bus) {
         return _kernel.open(clientName);

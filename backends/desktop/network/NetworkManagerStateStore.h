@@ -15,7 +15,7 @@ class NetworkManagerStateStore final : public platform::NetworkStateStore {
     //  kernel  borrowed; must outlive the connections, too
     explicit NetworkManagerStateStore(platform::NetworkStateStore& kernel) : _kernel(kernel) {}
 
-    std::unique_ptr<platform::NetworkStateConnection> open(const std::string& clientName) noexcept override;
+    std::unique_ptr<platform::NetworkStateConnection> open(const std::string& clientName) override;
 
   private:
     platform::NetworkStateStore& _kernel;

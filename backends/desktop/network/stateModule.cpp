@@ -14,8 +14,8 @@ class NetworkManagerState final : public NetworkStateServices {
         : _stateStore(*kernel.stateStore),
           _hostReachability(*kernel.hostReachability) {}
 
-    platform::NetworkStateStore& stateStore() noexcept override { return _stateStore; }
-    platform::HostReachability& hostReachability() noexcept override { return _hostReachability; }
+    platform::NetworkStateStore& stateStore() override { return _stateStore; }
+    platform::HostReachability& hostReachability() override { return _hostReachability; }
 
   private:
     NetworkManagerStateStore _stateStore;

@@ -159,7 +159,7 @@ std::string presentation(const NewOnlineAccount& account) {
 
 } // namespace
 
-std::optional<std::vector<OnlineAccount>> GoaOnlineAccounts::list() noexcept {
+std::optional<std::vector<OnlineAccount>> GoaOnlineAccounts::list() {
     const Connection bus = _connection();
     if (!bus) {
         return std::nullopt;
@@ -185,7 +185,7 @@ std::optional<std::vector<OnlineAccount>> GoaOnlineAccounts::list() noexcept {
 }
 
 // The library's setters return before the daemon has the value: a short process would lose it.
-bool GoaOnlineAccounts::setFeature(const OnlineAccount& account, OnlineFeature feature, bool isOn) noexcept {
+bool GoaOnlineAccounts::setFeature(const OnlineAccount& account, OnlineFeature feature, bool isOn) {
     const Connection bus = _connection();
     if (!bus) {
         return false;
@@ -205,7 +205,7 @@ bool GoaOnlineAccounts::setFeature(const OnlineAccount& account, OnlineFeature f
     });
 }
 
-bool GoaOnlineAccounts::makeOnce(const NewOnlineAccount& account) noexcept {
+bool GoaOnlineAccounts::makeOnce(const NewOnlineAccount& account) {
     if (!canBeSent(account.identity) || !canBeSent(account.password)) {
         return false;
     }

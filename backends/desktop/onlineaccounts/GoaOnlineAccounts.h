@@ -25,9 +25,9 @@ class GoaOnlineAccounts final : public OnlineAccounts {
     //  lock  keeps the user's other processes out, asked when an account is to be made
     explicit GoaOnlineAccounts(std::function<local::FileLock()> lock) : _lock(std::move(lock)) {}
 
-    std::optional<std::vector<OnlineAccount>> list() noexcept override;
-    bool setFeature(const OnlineAccount& account, OnlineFeature feature, bool isOn) noexcept override;
-    bool makeOnce(const NewOnlineAccount& account) noexcept override;
+    std::optional<std::vector<OnlineAccount>> list() override;
+    bool setFeature(const OnlineAccount& account, OnlineFeature feature, bool isOn) override;
+    bool makeOnce(const NewOnlineAccount& account) override;
 
   private:
     struct Unreference {
