@@ -86,6 +86,9 @@ void loadEntry(PluginScanEntry& entry) {
 }
 
 DelegatePluginArray loadDelegatePlugins() {
+    // The thread that will wait for the plug-ins has its run loop before there are any: what that loop stands
+    // on a plug-in's own thread could otherwise take first.
+    platform::current().runLoops.current();
     DelegatePluginArray plugins;
     for (PluginScanEntry& entry : scanDelegatePlugins()) {
         if (entry.plugin) {

@@ -19,7 +19,8 @@ using DelegatePluginArray = std::vector<std::shared_ptr<WLFirstRunDelegateConfig
 
 // The plug-ins of this machine, one per identifier, in the order in which they were met. The first call scans
 // the plug-in directory; every later call returns the same array, even when it is empty. It lives until the
-// process ends. Any thread; the first scan is made once.
+// process ends. Any thread, which has its run loop before the first plug-in is loaded; the first scan is made
+// once.
 const DelegatePluginArray& WLNimbusDelegatePlugins();
 
 // What became of one entry of the plug-in directory.

@@ -9,7 +9,9 @@
 
 namespace welcomer::desktop {
 
-// The main thread's loop, once asked for, is the same until the process ends.
+// The main thread's loop, once asked for, is the same until the process ends. Whoever loads plug-ins asks for
+// it before: a thread of theirs that runs GLib's main context first would keep it, and leave the main thread
+// the local loop.
 class DesktopRunLoops final : public platform::RunLoops {
   public:
     std::shared_ptr<platform::RunLoop> current() override;

@@ -8,7 +8,8 @@ namespace welcomer::desktop {
 
 struct RunLoopModule {
     static constexpr char kName[] = "runloop";
-    // Its current() is the main thread's loop, whichever thread asks.
+    // Its current() is the main thread's loop, whichever thread asks. Made on the main thread, which owns
+    // GLib's default main context from then on; there is none when another thread has taken that before.
     using Interface = platform::RunLoops;
     struct Arguments {};
 };

@@ -20,6 +20,12 @@ gint64 momentAfter(std::chrono::nanoseconds duration) {
     return now + std::chrono::duration_cast<std::chrono::microseconds>(duration).count() + 2;
 }
 
+void sleepUntil(gint64 moment) {
+    for (gint64 now = g_get_monotonic_time(); now < moment; now = g_get_monotonic_time()) {
+        g_usleep(static_cast<gulong>(moment - now));
+    }
+}
+
 // Wakes the context at a moment, for as long as it lives.
 class Alarm {
   public:
@@ -51,8 +57,12 @@ GSourceFuncs Alarm::kFunctions = {nullptr, nullptr, dispatch, nullptr, nullptr, 
 
 } // namespace
 
-void GLibRunLoop::run(std::chrono::nanoseconds duration) noexcept {
+void GLibRunLoop::run(std::chrono::nanoseconds duration) {
     const gint64 deadline = momentAfter(duration);
+    if (g_main_context_is_owner(nullptr) == FALSE) {
+        sleepUntil(deadline); // GLib would wait for the owner, who never lets go
+        return;
+    }
     std::unique_lock lock(_mutex);
     // A block that performs itself again does not keep a run for nothing from ending.
     const std::uint64_t pendingAtStart = _performed;
@@ -72,7 +82,12 @@ void GLibRunLoop::run(std::chrono::nanoseconds duration) noexcept {
     }
 }
 
-void GLibRunLoop::perform(std::function<void()> block) noexcept {
+void GLibRunLoop::perform(std::function<void()> block) {
+    {
+        const std::lock_guard lock(_mutex);
+        _pending.push_back(std::move(block));
+        ++_performed;
+    }
     // As urgent as what others attach without saying how urgent it is: blocks must not starve.
     GSource* const source = g_idle_source_new();
     g_source_set_priority(source, G_PRIORITY_DEFAULT);
@@ -83,11 +98,6 @@ void GLibRunLoop::perform(std::function<void()> block) noexcept {
             return G_SOURCE_REMOVE;
         },
         this, nullptr);
-    {
-        const std::lock_guard lock(_mutex);
-        _pending.push_back(std::move(block));
-        ++_performed;
-    }
     g_source_attach(source, nullptr);
     g_source_unref(source);
 }
@@ -104,11 +114,19 @@ void GLibRunLoop::runNext() noexcept {
     block();
 }
 
-std::unique_ptr<platform::RunLoopPort> GLibRunLoop::attachPort() noexcept {
+std::unique_ptr<platform::RunLoopPort> GLibRunLoop::attachPort() {
     return std::make_unique<Port>();
 }
 
-std::shared_ptr<platform::RunLoop> GLibRunLoops::current() noexcept {
+std::unique_ptr<GLibRunLoops> GLibRunLoops::create() {
+    // Never released. An owner may acquire it again.
+    if (g_main_context_acquire(nullptr) == FALSE) {
+        return nullptr;
+    }
+    return std::unique_ptr<GLibRunLoops>(new GLibRunLoops);
+}
+
+std::shared_ptr<platform::RunLoop> GLibRunLoops::current() {
     static const auto loop = std::make_shared<GLibRunLoop>();
     return loop;
 }

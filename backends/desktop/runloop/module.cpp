@@ -9,8 +9,12 @@ namespace welcomer::desktop {
 namespace {
 
 std::unique_ptr<platform::RunLoops> createRunLoops(const RunLoopModule::Arguments& /*arguments*/,
-                                                   std::string& /*whyNot*/) {
-    return std::make_unique<GLibRunLoops>();
+                                                   std::string& whyNot) {
+    std::unique_ptr<platform::RunLoops> loops = GLibRunLoops::create();
+    if (!loops) {
+        whyNot = "another thread runs GLib's default main context";
+    }
+    return loops;
 }
 
 bool describeRunLoops(const RunLoopModule::Arguments& /*arguments*/, platform::BackendReport& report) {

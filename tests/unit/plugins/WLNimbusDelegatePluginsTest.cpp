@@ -12,6 +12,23 @@ namespace {
 
 using fakes::InProcessPlugin;
 
+// Run loops that are made to be seen.
+class RecordedRunLoops final : public platform::RunLoops {
+  public:
+    RecordedRunLoops(platform::RunLoops& loops, fakes::CallRecorder& recorder)
+        : _loops(loops),
+          _recorder(recorder) {}
+
+    std::shared_ptr<platform::RunLoop> current() override {
+        _recorder.record("RunLoops.current");
+        return _loops.current();
+    }
+
+  private:
+    platform::RunLoops& _loops;
+    fakes::CallRecorder& _recorder;
+};
+
 class WLNimbusDelegatePluginsTest : public testing::Test {
   protected:
     static std::string path(const std::string& fileName) {
@@ -49,6 +66,35 @@ TEST_F(WLNimbusDelegatePluginsTest, GivesThePluginsInTheOrderInWhichTheyWereMet)
     add("m.ncdplugin", third.exportAs<2>());
     EXPECT_EQ(identifiers(), (Strings{"com.corvid.first", "com.corvid.second", "com.corvid.third"}));
     EXPECT_EQ(lines(), Strings{});
+}
+
+TEST_F(WLNimbusDelegatePluginsTest, TheThreadHasItsRunLoopBeforeTheFirstPluginIsLoaded) {
+    add("a.ncdplugin", first.exportAs<0>());
+    RecordedRunLoops runLoops(fake.virtualTime, fake.recorder);
+    const platform::Platform& plain = fake.platform();
+    const platform::Platform watched{plain.systemLog,
+                                     plain.fileSystem,
+                                     plain.processIdentity,
+                                     plain.credentialStore,
+                                     plain.pluginBundle,
+                                     plain.resourceBundles,
+                                     plain.clock,
+                                     runLoops,
+                                     plain.dispatchQueues,
+                                     plain.preferenceStore,
+                                     plain.systemVersionInfo,
+                                     plain.hostReachability,
+                                     plain.notificationCenter,
+                                     plain.accountService,
+                                     plain.accountDirectory,
+                                     plain.processLauncher,
+                                     plain.networkConfigStore,
+                                     plain.networkStateStore,
+                                     plain.directoryService};
+    const platform::ScopedPlatform watchedInstalled(watched);
+    EXPECT_EQ(identifiers(), Strings{"com.corvid.first"});
+    ASSERT_FALSE(fake.recorder.callsTo("PluginBundle.load").empty());
+    EXPECT_EQ(fake.recorder.calls().at(0), "RunLoops.current");
 }
 
 TEST_F(WLNimbusDelegatePluginsTest, IsEmptyWithoutALogLineWhenTheDirectoryIsMissing) {
