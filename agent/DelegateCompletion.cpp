@@ -37,14 +37,26 @@ void DelegateCompletion::queue(std::function<void()> job) {
     }
 }
 
+template <class Log>
+void DelegateCompletion::_handled(const Log& log) {
+    if (!_claimOutcome()) {
+        return;
+    }
+    try {
+        log();
+    } catch (...) {
+        // No memory for the line: the agent must not wait for ever all the same.
+    }
+    _leave();
+}
+
 void DelegateCompletion::complete(WLFirstRunDelegateConfiguration& plugin, const PropertyList& response) {
     const auto handler = [self = shared_from_this()](bool succeeded,
                                                      const std::optional<platform::Error>& error) {
-        if (self->_claimOutcome()) {
+        self->_handled([&] {
             WL_LOG("%@ setup: %@ (%0.3f seconds)", self->_identifier, describeOutcome(succeeded, error),
                    self->_secondsSinceStart());
-            self->_leave();
-        }
+        });
     };
     try {
         plugin.completeSetupWithResponseHandler(response, handler);
@@ -58,11 +70,10 @@ void DelegateCompletion::completeWithAliases(WLFirstRunDelegateConfiguration& pl
                                              const std::optional<std::vector<std::string>>& aliases) {
     const auto handler = [self = shared_from_this()](bool succeeded,
                                                      const std::optional<platform::Error>& error) {
-        if (self->_claimOutcome()) {
+        self->_handled([&] {
             WL_LOG("%@ setup+chosen: %@ (%0.3f seconds)", self->_identifier,
                    describeOutcome(succeeded, error), self->_secondsSinceStart());
-            self->_leave();
-        }
+        });
     };
     try {
         plugin.completeSetupWithResponseChosenAliasesHandler(response, aliases, handler);
@@ -73,8 +84,12 @@ void DelegateCompletion::completeWithAliases(WLFirstRunDelegateConfiguration& pl
 
 void DelegateCompletion::raised(const std::exception_ptr& exception) {
     const bool isOutcome = _claimOutcome();
-    WL_LOG("exception in setup response for plugin %@ (%0.3f seconds): %@", _identifier, _secondsSinceStart(),
-           exception);
+    try {
+        WL_LOG("exception in setup response for plugin %@ (%0.3f seconds): %@", _identifier,
+               _secondsSinceStart(), exception);
+    } catch (...) {
+        // Without its line, then.
+    }
     if (isOutcome) {
         _leave();
     }

@@ -17,7 +17,8 @@
 namespace welcomer {
 
 // Shared by the queued job and by the handler that the plug-in gets, either of which may outlive the other.
-// It does not hold the plug-in, so that a plug-in may keep its handler.
+// It does not hold the plug-in, so that a plug-in may keep its handler. Whatever fails on the way, the
+// outcome leaves the group: after its line, or without one where that cannot be written.
 class DelegateCompletion : public std::enable_shared_from_this<DelegateCompletion> {
   public:
     // Takes the time and enters the group; the completion's outcome leaves it.
@@ -36,7 +37,7 @@ class DelegateCompletion : public std::enable_shared_from_this<DelegateCompletio
     void completeWithAliases(WLFirstRunDelegateConfiguration& plugin, const PropertyList& response,
                              const std::optional<std::vector<std::string>>& aliases);
 
-    // Logs an exception; it is the outcome unless there is one already. Any thread.
+    // Logs an exception; it is the outcome unless there is one already. Nothing throws out of it. Any thread.
     void raised(const std::exception_ptr& exception);
 
   private:
@@ -44,6 +45,10 @@ class DelegateCompletion : public std::enable_shared_from_this<DelegateCompletio
 
     // Of the handler's first call and the exception, the first one is the outcome.
     bool _claimOutcome();
+
+    // Logs the outcome if it is one, and leaves the group whatever comes of that.
+    template <class Log>
+    void _handled(const Log& log);
     void _leave();
 
     const std::string _identifier; // as log lines have it

@@ -19,13 +19,18 @@ namespace {
 using namespace std::chrono_literals;
 
 // Carries out one step. What gets out of it, which only a lack of memory or of threads should, keeps no later
-// step from its work.
+// step from its work, nor does a line that cannot be written then.
 template <class Step>
 void attempt(const Step& step) {
     try {
         step();
     } catch (...) {
-        WL_LOG("exception in wlnimbussetup: %@", std::current_exception());
+        const std::exception_ptr exception = std::current_exception();
+        try {
+            WL_LOG("exception in wlnimbussetup: %@", exception);
+        } catch (...) {
+            // Without its line, then.
+        }
     }
 }
 

@@ -8,6 +8,7 @@
 #include "plugins/PluginText.h"
 #include "text/Format.h"
 
+#include <exception>
 #include <map>
 #include <utility>
 #include <vector>
@@ -51,6 +52,19 @@ const PropertyList* findResponse(const PropertyList& replayObject,
     return delegates && identifier ? delegates->find(*identifier) : nullptr;
 }
 
+void queueMessaging(const std::shared_ptr<DelegateCompletion>& completion, DelegateWork delegate,
+                    const Aliases& aliases) {
+    completion->queue([completion, delegate = std::move(delegate), aliases] {
+        completion->completeWithAliases(*delegate.plugin, delegate.response, aliases);
+    });
+}
+
+void queueOther(const std::shared_ptr<DelegateCompletion>& completion, DelegateWork delegate) {
+    completion->queue([completion, delegate = std::move(delegate)] {
+        completion->complete(*delegate.plugin, delegate.response);
+    });
+}
+
 } // namespace
 
 void wlnimbussetup_RemainingDelegateSetup(const PropertyList& replayObject,
@@ -90,15 +104,14 @@ void wlnimbussetup_RemainingDelegateSetup(const PropertyList& replayObject,
                         : queues.createSerial(text::format("com.corvid.wlnimbussetup -- %@", identifier));
         WL_LOG("setting up %@", pluginText(identifier));
         const auto completion = std::make_shared<DelegateCompletion>(identifier, group, queue);
-        if (isMessaging) {
-            completion->queue([completion, delegate = std::move(delegate),
-                               aliases = isVidlink ? vidlinkAliases : chatterAliases] {
-                completion->completeWithAliases(*delegate.plugin, delegate.response, aliases);
-            });
-        } else {
-            completion->queue([completion, delegate = std::move(delegate)] {
-                completion->complete(*delegate.plugin, delegate.response);
-            });
+        try {
+            if (isMessaging) {
+                queueMessaging(completion, std::move(delegate), isVidlink ? vidlinkAliases : chatterAliases);
+            } else {
+                queueOther(completion, std::move(delegate));
+            }
+        } catch (...) {
+            completion->raised(std::current_exception()); // no memory for the job: nobody must wait for it
         }
     }
 }

@@ -6,6 +6,7 @@
 
 #include <gtest/gtest.h>
 #include <memory>
+#include <new>
 #include <stdexcept>
 #include <string>
 #include <system_error>
@@ -112,6 +113,44 @@ TEST_F(DelegateCompletionTest, AQueueThatCannotTakeTheJobCountsAsAnException) {
     ASSERT_EQ(lines.size(), 1U);
     const std::string beginning = "exception in setup response for plugin d (0.000 seconds): no thread";
     EXPECT_EQ(lines[0].substr(0, beginning.size()), beginning);
+}
+
+// A line that cannot be written, as when no memory is left for it.
+class WithoutLines {
+  public:
+    WithoutLines() {
+        PCLogManager::sharedManager().setObserver([](const PCLogManager::Call&) { throw std::bad_alloc(); });
+    }
+    ~WithoutLines() { PCLogManager::sharedManager().setObserver({}); }
+    WithoutLines(const WithoutLines&) = delete;
+    WithoutLines& operator=(const WithoutLines&) = delete;
+};
+
+TEST_F(DelegateCompletionTest, AnOutcomeThatCannotBeLoggedLeavesTheGroupOnceAndReleasesTheQueue) {
+    const WithoutLines withoutLines;
+    const std::weak_ptr<platform::DispatchQueue> watched = std::exchange(queue, nullptr);
+    EXPECT_NO_THROW(completion->complete(plugin, "response"));
+    EXPECT_EQ(group->left, 1);
+    EXPECT_TRUE(watched.expired());
+    completion = std::make_shared<DelegateCompletion>("e", group, std::make_shared<DirectQueue>());
+    EXPECT_NO_THROW(completion->completeWithAliases(plugin, "response", std::nullopt));
+    EXPECT_EQ(group->left, 2);
+}
+
+TEST_F(DelegateCompletionTest, AnExceptionThatCannotBeLoggedLeavesTheGroupOnceAndGoesNoFurther) {
+    const WithoutLines withoutLines;
+    plugin.complete = [](const CompletionHandler& handler) {
+        handler(true, std::nullopt);
+        throw std::runtime_error("too late");
+    };
+    EXPECT_NO_THROW(completion->complete(plugin, "response"));
+    EXPECT_EQ(group->left, 1);
+    completion = std::make_shared<DelegateCompletion>("e", group, queue);
+    plugin.complete = [](const CompletionHandler&) {
+        throw std::runtime_error("no");
+    };
+    EXPECT_NO_THROW(completion->completeWithAliases(plugin, "response", std::nullopt));
+    EXPECT_EQ(group->left, 2);
 }
 
 TEST_F(DelegateCompletionTest, HandlerThenRaiseLogsBothAndLeavesOnce) {

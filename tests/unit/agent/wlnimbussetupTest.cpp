@@ -1,5 +1,6 @@
 #include "agent/wlnimbussetup.h"
 
+#include "log/PCLogManager.h"
 #include "propertylist/PropertyListWriter.h"
 #include "tests/fakes/FakePlatform.h"
 #include "tests/unit/agent/TestDelegate.h"
@@ -7,6 +8,7 @@
 #include <algorithm>
 #include <array>
 #include <gtest/gtest.h>
+#include <new>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -132,6 +134,20 @@ TEST_F(WlnimbussetupTest, WhatGetsOutOfTheFirstStageIsLoggedAndTheSecondStageFol
     putResponses({"a"});
     EXPECT_EQ(run(), 0);
     EXPECT_EQ(fake.recorder.callsTo("AccountManager."), Lines{});
+    EXPECT_EQ(plugin.calls.size(), 1U);
+    EXPECT_EQ(fake.systemLog.lines().back(), "exiting");
+}
+
+TEST_F(WlnimbussetupTest, WhatCannotBeLoggedKeepsNoStepFromItsWork) {
+    TestDelegate& plugin = add("a");
+    putResponses({"a"});
+    PCLogManager::sharedManager().setObserver([](const PCLogManager::Call& call) {
+        if (call.message.starts_with("Killing") || call.message.starts_with("exception")) {
+            throw std::bad_alloc();
+        }
+    });
+    EXPECT_EQ(run(), 0);
+    PCLogManager::sharedManager().setObserver({});
     EXPECT_EQ(plugin.calls.size(), 1U);
     EXPECT_EQ(fake.systemLog.lines().back(), "exiting");
 }
