@@ -3,8 +3,15 @@
 #include "agent/leaveProcess.h"
 #include "agent/wlnimbussetup.h"
 #include "backends/Backends.h"
+#include "text/ProgramOptions.h"
+
+#include <string_view>
 
 int main(int argc, char** argv) {
+    if (argc >= 2 && std::string_view(argv[1]).starts_with("--")) {
+        welcomer::answerOption(argv[1], "wlnimbussetup", "[LABEL]");
+        return 0;
+    }
     try {
         const auto owner = welcomer::buildPlatform();
         const welcomer::platform::ScopedPlatform installed(owner->platform());

@@ -1,13 +1,14 @@
 // welcomer-launch-agents, started once or more at each login: starts the user's launch agents once.
 //   --end-of-login   makes the next start a new login's
+//   --help, --version
 
 #include "backends/Backends.h"
+#include "text/ProgramOptions.h"
 #include "tools/launch-agents/ChildStarter.h"
 #include "tools/launch-agents/UserManagerStarter.h"
 #include "tools/launch-agents/startLaunchAgents.h"
 
 #include <cstdlib>
-#include <iostream>
 #include <string_view>
 
 using namespace welcomer;
@@ -15,8 +16,7 @@ using namespace welcomer;
 int main(int argc, char** argv) {
     const bool endOfLogin = argc == 2 && argv[1] == std::string_view("--end-of-login");
     if (argc > 1 && !endOfLogin) {
-        std::cerr << "usage: welcomer-launch-agents [--end-of-login]\n";
-        return 2;
+        return answerOption(argv[1], "welcomer-launch-agents", "[--end-of-login]");
     }
     const auto owner = buildPlatform();
     const platform::ScopedPlatform installed(owner->platform());

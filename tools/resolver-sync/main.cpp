@@ -2,6 +2,7 @@
 
 #include "backends/Backends.h"
 #include "log/PCLogManager.h"
+#include "text/ProgramOptions.h"
 #include "tools/resolver-sync/ResolverSync.h"
 #include "tools/resolver-sync/RunningMark.h"
 
@@ -10,7 +11,10 @@
 
 using namespace welcomer;
 
-int main() {
+int main(int argc, char** argv) {
+    if (argc > 1) {
+        return answerOption(argv[1], "welcomer-resolver-sync", "");
+    }
     const auto owner = buildPlatform();
     const platform::ScopedPlatform installed(owner->platform());
     try {
