@@ -1,6 +1,7 @@
 #include "plugins/AbiDelegatePlugin.h"
 
 #include "plugins/CompletionHandlers.h"
+#include "plugins/PluginMark.h"
 #include "plugins/PluginText.h"
 #include "plugins/PropertyListHandles.h"
 #include "propertylist/PropertyListReader.h"
@@ -21,10 +22,11 @@ constexpr std::size_t kDescriptorSize =
 constexpr std::size_t kInstanceSize = offsetof(wl_delegate, messaging_aliases_from_response) +
                                       sizeof(wl_delegate::messaging_aliases_from_response);
 
-// Calls into a plug-in: `call` gets the error slot. Whatever exception leaves the plug-in's function ends
-// here as a raise.
+// Calls into the plug-in of this name: `call` gets the error slot. Whatever exception leaves the plug-in's
+// function ends here as a raise.
 template <class Call>
-auto callPlugin(ErrorSlot& slot, Call call) -> decltype(call(slot.handle())) {
+auto callPlugin(const std::string& name, ErrorSlot& slot, Call call) -> decltype(call(slot.handle())) {
+    const PluginMark mark(name.c_str());
     try {
         return call(slot.handle());
     } catch (const std::exception& exception) {
@@ -65,10 +67,11 @@ void throwIfMissing(Function* function, const char* operation) {
 
 // Calls a completion operation, whose handler does nothing more once it has raised.
 template <class Call>
-void callCompletion(WLFirstRunDelegateConfiguration::CompletionHandler handler, Call call) {
+void callCompletion(const std::string& name, WLFirstRunDelegateConfiguration::CompletionHandler handler,
+                    Call call) {
     const wl_completion_handler issued = issueCompletionHandler(std::move(handler));
     ErrorSlot slot;
-    callPlugin(slot, [&](wl_error_slot* handle) { call(issued, handle); });
+    callPlugin(name, slot, [&](wl_error_slot* handle) { call(issued, handle); });
     if (slot.raised()) {
         revokeCompletionHandler(issued);
         throw DelegatePluginException(slot.message());
@@ -100,19 +103,20 @@ bool AbiDelegatePlugin::conformsToProtocol(const wl_delegate_plugin_descriptor& 
 }
 
 std::shared_ptr<AbiDelegatePlugin>
-AbiDelegatePlugin::create(const wl_delegate_plugin_descriptor& principalClass) {
+AbiDelegatePlugin::create(const wl_delegate_plugin_descriptor& principalClass, const std::string& name) {
     if (!principalClass.create) {
         return nullptr;
     }
     ErrorSlot slot;
-    wl_delegate* const instance = callPlugin(
-        slot, [&](wl_error_slot* handle) { return principalClass.create(&delegatePluginHost(), handle); });
+    wl_delegate* const instance = callPlugin(name, slot, [&](wl_error_slot* handle) {
+        return principalClass.create(&delegatePluginHost(), handle);
+    });
     if (!instance) {
         throwIfRaised(slot);
         return nullptr;
     }
     // From here on the destructor gives the instance back.
-    std::shared_ptr<AbiDelegatePlugin> plugin(new AbiDelegatePlugin(principalClass, instance));
+    std::shared_ptr<AbiDelegatePlugin> plugin(new AbiDelegatePlugin(principalClass, instance, name));
     throwIfRaised(slot);
     if (instance->size < kInstanceSize) {
         return nullptr;
@@ -123,15 +127,16 @@ AbiDelegatePlugin::create(const wl_delegate_plugin_descriptor& principalClass) {
 AbiDelegatePlugin::~AbiDelegatePlugin() {
     if (_principalClass.destroy) {
         ErrorSlot slot; // nobody is left to hear of it
-        callPlugin(slot, [this](wl_error_slot*) { _principalClass.destroy(_instance); });
+        callPlugin(_name, slot, [this](wl_error_slot*) { _principalClass.destroy(_instance); });
     }
 }
 
 std::optional<std::string> AbiDelegatePlugin::delegateIdentifier() {
     throwIfMissing(_instance->delegate_identifier, "delegateIdentifier");
     ErrorSlot slot;
-    const char* const identifier = callPlugin(
-        slot, [this](wl_error_slot* handle) { return _instance->delegate_identifier(_instance, handle); });
+    const char* const identifier = callPlugin(_name, slot, [this](wl_error_slot* handle) {
+        return _instance->delegate_identifier(_instance, handle);
+    });
     throwIfRaised(slot);
     if (!identifier) {
         return std::nullopt;
@@ -143,7 +148,7 @@ std::optional<std::string> AbiDelegatePlugin::delegateIdentifier() {
 std::optional<PropertyList> AbiDelegatePlugin::delegateSetupRequest() {
     throwIfMissing(_instance->delegate_setup_request, "delegateSetupRequest");
     ErrorSlot slot;
-    auto request = takeHandle(callPlugin(slot, [this](wl_error_slot* handle) {
+    auto request = takeHandle(callPlugin(_name, slot, [this](wl_error_slot* handle) {
         return _instance->delegate_setup_request(_instance, handle);
     }));
     throwIfRaised(slot);
@@ -159,7 +164,7 @@ std::optional<PropertyList> AbiDelegatePlugin::delegateSetupRequest() {
 void AbiDelegatePlugin::completeSetupWithResponseHandler(const PropertyList& response,
                                                          CompletionHandler handler) {
     throwIfMissing(_instance->complete_setup_with_response, "completeSetupWithResponse:handler:");
-    callCompletion(std::move(handler), [&](wl_completion_handler issued, wl_error_slot* slot) {
+    callCompletion(_name, std::move(handler), [&](wl_completion_handler issued, wl_error_slot* slot) {
         _instance->complete_setup_with_response(_instance, borrowedHandle(response), issued, slot);
     });
 }
@@ -169,7 +174,7 @@ void AbiDelegatePlugin::terminateSetupCompletion() {
         return;
     }
     ErrorSlot slot;
-    callPlugin(slot,
+    callPlugin(_name, slot,
                [this](wl_error_slot* handle) { _instance->terminate_setup_completion(_instance, handle); });
     throwIfRaised(slot);
 }
@@ -183,7 +188,7 @@ void AbiDelegatePlugin::completeSetupWithResponseChosenAliasesHandler(
     if (aliases) {
         array = PropertyList::Array(aliases->begin(), aliases->end());
     }
-    callCompletion(std::move(handler), [&](wl_completion_handler issued, wl_error_slot* slot) {
+    callCompletion(_name, std::move(handler), [&](wl_completion_handler issued, wl_error_slot* slot) {
         _instance->complete_setup_with_response_chosen_aliases(
             _instance, borrowedHandle(response), array ? borrowedHandle(*array) : nullptr, issued, slot);
     });
@@ -193,7 +198,7 @@ std::optional<std::vector<std::string>>
 AbiDelegatePlugin::messagingAliasesFromResponse(const PropertyList& response) {
     throwIfMissing(_instance->messaging_aliases_from_response, "messagingAliasesFromResponse:");
     ErrorSlot slot;
-    auto aliases = takeHandle(callPlugin(slot, [&](wl_error_slot* handle) {
+    auto aliases = takeHandle(callPlugin(_name, slot, [&](wl_error_slot* handle) {
         return _instance->messaging_aliases_from_response(_instance, borrowedHandle(response), handle);
     }));
     throwIfRaised(slot);

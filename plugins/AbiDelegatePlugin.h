@@ -9,6 +9,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace welcomer {
@@ -36,7 +37,9 @@ class AbiDelegatePlugin final : public WLFirstRunDelegateConfiguration {
     // A new instance, or null when the class makes none. Throws DelegatePluginException when that raises. On
     // the calling thread.
     //  principalClass  borrowed until the process ends
-    static std::shared_ptr<AbiDelegatePlugin> create(const wl_delegate_plugin_descriptor& principalClass);
+    //  name            of the plug-in's entry, with which threads are marked while they are in the plug-in
+    static std::shared_ptr<AbiDelegatePlugin> create(const wl_delegate_plugin_descriptor& principalClass,
+                                                     const std::string& name);
 
     ~AbiDelegatePlugin() override;
     AbiDelegatePlugin(const AbiDelegatePlugin&) = delete;
@@ -58,12 +61,15 @@ class AbiDelegatePlugin final : public WLFirstRunDelegateConfiguration {
     std::string className() const override;
 
   private:
-    AbiDelegatePlugin(const wl_delegate_plugin_descriptor& principalClass, wl_delegate* instance)
+    AbiDelegatePlugin(const wl_delegate_plugin_descriptor& principalClass, wl_delegate* instance,
+                      std::string name)
         : _principalClass(principalClass),
-          _instance(instance) {}
+          _instance(instance),
+          _name(std::move(name)) {}
 
     const wl_delegate_plugin_descriptor& _principalClass;
     wl_delegate* _instance; // owned
+    const std::string _name;
 };
 
 } // namespace welcomer

@@ -3,6 +3,7 @@
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
 #include "plugins/AbiDelegatePlugin.h"
+#include "plugins/PluginMark.h"
 #include "plugins/PluginText.h"
 
 #include <exception>
@@ -20,26 +21,25 @@ std::string_view pathExtension(std::string_view fileName) {
     return point == std::string_view::npos || point == 0 ? std::string_view() : fileName.substr(point + 1);
 }
 
-// Loading runs the library's own initialisers, which may throw.
-const wl_delegate_plugin_descriptor* loadPrincipalClass(const std::string& path, std::string& reason) {
-    try {
-        const platform::PluginSymbol symbol =
-            platform::current().pluginBundle.load(path, WL_DELEGATE_PLUGIN_SYMBOL);
-        if (symbol.address) {
-            return AbiDelegatePlugin::principalClass(symbol.address, reason);
-        }
-        reason = symbol.reason;
-    } catch (...) {
-        reason = text::describe(std::current_exception());
+// Loading runs the library's own initialisers. What they throw cannot be caught: the loader lets no exception
+// through, and the process ends there. The mark is for who says so then.
+const wl_delegate_plugin_descriptor* loadPrincipalClass(const std::string& fileName, std::string& reason) {
+    const PluginMark mark(fileName.c_str());
+    const platform::PluginSymbol symbol = platform::current().pluginBundle.load(
+        std::string(kPluginDirectory) + "/" + fileName, WL_DELEGATE_PLUGIN_SYMBOL);
+    if (symbol.address) {
+        return AbiDelegatePlugin::principalClass(symbol.address, reason);
     }
+    reason = symbol.reason;
     return nullptr;
 }
 
 // A new instance, or null; one that raises is none.
 std::shared_ptr<WLFirstRunDelegateConfiguration>
-makeInstance(const wl_delegate_plugin_descriptor& principalClass, std::string& reason) {
+makeInstance(const wl_delegate_plugin_descriptor& principalClass, const std::string& fileName,
+             std::string& reason) {
     try {
-        auto plugin = AbiDelegatePlugin::create(principalClass);
+        auto plugin = AbiDelegatePlugin::create(principalClass, fileName);
         if (!plugin) {
             reason = "made no plug-in object";
         }
@@ -53,8 +53,7 @@ makeInstance(const wl_delegate_plugin_descriptor& principalClass, std::string& r
 // Loads and checks one entry. On return either the plug-in and its identifier are set, or the reason.
 void loadEntry(PluginScanEntry& entry) {
     const std::string shownName = pluginText(entry.fileName);
-    const auto* principalClass =
-        loadPrincipalClass(std::string(kPluginDirectory) + "/" + entry.fileName, entry.reason);
+    const auto* principalClass = loadPrincipalClass(entry.fileName, entry.reason);
     if (!principalClass) {
         WL_LOG("Nimbus Plugins: Failed to get principal class for %@", shownName);
         return;
@@ -64,7 +63,7 @@ void loadEntry(PluginScanEntry& entry) {
         entry.reason = "does not conform to " WL_DELEGATE_PLUGIN_PROTOCOL;
         return;
     }
-    auto plugin = makeInstance(*principalClass, entry.reason);
+    auto plugin = makeInstance(*principalClass, entry.fileName, entry.reason);
     if (!plugin) {
         WL_LOG("Nimbus Plugins: Failed to init plugin object for %@", shownName);
         return;

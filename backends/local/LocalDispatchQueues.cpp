@@ -1,5 +1,6 @@
 #include "backends/local/LocalDispatchQueues.h"
 
+#include "backends/local/AlternateStack.h"
 #include "backends/local/LocalClock.h"
 #include "backends/local/LocalWorkGroup.h"
 
@@ -26,7 +27,10 @@ void call(const Block& block) noexcept {
 
 bool startDetachedThread(Block function) {
     try {
-        std::thread(std::move(function)).detach();
+        std::thread([function = std::move(function)] {
+            const AlternateStack stack;
+            function();
+        }).detach();
         return true;
     } catch (const std::exception&) {
         return false;

@@ -1,15 +1,13 @@
 #include "tests/fakes/FakePluginBundle.h"
 
-#include <stdexcept>
-
 namespace welcomer::fakes {
 
 platform::PluginSymbol FakePluginBundle::load(const std::string& path, const char* symbol) {
     _recorder.record("PluginBundle.load " + path + ", " + symbol);
-    const std::lock_guard lock(_mutex);
-    if (const auto exception = _exceptions.find(path); exception != _exceptions.end()) {
-        throw std::runtime_error(exception->second);
+    if (onLoad) {
+        onLoad();
     }
+    const std::lock_guard lock(_mutex);
     if (const auto reason = _reasons.find(path); reason != _reasons.end()) {
         return {nullptr, reason->second};
     }
@@ -27,11 +25,6 @@ void FakePluginBundle::add(const std::string& path, const std::string& symbol, c
 void FakePluginBundle::addBroken(const std::string& path, const std::string& reason) {
     const std::lock_guard lock(_mutex);
     _reasons[path] = reason;
-}
-
-void FakePluginBundle::addThrowing(const std::string& path, const std::string& message) {
-    const std::lock_guard lock(_mutex);
-    _exceptions[path] = message;
 }
 
 } // namespace welcomer::fakes

@@ -5,6 +5,7 @@
 #include "platform/PluginBundle.h"
 #include "tests/fakes/CallRecorder.h"
 
+#include <functional>
 #include <map>
 #include <mutex>
 #include <string>
@@ -26,15 +27,14 @@ class FakePluginBundle final : public platform::PluginBundle {
     // Has the bundle at a path fail to load, whatever the symbol.
     void addBroken(const std::string& path, const std::string& reason);
 
-    // Has loading the bundle at a path throw, as the initialisers of its library may.
-    void addThrowing(const std::string& path, const std::string& message);
+    // What a library's own initialisers do, for every one that is loaded; empty: nothing.
+    std::function<void()> onLoad;
 
   private:
     CallRecorder& _recorder;
     mutable std::mutex _mutex;
     std::map<std::pair<std::string, std::string>, const void*> _symbols;
     std::map<std::string, std::string> _reasons;
-    std::map<std::string, std::string> _exceptions;
 };
 
 } // namespace welcomer::fakes

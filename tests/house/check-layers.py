@@ -32,8 +32,9 @@ SIDES = {
 }
 # Free to include everything: nothing includes them.
 TESTS = {"tests"}
-# The only files, besides tests and the backends themselves, that may choose a backend.
+# The only files, besides tests and the backends themselves, that may choose a backend, and what is offered to them.
 PROGRAMS = re.compile(r"^(agent/main\.cpp|tools/[^/]+/main\.cpp)$")
+OFFERED = re.compile(r"^backends/(Backends|UnexpectedEnd|simulated/.+)\.h$")
 
 SOURCES = {".h", ".hpp", ".c", ".cpp"}
 INCLUDE = re.compile(r'^\s*#\s*include\s*([<"])([^>"]+)[>"]')
@@ -73,8 +74,7 @@ def refusal(source, target, quoted, tree):
     if aim in TESTS:
         return "includes a test"
     if aim == "backends" and room != "backends":
-        offered = target == "backends/Backends.h" or target.startswith("backends/simulated/")
-        if offered and PROGRAMS.match(str(source)):
+        if OFFERED.match(target) and PROGRAMS.match(str(source)):
             return None
         return "chooses a backend; only a program's main.cpp does"
     if aim == room:

@@ -1,5 +1,6 @@
 #include "plugins/AbiDelegatePlugin.h"
 
+#include "plugins/PluginMark.h"
 #include "plugins/PropertyListHandles.h"
 #include "tests/unit/plugins/InProcessPlugin.h"
 
@@ -16,9 +17,13 @@ namespace {
 using fakes::InProcessPlugin;
 using Aliases = std::optional<std::vector<std::string>>;
 
+constexpr const char* kName = "Sample.ncdplugin";
+
 class AbiDelegatePluginTest : public testing::Test {
   protected:
-    std::shared_ptr<AbiDelegatePlugin> create() { return AbiDelegatePlugin::create(*plugin.exportAs<0>()); }
+    std::shared_ptr<AbiDelegatePlugin> create() {
+        return AbiDelegatePlugin::create(*plugin.exportAs<0>(), kName);
+    }
 
     const wl_delegate_plugin_descriptor* principalClass() {
         return AbiDelegatePlugin::principalClass(plugin.exportAs<0>(), reason);
@@ -116,13 +121,44 @@ TEST_F(AbiDelegatePluginTest, SurvivesADestroyThatThrows) {
 TEST_F(AbiDelegatePluginTest, MakesNothingWithoutCreate) {
     plugin.exportAs<0>();
     plugin.descriptor.create = nullptr;
-    EXPECT_EQ(AbiDelegatePlugin::create(plugin.descriptor), nullptr);
+    EXPECT_EQ(AbiDelegatePlugin::create(plugin.descriptor, kName), nullptr);
 }
 
 TEST_F(AbiDelegatePluginTest, MakesNothingOfAnInstanceThatIsTooSmallAndGivesItBack) {
     plugin.instance.size -= 1;
     EXPECT_EQ(create(), nullptr);
     EXPECT_EQ(plugin.destroyed, 1);
+}
+
+TEST_F(AbiDelegatePluginTest, TheThreadIsMarkedWithItsNameWhileItIsInThePlugin) {
+    std::vector<std::string> marks;
+    const auto note = [&marks] {
+        marks.emplace_back(PluginMark::current() ? PluginMark::current() : "none");
+    };
+    plugin.create = [&](wl_error_slot*) {
+        note();
+        return &plugin.instance;
+    };
+    plugin.request = [&](wl_error_slot*) -> wl_value* {
+        note();
+        throw std::runtime_error("leaves the mark behind?");
+    };
+    plugin.complete = [&](auto...) {
+        note();
+    };
+    plugin.aliases = [&](auto...) {
+        note();
+        return static_cast<wl_value*>(nullptr);
+    };
+    const auto instance = create();
+    note();
+    thrown([&] { instance->delegateSetupRequest(); });
+    note();
+    instance->completeSetupWithResponseHandler({}, handler());
+    instance->completeSetupWithResponseChosenAliasesHandler({}, std::nullopt, handler());
+    instance->messagingAliasesFromResponse({});
+    note();
+    EXPECT_EQ(marks, (std::vector<std::string>{kName, "none", kName, "none", kName, kName, kName, "none"}));
 }
 
 TEST_F(AbiDelegatePluginTest, PassesOnAnExceptionOfCreate) {

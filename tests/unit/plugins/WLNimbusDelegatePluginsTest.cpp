@@ -1,5 +1,6 @@
 #include "plugins/WLNimbusDelegatePlugins.h"
 
+#include "plugins/PluginMark.h"
 #include "tests/fakes/FakePlatform.h"
 #include "tests/unit/plugins/InProcessPlugin.h"
 
@@ -162,11 +163,15 @@ TEST_F(WLNimbusDelegatePluginsTest, SkipsALibraryWithoutTheSymbol) {
     EXPECT_EQ(lines(), Strings{"Nimbus Plugins: Failed to get principal class for a.ncdplugin"});
 }
 
-TEST_F(WLNimbusDelegatePluginsTest, SkipsALibraryWhoseInitialisersThrow) {
-    fake.fileSystem.addFile(path("a.ncdplugin"), "");
-    fake.pluginBundle.addThrowing(path("a.ncdplugin"), "thrown while loading");
-    EXPECT_TRUE(WLNimbusDelegatePlugins().empty());
-    EXPECT_EQ(lines(), Strings{"Nimbus Plugins: Failed to get principal class for a.ncdplugin"});
+TEST_F(WLNimbusDelegatePluginsTest, TheThreadIsMarkedWithTheEntrysNameWhileItsLibraryIsLoaded) {
+    std::string mark;
+    fake.pluginBundle.onLoad = [&mark] {
+        mark = PluginMark::current() ? PluginMark::current() : "none";
+    };
+    add("a.ncdplugin", first.exportAs<0>());
+    EXPECT_EQ(identifiers(), Strings{"com.corvid.first"});
+    EXPECT_EQ(mark, "a.ncdplugin");
+    EXPECT_EQ(PluginMark::current(), nullptr);
 }
 
 TEST_F(WLNimbusDelegatePluginsTest, SkipsAnotherAbiVersion) {

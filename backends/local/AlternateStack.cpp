@@ -1,0 +1,17 @@
+#include "backends/local/AlternateStack.h"
+
+namespace welcomer::local {
+
+// NOLINTNEXTLINE(cppcoreguidelines-pro-type-member-init): see the memory's own comment
+AlternateStack::AlternateStack() noexcept {
+    stack_t stack = {};
+    stack.ss_sp = _memory.data();
+    stack.ss_size = _memory.size();
+    ::sigaltstack(&stack, &_previous);
+}
+
+AlternateStack::~AlternateStack() {
+    ::sigaltstack(&_previous, nullptr);
+}
+
+} // namespace welcomer::local
