@@ -28,17 +28,24 @@ std::string userLibraryDirectory() {
     return directory;
 }
 
+platform::Outcome removeLaunchAgentFile(const std::string& label) {
+    try {
+        const std::string folder = platform::joinPath(userLibraryDirectory(), kLaunchAgentsFolder);
+        return platform::current().fileSystem.remove(
+            platform::joinPath(folder, text::format("%@.plist", label)));
+    } catch (const platform::Exception& exception) { // the user has no home
+        return platform::Outcome::failure({0, exception.what()});
+    }
+}
+
 } // namespace
 
 void selfDestruct(const std::string& label) {
     WL_LOG("Self destructing...");
-    const std::string path = platform::joinPath(
-        platform::joinPath(userLibraryDirectory(), kLaunchAgentsFolder), text::format("%@.plist", label));
-    const platform::Platform& platform = platform::current();
-    const platform::Outcome removed = platform.fileSystem.remove(path);
+    const platform::Outcome removed = removeLaunchAgentFile(label);
     if (!removed) {
-        WL_LOG("Failed to remove wlnimbussetup plist for %@: %@", platform.processIdentity.loginName(),
-               removed.error);
+        WL_LOG("Failed to remove wlnimbussetup plist for %@: %@",
+               platform::current().processIdentity.loginName(), removed.error);
     }
 }
 

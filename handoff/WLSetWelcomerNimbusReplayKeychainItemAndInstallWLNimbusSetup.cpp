@@ -50,16 +50,20 @@ bool storeReplayItem(const std::string& accountName, const PropertyList& replayO
     return true;
 }
 
+// The folder of the launch agents; throws where the user has no home.
+std::string launchAgentsFolder() {
+    platform::ProcessIdentity& identity = platform::current().processIdentity;
+    // Asked for its effect: the platform makes the library folder where a home has none yet. Here only the
+    // folder in it is made.
+    identity.userLibraryDirectories();
+    return platform::joinPath(platform::joinPath(identity.homeDirectory(), "Library"), kLaunchAgentsFolder);
+}
+
 bool installLaunchAgent(platform::ResourceBundle& bundle) {
     const platform::Platform& platform = platform::current();
     const std::optional<std::string> resource =
         bundle.pathForResource(kLaunchAgentLabel, kLaunchAgentFileType);
-
-    // Asked for its effect: the platform makes the library folder where a home has none yet. Here only the
-    // folder in it is made.
-    platform.processIdentity.userLibraryDirectories();
-    const std::string folder = platform::joinPath(
-        platform::joinPath(platform.processIdentity.homeDirectory(), "Library"), kLaunchAgentsFolder);
+    const std::string folder = launchAgentsFolder();
     if (!platform.fileSystem.exists(folder)) {
         const platform::Outcome created = platform.fileSystem.createDirectory(folder, 0755);
         if (!created && created.error.number != EEXIST) {
@@ -84,7 +88,15 @@ bool installLaunchAgent(platform::ResourceBundle& bundle) {
 bool WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(const std::string& accountName,
                                                                   const PropertyList& replayObject,
                                                                   platform::ResourceBundle& bundle) {
-    return storeReplayItem(accountName, replayObject, bundle) && installLaunchAgent(bundle);
+    if (!storeReplayItem(accountName, replayObject, bundle)) {
+        return false;
+    }
+    try {
+        return installLaunchAgent(bundle);
+    } catch (const platform::Exception& exception) { // the user has no home
+        WL_LOG("failed to install com.corvid.welcomer.nimbussetup: %@", exception);
+        return false;
+    }
 }
 
 } // namespace welcomer

@@ -36,6 +36,8 @@ std::string credentialStatusText(std::int32_t status) {
         return "the credential service failed";
     case kCredentialStoreInUse:
         return "the credential store is locked by another process: waited 10 seconds";
+    case kCredentialNoHome:
+        return "the user has no home folder";
     default:
         return "unknown credential store status " + std::to_string(status);
     }

@@ -31,6 +31,7 @@ enum CredentialStatus : std::int32_t {
     kCredentialServiceFailed = 14,    // the service reports a failure of another kind
     // Of a store that is a file:
     kCredentialStoreInUse = 18, // another process of the user holds it, and did not let go of it in time
+    kCredentialNoHome = 22, // the user has no home folder that it could lie in
 };
 
 // The text of a result code, for people. Any thread.

@@ -19,12 +19,14 @@ class ProcessIdentity {
     // entry. Any thread.
     virtual std::string loginName() = 0;
 
-    // The home folder of the effective user, "/" when the password database has none. Any thread.
+    // The home folder of the effective user, an absolute path. Throws Exception, with a text for people, when
+    // the password database has none: nothing stands in for it. Any thread.
     virtual std::string homeDirectory() = 0;
 
-    // The library folders in the user's domain, the first being the one to use; a leading "~" may stand for
-    // the home folder. The platform makes the folder where it is missing (mode 0700) and the home folder
-    // exists; when that fails the path is given all the same. Any thread.
+    // The library folders in the user's domain, the first being the one to use; none for a user without a
+    // home folder. A leading "~" may stand for the home folder. The platform makes the folder where it is
+    // missing (mode 0700) and the home folder exists; when that fails the path is given all the same. Any
+    // thread.
     virtual std::vector<std::string> userLibraryDirectories() = 0;
 };
 

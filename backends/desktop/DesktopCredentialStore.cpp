@@ -37,9 +37,10 @@ DesktopCredentialStore::DesktopCredentialStore(local::RootFolder root, platform:
       _store([this] { return mayHaveSessionBus() ? _module.service() : nullptr; }, local,
              [this] {
                  // Makes the library folder where it is missing.
-                 _identity.userLibraryDirectories();
-                 const std::string library = platform::joinPath(_identity.homeDirectory(), "Library");
-                 return local::FileLock(_root, local::userLockPath(library, kLockName));
+                 const std::vector<std::string> libraries = _identity.userLibraryDirectories();
+                 return libraries.empty()
+                            ? local::FileLock()
+                            : local::FileLock(_root, local::userLockPath(libraries.front(), kLockName));
              }) {}
 
 platform::BackendReport DesktopCredentialStore::report() {

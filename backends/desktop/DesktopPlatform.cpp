@@ -55,7 +55,9 @@ DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
       _onlineAccounts(
           {[root = local::RootFolder(options.root), &identity = _local.platform().processIdentity] {
               const std::vector<std::string> libraries = identity.userLibraryDirectories();
-              return local::FileLock(root, local::userLockPath(libraries.front(), kOnlineAccountsLock));
+              return libraries.empty()
+                         ? local::FileLock()
+                         : local::FileLock(root, local::userLockPath(libraries.front(), kOnlineAccountsLock));
           }}),
       _accountService(_accountSurroundings(options.root), {std::string(configuration::kOnlineAccountProvider),
                                                            std::string(configuration::kOnlineAccountServer)}),

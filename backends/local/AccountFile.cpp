@@ -38,6 +38,9 @@ platform::Outcome AccountFile::change(const std::function<bool(PropertyList::Dic
 
 platform::Outcome AccountFile::_change(const std::function<bool(PropertyList::Dictionary& content)>& change) {
     const std::string library = _library();
+    if (library.empty()) {
+        return platform::Outcome::failure({0, "the user has no home folder"});
+    }
     const std::string path = platform::joinPath(library, kFolderName);
     const std::lock_guard lock(_mutex);
     LockedPreferenceFolder folder(_root, path, userLockPath(library, kFolderName));
@@ -86,15 +89,21 @@ bool AccountFile::_setAside(LockedPreferenceFolder& folder, const std::string& p
 
 const PropertyList::Dictionary& AccountFile::_readContent() {
     if (!_path) {
-        _path = platform::joinPath(platform::joinPath(_library(), kFolderName), kFileName);
+        const std::string library = _library();
+        if (library.empty()) {
+            return _onDisk.values;
+        }
+        _path = platform::joinPath(platform::joinPath(library, kFolderName), kFileName);
     }
     rereadPreferenceFile(_root, *_path, _onDisk);
     return _onDisk.values;
 }
 
-// Makes the library folder where it is missing: the platform gives the library folder without a "~".
+// Empty for a user without a home. Makes the library folder where it is missing: the platform gives the
+// library folder without a "~".
 std::string AccountFile::_library() {
-    return _identity.userLibraryDirectories().front();
+    const std::vector<std::string> libraries = _identity.userLibraryDirectories();
+    return libraries.empty() ? "" : libraries.front();
 }
 
 } // namespace welcomer::local

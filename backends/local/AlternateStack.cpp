@@ -2,7 +2,6 @@
 
 namespace welcomer::local {
 
-// NOLINTNEXTLINE(cppcoreguidelines-pro-type-member-init): see the memory's own comment
 AlternateStack::AlternateStack() noexcept {
     stack_t stack = {};
     stack.ss_sp = _memory.data();

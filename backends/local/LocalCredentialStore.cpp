@@ -3,6 +3,7 @@
 #include "backends/local/CredentialFolder.h"
 #include "backends/local/CredentialItemFormat.h"
 #include "backends/local/Directory.h"
+#include "platform/Error.h"
 #include "platform/Path.h"
 
 #include <algorithm>
@@ -38,6 +39,15 @@ PropertyList::Array::iterator findIn(PropertyList::Array& items, const std::stri
     return std::find_if(items.begin(), items.end(), [&](const PropertyList& item) {
         return credentialItemHasKey(item, service, account);
     });
+}
+
+bool hasHome(platform::ProcessIdentity& identity) {
+    try {
+        identity.homeDirectory();
+        return true;
+    } catch (const platform::Exception&) {
+        return false;
+    }
 }
 
 // Opens the folder for the creation of an item, and makes it where it is missing.
@@ -107,6 +117,9 @@ std::int32_t LocalCredentialStore::createAccess(const std::string& description,
 }
 
 std::int32_t LocalCredentialStore::createItem(const platform::CredentialItem& item, const std::string& data) {
+    if (!hasHome(_identity)) {
+        return platform::kCredentialNoHome;
+    }
     // Makes the library folder where it is missing.
     _identity.userLibraryDirectories();
     CredentialFolder folder;
@@ -137,6 +150,9 @@ std::int32_t LocalCredentialStore::createItem(const platform::CredentialItem& it
 std::int32_t LocalCredentialStore::findItem(const std::string& service, const std::string& account,
                                             std::string* data,
                                             std::unique_ptr<platform::CredentialItemReference>* reference) {
+    if (!hasHome(_identity)) {
+        return platform::kCredentialNoHome;
+    }
     PropertyList item;
     const std::int32_t status = readItem(_root, _folderPath(), service, account, item);
     if (status != platform::kCredentialSuccess) {

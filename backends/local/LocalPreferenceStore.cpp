@@ -107,13 +107,14 @@ LocalPreferenceStore::Domain& LocalPreferenceStore::_use(const std::string& name
 const std::string& LocalPreferenceStore::_library() {
     if (!_userLibrary) {
         const std::vector<std::string> libraries = _identity.userLibraryDirectories();
-        _userLibrary = libraries.empty() ? "/Library" : libraries.front();
+        _userLibrary = libraries.empty() ? "" : libraries.front();
     }
     return *_userLibrary;
 }
 
 std::string LocalPreferenceStore::_folder() {
-    return platform::joinPath(_library(), kFolderName);
+    const std::string& library = _library();
+    return library.empty() ? "" : platform::joinPath(library, kFolderName);
 }
 
 LockedPreferenceFolder LocalPreferenceStore::_lockedFolder() {
@@ -129,7 +130,7 @@ const std::string& LocalPreferenceStore::_pathOf(const std::string& name, Domain
 
 bool LocalPreferenceStore::_load(const std::string& name, Domain& domain) {
     domain.isLoaded = true;
-    if (!isDomainName(name)) {
+    if (!isDomainName(name) || _folder().empty()) {
         return false;
     }
     rereadPreferenceFile(_root, _pathOf(name, domain), domain.onDisk);
@@ -146,10 +147,10 @@ bool LocalPreferenceStore::_load(const std::string& name, Domain& domain) {
 }
 
 bool LocalPreferenceStore::_storeChanges(const std::string& name, Domain& domain) {
-    if (!isDomainName(name)) {
+    _userLibrary.reset(); // asking makes the library folder where it is missing
+    if (!isDomainName(name) || _folder().empty()) {
         return false;
     }
-    _userLibrary.reset(); // asking makes the library folder where it is missing
     LockedPreferenceFolder folder = _lockedFolder();
     if (!folder) {
         _noteNotStored(name, folder.error().message);

@@ -53,8 +53,8 @@ class LocalPreferenceStore final : public platform::PreferenceStore {
 
     // All with _mutex held.
     Domain& _use(const std::string& name);
-    const std::string& _library();
-    std::string _folder();
+    const std::string& _library(); // empty for a user without a home
+    std::string _folder();         // likewise
     LockedPreferenceFolder _lockedFolder();
     const std::string& _pathOf(const std::string& name, Domain& domain);
     bool _load(const std::string& name, Domain& domain);

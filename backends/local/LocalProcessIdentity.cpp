@@ -1,10 +1,12 @@
 #include "backends/local/LocalProcessIdentity.h"
 
 #include "backends/local/Directory.h"
+#include "platform/Error.h"
 #include "platform/Path.h"
 
 #include <cerrno>
 #include <pwd.h>
+#include <system_error>
 #include <unistd.h>
 
 namespace welcomer::local {
@@ -19,8 +21,6 @@ constexpr mode_t kLibraryMode = 0700;
 void LocalProcessIdentity::_readEntry() {
     const uid_t userID = ::geteuid();
     _loginName = std::to_string(userID);
-    _homeDirectory = "/";
-
     std::string buffer(kFirstEntrySize, '\0');
     passwd entry = {};
     passwd* found = nullptr;
@@ -32,6 +32,7 @@ void LocalProcessIdentity::_readEntry() {
         }
     }
     if (!found) {
+        _whyNoHome = error != 0 ? ": " + std::generic_category().message(error) : "";
         return;
     }
     if (*found->pw_name != '\0') {
@@ -53,11 +54,18 @@ std::string LocalProcessIdentity::loginName() {
 
 std::string LocalProcessIdentity::homeDirectory() {
     std::call_once(_entryRead, [this] { _readEntry(); });
+    if (_homeDirectory.empty()) {
+        throw platform::Exception("the user " + _loginName + " has no home folder" + _whyNoHome);
+    }
     return _homeDirectory;
 }
 
 std::vector<std::string> LocalProcessIdentity::userLibraryDirectories() {
-    const std::string library = platform::joinPath(homeDirectory(), "Library");
+    std::call_once(_entryRead, [this] { _readEntry(); });
+    if (_homeDirectory.empty()) {
+        return {};
+    }
+    const std::string library = platform::joinPath(_homeDirectory, "Library");
     // Fails where the folder exists already or the home folder does not; the path is right all the same.
     makeDirectory(_root, library, kLibraryMode);
     return {library};

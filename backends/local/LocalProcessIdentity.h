@@ -26,7 +26,8 @@ class LocalProcessIdentity final : public platform::ProcessIdentity {
     const RootFolder _root;
     std::once_flag _entryRead;
     std::string _loginName;
-    std::string _homeDirectory;
+    std::string _homeDirectory; // empty: there is none
+    std::string _whyNoHome;     // the system's reason, where it has one
 };
 
 } // namespace welcomer::local

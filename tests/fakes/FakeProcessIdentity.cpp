@@ -1,5 +1,7 @@
 #include "tests/fakes/FakeProcessIdentity.h"
 
+#include "platform/Error.h"
+
 namespace welcomer::fakes {
 
 uid_t FakeProcessIdentity::effectiveUserID() {
@@ -17,6 +19,9 @@ std::string FakeProcessIdentity::loginName() {
 std::string FakeProcessIdentity::homeDirectory() {
     _recorder.record("ProcessIdentity.homeDirectory");
     const std::lock_guard lock(_mutex);
+    if (_homeDirectory.empty()) {
+        throw platform::Exception("the user " + _loginName + " has no home folder");
+    }
     return _homeDirectory;
 }
 
@@ -25,6 +30,9 @@ std::vector<std::string> FakeProcessIdentity::userLibraryDirectories() {
     const std::lock_guard lock(_mutex);
     if (_libraryDirectories) {
         return *_libraryDirectories;
+    }
+    if (_homeDirectory.empty()) {
+        return {};
     }
     const std::string path = (_homeDirectory == "/" ? "" : _homeDirectory) + "/Library";
     if (_fileSystem.isDirectory(_homeDirectory) && !_fileSystem.isDirectory(path)) {

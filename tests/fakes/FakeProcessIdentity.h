@@ -30,7 +30,7 @@ class FakeProcessIdentity final : public platform::ProcessIdentity {
 
     void setEffectiveUserID(uid_t userID);
     void setLoginName(const std::string& loginName);
-    void setHomeDirectory(const std::string& path);
+    void setHomeDirectory(const std::string& path); // empty: the user has none
     void setUserLibraryDirectories(const std::vector<std::string>& paths);
 
   private:

@@ -3,6 +3,7 @@
 //   --help, --version
 
 #include "backends/Backends.h"
+#include "log/PCLogManager.h"
 #include "text/ProgramOptions.h"
 #include "tools/launch-agents/ChildStarter.h"
 #include "tools/launch-agents/UserManagerStarter.h"
@@ -13,6 +14,30 @@
 
 using namespace welcomer;
 
+namespace {
+
+// Starts the launch agents that lie in the user's home.
+//  result  the exit status
+int startAgents(platform::ProcessIdentity& user, const std::string& runtimeFolder,
+                const launch::LoginStamp& stamp) {
+    try {
+        const std::string home = user.homeDirectory();
+        launch::startLaunchAgents(home + "/Library/LaunchAgents", user.effectiveUserID(), stamp,
+                                  [&]() -> std::unique_ptr<launch::AgentStarter> {
+                                      if (auto manager = launch::UserManagerStarter::connect(runtimeFolder)) {
+                                          return manager;
+                                      }
+                                      return std::make_unique<launch::ChildStarter>(home);
+                                  });
+        return 0;
+    } catch (const platform::Exception& exception) { // there is no home
+        WL_LOG("Launch agents cannot start: %@", exception);
+        return 1;
+    }
+}
+
+} // namespace
+
 int main(int argc, char** argv) {
     const bool endOfLogin = argc == 2 && argv[1] == std::string_view("--end-of-login");
     if (argc > 1 && !endOfLogin) {
@@ -20,7 +45,6 @@ int main(int argc, char** argv) {
     }
     const auto owner = buildPlatform();
     const platform::ScopedPlatform installed(owner->platform());
-    platform::ProcessIdentity& user = platform::current().processIdentity;
     const char* const variable = std::getenv("XDG_RUNTIME_DIR");
     const std::string runtimeFolder = variable ? variable : "";
     const launch::LoginStamp stamp(runtimeFolder);
@@ -28,13 +52,5 @@ int main(int argc, char** argv) {
         stamp.remove();
         return 0;
     }
-    const std::string home = user.homeDirectory();
-    launch::startLaunchAgents(home + "/Library/LaunchAgents", user.effectiveUserID(), stamp,
-                              [&]() -> std::unique_ptr<launch::AgentStarter> {
-                                  if (auto manager = launch::UserManagerStarter::connect(runtimeFolder)) {
-                                      return manager;
-                                  }
-                                  return std::make_unique<launch::ChildStarter>(home);
-                              });
-    return 0;
+    return startAgents(platform::current().processIdentity, runtimeFolder, stamp);
 }

@@ -18,10 +18,17 @@ void addSwitchCommands(CommandLine& commandLine);
 void addDoctorCommand(CommandLine& commandLine);
 void addNetworkCommands(CommandLine& commandLine);
 
+// What adds commands, and whether these work with what lies in the user's home.
+struct CommandAdder {
+    void (*add)(CommandLine& commandLine);
+    bool needsHome;
+};
+
 // In the order in which --help shows them.
-inline constexpr void (*kCommands[])(CommandLine&) = {
-    addTryCommand,     addSetupCommand,    addAccountCommands, addServicesCommands,
-    addReplayCommands, addPluginsCommands, addStateCommands,   addSyncCommands,
-    addSwitchCommands, addNetworkCommands, addDoctorCommand};
+inline constexpr CommandAdder kCommands[] = {
+    {addTryCommand, true},       {addSetupCommand, true},   {addAccountCommands, true},
+    {addServicesCommands, true}, {addReplayCommands, true}, {addPluginsCommands, false},
+    {addStateCommands, true},    {addSyncCommands, true},   {addSwitchCommands, false},
+    {addNetworkCommands, false}, {addDoctorCommand, false}};
 
 } // namespace welcomer::tool

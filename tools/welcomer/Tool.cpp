@@ -143,6 +143,12 @@ CLI::App& CommandLine::addCommand(const std::string& name, const std::string& de
 
 CLI::App& CommandLine::addCommand(CLI::App& group, const std::string& name, const std::string& description,
                                   Command command) {
+    if (_needsHome) {
+        command = [command = std::move(command)](Session& session) {
+            platform::current().processIdentity.homeDirectory(); // throws where there is none
+            command(session);
+        };
+    }
     CLI::App& added = addLevel(group, name, description);
     added.callback([this, &added, command = std::move(command)] {
         _chosen = command;
@@ -162,8 +168,9 @@ int runTool(int argc, char** argv, const PlatformFactory& buildPlatform) {
     Options options;
     addGlobalOptions(app, options);
     CommandLine commandLine(app);
-    for (const auto add : kCommands) {
-        add(commandLine);
+    for (const CommandAdder& commands : kCommands) {
+        commandLine.setNeedsHome(commands.needsHome);
+        commands.add(commandLine);
     }
     if (const auto status = parse(app, argc, argv)) {
         return *status;

@@ -66,12 +66,17 @@ class CommandLine {
     CLI::App& addCommand(CLI::App& group, const std::string& name, const std::string& description,
                          Command command);
 
+    // Whether the commands that are added next need a home folder: where the user has none, they end with one
+    // line that says so.
+    void setNeedsHome(bool needsHome) { _needsHome = needsHome; }
+
     // The command that the arguments chose, with its full name.
     const Command& chosen() const { return _chosen; }
     const std::string& chosenName() const { return _chosenName; }
 
   private:
     CLI::App& _app;
+    bool _needsHome = false;
     Command _chosen;
     std::string _chosenName;
 };

@@ -232,7 +232,7 @@ class WithoutHome(OnAMachine):
     def test_the_tool_says_so_in_one_line(self):
         before = self.snapshot()
         for command in (["replay", "show"], ["replay", "delete"], ["account", "list"], ["state", "show"],
-                        ["sync", "destination"], ["replay", "store", "--account", "a", "--file", "/tmp/replay.plist",
+                        ["services", "list"], ["replay", "store", "--account", "a", "--file", "/tmp/replay.plist",
                                                   "--bundle", "/usr/local/share/welcomer/setup-bundle"]):
             with self.subTest(command):
                 asked = self.run_as_stranger(TOOL, *command)

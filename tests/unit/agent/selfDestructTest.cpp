@@ -74,6 +74,17 @@ TEST_F(SelfDestructTest, WithoutLibraryDirectoriesTheHomeDirectorysLibraryIsTheO
               (Lines{"FileSystem.remove /home/user/Library/LaunchAgents/l.plist"}));
 }
 
+TEST_F(SelfDestructTest, WithoutAHomeNothingIsTouchedAndTheLineSaysWhy) {
+    fake.processIdentity.setLoginName("54321");
+    fake.processIdentity.setHomeDirectory("");
+    selfDestruct("l");
+    EXPECT_EQ(fake.recorder.callsTo("FileSystem."), Lines{});
+    EXPECT_EQ(
+        fake.systemLog.lines(),
+        (Lines{"Self destructing...", "Failed to remove wlnimbussetup plist for 54321: the user 54321 has "
+                                      "no home folder"}));
+}
+
 TEST_F(SelfDestructTest, ALabelIsTakenAsItStands) {
     selfDestruct("Zo\xC3\xAB %@");
     selfDestruct("");

@@ -1,5 +1,6 @@
 #include "backends/local/LocalProcessIdentity.h"
 
+#include "platform/Error.h"
 #include "tests/contract/TemporaryRoot.h"
 
 #include <gtest/gtest.h>
@@ -32,7 +33,7 @@ TEST(LocalProcessIdentityTest, NoEnvironmentVariableIsAsked) {
     EXPECT_EQ(identity.loginName(), expected.loginName());
 }
 
-TEST(LocalProcessIdentityTest, AUserWhomNobodyKnowsHasANumberAndTheRootAsHome) {
+TEST(LocalProcessIdentityTest, AUserWhomNobodyKnowsHasANumberAndNoHome) {
     constexpr uid_t kNobodysID = 1234567;
     if (::geteuid() != 0) {
         GTEST_SKIP() << "only the superuser can become another user";
@@ -44,8 +45,12 @@ TEST(LocalProcessIdentityTest, AUserWhomNobodyKnowsHasANumberAndTheRootAsHome) {
 
     EXPECT_EQ(identity.effectiveUserID(), kNobodysID);
     EXPECT_EQ(identity.loginName(), "1234567");
-    EXPECT_EQ(identity.homeDirectory(), "/");
-    EXPECT_EQ(identity.userLibraryDirectories(), std::vector<std::string>{"/Library"});
+    try {
+        ADD_FAILURE() << "has the home " << identity.homeDirectory();
+    } catch (const platform::Exception& exception) {
+        EXPECT_STREQ(exception.what(), "the user 1234567 has no home folder");
+    }
+    EXPECT_EQ(identity.userLibraryDirectories(), std::vector<std::string>{});
     ASSERT_EQ(::seteuid(0), 0);
 }
 

@@ -67,6 +67,14 @@ TEST_F(WriterTest, StoresTheItemAndInstallsTheLaunchAgentInThisOrder) {
                      "FileSystem.copy " + kResource + ", " + kInstalled}));
 }
 
+TEST_F(WriterTest, WithoutAHomeThereIsNoPlaceForTheLaunchAgent) {
+    fake.processIdentity.setHomeDirectory("");
+    EXPECT_FALSE(write());
+    EXPECT_EQ(fake.systemLog.lines().back(),
+              "failed to install com.corvid.welcomer.nimbussetup: the user user has no home folder");
+    EXPECT_EQ(fake.recorder.callsTo("FileSystem."), Lines{});
+}
+
 TEST_F(WriterTest, TheItemHasItsAttributesDataAndAccess) {
     EXPECT_TRUE(write());
     const auto [item, data] = stored();
