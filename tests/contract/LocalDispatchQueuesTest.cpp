@@ -8,7 +8,9 @@
 #include <atomic>
 #include <chrono>
 #include <filesystem>
+#include <future>
 #include <iterator>
+#include <memory>
 #include <mutex>
 #include <stdexcept>
 #include <thread>
@@ -192,6 +194,31 @@ TEST(LocalDispatchQueuesTest, AnEarlierDelayedBlockWakesTheThreadThatKeepsTime) 
     group->enter();
     queues.global().asyncAfter(1ms, [group] { group->leave(); });
     EXPECT_TRUE(group->wait(tooLong));
+}
+
+TEST(LocalDispatchQueuesTest, WhatABlockHoldsIsReleasedWhileOthersMayPost) {
+    ThreadsByHand threads;
+    LocalDispatchQueues queues(threads.starter());
+    const auto queue = queues.createSerial("serial");
+    int released = 0;
+    int couldPost = 0;
+    std::vector<std::future<void>> posts;
+    // Its deletion waits for another thread that posts.
+    const auto makeHeld = [&] {
+        return std::shared_ptr<void>(nullptr, [&](void*) {
+            posts.push_back(std::async(std::launch::async, [&] { queues.global().async([] {}); }));
+            ++released;
+            if (posts.back().wait_for(tooLong / 6) == std::future_status::ready)
+                ++couldPost;
+        });
+    };
+    queues.global().async([held = makeHeld()] {});
+    queue->async([held = makeHeld()] {});
+    queue->async([held = makeHeld()] {}); // the last one of its queue
+    while (!threads.waiting.empty())
+        threads.runNext();
+    EXPECT_EQ(released, 3);
+    EXPECT_EQ(couldPost, 3);
 }
 
 TEST(LocalDispatchQueuesTest, DestructionWaitsForRunningBlocksAndDropsTheRest) {

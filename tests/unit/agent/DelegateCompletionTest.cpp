@@ -4,12 +4,16 @@
 #include "tests/fakes/FakePlatform.h"
 #include "tests/unit/agent/TestDelegate.h"
 
+#include <algorithm>
+#include <atomic>
 #include <gtest/gtest.h>
 #include <memory>
 #include <new>
+#include <sched.h>
 #include <stdexcept>
 #include <string>
 #include <system_error>
+#include <thread>
 #include <utility>
 #include <vector>
 
@@ -30,6 +34,19 @@ class CountingGroup final : public platform::WorkGroup {
     bool wait(std::chrono::nanoseconds) override { return entered == left; }
 };
 
+// Counts for other threads too.
+class LeaveCounter final : public platform::WorkGroup {
+  public:
+    explicit LeaveCounter(std::atomic<int>& left) : _left(left) {}
+
+    void enter() override {}
+    void leave() override { ++_left; }
+    bool wait(std::chrono::nanoseconds) override { return _left > 0; }
+
+  private:
+    std::atomic<int>& _left;
+};
+
 class DirectQueue final : public platform::DispatchQueue {
   public:
     void async(std::function<void()> block) override { block(); }
@@ -45,6 +62,27 @@ class FullQueue final : public platform::DispatchQueue {
         async(std::move(block));
     }
 };
+
+std::vector<std::size_t> processorsOfThisProcess() {
+    cpu_set_t set;
+    CPU_ZERO(&set);
+    EXPECT_EQ(::sched_getaffinity(0, sizeof set, &set), 0);
+    std::vector<std::size_t> processors;
+    for (std::size_t processor = 0; processor < CPU_SETSIZE; ++processor) {
+        if (CPU_ISSET(processor, &set)) {
+            processors.push_back(processor);
+        }
+    }
+    return processors;
+}
+
+// For the calling thread. Left to itself, a busy machine runs threads that meet on one processor in turns.
+void runOnlyOn(std::size_t processor) {
+    cpu_set_t set;
+    CPU_ZERO(&set);
+    CPU_SET(processor, &set);
+    EXPECT_EQ(::sched_setaffinity(0, sizeof set, &set), 0);
+}
 
 class DelegateCompletionTest : public testing::Test {
   protected:
@@ -64,13 +102,21 @@ TEST_F(DelegateCompletionTest, EntersTheGroupWhenMadeAndLeavesItOnceWithItsOutco
     EXPECT_EQ(group->left, 1);
 }
 
-TEST_F(DelegateCompletionTest, TheLineIsLoggedBeforeTheGroupIsLeft) {
+TEST_F(DelegateCompletionTest, WhateverTheOutcomeItsLineIsLoggedBeforeTheGroupIsLeft) {
+    std::vector<int> leftThen;
     PCLogManager::sharedManager().setObserver(
-        [this](const PCLogManager::Call&) { EXPECT_EQ(group->left, 0); });
+        [&](const PCLogManager::Call&) { leftThen.push_back(group->left); });
     completion->complete(plugin, "response");
+    completion = std::make_shared<DelegateCompletion>("e", group, queue);
+    completion->completeWithAliases(plugin, "response", std::nullopt);
+    completion = std::make_shared<DelegateCompletion>("f", group, queue);
+    completion->raised(std::make_exception_ptr(std::runtime_error("no")));
     PCLogManager::sharedManager().setObserver({});
-    EXPECT_EQ(group->left, 1);
-    EXPECT_EQ(fake.systemLog.lines(), (Lines{"d setup: completed (0.000 seconds)"}));
+    EXPECT_EQ(leftThen, (std::vector<int>{0, 1, 2}));
+    EXPECT_EQ(group->left, 3);
+    EXPECT_EQ(fake.systemLog.lines(),
+              (Lines{"d setup: completed (0.000 seconds)", "e setup+chosen: completed (0.000 seconds)",
+                     "exception in setup response for plugin f (0.000 seconds): no"}));
 }
 
 TEST_F(DelegateCompletionTest, HoldsItsQueueUntilTheOutcome) {
@@ -190,6 +236,45 @@ TEST_F(DelegateCompletionTest, TheHandlersSecondCallDoesNothing) {
     EXPECT_EQ(group->left, 2);
     EXPECT_EQ(fake.systemLog.lines(),
               (Lines{"d setup: completed (0.000 seconds)", "e setup+chosen: completed (0.000 seconds)"}));
+}
+
+// Two threads meet before each handler. The one that comes last sees the other first, and so gives it a head
+// start that grows: in some rounds both call at the same moment.
+TEST_F(DelegateCompletionTest, OfTwoThreadsThatCallTheHandlerAtOnceOneGivesTheOutcome) {
+    constexpr std::size_t kRounds = 2000;
+    constexpr std::size_t kLongestStart = 200;
+    std::vector<std::atomic<int>> left(kRounds);
+    std::vector<CompletionHandler> handlers;
+    plugin.complete = [&](const CompletionHandler& handler) {
+        handlers.push_back(handler);
+    };
+    for (std::atomic<int>& count : left) {
+        completion =
+            std::make_shared<DelegateCompletion>("d", std::make_shared<LeaveCounter>(count), nullptr);
+        completion->complete(plugin, "response");
+    }
+    const std::vector<std::size_t> processors = processorsOfThisProcess();
+    std::atomic<std::size_t> arrived = 0;
+    const auto callAll = [&](std::size_t processor) {
+        runOnlyOn(processor);
+        for (std::size_t round = 0; round < kRounds; ++round) {
+            const bool isLast = arrived++ == 2 * round + 1;
+            while (arrived < 2 * round + 2) {
+                if (processors.size() == 1) {
+                    std::this_thread::yield();
+                }
+            }
+            for (std::size_t start = isLast ? round % kLongestStart : 0; start > 0; --start) {
+                std::atomic_signal_fence(std::memory_order_seq_cst);
+            }
+            handlers[round](true, std::nullopt);
+        }
+    };
+    std::thread first(callAll, processors.front());
+    std::thread second(callAll, processors.back());
+    first.join();
+    second.join();
+    EXPECT_TRUE(std::ranges::all_of(left, [](const std::atomic<int>& count) { return count == 1; }));
 }
 
 TEST_F(DelegateCompletionTest, WhateverAPluginThrowsIsCaughtAndLogged) {

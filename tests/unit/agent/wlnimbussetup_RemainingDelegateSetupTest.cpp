@@ -318,6 +318,37 @@ TEST_F(RemainingDelegateSetupTest, AMessagingDelegateWaitsForTheOthersCallAndNot
     EXPECT_TRUE(group->wait(0ns));
 }
 
+TEST_F(RemainingDelegateSetupTest, ALoneMessagingDelegateIsOnTheSharedQueueToo) {
+    for (const char* identifier : {"com.corvid.vidlink", "com.corvid.chatter"}) {
+        fakes::FakePlatform own;
+        const platform::ScopedPlatform ownInstalled(own.platform());
+        const auto ownGroup = own.virtualTime.createGroup();
+        const PropertyList replayObject(PropertyList::Dictionary{
+            {"delegatesResponseDict",
+             PropertyList::Dictionary{{"delegates", PropertyList::Dictionary{{identifier, "response"}}}}}});
+        plugins = {std::make_shared<TestDelegate>(identifier)};
+        wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, ownGroup,
+                                             [this]() -> const DelegatePluginArray& { return plugins; });
+        EXPECT_TRUE(ownGroup->wait(1h));
+        EXPECT_EQ(own.virtualTime.queueNames(), Lines{kSharedQueue});
+    }
+}
+
+TEST_F(RemainingDelegateSetupTest, SecondsAreCountedFromTheQueueingAlsoWhileTheJobWaitsForAnother) {
+    for (const char* identifier : {"com.corvid.chatter", "com.corvid.vidlink"}) {
+        add(identifier).complete = [&](const CompletionHandler& handler) {
+            fake.virtualTime.sleep(1s);
+            handler(true, std::nullopt);
+        };
+        respond(identifier);
+    }
+    setUpAndFinish();
+    const Lines lines = fake.systemLog.lines();
+    ASSERT_EQ(lines.size(), 6U);
+    EXPECT_EQ(lines[4], "com.corvid.chatter setup+chosen: completed (1.000 seconds)");
+    EXPECT_EQ(lines[5], "com.corvid.vidlink setup+chosen: completed (2.000 seconds)");
+}
+
 TEST_F(RemainingDelegateSetupTest, ARaisingPluginHarmsNoOther) {
     add("a").complete = [](const CompletionHandler&) {
         throw 42;

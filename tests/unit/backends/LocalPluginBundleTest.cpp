@@ -117,6 +117,31 @@ TEST_F(LocalPluginBundleTest, ALibraryStaysLoadedAndKeepsItsSymbolsToItself) {
     EXPECT_EQ(::dlsym(RTLD_DEFAULT, kSymbol), nullptr);
 }
 
+TEST_F(LocalPluginBundleTest, AFoldersLibraryStaysLoadedAndKeepsItsSymbolsToItselfToo) {
+    addLibrary("/folder.ncdplugin/library.so");
+    root.addFile("/folder.ncdplugin/Info.plist", info("library.so"));
+
+    const platform::PluginSymbol symbol = load("/folder.ncdplugin");
+
+    ASSERT_NE(symbol.address, nullptr);
+    void* const again = ::dlopen(root.locate("/folder.ncdplugin/library.so").c_str(), RTLD_NOW | RTLD_NOLOAD);
+    EXPECT_NE(again, nullptr);
+    ::dlclose(again);
+    EXPECT_EQ(*static_cast<const int*>(symbol.address), 42);
+    EXPECT_EQ(::dlsym(RTLD_DEFAULT, kSymbol), nullptr);
+}
+
+TEST_F(LocalPluginBundleTest, AFoldersLibraryWithUnresolvedSymbolsIsRefusedWhenItIsLoadedToo) {
+    std::filesystem::create_directory(root.locate("/folder.ncdplugin"));
+    std::filesystem::copy_file(WELCOMER_UNRESOLVED_LIBRARY, root.locate("/folder.ncdplugin/library.so"));
+    root.addFile("/folder.ncdplugin/Info.plist", info("library.so"));
+
+    const platform::PluginSymbol symbol = load("/folder.ncdplugin");
+
+    EXPECT_EQ(symbol.address, nullptr);
+    EXPECT_NE(symbol.reason.find("wl_defined_nowhere"), std::string::npos) << symbol.reason;
+}
+
 TEST_F(LocalPluginBundleTest, ALibraryWithUnresolvedSymbolsIsRefusedWhenItIsLoaded) {
     const platform::PluginSymbol symbol =
         LocalPluginBundle(RootFolder("/")).load(WELCOMER_UNRESOLVED_LIBRARY, kSymbol);

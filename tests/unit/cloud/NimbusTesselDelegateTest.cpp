@@ -1,6 +1,7 @@
 #include "cloud/NimbusTesselDelegate.h"
 
 #include "cloud/WLNimbusServiceCatalogue.h"
+#include "log/PCLogManager.h"
 #include "tests/fakes/FakePlatform.h"
 #include "tests/unit/plugins/InProcessPlugin.h"
 
@@ -184,6 +185,14 @@ TEST_F(NimbusTesselDelegateTest, TermsOfServiceVersionsJoinTheDefaultRequestToo)
 TEST_F(NimbusTesselDelegateTest, TermsOfServiceVersionsMakeTheDelegatesWhereARequestHasNone) {
     validateWith(Dictionary{{"a", 1}}, Dictionary{});
     EXPECT_EQ(fake.accountService.lastRequest, (Dictionary{{"delegates", Dictionary{{"a", 1}}}}));
+}
+
+TEST_F(NimbusTesselDelegateTest, TermsOfServiceVersionsReplaceDelegatesThatAreNoDictionary) {
+    for (const PropertyList& delegates : {PropertyList("text"), PropertyList(PropertyList::Array{"b"})}) {
+        validateWith(Dictionary{{"a", 1}}, Dictionary{{"delegates", delegates}, {"more", 1}});
+        EXPECT_EQ(fake.accountService.lastRequest,
+                  (Dictionary{{"delegates", Dictionary{{"a", 1}}}, {"more", 1}}));
+    }
 }
 
 TEST_F(NimbusTesselDelegateTest, ASignInLogsItsRequestAndNeverThePassword) {
@@ -458,6 +467,29 @@ TEST_F(NimbusTesselDelegateTest, NeedsRepairIsNeverFalseAgain) {
     EXPECT_TRUE(delegate.needsRepair());
 }
 
+TEST_F(NimbusTesselDelegateTest, AnAccountErrorOfZeroDoesNotEndTheNeedForRepair) {
+    answerWith(false, {{kSKPropertyAccountError, 5}, {kSKPropertyAccountErrorInfo, "info"}});
+    EXPECT_FALSE(validate());
+    answerWith(false, {{kSKPropertyAccountError, 0}});
+    EXPECT_FALSE(complete());
+    EXPECT_TRUE(validate()); // at once, with the error of 0
+    EXPECT_EQ(lines().back(), "Nimbus: validation 'NoError'");
+    EXPECT_TRUE(delegate.needsRepair());
+}
+
+TEST_F(NimbusTesselDelegateTest, WhatANotificationSaysReplacesWhatTheLastOneSaid) {
+    answerWith(false, {{kSKPropertyAccountError, 5}, {kSKPropertyAccountErrorInfo, "info"}});
+    EXPECT_FALSE(validate());
+    answerWith(false, {{kSKPropertyAccountError, 1}});
+    EXPECT_FALSE(complete());
+    EXPECT_FALSE(validate()); // at once, with what has just failed
+    EXPECT_EQ(delegate.delegatesResponseDict(), (Dictionary{{kSKPropertyAccountError, 1}}));
+    answerWith(true, {{kSKPropertyAccountID, "anna"}});
+    EXPECT_TRUE(complete());
+    EXPECT_TRUE(validate()); // at once, with what has just succeeded
+    EXPECT_EQ(delegate.delegatesResponseDict(), (Dictionary{{kSKPropertyAccountID, "anna"}}));
+}
+
 TEST_F(NimbusTesselDelegateTest, CompletingSignsInAndEnablesThePreLoginServices) {
     answerWith(true, {{kSKPropertyAccountID, "anna"}}, 1s);
     EXPECT_TRUE(complete());
@@ -470,6 +502,28 @@ TEST_F(NimbusTesselDelegateTest, CompletingSignsInAndEnablesThePreLoginServices)
     EXPECT_EQ(fake.accountService.lastRequest, (Dictionary{{"cloud", "dictionary"}}));
     EXPECT_TRUE(fake.accountService.accounts["anna"][kSKServiceIDLOC].enabled);
     EXPECT_FALSE(fake.accountService.accounts["anna"][kSKServiceIDContacts].enabled);
+}
+
+TEST_F(NimbusTesselDelegateTest, CompletingObservesBeforeItsRequestAndNoLongerWhenItEnables) {
+    std::vector<std::size_t> observersThen;
+    fake.accountService.answerSignIn = [&](const auto&, const auto&, const auto&) {
+        observersThen.push_back(observers());
+        return std::optional(Answer{true, {{kSKPropertyAccountID, "anna"}}, 0ns, false});
+    };
+    PCLogManager::sharedManager().setObserver([&](const PCLogManager::Call& call) {
+        if (call.message == "Enabling Nimbus Locator") {
+            observersThen.push_back(observers());
+        }
+    });
+    EXPECT_TRUE(complete());
+    PCLogManager::sharedManager().setObserver({});
+    EXPECT_EQ(observersThen, (std::vector<std::size_t>{2, 0}));
+}
+
+TEST_F(NimbusTesselDelegateTest, CompletingHearsANotificationThatComesWithItsRequest) {
+    answerImmediately(true, {{kSKPropertyAccountID, "anna"}});
+    EXPECT_TRUE(complete());
+    EXPECT_EQ(slices(), 0U);
 }
 
 TEST_F(NimbusTesselDelegateTest, CompletingWaitsAgainAfterAValidation) {

@@ -63,6 +63,13 @@ TEST_F(WLSetupProbesTest, TheOverrideFalseAnswersToo) {
     EXPECT_FALSE(WLScreenLockRequiresPassword());
 }
 
+TEST_F(WLSetupProbesTest, OfSeveralOverridesTheLastOneAnswers) {
+    for (const bool value : {true, false, false, true}) {
+        WLSetScreenLockRequiresPasswordOverride(value);
+        EXPECT_EQ(WLScreenLockRequiresPassword(), value);
+    }
+}
+
 TEST_F(WLSetupProbesTest, DelegateResponsesMayAlwaysBeLoggedAfterTheDefaultAndTheFolderWereLookedAt) {
     EXPECT_TRUE(WLShouldLogDelegateResponses());
     EXPECT_EQ(fake.recorder.calls(),

@@ -159,6 +159,22 @@ TEST_F(ReplayItemTest, WhatKeepsTheReaderFromItsWorkKeepsTheOtherOneToo) {
     EXPECT_EQ(lines[2], "Failed to get account name attribute");
 }
 
+TEST_F(ReplayItemTest, TheLabelIsNotReadBeforeTheObjectIsUnderstood) {
+    put("no property list at all <<<");
+    fake.credentialStore.setStatus(Operation::ReadAttributes, platform::kCredentialReadFailed);
+    PropertyList replayObject;
+    std::string accountName;
+    EXPECT_FALSE(WLGetNimbusReplayKeychainItem(&replayObject, &accountName));
+    ReplayItem found;
+    EXPECT_FALSE(readReplayItem(found));
+    EXPECT_EQ(fake.recorder.callsTo("CredentialStore."), Lines(2, "CredentialStore.findItem " + kKey));
+    const Lines lines = fake.systemLog.lines();
+    ASSERT_EQ(lines.size(), 2U);
+    for (const std::string& line : lines) {
+        EXPECT_TRUE(line.starts_with("Failed to deserialize replayable data length: ")) << line;
+    }
+}
+
 TEST_F(ReplayItemTest, TheReaderTakesAnObjectThatIsNoDictionary) {
     put(*writeXMLPropertyList(PropertyList::Array{1, "two"}));
     PropertyList replayObject;

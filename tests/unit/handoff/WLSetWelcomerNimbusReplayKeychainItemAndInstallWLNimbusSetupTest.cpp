@@ -177,6 +177,21 @@ TEST_F(WriterTest, AHomeWithoutALibraryFolderGetsOneFromThePlatform) {
     EXPECT_EQ(fake.fileSystem.mode("/home/user/Library"), 0700U);
 }
 
+TEST_F(WriterTest, TheFolderIsInTheHomesLibraryWhateverTheLibraryDirectoriesAre) {
+    for (const std::vector<std::string>& directories :
+         {std::vector<std::string>{"/elsewhere/Library", "/home/user/Library"}, std::vector<std::string>{}}) {
+        fakes::FakePlatform own;
+        const platform::ScopedPlatform ownInstalled(own.platform());
+        own.fileSystem.addFile(kResource, "the launch agent");
+        own.fileSystem.addDirectory("/elsewhere/Library");
+        own.fileSystem.addDirectory("/home/user/Library");
+        own.processIdentity.setUserLibraryDirectories(directories);
+        EXPECT_TRUE(write());
+        EXPECT_EQ(own.fileSystem.content(kInstalled), "the launch agent");
+        EXPECT_FALSE(own.fileSystem.exists("/elsewhere/Library/LaunchAgents"));
+    }
+}
+
 TEST_F(WriterTest, TheFoldersParentsAreNotMade) {
     fake.processIdentity.setHomeDirectory("/home/nobody");
     EXPECT_FALSE(write());

@@ -618,6 +618,22 @@ TEST_F(NetworkingManagerTest, AtLeastThreeReachableNodesAreEnough) {
     EXPECT_TRUE(manager->dirServiceNodesExist());
 }
 
+TEST_F(NetworkingManagerTest, TheSearchPathIsReadAgainBeforeItsNodesAreCounted) {
+    manager.emplace();
+    fake.directoryService.subnodes = {"local", "a"};
+    PCLogManager::sharedManager().setObserver([&](const PCLogManager::Call& call) {
+        if (call.message.find("search paths") != std::string::npos) {
+            fake.directoryService.subnodes = {"local", "a", "b"};
+        }
+    });
+    EXPECT_TRUE(manager->dirServiceNodesExist());
+    PCLogManager::sharedManager().setObserver({});
+    EXPECT_EQ(fake.recorder.callsTo("DirectoryService."),
+              (Lines{"DirectoryService.openNode 8705", "DirectoryService.subnodeNames",
+                     "DirectoryService.openNode 8705", "DirectoryService.subnodeNames",
+                     "DirectoryService.unreachableSubnodeNames"}));
+}
+
 TEST_F(NetworkingManagerTest, FewerThanThreeNodesAreNotCounted) {
     manager.emplace();
     logged();

@@ -134,8 +134,9 @@ TEST_F(WLNimbusDelegatePluginsTest, NeverScansAgainNorRetriesAPluginThatFailed) 
 }
 
 TEST_F(WLNimbusDelegatePluginsTest, SkipsSilentlyWhateverHasAnotherExtension) {
-    for (const char* name : {"a.NCDPLUGIN", "b.ncdPlugin", "c.so", "d.ncdplugin.bak", "ncdplugin",
-                             ".ncdplugin", "e.ncdplugin.", "f.xncdplugin", "g ncdplugin"}) {
+    for (const char* name :
+         {"a.NCDPLUGIN", "b.ncdPlugin", "c.so", "d.ncdplugin.bak", "ncdplugin", ".ncdplugin", "e.ncdplugin.",
+          "f.xncdplugin", "g ncdplugin", "h.ncdplugins", "i.ncdplugin~", "j.ncdplugi"}) {
         add(name, first.exportAs<0>());
     }
     EXPECT_TRUE(WLNimbusDelegatePlugins().empty());

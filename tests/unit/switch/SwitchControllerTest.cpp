@@ -395,7 +395,7 @@ class SwitchControllerFailureTest : public SwitchControllerTest {
 };
 
 TEST_F(SwitchControllerFailureTest, ARemovalThatFailsEndsIt) {
-    for (const int number : {EPERM, EBUSY, ENOTEMPTY, EROFS, EEXIST, EIO}) {
+    for (const int number : {0, EPERM, EBUSY, ENOTEMPTY, EROFS, EEXIST, EIO}) {
         fake.fileSystem.fail(Operation::Remove, kDirectory, number, "no removal");
         expectRefusal("SwitchController failed to remove previous config: no removal");
         EXPECT_EQ(fake.fileSystem.content(path(3)), overrideText(3, 1));
