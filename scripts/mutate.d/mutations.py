@@ -102,15 +102,15 @@ class Source:
 
 
 def _of_statements(source, opening):
-    statements = source.statements(opening)
-    ends = {i for _, last, _ in statements for i in [last + 1] if source.words[i] == "}"}
+    ends_simply = source.words[source.partner[opening] - 1] == ";"
     previous = None
-    for first, last, block in statements:
+    for first, last, block in source.statements(opening):
         head, text = source.words[first], source.slice(first, last)
         declares = head not in ("return", "throw", "break", "continue", "delete") and DECLARATION.match(text)
-        if head not in NO_STATEMENT and not (head == "return" and last > first + 1 and source.partner[block] in ends and
-                                             (block == opening or source.words[block - 1] in ("]", ")") and
-                                              source.words[source.partner.get(block - 1, 0) - 1] == "]")):
+        # No function may end without its result.
+        needed = head == "return" and last > first + 1 and (
+            not ends_simply or block == opening or source.words[source.partner[block] + 1] in (")", ",", ";"))
+        if head not in NO_STATEMENT and not needed:
             yield Mutation(source.start(first), source.end(last), ";", "drop")
         simple = head not in NO_STATEMENT | {"return", "throw", "break", "continue"}
         if previous and simple and previous[2] == block and previous[1] == first - 1 and not (declares and previous[3]):

@@ -2,18 +2,18 @@
 
 #include "log/PCLogManager.h"
 #include "tests/fakes/FakePlatform.h"
+#include "tests/support/Processors.h"
 #include "tests/unit/agent/TestDelegate.h"
 
 #include <algorithm>
 #include <atomic>
+#include <functional>
 #include <gtest/gtest.h>
 #include <memory>
 #include <new>
-#include <sched.h>
 #include <stdexcept>
 #include <string>
 #include <system_error>
-#include <thread>
 #include <utility>
 #include <vector>
 
@@ -28,9 +28,14 @@ class CountingGroup final : public platform::WorkGroup {
   public:
     int entered = 0;
     int left = 0;
+    std::function<void()> whenLeft = [] {
+    };
 
     void enter() override { ++entered; }
-    void leave() override { ++left; }
+    void leave() override {
+        ++left;
+        whenLeft();
+    }
     bool wait(std::chrono::nanoseconds) override { return entered == left; }
 };
 
@@ -62,27 +67,6 @@ class FullQueue final : public platform::DispatchQueue {
         async(std::move(block));
     }
 };
-
-std::vector<std::size_t> processorsOfThisProcess() {
-    cpu_set_t set;
-    CPU_ZERO(&set);
-    EXPECT_EQ(::sched_getaffinity(0, sizeof set, &set), 0);
-    std::vector<std::size_t> processors;
-    for (std::size_t processor = 0; processor < CPU_SETSIZE; ++processor) {
-        if (CPU_ISSET(processor, &set)) {
-            processors.push_back(processor);
-        }
-    }
-    return processors;
-}
-
-// For the calling thread. Left to itself, a busy machine runs threads that meet on one processor in turns.
-void runOnlyOn(std::size_t processor) {
-    cpu_set_t set;
-    CPU_ZERO(&set);
-    CPU_SET(processor, &set);
-    EXPECT_EQ(::sched_setaffinity(0, sizeof set, &set), 0);
-}
 
 class DelegateCompletionTest : public testing::Test {
   protected:
@@ -238,8 +222,8 @@ TEST_F(DelegateCompletionTest, TheHandlersSecondCallDoesNothing) {
               (Lines{"d setup: completed (0.000 seconds)", "e setup+chosen: completed (0.000 seconds)"}));
 }
 
-// Two threads meet before each handler. The one that comes last sees the other first, and so gives it a head
-// start that grows: in some rounds both call at the same moment.
+// The thread that comes last sees the other first, and so gives it a head start that grows: in some rounds
+// both call at the same moment.
 TEST_F(DelegateCompletionTest, OfTwoThreadsThatCallTheHandlerAtOnceOneGivesTheOutcome) {
     constexpr std::size_t kRounds = 2000;
     constexpr std::size_t kLongestStart = 200;
@@ -253,28 +237,44 @@ TEST_F(DelegateCompletionTest, OfTwoThreadsThatCallTheHandlerAtOnceOneGivesTheOu
             std::make_shared<DelegateCompletion>("d", std::make_shared<LeaveCounter>(count), nullptr);
         completion->complete(plugin, "response");
     }
-    const std::vector<std::size_t> processors = processorsOfThisProcess();
-    std::atomic<std::size_t> arrived = 0;
-    const auto callAll = [&](std::size_t processor) {
-        runOnlyOn(processor);
+    runOnTwoProcessors([&](MeetingPoint& point) {
         for (std::size_t round = 0; round < kRounds; ++round) {
-            const bool isLast = arrived++ == 2 * round + 1;
-            while (arrived < 2 * round + 2) {
-                if (processors.size() == 1) {
-                    std::this_thread::yield();
-                }
-            }
-            for (std::size_t start = isLast ? round % kLongestStart : 0; start > 0; --start) {
+            for (std::size_t start = point.meet() ? round % kLongestStart : 0; start > 0; --start) {
                 std::atomic_signal_fence(std::memory_order_seq_cst);
             }
             handlers[round](true, std::nullopt);
         }
-    };
-    std::thread first(callAll, processors.front());
-    std::thread second(callAll, processors.back());
-    first.join();
-    second.join();
+    });
     EXPECT_TRUE(std::ranges::all_of(left, [](const std::atomic<int>& count) { return count == 1; }));
+}
+
+TEST_F(DelegateCompletionTest, TheQueueIsReleasedAfterTheGroupIsLeft) {
+    const std::weak_ptr<platform::DispatchQueue> watched = std::exchange(queue, nullptr);
+    bool wasHeld = false;
+    group->whenLeft = [&] {
+        wasHeld = !watched.expired();
+    };
+    completion->complete(plugin, "response");
+    EXPECT_TRUE(wasHeld);
+    EXPECT_TRUE(watched.expired());
+}
+
+TEST_F(DelegateCompletionTest, ARaiseIsTheOutcomeBeforeItIsLogged) {
+    CompletionHandler kept;
+    plugin.complete = [&](const CompletionHandler& handler) {
+        kept = handler;
+    };
+    completion->complete(plugin, "response");
+    PCLogManager::sharedManager().setObserver([&](const PCLogManager::Call&) {
+        if (const CompletionHandler handler = std::exchange(kept, nullptr)) {
+            handler(true, std::nullopt);
+        }
+    });
+    completion->raised(std::make_exception_ptr(std::runtime_error("first")));
+    PCLogManager::sharedManager().setObserver({});
+    EXPECT_EQ(group->left, 1);
+    EXPECT_EQ(fake.systemLog.lines(),
+              (Lines{"exception in setup response for plugin d (0.000 seconds): first"}));
 }
 
 TEST_F(DelegateCompletionTest, WhateverAPluginThrowsIsCaughtAndLogged) {

@@ -1,5 +1,7 @@
 #include "plugins/CompletionHandlers.h"
 
+#include "tests/support/Processors.h"
+
 #include <atomic>
 #include <gtest/gtest.h>
 #include <memory>
@@ -138,6 +140,18 @@ TEST(CompletionHandlers, CountOneCallWhenManyThreadsCallAtOnce) {
         thread.join();
     }
     EXPECT_EQ(calls, 1);
+}
+
+TEST(CompletionHandlers, AreIssuedAndCalledByThreadsAtOnce) {
+    constexpr int kRounds = 20'000;
+    std::atomic<int> calls = 0;
+    runOnTwoProcessors([&](MeetingPoint&) {
+        for (int round = 0; round < kRounds; ++round) {
+            const auto handler = issueCompletionHandler([&](bool, const auto&) { ++calls; });
+            handler.call(handler.context, true, 0, nullptr);
+        }
+    });
+    EXPECT_EQ(calls, 2 * kRounds);
 }
 
 } // namespace

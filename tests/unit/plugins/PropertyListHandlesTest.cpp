@@ -171,7 +171,25 @@ TEST(PropertyListHandles, TolerateNullEverywhere) {
     EXPECT_EQ(host.dictionary_get(borrowedHandle(value), nullptr, 0), nullptr);
     EXPECT_FALSE(host.get_boolean(get(value, "boolean"), nullptr));
     EXPECT_FALSE(host.get_date(get(value, "date"), nullptr));
-    EXPECT_FALSE(host.dictionary_next(borrowedHandle(value), nullptr, nullptr, nullptr));
+    const char* key = nullptr;
+    std::size_t length = 0;
+    const wl_value* entry = nullptr;
+    EXPECT_FALSE(host.dictionary_next(nullptr, &key, &length, &entry));
+    EXPECT_FALSE(host.dictionary_next(borrowedHandle(value), nullptr, &length, &entry));
+    EXPECT_FALSE(host.dictionary_next(borrowedHandle(value), &key, nullptr, &entry));
+    EXPECT_FALSE(host.dictionary_next(borrowedHandle(value), &key, &length, nullptr));
+}
+
+TEST(PropertyListHandles, TakeNoBytesFromNowhereAndOneFromSomewhere) {
+    std::size_t length = 7;
+    wl_value* empty = host.new_data(nullptr, 0);
+    ASSERT_NE(empty, nullptr);
+    EXPECT_NE(host.get_data(empty, &length), nullptr);
+    EXPECT_EQ(length, 0U);
+    host.release(empty);
+    EXPECT_EQ(host.new_data(nullptr, 1), nullptr);
+    wl_value* one = host.new_data("x", 1);
+    EXPECT_EQ(takeHandle(one), PropertyList(PropertyList::Data{"x"}));
 }
 
 TEST(PropertyListHandles, ReleaseWhatAContainerRefuses) { // the leak check of a sanitizer build looks here
@@ -270,6 +288,40 @@ TEST(PropertyListHandles, RefuseToCopyWhatIsNestedTooDeep) {
         value = std::move(outer);
     }
     EXPECT_EQ(host.copy(borrowedHandle(value)), nullptr);
+}
+
+// How often a value can be put into another one.
+int wrapsOf(wl_value* value) {
+    for (int wraps = 0;; ++wraps) {
+        wl_value* outer = host.new_array();
+        if (!host.array_append(outer, value)) {
+            host.release(outer);
+            return wraps;
+        }
+        value = outer;
+    }
+}
+
+TEST(PropertyListHandles, AContainerIsOneDeeperThanWhatIsNone) {
+    const int wraps = wrapsOf(host.new_array());
+    EXPECT_EQ(wrapsOf(host.new_dictionary()), wraps);
+    for (wl_value* value :
+         {host.new_string("text", 4), host.new_integer(1), host.new_unsigned(1), host.new_real(1),
+          host.new_boolean(true), host.new_data("x", 1), host.new_date(1)}) {
+        EXPECT_EQ(wrapsOf(value), wraps + 1);
+    }
+}
+
+TEST(PropertyListHandles, ACopyIsAsDeepAsWhatIsBuiltTheSame) {
+    wl_value* array = host.new_array();
+    EXPECT_TRUE(host.array_append(array, host.new_integer(1)));
+    wl_value* dictionary = host.new_dictionary();
+    EXPECT_TRUE(host.dictionary_set(dictionary, "k", 1, array));
+    EXPECT_TRUE(host.dictionary_set(dictionary, "z", 1, host.new_integer(1)));
+    const PropertyList original(PropertyList::Dictionary{{"k", PropertyList::Array{1}}, {"z", 1}});
+    EXPECT_EQ(wrapsOf(host.copy(borrowedHandle(original))), wrapsOf(dictionary));
+    const PropertyList number(1);
+    EXPECT_EQ(wrapsOf(host.copy(borrowedHandle(number))), wrapsOf(host.new_integer(1)));
 }
 
 TEST(ErrorSlot, KeepsTheFirstMessage) {

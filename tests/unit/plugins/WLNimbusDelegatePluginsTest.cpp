@@ -1,10 +1,12 @@
 #include "plugins/WLNimbusDelegatePlugins.h"
 
+#include "log/PCLogManager.h"
 #include "plugins/PluginMark.h"
 #include "tests/fakes/FakePlatform.h"
 #include "tests/unit/plugins/InProcessPlugin.h"
 
 #include <gtest/gtest.h>
+#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -283,6 +285,19 @@ TEST_F(WLNimbusDelegatePluginsTest, KeepsTheEarlierOfTwoWithTheSameIdentifier) {
     EXPECT_EQ(second.destroyed, 1);
 }
 
+TEST_F(WLNimbusDelegatePluginsTest, ADuplicateIsLoggedBeforeItIsDestroyed) {
+    second.identifier = "com.corvid.first";
+    add("a.ncdplugin", first.exportAs<0>());
+    add("b.ncdplugin", second.exportAs<1>());
+    std::vector<int> destroyedThen;
+    PCLogManager::sharedManager().setObserver(
+        [&](const PCLogManager::Call&) { destroyedThen.push_back(second.destroyed); });
+    WLNimbusDelegatePlugins();
+    PCLogManager::sharedManager().setObserver({});
+    EXPECT_EQ(destroyedThen, std::vector<int>{0});
+    EXPECT_EQ(second.destroyed, 1);
+}
+
 TEST_F(WLNimbusDelegatePluginsTest, APluginThatWasSkippedDoesNotTakeItsIdentifier) {
     first.instance.delegate_identifier = [](wl_delegate*, wl_error_slot*) -> const char* {
         throw 42;
@@ -347,6 +362,19 @@ TEST_F(WLNimbusDelegatePluginsTest, AScanGivesTheReasonOfEveryOtherRefusal) {
     EXPECT_EQ(entries[1].reason, "no licence");
     EXPECT_EQ(entries[2].reason, "has no identifier");
     EXPECT_EQ(entries[3].reason, "made no plug-in object");
+}
+
+TEST_F(WLNimbusDelegatePluginsTest, AScanGivesTheTextOfWhatWasThrown) {
+    fake.fileSystem.addFile(path("a.ncdplugin"), "");
+    fake.pluginBundle.addThrowing(path("a.ncdplugin"), "thrown while loading");
+    first.instance.delegate_identifier = [](wl_delegate*, wl_error_slot*) -> const char* {
+        throw std::runtime_error("thrown for the identifier");
+    };
+    add("b.ncdplugin", first.exportAs<0>());
+    const auto entries = scanDelegatePlugins();
+    ASSERT_EQ(entries.size(), 2U);
+    EXPECT_EQ(entries[0].reason, "thrown while loading");
+    EXPECT_EQ(entries[1].reason, "thrown for the identifier");
 }
 
 } // namespace
