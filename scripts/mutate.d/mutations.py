@@ -150,7 +150,8 @@ def _of_conditions(source, i):
 
 def _of_calls(source, i):
     """A method's call makes way for its object, a function's for its only argument."""
-    if source.words[i + 1] != "(" or source.words[i] in NO_CALL or source.words[i].startswith("WL_LOG"):
+    if source.tokens[i].lastgroup != "word" or source.words[i + 1] != "(" or source.words[i] in NO_CALL or (
+            source.words[i].startswith("WL_LOG")):
         return
     close, before = source.partner[i + 1], source.words[i - 1]
     label = f"leave out {source.words[i]}"

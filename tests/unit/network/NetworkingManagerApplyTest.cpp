@@ -502,6 +502,13 @@ TEST_F(ApplyTest, ACommitThatFailsIsUndoneAndNotApplied) {
               (Lines{"NetworkingManager: NCPreferencesCommitChanges failed error code -7 error text of -7"}));
 }
 
+TEST_F(ApplyTest, ACommitThatFailsIsLoggedBeforeItIsUndone) {
+    NetworkingManager& made = openManager();
+    store.failures["commit"] = {-7};
+    EXPECT_FALSE(made.commitPrefs());
+    EXPECT_EQ(fake.recorder.calls().back(), kStore + "synchronize");
+}
+
 TEST_F(ApplyTest, ACommitThatFailsWithoutACodeCountsAsSuccess) {
     NetworkingManager& made = openManager();
     store.failures["commit"] = {0};

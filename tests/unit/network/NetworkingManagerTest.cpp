@@ -4,13 +4,16 @@
 #include "log/PCLogManager.h"
 #include "tests/unit/network/NetworkingManagerFixture.h"
 
+#include <algorithm>
 #include <cstdint>
+#include <iterator>
 #include <thread>
 #include <tuple>
 
 namespace welcomer {
 namespace {
 
+using namespace std::chrono_literals;
 using platform::NetworkDomain;
 using platform::NetworkEntity;
 
@@ -41,6 +44,15 @@ TEST_F(NetworkingManagerTest, WhatWasReadIsLoggedInOrder) {
     EXPECT_EQ(logged(),
               (Lines{"--- WLCopyNetworkConfig ---", "IP: 192.0.2.7", "Mask: 255.255.255.0",
                      "Router: 192.0.2.1", "DNS: 192.0.2.53", "Domain: home.example", "Config Method: DHCP"}));
+}
+
+TEST_F(NetworkingManagerTest, TheStateStoreIsClosedBeforeWhatWasReadIsLogged) {
+    setWholeState();
+    manager.emplace();
+    const Lines calls = fake.recorder.calls();
+    const auto closed = std::ranges::find(calls, "NetworkStateStore.close");
+    ASSERT_NE(closed, calls.end());
+    EXPECT_EQ(*std::next(closed), "SystemLog.write 115, --- WLCopyNetworkConfig ---");
 }
 
 TEST_F(NetworkingManagerTest, AMachineWithoutANetworkHasNoDefaultsAndALogOfNothing) {
@@ -365,6 +377,25 @@ TEST_F(NetworkingManagerTest, ASetIsWaitedForSecondBySecondWithAFreshConnectionE
     EXPECT_EQ(sleeps(), 2U);
 }
 
+TEST_F(NetworkingManagerTest, EachAttemptIsLoggedBeforeItsSecondAndKeepsTheLastConnectionForAsLong) {
+    store.interfaces = {{{}}};
+    store.setAppearsAfterOpening = 3;
+    manager.emplace();
+    std::vector<std::chrono::nanoseconds> loggedAt;
+    PCLogManager::sharedManager().setObserver([&](const PCLogManager::Call& call) {
+        if (call.message.starts_with("waiting")) {
+            loggedAt.push_back(fake.virtualTime.now());
+        }
+    });
+    std::size_t closedWithinTheSecond = 99;
+    fake.virtualTime.global().asyncAfter(
+        500ms, [&] { closedWithinTheSecond = fake.recorder.callsTo("NetworkConfigStore.close").size(); });
+    manager->systemPreferences();
+    PCLogManager::sharedManager().setObserver({});
+    EXPECT_EQ(loggedAt, (std::vector<std::chrono::nanoseconds>{0s, 1s}));
+    EXPECT_EQ(closedWithinTheSecond, 0U);
+}
+
 TEST_F(NetworkingManagerTest, TheWaitForASetEndsAfterSixtyOneAttemptsAndSixtySeconds) {
     store.interfaces = {{{}}};
     store.hasSet = false;
@@ -632,6 +663,17 @@ TEST_F(NetworkingManagerTest, TheSearchPathIsReadAgainBeforeItsNodesAreCounted) 
               (Lines{"DirectoryService.openNode 8705", "DirectoryService.subnodeNames",
                      "DirectoryService.openNode 8705", "DirectoryService.subnodeNames",
                      "DirectoryService.unreachableSubnodeNames"}));
+}
+
+TEST_F(NetworkingManagerTest, BothListsOfNodesAreReadBeforeTheyAreLogged) {
+    manager.emplace();
+    fake.directoryService.subnodes = {"local", "a", "b"};
+    EXPECT_TRUE(manager->dirServiceNodesExist());
+    const Lines calls = fake.recorder.calls();
+    const auto read = std::ranges::find(calls, "DirectoryService.unreachableSubnodeNames");
+    ASSERT_NE(read, calls.end());
+    EXPECT_EQ(*std::next(read),
+              "SystemLog.write 115, NetworkingManager: DirService: subnodeNames (local, a, b)");
 }
 
 TEST_F(NetworkingManagerTest, FewerThanThreeNodesAreNotCounted) {
