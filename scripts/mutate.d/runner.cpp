@@ -18,7 +18,7 @@ int wl_mutant = 0;
 
 namespace {
 
-constexpr rlim_t kProcessorSeconds = 5; // a whole test case takes less than one
+constexpr rlim_t kProcessorSeconds = 3; // a whole test case takes less than one
 constexpr unsigned kSeconds = 60;       // for one that waits for what never comes
 
 void limit(int resource, rlim_t value) {

@@ -268,6 +268,20 @@ TEST_F(RemainingDelegateSetupTest, TheSettingUpLineComesBeforeTheStartTimeAndBef
     EXPECT_EQ(fake.systemLog.lines().back(), "a setup: completed (0.000 seconds)");
 }
 
+TEST_F(RemainingDelegateSetupTest, TheSettingUpLineComesAfterTheQueueIsMade) {
+    add("a");
+    respond("a");
+    Lines queuesThen;
+    PCLogManager::sharedManager().setObserver([&](const PCLogManager::Call& call) {
+        if (call.message == "setting up a") {
+            queuesThen = fake.virtualTime.queueNames();
+        }
+    });
+    setUp();
+    PCLogManager::sharedManager().setObserver({});
+    EXPECT_EQ(queuesThen, (Lines{kSharedQueue, "com.corvid.wlnimbussetup -- a"}));
+}
+
 TEST_F(RemainingDelegateSetupTest, TheMessagingDelegatesShareAQueueAndEveryOtherHasItsOwn) {
     for (const char* identifier :
          {"com.corvid.storefront", "com.corvid.vidlink", "com.corvid.chatter", "a"}) {
