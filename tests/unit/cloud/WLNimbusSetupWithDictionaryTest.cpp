@@ -1,6 +1,7 @@
 #include "cloud/WLNimbusSetupWithDictionary.h"
 
 #include "cloud/WLNimbusServiceCatalogue.h"
+#include "log/PCLogManager.h"
 #include "tests/fakes/FakePlatform.h"
 #include "text/Describe.h"
 
@@ -277,6 +278,20 @@ TEST_F(WLNimbusSetupWithDictionaryTest, WithAWindowEveryEnablingPassesItAndCreat
     for (const std::string& call : calls) {
         EXPECT_TRUE(call.ends_with(", yes, yes")) << call;
     }
+}
+
+TEST_F(WLNimbusSetupWithDictionaryTest, ADelayCountsFromAfterItsLine) {
+    PCLogManager::sharedManager().setObserver([&](const PCLogManager::Call& call) {
+        if (call.message.ends_with("second delay")) {
+            fake.virtualTime.sleep(10s);
+        }
+    });
+    EXPECT_TRUE(setUp(true, {kSKServiceIDCalendars}));
+    PCLogManager::sharedManager().setObserver({});
+    fake.virtualTime.sleep(3s - 1ns);
+    EXPECT_EQ(enabled(), Strings{});
+    fake.virtualTime.sleep(1ns);
+    EXPECT_EQ(enabled(), Strings{kSKServiceIDCalendars});
 }
 
 TEST_F(WLNimbusSetupWithDictionaryTest, ADelayedTaskKeepsTheWindowUntilItHasRun) {

@@ -186,6 +186,13 @@ TEST_F(WLPerUserStateTest, AFlagOfAnotherTypeReadsAsFalseANumberOneToo) {
     }
 }
 
+TEST_F(WLPerUserStateTest, AFlagThatIsStoredAsFalseReadsAsFalse) {
+    for (const FlagProperty& flag : kFlags) {
+        fake.preferenceStore.store(kDomain, flag.key, false);
+    }
+    expectEmpty(WLPerUserState());
+}
+
 TEST_F(WLPerUserStateTest, WhatOthersStoreIsSeenByANewRecordOrByLoadingAgain) {
     WLPerUserState state;
     store({{"PreviousSystemVersion", "11"}});
@@ -334,6 +341,17 @@ TEST_F(WLPerUserStateTest, DestructionClearsThePreviousVersionAndTellsObservers)
     EXPECT_EQ(describe(), "10.9");
     state.reset();
     EXPECT_EQ(told, (Lines{"10.9", "none"}));
+}
+
+TEST_F(WLPerUserStateTest, DestructionClearsThePreviousBuildVersionLast) {
+    auto state = std::make_unique<WLPerUserState>();
+    state->setPreviousSystemVersionBuildVersion("10.9", "13A603");
+    std::optional<std::string> build;
+    WLPerUserState* const borrowed = state.get();
+    const auto observation = state->observe(
+        "previousSystemVersion", [] {}, [&, borrowed] { build = borrowed->previousBuildVersion(); });
+    state.reset();
+    EXPECT_EQ(build, "13A603");
 }
 
 // The dictionary form
@@ -505,6 +523,7 @@ TEST_F(WLPerUserStateTest, VersionsAreDeliberatelyOrderedByIdentitySoEqualOnesCo
     const std::string version = "10.9.1";
     EXPECT_NE(WLPerUserState::_compareSystemVersionWith(version, version), 0);
     EXPECT_NE(WLPerUserState::_compareSystemVersionWith("", ""), 0);
+    EXPECT_NE(WLPerUserState::_compareSystemVersionWith("1.", "."), 0);
 }
 
 class ComponentsTest : public testing::Test {

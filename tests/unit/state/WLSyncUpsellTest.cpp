@@ -56,6 +56,20 @@ TEST_F(WLSyncUpsellTest, AScreenLockThatIsOffIsRecordedAsSeen) {
     EXPECT_TRUE(state.didSeeSyncSetup2());
 }
 
+TEST_F(WLSyncUpsellTest, WhySyncSetupIsSkippedIsLoggedBeforeItIsRecorded) {
+    for (const bool syncIsEnabled : {true, false}) {
+        state.setDidSeeSyncSetup(false);
+        logIn(syncIsEnabled);
+        bool wasRecorded = true;
+        PCLogManager::sharedManager().setObserver(
+            [&](const PCLogManager::Call&) { wasRecorded = state.didSeeSyncSetup(); });
+        EXPECT_FALSE(WLCurrentUserGetsSyncUpsell());
+        PCLogManager::sharedManager().setObserver({});
+        EXPECT_FALSE(wasRecorded);
+        EXPECT_TRUE(state.didSeeSyncSetup());
+    }
+}
+
 TEST_F(WLSyncUpsellTest, AUserWhoSawTheFirstSyncSetupOnlyIsOfferedTheSecond) {
     logIn();
     setScreenLock(true);
