@@ -63,7 +63,7 @@ void refuseUnusable(const std::string& user) {
         throw UsageError("a user's name holds no slash: " + user);
     }
     if (const std::size_t offset = findInvalidXMLText(user); offset != std::string::npos) {
-        throw UsageError("a user's name cannot hold " + describeInvalidXMLText(user, offset) + ": " + user);
+        throw UsageError("a user's name cannot hold " + describeInvalidXMLText(user, offset));
     }
     if (hasControlCharacter(user)) {
         throw UsageError("a user's name holds no control character: " + user);
