@@ -39,6 +39,9 @@ struct PlatformOptions {
 
     // The folder of the application's main bundle, a path of this machine; empty: the application has none.
     std::string mainBundle = {};
+
+    // New credentials go to the local store, whatever keyring there is. They are found either way.
+    bool storesCredentialsLocally = false;
 };
 
 // Builds the platform: on the desktop's own services for the root "/", where they are built in and there, and

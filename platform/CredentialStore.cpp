@@ -29,17 +29,46 @@ std::string credentialStatusText(std::int32_t status) {
     case kCredentialNoService:
         return "no credential service runs or can be started";
     case kCredentialNoBus:
-        return "there is no session bus, or it has died";
+        return "the keyring could not be asked: there is no session bus";
     case kCredentialTooLarge:
         return "the secret is too large for the credential service";
     case kCredentialServiceFailed:
         return "the credential service failed";
+    case kCredentialFindTimedOut:
+        return "the keyring could not be asked for the item: no answer within 10 seconds";
+    case kCredentialCreateTimedOut:
+        return "the keyring could not be asked to create the item: no answer within 10 seconds; it may still "
+               "create it";
+    case kCredentialReadTimedOut:
+        return "the keyring could not be asked for the item's attributes: no answer within 10 seconds";
+    case kCredentialDeleteTimedOut:
+        return "the keyring could not be asked to delete the item: no answer within 10 seconds; it may still "
+               "delete it";
+    case kCredentialStartFailed:
+        return "the keyring could not be asked: it does not run, and starting it failed";
+    case kCredentialBusDied:
+        return "the keyring could not be asked: the session bus is dead";
     case kCredentialStoreInUse:
         return "the credential store is locked by another process: waited 10 seconds";
     case kCredentialNoHome:
         return "the user has no home folder";
     default:
         return "unknown credential store status " + std::to_string(status);
+    }
+}
+
+bool credentialServiceWasNotAsked(std::int32_t status) {
+    switch (status) {
+    case kCredentialNoBus:
+    case kCredentialFindTimedOut:
+    case kCredentialCreateTimedOut:
+    case kCredentialReadTimedOut:
+    case kCredentialDeleteTimedOut:
+    case kCredentialStartFailed:
+    case kCredentialBusDied:
+        return true;
+    default:
+        return false;
     }
 }
 

@@ -26,16 +26,28 @@ enum CredentialStatus : std::int32_t {
     kCredentialDismissed = 9,         // the user was asked, and refused
     kCredentialPromptUnanswered = 10, // the user was asked, and did not answer in time
     kCredentialNoService = 11,        // no such service runs or can be started
-    kCredentialNoBus = 12,            // there is no session bus, or it has died
+    kCredentialNoBus = 12,            // there is no session bus to ask the service on
     kCredentialTooLarge = 13,         // the secret is larger than the service can take
     kCredentialServiceFailed = 14,    // the service reports a failure of another kind
+    // The service, or its bus, did not answer in time: one for each operation. It may still do what it was
+    // asked for.
+    kCredentialFindTimedOut = 15,
+    kCredentialCreateTimedOut = 16,
+    kCredentialReadTimedOut = 17,
+    kCredentialDeleteTimedOut = 19,
+    kCredentialStartFailed = 20, // the service does not run, and starting it failed
+    kCredentialBusDied = 21,     // nobody answers where the session bus should be, or it has died meanwhile
     // Of a store that is a file:
     kCredentialStoreInUse = 18, // another process of the user holds it, and did not let go of it in time
-    kCredentialNoHome = 22, // the user has no home folder that it could lie in
+    kCredentialNoHome = 22,     // the user has no home folder that it could lie in
 };
 
-// The text of a result code, for people. Any thread.
+// The text of a result code, for people; of a time-out, it says which operation that was. Any thread.
 std::string credentialStatusText(std::int32_t status);
+
+// Whether a result code says that there is a service, or may be one, that could not be asked: what it holds
+// is not known. Any thread.
+bool credentialServiceWasNotAsked(std::int32_t status);
 
 // A program that may read an item without a prompt.
 struct TrustedApplication {
@@ -56,6 +68,9 @@ struct CredentialItem {
     std::string account;
     std::string label;
     std::optional<CredentialAccess> access; // none: the store's default access
+    // When the store last changed the item, in seconds since 1970; 0 where it is not known. The store's own:
+    // createItem() does not look at it.
+    std::int64_t changed = 0;
 };
 
 // The store that an item lies in, for people.
@@ -98,17 +113,19 @@ class CredentialStore {
     // Any thread and any process; may block while another process changes the store.
     virtual std::int32_t createItem(const CredentialItem& item, const std::string& data) = 0;
 
-    // Finds the item with this service and account in the search list.
+    // Finds the item with this service and account in the search list; the newest, where there is more than
+    // one all the same.
     //  data       where to put the secret, or null when it is not wanted
     //  reference  where to put the reference to what was found, or null
-    // Both are written on success only. Any thread.
+    // Both are written on success only. With neither, nobody is asked to unlock anything. Any thread.
     virtual std::int32_t findItem(const std::string& service, const std::string& account, std::string* data,
                                   std::unique_ptr<CredentialItemReference>* reference) = 0;
 
     // Reads everything of an item but its secret. `item` is written on success only. Any thread.
     virtual std::int32_t readAttributes(const CredentialItemReference& reference, CredentialItem& item) = 0;
 
-    // Deletes an item. Any thread.
+    // Deletes an item, and with it every other one that the look-up has found by its service and account. Any
+    // thread.
     virtual std::int32_t deleteItem(const CredentialItemReference& reference) = 0;
 };
 

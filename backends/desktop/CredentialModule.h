@@ -19,6 +19,8 @@ struct CredentialModule {
     struct Arguments {
         // How long a prompt waits for an answer before it is given up.
         std::chrono::nanoseconds promptPatience = std::chrono::minutes(2);
+        // How long one operation may take, without what a person takes to answer.
+        std::chrono::nanoseconds questionLimit = std::chrono::seconds(10);
     };
 };
 

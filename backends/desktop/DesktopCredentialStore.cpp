@@ -1,5 +1,6 @@
 #include "backends/desktop/DesktopCredentialStore.h"
 
+#include "backends/desktop/SecretServiceTraces.h"
 #include "platform/Path.h"
 
 #include <cstdlib>
@@ -11,6 +12,7 @@ namespace welcomer::desktop {
 namespace {
 
 constexpr char kLockName[] = "CredentialSearch"; // not the local store's own, which it takes meanwhile
+constexpr char kNone[] = "none";                 // who serves where a bus cannot be asked
 
 // Empty where it is not set.
 std::string environmentVariable(const char* name) {
@@ -30,27 +32,44 @@ bool mayHaveSessionBus() {
 
 DesktopCredentialStore::DesktopCredentialStore(local::RootFolder root, platform::ProcessIdentity& identity,
                                                platform::CredentialStore& local,
-                                               CredentialModule::Arguments arguments)
+                                               CredentialModule::Arguments arguments,
+                                               SearchListCredentialStore::NewItems newItems)
     : _root(std::move(root)),
       _identity(identity),
       _module(arguments),
-      _store([this] { return mayHaveSessionBus() ? _module.service() : nullptr; }, local,
-             [this] {
-                 // Makes the library folder where it is missing.
-                 const std::vector<std::string> libraries = _identity.userLibraryDirectories();
-                 return libraries.empty()
-                            ? local::FileLock()
-                            : local::FileLock(_root, local::userLockPath(libraries.front(), kLockName));
-             }) {}
+      _store(
+          {[this] { return mayHaveSessionBus() ? _module.service() : nullptr; },
+           [this] {
+               return _isSomewhere();
+           }},
+          local,
+          [this] {
+              // Makes the library folder where it is missing.
+              const std::vector<std::string> libraries = _identity.userLibraryDirectories();
+              return libraries.empty()
+                         ? local::FileLock()
+                         : local::FileLock(_root, local::userLockPath(libraries.front(), kLockName));
+          },
+          newItems) {}
+
+bool DesktopCredentialStore::_isSomewhere() {
+    return _module.isThere() && hasSecretServiceTraces(_root, _identity);
+}
 
 platform::BackendReport DesktopCredentialStore::report() {
     platform::BackendReport report{"CredentialStore", "local file", "", ""};
+    const bool isSomewhere = _isSomewhere();
     if (!mayHaveSessionBus()) {
-        report.reason = "there is no session bus";
+        report.backend = isSomewhere ? kNone : report.backend;
+        report.reason = isSomewhere ? "there is no session bus, so that the keyring cannot be asked"
+                                    : "there is no session bus";
         report.advice = "log in to a desktop session, with a Secret Service such as gnome-keyring";
         return report;
     }
     _module.describe(report);
+    if (report.backend == kNone && !isSomewhere) {
+        report.backend = "local file";
+    }
     return report;
 }
 

@@ -21,15 +21,20 @@ class DesktopCredentialStore {
     //  root      the folder below which the lock is looked up
     //  identity  says where the user's library is; borrowed
     //  local     the local store; borrowed
-    DesktopCredentialStore(local::RootFolder root, platform::ProcessIdentity& identity,
-                           platform::CredentialStore& local, CredentialModule::Arguments arguments = {});
+    DesktopCredentialStore(
+        local::RootFolder root, platform::ProcessIdentity& identity, platform::CredentialStore& local,
+        CredentialModule::Arguments arguments = {},
+        SearchListCredentialStore::NewItems newItems = SearchListCredentialStore::NewItems::ToTheService);
 
     platform::CredentialStore& store() { return _store; }
 
-    // Any thread; may block while the service answers.
+    // Starts no service. Any thread; may block while the service answers.
     platform::BackendReport report();
 
   private:
+    // Whether there is a Secret Service though no bus can be asked (SecretServiceTraces.h).
+    bool _isSomewhere();
+
     const local::RootFolder _root;
     platform::ProcessIdentity& _identity;
     DesktopModule<CredentialModule> _module;

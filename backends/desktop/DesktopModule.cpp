@@ -49,6 +49,10 @@ const char* loadingError() {
 
 } // namespace
 
+bool isModuleInstalled(const std::string& name, const std::string& folder) {
+    return !pathOf(name, folder).empty();
+}
+
 const ModuleEntry* loadModule(const std::string& name, const std::string& folder, std::string& whyNot) {
     const std::string path = pathOf(name, folder);
     if (path.empty()) {

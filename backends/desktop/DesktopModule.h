@@ -19,6 +19,9 @@ namespace welcomer::desktop {
 // Any thread. Loading is what takes time: callers keep the result.
 const ModuleEntry* loadModule(const std::string& name, const std::string& folder, std::string& whyNot);
 
+// Whether the module NAME.so is where loadModule() looks for it. Any thread.
+bool isModuleInstalled(const std::string& name, const std::string& folder);
+
 // One module and its one service. `Module` describes it: kName, Interface and Arguments.
 template <class Module>
 class DesktopModule {
@@ -42,6 +45,12 @@ class DesktopModule {
             }
         }
         return _service.get();
+    }
+
+    // Whether there is a module, as far as is known without loading it. Any thread.
+    bool isThere() {
+        const std::lock_guard lock(_mutex);
+        return _wasLoaded ? _entry != nullptr : isModuleInstalled(Module::kName, _folder);
     }
 
     // Has the module say how it serves now.

@@ -47,10 +47,12 @@ DesktopNetwork::Reachability::createTarget(const std::string& hostName) {
 std::vector<platform::BackendReport> DesktopNetwork::reports() {
     platform::BackendReport config{"NetworkConfigStore", "local file and kernel", "", ""};
     platform::BackendReport state{"NetworkStateStore", "kernel", "", ""};
-    platform::BackendReport reachability{"HostReachability", "name lookup and routes", "", ""};
     _configModule.describe(config);
-    _stateModule.describe(state);
-    _stateModule.describe(reachability);
+    const bool isServed = _stateModule.describe(state);
+    // One module is both; a service that does not answer is waited for once.
+    platform::BackendReport reachability = state;
+    reachability.interface = "HostReachability";
+    reachability.backend = isServed ? state.backend : "name lookup and routes";
     return {config, state, reachability};
 }
 

@@ -20,6 +20,11 @@ PlatformOptions withRunLoops(PlatformOptions options, platform::RunLoops& runLoo
     return options;
 }
 
+SearchListCredentialStore::NewItems newItemsOf(const PlatformOptions& options) {
+    return options.storesCredentialsLocally ? SearchListCredentialStore::NewItems::ToTheLocalStore
+                                            : SearchListCredentialStore::NewItems::ToTheService;
+}
+
 // The local platform with the desktop's services in their places.
 platform::Platform withDesktop(const platform::Platform& local, platform::CredentialStore& credentialStore,
                                platform::PreferenceStore& preferenceStore,
@@ -51,7 +56,7 @@ platform::Platform withDesktop(const platform::Platform& local, platform::Creden
 DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
     : _local(withRunLoops(options, _runLoops)),
       _credentialStore(local::RootFolder(options.root), _local.platform().processIdentity,
-                       _local.platform().credentialStore),
+                       _local.platform().credentialStore, {}, newItemsOf(options)),
       _onlineAccounts(
           {[root = local::RootFolder(options.root), &identity = _local.platform().processIdentity] {
               const std::vector<std::string> libraries = identity.userLibraryDirectories();

@@ -1,32 +1,28 @@
 #include "backends/desktop/SearchListCredentialStore.h"
 
 #include <cerrno>
+#include <vector>
 
 namespace welcomer::desktop {
 
 namespace {
 
-// What one of the stores found.
+// What the stores have found, the newest first.
 class Reference final : public platform::CredentialItemReference {
   public:
-    Reference(platform::CredentialStore& store, std::unique_ptr<platform::CredentialItemReference> item)
-        : _store(store),
-          _item(std::move(item)) {}
+    struct Entry {
+        platform::CredentialStore* store;
+        std::unique_ptr<platform::CredentialItemReference> item;
+    };
 
-    platform::CredentialStoreDescription store() const override { return _item->store(); }
-    platform::CredentialStore& foundBy() const { return _store; }
-    const platform::CredentialItemReference& item() const { return *_item; }
+    explicit Reference(std::vector<Entry> entries) : _entries(std::move(entries)) {}
+
+    platform::CredentialStoreDescription store() const override { return _entries.front().item->store(); }
+    const std::vector<Entry>& entries() const { return _entries; }
 
   private:
-    platform::CredentialStore& _store;
-    const std::unique_ptr<platform::CredentialItemReference> _item;
+    const std::vector<Entry> _entries;
 };
-
-// Whether a status of the service says that there is none, or none with such an item.
-bool leavesItToTheLocalStore(std::int32_t status) {
-    return status == platform::kCredentialItemNotFound || status == platform::kCredentialNoService ||
-           status == platform::kCredentialNoBus;
-}
 
 } // namespace
 
@@ -42,6 +38,40 @@ SearchListCredentialStore::createAccess(const std::string& description,
     return _local.createAccess(description, std::move(trustedApplications), access);
 }
 
+// What one store has found, as far as it was wanted.
+struct SearchListCredentialStore::Found {
+    platform::CredentialStore* store = nullptr;
+    std::string data;
+    std::unique_ptr<platform::CredentialItemReference> reference;
+};
+
+std::int32_t SearchListCredentialStore::_askService(
+    const std::function<std::int32_t(platform::CredentialStore&)>& question) {
+    platform::CredentialStore* const service = _service.store();
+    const std::int32_t status = service ? question(*service) : platform::kCredentialNoBus;
+    const std::lock_guard lock(_mutex);
+    _hasServed = _hasServed || (status != platform::kCredentialNoService &&
+                                !platform::credentialServiceWasNotAsked(status));
+    return status;
+}
+
+// Whether a status says that there is no service at all.
+bool SearchListCredentialStore::_isWithoutService(std::int32_t status) {
+    if (status == platform::kCredentialNoService) {
+        return true;
+    }
+    if (status != platform::kCredentialNoBus && status != platform::kCredentialBusDied) {
+        return false;
+    }
+    {
+        const std::lock_guard lock(_mutex);
+        if (_hasServed) {
+            return false;
+        }
+    }
+    return !_service.isSomewhere();
+}
+
 std::int32_t SearchListCredentialStore::createItem(const platform::CredentialItem& item,
                                                    const std::string& data) {
     const local::FileLock lock = _lock();
@@ -53,66 +83,110 @@ std::int32_t SearchListCredentialStore::createItem(const platform::CredentialIte
     if (_local.findItem(item.service, item.account, nullptr, nullptr) == platform::kCredentialSuccess) {
         return platform::kCredentialDuplicateItem;
     }
-    platform::CredentialStore* const service = _service();
-    const std::int32_t status = service ? service->createItem(item, data) : platform::kCredentialNoService;
-    return leavesItToTheLocalStore(status) ? _local.createItem(item, data) : status;
+    const bool isForService = _newItems == NewItems::ToTheService;
+    const std::int32_t status = _askService([&](platform::CredentialStore& service) {
+        return isForService ? service.createItem(item, data)
+                            : service.findItem(item.service, item.account, nullptr, nullptr);
+    });
+    if (isForService) {
+        return _isWithoutService(status) ? _local.createItem(item, data) : status;
+    }
+    return status == platform::kCredentialSuccess
+               ? static_cast<std::int32_t>(platform::kCredentialDuplicateItem)
+               : _local.createItem(item, data);
 }
 
 std::int32_t
 SearchListCredentialStore::findItem(const std::string& service, const std::string& account, std::string* data,
                                     std::unique_ptr<platform::CredentialItemReference>* reference) {
     const Key key(service, account);
-    if (!data && _wasReadLocally(key) &&
-        _find(&_local, key, nullptr, reference) == platform::kCredentialSuccess) {
-        return platform::kCredentialSuccess;
-    }
-    platform::CredentialStore* const desktop = _service();
-    const std::int32_t status =
-        desktop ? _find(desktop, key, data, reference) : platform::kCredentialNoService;
+    // Which of two is the newest is seen by the references.
+    const bool wantsReference = data || reference;
+    Found local;
+    Found desktop;
+    const std::int32_t localStatus = _look(_local, key, data != nullptr, wantsReference, local);
+    const bool isEnough = localStatus == platform::kCredentialSuccess && !data && _wasReadLocally(key);
+    const std::int32_t status = isEnough
+                                    ? static_cast<std::int32_t>(platform::kCredentialItemNotFound)
+                                    : _askService([&](platform::CredentialStore& store) {
+                                          return _look(store, key, data != nullptr, wantsReference, desktop);
+                                      });
+    std::vector<Found> found;
     if (status == platform::kCredentialSuccess) {
-        return status;
+        found.push_back(std::move(desktop));
     }
-    const std::int32_t localStatus = _find(&_local, key, data, reference);
-    return localStatus == platform::kCredentialSuccess || leavesItToTheLocalStore(status) ? localStatus
-                                                                                          : status;
+    if (localStatus == platform::kCredentialSuccess) {
+        found.push_back(std::move(local));
+    }
+    if (found.empty()) {
+        return status == platform::kCredentialItemNotFound || _isWithoutService(status) ? localStatus
+                                                                                        : status;
+    }
+    if (found.size() == 2 && wantsReference && _changed(found[1]) > _changed(found[0])) {
+        std::swap(found[0], found[1]);
+    }
+    if (data) {
+        *data = std::move(found.front().data);
+        _noteReadLocally(key, status != platform::kCredentialSuccess &&
+                                  status != platform::kCredentialItemNotFound);
+    }
+    if (reference) {
+        std::vector<Reference::Entry> entries;
+        for (Found& each : found) {
+            entries.push_back({each.store, std::move(each.reference)});
+        }
+        *reference = std::make_unique<Reference>(std::move(entries));
+    }
+    return platform::kCredentialSuccess;
 }
 
-std::int32_t SearchListCredentialStore::_find(platform::CredentialStore* store, const Key& key,
-                                              std::string* data,
-                                              std::unique_ptr<platform::CredentialItemReference>* reference) {
-    std::unique_ptr<platform::CredentialItemReference> found;
-    const std::int32_t status = store->findItem(key.first, key.second, data, reference ? &found : nullptr);
-    if (status == platform::kCredentialSuccess) {
-        if (reference) {
-            *reference = std::make_unique<Reference>(*store, std::move(found));
-        }
-        if (data) {
-            _noteRead(key, store);
-        }
-    }
-    return status;
+std::int32_t SearchListCredentialStore::_look(platform::CredentialStore& store, const Key& key,
+                                              bool wantsData, bool wantsReference, Found& found) {
+    found.store = &store;
+    return store.findItem(key.first, key.second, wantsData ? &found.data : nullptr,
+                          wantsReference ? &found.reference : nullptr);
 }
 
-void SearchListCredentialStore::_noteRead(const Key& key, platform::CredentialStore* store) {
+// What cannot be looked at is the oldest.
+std::int64_t SearchListCredentialStore::_changed(const Found& found) {
+    platform::CredentialItem item;
+    return found.store->readAttributes(*found.reference, item) == platform::kCredentialSuccess ? item.changed
+                                                                                               : 0;
+}
+
+void SearchListCredentialStore::_noteReadLocally(const Key& key, bool wasReadLocally) {
     const std::lock_guard lock(_mutex);
-    _readFrom[key] = store;
+    if (wasReadLocally) {
+        _readLocally.insert(key);
+    } else {
+        _readLocally.erase(key);
+    }
 }
 
 bool SearchListCredentialStore::_wasReadLocally(const Key& key) {
     const std::lock_guard lock(_mutex);
-    const auto found = _readFrom.find(key);
-    return found != _readFrom.end() && found->second == &_local;
+    return _readLocally.contains(key);
 }
 
 std::int32_t SearchListCredentialStore::readAttributes(const platform::CredentialItemReference& reference,
                                                        platform::CredentialItem& item) {
-    const auto& found = dynamic_cast<const Reference&>(reference);
-    return found.foundBy().readAttributes(found.item(), item);
+    const auto& found = dynamic_cast<const Reference&>(reference).entries().front();
+    return found.store->readAttributes(*found.item, item);
 }
 
 std::int32_t SearchListCredentialStore::deleteItem(const platform::CredentialItemReference& reference) {
-    const auto& found = dynamic_cast<const Reference&>(reference);
-    return found.foundBy().deleteItem(found.item());
+    std::int32_t result = platform::kCredentialItemNotFound;
+    for (const Reference::Entry& found : dynamic_cast<const Reference&>(reference).entries()) {
+        const std::int32_t status = found.store->deleteItem(*found.item);
+        const bool isFirst = result == platform::kCredentialItemNotFound;
+        const bool isFailure =
+            status != platform::kCredentialSuccess && status != platform::kCredentialItemNotFound;
+        // A failure says that an item is left; what has gone meanwhile is as good as deleted.
+        if (isFirst || (isFailure && result == platform::kCredentialSuccess)) {
+            result = status;
+        }
+    }
+    return result;
 }
 
 } // namespace welcomer::desktop

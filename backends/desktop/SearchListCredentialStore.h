@@ -5,37 +5,53 @@
 #include "backends/local/FileLock.h"
 #include "platform/CredentialStore.h"
 
+#include <cstdint>
 #include <functional>
-#include <map>
+#include <memory>
 #include <mutex>
+#include <set>
 #include <string>
 #include <utility>
 
 namespace welcomer::desktop {
 
-// Without a bus or a service the local store serves alone. Otherwise items are created by the service; they
-// are found in either, the service's first. What the service cannot do for another reason (a locked keyring,
-// a refusal, a secret too large) it says with a status of its own, unless the local store holds the item that
-// is wanted.
+// Where there is no service at all the local store serves alone. Otherwise items are created by the service;
+// they are looked for in both. Where both have one, the newest is read (the service's, when they are of one
+// second), and both are deleted. What the service cannot do (it hangs, it cannot be asked, the keyring is
+// locked, the user refuses, a secret is too large) it says with a status of its own, unless the local store
+// holds the item that is wanted.
 //
 // Creating an item holds a lock of the user, because the service itself replaces silently, or makes a
 // second item: of two writers at once one succeeds, and the other learns of the duplicate.
 class SearchListCredentialStore final : public platform::CredentialStore {
   public:
-    //  service  gives the service's store, borrowed, or null where there is none; asked at each operation
-    //  local    borrowed
-    //  lock     takes the lock of this user; asked when an item is created
-    SearchListCredentialStore(std::function<platform::CredentialStore*()> service,
-                              platform::CredentialStore& local, std::function<local::FileLock()> lock)
+    // What is to be known of the service. Each is asked at every operation that wants it.
+    struct Service {
+        // Its store, borrowed; null where there is no bus to ask it on, or no module for it.
+        std::function<platform::CredentialStore*()> store;
+        // Where nobody could be asked: whether there is a service all the same.
+        std::function<bool()> isSomewhere;
+    };
+
+    // Where new items go.
+    enum class NewItems { ToTheService, ToTheLocalStore };
+
+    //  local  borrowed
+    //  lock   takes the lock of this user; asked when an item is created
+    SearchListCredentialStore(Service service, platform::CredentialStore& local,
+                              std::function<local::FileLock()> lock,
+                              NewItems newItems = NewItems::ToTheService)
         : _service(std::move(service)),
           _local(local),
-          _lock(std::move(lock)) {}
+          _lock(std::move(lock)),
+          _newItems(newItems) {}
 
     std::int32_t createTrustedApplication(const std::string& path,
                                           platform::TrustedApplication& application) override;
     std::int32_t createAccess(const std::string& description,
                               std::vector<platform::TrustedApplication> trustedApplications,
                               platform::CredentialAccess& access) override;
+    // An item for the local store is refused where the service is known to hold it, locked or not.
     std::int32_t createItem(const platform::CredentialItem& item, const std::string& data) override;
     std::int32_t findItem(const std::string& service, const std::string& account, std::string* data,
                           std::unique_ptr<platform::CredentialItemReference>* reference) override;
@@ -45,19 +61,27 @@ class SearchListCredentialStore final : public platform::CredentialStore {
 
   private:
     using Key = std::pair<std::string, std::string>; // service and account
+    struct Found;
 
-    std::int32_t _find(platform::CredentialStore* store, const Key& key, std::string* data,
-                       std::unique_ptr<platform::CredentialItemReference>* reference);
-    void _noteRead(const Key& key, platform::CredentialStore* store);
+    // What the service says, or why it cannot be asked.
+    std::int32_t _askService(const std::function<std::int32_t(platform::CredentialStore&)>& question);
+    bool _isWithoutService(std::int32_t status);
+    static std::int32_t _look(platform::CredentialStore& store, const Key& key, bool wantsData,
+                              bool wantsReference, Found& found);
+    static std::int64_t _changed(const Found& found);
+    void _noteReadLocally(const Key& key, bool wasReadLocally);
     bool _wasReadLocally(const Key& key);
 
-    const std::function<platform::CredentialStore*()> _service;
+    const Service _service;
     platform::CredentialStore& _local;
     const std::function<local::FileLock()> _lock;
+    const NewItems _newItems;
     std::mutex _mutex;
-    // Where each item's secret was last read: what is then looked up to be deleted is that item, and no
-    // other.
-    std::map<Key, platform::CredentialStore*> _readFrom;
+    // Whether the service has ever answered: then it does not stop to exist.
+    bool _hasServed = false;
+    // Whose secret was last read in the local store because the service could not tell: what is then looked
+    // up to be deleted is that item, and the service is not asked again.
+    std::set<Key> _readLocally;
 };
 
 } // namespace welcomer::desktop

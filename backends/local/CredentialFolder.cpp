@@ -84,8 +84,9 @@ std::int32_t CredentialFolder::lock(const RootFolder& root, const std::string& p
     return platform::kCredentialSuccess;
 }
 
-std::int32_t CredentialFolder::load(PropertyList::Array& items) const {
+std::int32_t CredentialFolder::load(PropertyList::Array& items) {
     items.clear();
+    _changed = 0;
     // A pipe must not block.
     const FileDescriptor file(
         ::openat(_folder.get(), kFileName, O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK));
@@ -102,6 +103,7 @@ std::int32_t CredentialFolder::load(PropertyList::Array& items) const {
     if (!S_ISREG(status.st_mode) || !isOwn(status)) {
         return platform::kCredentialStoreUnsafe;
     }
+    _changed = status.st_mtim.tv_sec;
     std::string bytes;
     if (readAll(file.get(), bytes) != 0) {
         return platform::kCredentialReadFailed;

@@ -29,7 +29,10 @@ class CredentialFolder {
     // understand.
     //  result  success with no items when there is no file; kCredentialStoreDamaged, kCredentialStoreUnsafe,
     //          kCredentialReadFailed
-    std::int32_t load(PropertyList::Array& items) const;
+    std::int32_t load(PropertyList::Array& items);
+
+    // When the loaded file was last changed, in seconds since 1970; 0 when there was none.
+    std::int64_t changed() const { return _changed; }
 
     // Replaces the items, all or nothing; without any, the file goes. Only after lock().
     //  result  kCredentialWriteFailed
@@ -38,6 +41,7 @@ class CredentialFolder {
   private:
     FileDescriptor _folder;
     FileLock _lock;
+    std::int64_t _changed = 0;
 };
 
 // Whether the file of the folder at a path is certainly absent: a single system call where the root is "/".

@@ -63,8 +63,9 @@ std::int32_t openOrMake(CredentialFolder& folder, const RootFolder& root, const 
 }
 
 // Copies the one item out of the store at a path.
+//  changed  when its file was last changed
 std::int32_t readItem(const RootFolder& root, const std::string& folderPath, const std::string& service,
-                      const std::string& account, PropertyList& item) {
+                      const std::string& account, PropertyList& item, std::int64_t& changed) {
     if (credentialFileIsAbsent(root, folderPath)) {
         return platform::kCredentialItemNotFound;
     }
@@ -82,6 +83,7 @@ std::int32_t readItem(const RootFolder& root, const std::string& folderPath, con
         return platform::kCredentialItemNotFound;
     }
     item = std::move(*found);
+    changed = folder.changed();
     return platform::kCredentialSuccess;
 }
 
@@ -154,7 +156,8 @@ std::int32_t LocalCredentialStore::findItem(const std::string& service, const st
         return platform::kCredentialNoHome;
     }
     PropertyList item;
-    const std::int32_t status = readItem(_root, _folderPath(), service, account, item);
+    std::int64_t changed = 0;
+    const std::int32_t status = readItem(_root, _folderPath(), service, account, item, changed);
     if (status != platform::kCredentialSuccess) {
         return status;
     }
@@ -171,9 +174,11 @@ std::int32_t LocalCredentialStore::readAttributes(const platform::CredentialItem
                                                   platform::CredentialItem& item) {
     const auto& key = dynamic_cast<const Reference&>(reference);
     PropertyList stored;
-    const std::int32_t status = readItem(_root, _folderPath(), key.service(), key.account(), stored);
+    std::int64_t changed = 0;
+    const std::int32_t status = readItem(_root, _folderPath(), key.service(), key.account(), stored, changed);
     if (status == platform::kCredentialSuccess) {
         item = credentialItemAttributes(stored);
+        item.changed = changed;
     }
     return status;
 }

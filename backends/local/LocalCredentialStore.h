@@ -16,8 +16,8 @@ namespace welcomer::local {
 // The folder and the file are used only when they are the user's own, no symbolic links, and writable by
 // nobody else. Writers take the folder's lock (FileLock.h) and replace the file in one step; readers take no
 // lock. A file that cannot be read as what it should be is never written again, until somebody removes it.
-// Deleting the last item removes the file. Looking up an item in a store that does not exist makes one system
-// call where the root is "/".
+// Deleting the last item removes the file. All items have one time, the file's. Looking up an item in a store
+// that does not exist makes one system call where the root is "/".
 class LocalCredentialStore final : public platform::CredentialStore {
   public:
     // Borrows the identity, which must outlive the store.

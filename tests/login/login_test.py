@@ -45,10 +45,11 @@ class Story:
     """One machine, from its installation to the end of the login after the setup. A subclass says what is different."""
 
     delays = AT_ONCE
+    with_keyring = True
 
     def __init__(self):
         self.folder = Path(tempfile.mkdtemp(prefix="login-"))
-        self.machine = machine.Machine(self.folder / "machine")
+        self.machine = machine.Machine(self.folder / "machine", self.with_keyring)
         self.daemons = []
 
     def run(self):
@@ -258,11 +259,12 @@ class LockedForGood(Locked):
 class WithoutKeyring(Story):
     """No Secret Service, no online accounts: a bus, and nobody on it."""
 
+    with_keyring = False
+
     def __init__(self):
         super().__init__()
-        for name in (SECRETS, ONLINE_ACCOUNTS):
-            machine.mount("/dev/null", self.machine.root / f"usr/share/dbus-1/services/{name}.service", None,
-                          machine.MS_BIND)
+        machine.mount("/dev/null", self.machine.root / f"usr/share/dbus-1/services/{ONLINE_ACCOUNTS}.service", None,
+                      machine.MS_BIND)
 
     def prepare_setup(self, login):
         pass

@@ -103,6 +103,7 @@ bool Daemon::waitForLine(const std::string& text) {
 void Daemon::stop() {
     if (_process > 0) {
         ::kill(_process, SIGTERM);
+        ::kill(_process, SIGCONT);
         ::waitpid(_process, nullptr, 0);
         ::close(_output);
         _process = -1;
@@ -114,6 +115,10 @@ void Daemon::kill() {
         ::kill(_process, SIGKILL);
     }
     stop();
+}
+
+void Daemon::hold(bool isHeld) const {
+    ::kill(_process, isHeld ? SIGSTOP : SIGCONT);
 }
 
 KeyringSession::KeyringSession() {

@@ -29,6 +29,8 @@ class Daemon {
     bool waitForLine(const std::string& text);
     void stop();
     void kill();
+    // Has it hang (SIGSTOP), or lets it go on.
+    void hold(bool isHeld) const;
 
   private:
     pid_t _process = -1;
@@ -61,6 +63,9 @@ class KeyringSession {
     // The keyring ends, as at a logout, or without a word. It may be started again.
     void stopKeyring() { _keyring.stop(); }
     void killKeyring() { _keyring.kill(); }
+    // The keyring, or the bus, hangs, or goes on.
+    void holdKeyring(bool isHeld) const { _keyring.hold(isHeld); }
+    void holdBus(bool isHeld) const { _bus.hold(isHeld); }
 
     static constexpr const char* kPassword = "the keyring's password";
 

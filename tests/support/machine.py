@@ -48,7 +48,8 @@ def unmount(target):
 class Machine:
     """A root folder on a tmpfs. Programs and libraries are this machine's own; everything else is fresh."""
 
-    def __init__(self, folder):
+    def __init__(self, folder, with_keyring=False):
+        """with_keyring: whether a session bus can start this machine's Secret Service."""
         self.root = Path(folder)
         self.root.mkdir(parents=True, exist_ok=True)
         mount("tmpfs", self.root, "tmpfs")
@@ -63,6 +64,9 @@ class Machine:
             path = self.root / "dev" / name
             os.mknod(path, 0o020666, os.makedev(1, minor))
             path.chmod(0o666)
+        secrets = self.root / "usr/share/dbus-1/services/org.freedesktop.secrets.service"
+        if not with_keyring and secrets.exists():
+            mount("/dev/null", secrets, None, MS_BIND)
         self._write("etc/passwd", f"root:x:0:0:root:/root:/bin/sh\n{USER}:x:{UID}:{UID}::/home/{USER}:/bin/sh\n")
         self._write("etc/group", f"root:x:0:\n{USER}:x:{UID}:\n")
         self._write("etc/nsswitch.conf", "passwd: files\ngroup: files\nhosts: files\n")

@@ -20,6 +20,7 @@ struct PlatformRequest {
     platform::HostReachability* hostReachability =
         nullptr;                                        // in place of the machine's own, or null; borrowed
     platform::DispatchQueues* dispatchQueues = nullptr; // the same; not with simulated time
+    bool storesCredentialsLocally = false; // new credentials go to the local store, whatever keyring there is
     // Where to put how each interface is served, or null; asks the services, and may block. Borrowed.
     std::vector<platform::BackendReport>* backendReports = nullptr;
 };

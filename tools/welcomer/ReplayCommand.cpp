@@ -52,7 +52,7 @@ void store(Session& session, const StoreArguments& arguments) {
     if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(arguments.account, replayObject,
                                                                       *bundle)) {
         throw CommandFailure("cannot store the replay item and install the agent: " +
-                             replayReason(session.log));
+                             storingReason(session.log));
     }
     if (session.options.json) {
         printJson(session.out, {{"account", arguments.account}, {"stored", true}});
@@ -123,6 +123,7 @@ void addStore(CommandLine& commandLine, CLI::App& group) {
             "The setup application's bundle; like every path of the system it is looked up below --root")
         ->type_name("DIR")
         ->required();
+    commandLine.addLocalOption(command);
 }
 
 } // namespace

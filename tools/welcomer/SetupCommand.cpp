@@ -305,7 +305,7 @@ void setUp(Session& session, const SetupArguments& arguments) {
                              (session.options.rootGiven ? " below " + session.options.root : "") +
                              " (see --bundle)");
     }
-    SetupFlow::checkNothingIsWaiting();
+    SetupFlow::checkNothingIsWaiting(session.options.storesLocally);
 
     SetupFlow flow(session.log, session.out, !session.options.verbose);
     Decisions decisions;
@@ -353,6 +353,7 @@ void addSetupCommand(CommandLine& commandLine) {
                                 "with the tool; below --root ") +
                         kSetupBundlePath + "]")
         ->type_name("DIR");
+    commandLine.addLocalOption(command);
 }
 
 } // namespace welcomer::tool

@@ -77,12 +77,16 @@ void SetupFlow::checkWhoIsLoggedIn(const std::string& account) {
     }
 }
 
-void SetupFlow::checkNothingIsWaiting() {
+void SetupFlow::checkNothingIsWaiting(bool storesLocally) {
     const platform::Platform& platform = platform::current();
-    std::unique_ptr<platform::CredentialItemReference> reference;
-    if (platform.credentialStore.findItem(kReplayItemService, kReplayItemAccount, nullptr, &reference) ==
-        platform::kCredentialSuccess) {
+    const std::int32_t status =
+        platform.credentialStore.findItem(kReplayItemService, kReplayItemAccount, nullptr, nullptr);
+    if (status == platform::kCredentialSuccess) {
         throw CommandFailure("a replay item is waiting for the next login already (see welcomer replay)");
+    }
+    if (status != platform::kCredentialItemNotFound && !storesLocally) {
+        throw CommandFailure("cannot tell whether a replay item is waiting for the next login already: " +
+                             platform::credentialStatusText(status) + storingAdvice(status));
     }
     const std::string agent =
         platform::joinPath(platform.processIdentity.homeDirectory(),
@@ -155,7 +159,7 @@ void SetupFlow::complete(const std::vector<std::string>& services, bool justTheA
 void SetupFlow::handOver(const ChosenAliases& aliases, platform::ResourceBundle& bundle) {
     if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(_account, _replayObject(aliases),
                                                                       bundle)) {
-        throw CommandFailure("cannot hand over to the next login: " + replayReason(_log));
+        throw CommandFailure("cannot hand over to the next login: " + storingReason(_log));
     }
     WLCallTesselFinishedSetup();
 }

@@ -65,8 +65,9 @@ class SetupFlow {
     // the one for the other.
     static void checkWhoIsLoggedIn(const std::string& account);
 
-    // Refuses to begin where a hand-over is waiting already.
-    static void checkNothingIsWaiting();
+    // Refuses to begin where a hand-over is waiting already, or where that cannot be told.
+    //  storesLocally  what the keyring does not tell is no obstacle then
+    static void checkNothingIsWaiting(bool storesLocally);
 
     // Has the server check the password and ask each delegate. Throws SignInFailure. May be called again
     // after that.

@@ -120,7 +120,9 @@ class DamageReport {
 int runCommand(const Command& command, const Options& options, const PlatformFactory& buildPlatform) {
     KeptLog log;
     log.setVerbose(options.verbose);
-    const PlatformHandle platform = buildPlatform({options.root, &log, false});
+    PlatformRequest request{options.root, &log};
+    request.storesCredentialsLocally = options.storesLocally;
+    const PlatformHandle platform = buildPlatform(request);
     const platform::ScopedPlatform installed(*platform);
     const DamageReport damageReport(platform->preferenceStore);
     Session session{options, buildPlatform, log, std::cout};
@@ -157,6 +159,12 @@ CLI::App& CommandLine::addCommand(CLI::App& group, const std::string& name, cons
     return added;
 }
 
+void CommandLine::addLocalOption(CLI::App& command) {
+    command.add_flag("--local", _options.storesLocally,
+                     "Store the replay item in the user's local file, whatever keyring there is; the agent "
+                     "finds it there");
+}
+
 int runTool(int argc, char** argv, const PlatformFactory& buildPlatform) {
     CLI::App app(
         "Finishes a user's cloud-account setup after the first login: looks at it, tries it, prepares it.",
@@ -167,7 +175,7 @@ int runTool(int argc, char** argv, const PlatformFactory& buildPlatform) {
                "Exit status: 0 done, 1 failed, 2 the command line makes no sense.");
     Options options;
     addGlobalOptions(app, options);
-    CommandLine commandLine(app);
+    CommandLine commandLine(app, options);
     for (const CommandAdder& commands : kCommands) {
         commandLine.setNeedsHome(commands.needsHome);
         commands.add(commandLine);

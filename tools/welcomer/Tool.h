@@ -26,6 +26,7 @@ struct Options {
     bool rootGiven = false;
     bool json = false;
     bool verbose = false;
+    bool storesLocally = false; // what `--local` asks for, of the commands that have it
 };
 
 // What a command works with. The platform for the chosen root is installed while it runs.
@@ -54,7 +55,8 @@ class UsageError : public std::runtime_error {
 // What a command registers itself with: the command line being built, and the place for the chosen command.
 class CommandLine {
   public:
-    explicit CommandLine(CLI::App& app) : _app(app) {}
+    //  options  where the options for every command are put; borrowed
+    CommandLine(CLI::App& app, Options& options) : _app(app), _options(options) {}
 
     // A group of commands, such as `replay`: it is called with one of the commands below it.
     CLI::App& addGroup(const std::string& name, const std::string& description);
@@ -70,12 +72,16 @@ class CommandLine {
     // line that says so.
     void setNeedsHome(bool needsHome) { _needsHome = needsHome; }
 
+    // Gives a command the option `--local`, which has the platform store new credentials in the local store.
+    void addLocalOption(CLI::App& command);
+
     // The command that the arguments chose, with its full name.
     const Command& chosen() const { return _chosen; }
     const std::string& chosenName() const { return _chosenName; }
 
   private:
     CLI::App& _app;
+    Options& _options;
     bool _needsHome = false;
     Command _chosen;
     std::string _chosenName;

@@ -22,6 +22,7 @@ tool::PlatformHandle build(const tool::PlatformRequest& request) {
     PlatformOptions options{.root = request.root, .systemLog = request.systemLog};
     options.hostReachability = request.hostReachability;
     options.dispatchQueues = request.dispatchQueues;
+    options.storesCredentialsLocally = request.storesCredentialsLocally;
     options.mainBundle = tool::findToolBundle();
     if (request.simulatedTime) {
         owned->simulatedTime = std::make_unique<VirtualTime>(VirtualTime::OutstandingWork::OnRealThreads);

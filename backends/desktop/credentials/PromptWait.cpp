@@ -16,6 +16,7 @@ guint milliseconds(std::chrono::nanoseconds duration) {
 struct PromptWait::State {
     GMainContext* context = g_main_context_new();
     ObjectPointer<GAsyncResult> result;
+    ObjectPointer<GCancellable> cancellable; // made where it is wanted
     std::chrono::nanoseconds patience{};
     bool isGivenUp = false;
     int references = 1; // one of the wait, one of the call
@@ -58,6 +59,11 @@ gpointer PromptWait::argument() const {
     return _state;
 }
 
+GCancellable* PromptWait::cancellable() {
+    _state->cancellable.reset(g_cancellable_new());
+    return _state->cancellable.get();
+}
+
 void PromptWait::done(GObject* /*source*/, GAsyncResult* result, gpointer wait) {
     auto* const state = static_cast<State*>(wait);
     state->result.reset(static_cast<GAsyncResult*>(g_object_ref(result)));
@@ -68,6 +74,13 @@ GAsyncResult* PromptWait::wait() {
     _state->attach(_state->patience, State::giveUp);
     while (!_state->result && !_state->isGivenUp) {
         g_main_context_iteration(_state->context, TRUE);
+    }
+    if (!_state->result && _state->cancellable) {
+        g_cancellable_cancel(_state->cancellable.get());
+        while (!_state->result) {
+            g_main_context_iteration(_state->context, TRUE);
+        }
+        _state->result.reset();
     }
     return _state->result.get();
 }

@@ -11,9 +11,10 @@ namespace welcomer::desktop {
 // Runs one asynchronous call on a main context of its own, and gives it up when nobody answers. One call, one
 // thread.
 //
-// A call that is given up is left as it is, and so is its prompt, which goes with this process at the latest:
-// gnome-keyring (42) ends with a failed assertion when somebody dismisses a prompt to unlock, and with it all
-// that other programs have unlocked.
+// A prompt that is given up is left as it is, and goes with this process at the latest: gnome-keyring (42)
+// ends with a failed assertion when somebody dismisses a prompt to unlock, and with it all that other
+// programs have unlocked. A call that asks nobody anything takes cancellable(), and is then ended when it is
+// given up.
 class PromptWait {
   public:
     explicit PromptWait(std::chrono::nanoseconds patience);
@@ -24,6 +25,7 @@ class PromptWait {
     // What the asynchronous call takes.
     static void done(GObject* source, GAsyncResult* result, gpointer wait);
     gpointer argument() const;
+    GCancellable* cancellable();
 
     // Waits for the call.
     //  result  its result, borrowed; null when it had to be given up without one

@@ -3,9 +3,8 @@
 #pragma once
 
 #include "backends/desktop/CredentialModule.h"
-#include "backends/desktop/credentials/LibSecret.h"
+#include "backends/desktop/credentials/SecretServiceQuestion.h"
 #include "backends/desktop/credentials/SessionBus.h"
-#include "platform/BackendReport.h"
 
 #include <mutex>
 #include <string>
@@ -21,12 +20,18 @@ namespace welcomer::desktop {
 // A plain look-up of the service reports a locked item like a missing one: here items are searched for, and
 // then unlocked, which may ask the user. A prompt that nobody answers is given up after a while.
 //
-// Nothing of the service is kept from one operation to the next, nor in a reference but the item's path: the
-// service may end and be started anew in between.
+// Each operation, with everything that it asks, is over after ten seconds; what a person takes to answer is
+// not counted. Of several items with one service and account, which another program may have made, the newest
+// is read (an unlocked one before those that are locked), and all are deleted.
+//
+// Nothing of the service is kept from one operation to the next, nor in a reference but the item's path and
+// its key: the service may end and be started anew in between.
 //
 // Statuses, besides those of every store: kCredentialLocked, kCredentialDismissed,
-// kCredentialPromptUnanswered, kCredentialNoService, kCredentialNoBus, kCredentialTooLarge (more than
-// kLargestSecret bytes), kCredentialServiceFailed. Any thread; operations are done one after the other.
+// kCredentialPromptUnanswered, kCredentialNoService (nobody has its name, and the bus knows of nothing to
+// start for it), kCredentialStartFailed, kCredentialBusDied, kCredentialTooLarge (more than kLargestSecret
+// bytes), kCredentialServiceFailed, and each operation's time-out. Any thread; operations are done one after
+// the other.
 class SecretServiceStore final : public platform::CredentialStore {
   public:
     explicit SecretServiceStore(CredentialModule::Arguments arguments) : _arguments(arguments) {}
@@ -45,22 +50,9 @@ class SecretServiceStore final : public platform::CredentialStore {
                                 platform::CredentialItem& item) override;
     std::int32_t deleteItem(const platform::CredentialItemReference& reference) override;
 
-    // In what state the keyring is: asks the service, never the user. Any thread.
-    //  result  whether the service serves
-    bool describe(platform::BackendReport& report);
-
   private:
-    struct SearchResult {
-        std::string path; // of the first item that is not locked, else of the first one
-        bool isLocked = false;
-    };
-
-    // All with _mutex held, and with the status of what failed.
-    static std::int32_t _search(GDBusConnection* connection, const std::string& service,
-                                const std::string& account, SearchResult& result);
-    std::int32_t _defaultCollection(GDBusConnection* connection, SecretService* library, std::string& path);
-    std::int32_t _unlock(SecretService* library, const std::string& path);
-    std::int32_t _refusal(const class PromptWait& wait, const GError* error);
+    // For one operation, with _mutex held.
+    SecretServiceQuestion _question();
 
     const CredentialModule::Arguments _arguments;
     std::mutex _mutex;

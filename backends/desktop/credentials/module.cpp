@@ -1,5 +1,6 @@
 #include "backends/desktop/CredentialModule.h"
 #include "backends/desktop/ModuleEntry.h"
+#include "backends/desktop/credentials/SecretServiceReport.h"
 #include "backends/desktop/credentials/SecretServiceStore.h"
 
 namespace welcomer::desktop {
@@ -12,8 +13,9 @@ std::unique_ptr<platform::CredentialStore> createCredentialStore(const Credentia
     return std::make_unique<SecretServiceStore>(arguments);
 }
 
-bool describeCredentialStore(const CredentialModule::Arguments& arguments, platform::BackendReport& report) {
-    return SecretServiceStore(arguments).describe(report);
+bool describeCredentialStore(const CredentialModule::Arguments& /*arguments*/,
+                             platform::BackendReport& report) {
+    return reportSecretService(report);
 }
 
 } // namespace

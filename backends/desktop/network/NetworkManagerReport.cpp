@@ -6,6 +6,13 @@
 
 namespace welcomer::desktop {
 
+namespace {
+
+// What takes longer does not answer.
+constexpr std::chrono::milliseconds kLimit{5'000};
+
+} // namespace
+
 bool reportNetworkManager(platform::BackendReport& report) {
     const auto bus = NetworkManagerBus::open();
     if (!bus) {
@@ -13,9 +20,19 @@ bool reportNetworkManager(platform::BackendReport& report) {
         report.advice = "start NetworkManager, where it is to have the network";
         return false;
     }
-    const std::string version = bus->properties(NM_DBUS_PATH, NM_DBUS_INTERFACE).text("Version");
     report.backend = "NetworkManager";
-    report.reason = "NetworkManager " + version + " runs";
+    const NetworkManagerReply reply = bus->call(NM_DBUS_PATH, "org.freedesktop.DBus.Properties", "Get",
+                                                g_variant_new("(ss)", NM_DBUS_INTERFACE, "Version"), kLimit);
+    if (!reply || !g_variant_is_of_type(reply.value.get(), G_VARIANT_TYPE("(v)"))) {
+        report.reason = "NetworkManager runs, does not answer";
+        report.advice = "start NetworkManager anew";
+        return true;
+    }
+    const VariantPointer boxed(g_variant_get_child_value(reply.value.get(), 0));
+    const VariantPointer version(g_variant_get_variant(boxed.get()));
+    const bool isText = g_variant_is_of_type(version.get(), G_VARIANT_TYPE_STRING) != FALSE;
+    report.reason =
+        "NetworkManager " + std::string(isText ? g_variant_get_string(version.get(), nullptr) : "") + " runs";
     return true;
 }
 

@@ -1,5 +1,7 @@
 #include "backends/desktop/onlineaccounts/GoaOnlineAccounts.h"
 
+#include "backends/desktop/BusName.h"
+
 #include <algorithm>
 #include <array>
 #include <utility>
@@ -158,6 +160,25 @@ std::string presentation(const NewOnlineAccount& account) {
 }
 
 } // namespace
+
+GoaOnlineAccounts::Daemon GoaOnlineAccounts::look() {
+    const Connection bus = _connection();
+    const BusName name = bus ? lookAtBusName(bus.get(), kBusName, kReportMilliseconds) : BusName::Unknown;
+    switch (name) {
+    case BusName::Unknown:
+        return Daemon::WithoutBus;
+    case BusName::Nobody:
+        return Daemon::Absent;
+    case BusName::Startable:
+        return Daemon::Startable;
+    case BusName::Owned:
+        break;
+    }
+    const VariantPointer answer(g_dbus_connection_call_sync(
+        bus.get(), kBusName, kObjectManagerPath, "org.freedesktop.DBus.ObjectManager", "GetManagedObjects",
+        nullptr, nullptr, G_DBUS_CALL_FLAGS_NO_AUTO_START, kReportMilliseconds, nullptr, nullptr));
+    return answer ? Daemon::Answers : Daemon::Silent;
+}
 
 std::optional<std::vector<OnlineAccount>> GoaOnlineAccounts::list() {
     const Connection bus = _connection();

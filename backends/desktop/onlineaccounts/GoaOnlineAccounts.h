@@ -25,6 +25,13 @@ class GoaOnlineAccounts final : public OnlineAccounts {
     //  lock  keeps the user's other processes out, asked when an account is to be made
     explicit GoaOnlineAccounts(std::function<local::FileLock()> lock) : _lock(std::move(lock)) {}
 
+    // In what state the daemon is.
+    enum class Daemon { WithoutBus, Absent, Startable, Silent, Answers };
+
+    // Looks at the daemon without starting it. One that has not answered after five seconds is silent. Any
+    // thread.
+    Daemon look();
+
     std::optional<std::vector<OnlineAccount>> list() override;
     bool setFeature(const OnlineAccount& account, OnlineFeature feature, bool isOn) override;
     bool makeOnce(const NewOnlineAccount& account) override;

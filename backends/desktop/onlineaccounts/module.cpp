@@ -12,18 +12,39 @@ std::unique_ptr<OnlineAccounts> createOnlineAccounts(const OnlineAccountsModule:
     return std::make_unique<GoaOnlineAccounts>(arguments.lock);
 }
 
+// What a daemon that answers has to say.
+void describeAnswer(GoaOnlineAccounts& onlineAccounts, platform::BackendReport& report) {
+    const auto accounts = onlineAccounts.list();
+    const std::size_t count = accounts ? accounts->size() : 0;
+    report.reason = "its daemon answers, with " + std::to_string(count) +
+                    (count == 1 ? " account" : " accounts") +
+                    "; what they have no switch for is kept in the account file";
+}
+
 bool describeOnlineAccounts(const OnlineAccountsModule::Arguments& arguments,
                             platform::BackendReport& report) {
-    const auto accounts = GoaOnlineAccounts(arguments.lock).list();
-    if (!accounts) {
-        report.reason = "no daemon of GNOME Online Accounts answers on the session bus";
+    GoaOnlineAccounts onlineAccounts(arguments.lock);
+    const GoaOnlineAccounts::Daemon daemon = onlineAccounts.look();
+    switch (daemon) {
+    case GoaOnlineAccounts::Daemon::WithoutBus:
+    case GoaOnlineAccounts::Daemon::Absent:
+        report.reason = daemon == GoaOnlineAccounts::Daemon::Absent
+                            ? "no daemon of GNOME Online Accounts runs or can be started"
+                            : "no session bus answers";
         report.advice = "install gnome-online-accounts, and run within a desktop session";
         return false;
+    case GoaOnlineAccounts::Daemon::Startable:
+        report.reason = "its daemon does not run; the session bus starts it when it is needed";
+        break;
+    case GoaOnlineAccounts::Daemon::Silent:
+        report.reason = "its daemon runs, does not answer";
+        report.advice = "end goa-daemon; the session bus starts it anew";
+        break;
+    case GoaOnlineAccounts::Daemon::Answers:
+        describeAnswer(onlineAccounts, report);
+        break;
     }
     report.backend = "GNOME Online Accounts";
-    report.reason = "its daemon answers, with " + std::to_string(accounts->size()) +
-                    (accounts->size() == 1 ? " account" : " accounts") +
-                    "; what they have no switch for is kept in the account file";
     return true;
 }
 

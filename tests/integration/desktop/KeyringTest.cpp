@@ -18,10 +18,11 @@ using namespace std::chrono_literals;
 
 // A user's credential store, and what it stands on.
 struct UsersCredentials {
-    explicit UsersCredentials(const TemporaryRoot& folder, std::chrono::nanoseconds patience = 120s)
+    explicit UsersCredentials(const TemporaryRoot& folder, std::chrono::nanoseconds patience = 120s,
+                              std::chrono::nanoseconds limit = 60s)
         : root(folder.path()),
           local(root, identity),
-          desktop(root, identity, local, {patience}) {
+          desktop(root, identity, local, {patience, limit}) {
         folder.addDirectory("/home/user/Library");
     }
 
@@ -197,6 +198,60 @@ TEST(CredentialModuleTest, APromptIsGivenUpAfterTwoMinutes) {
     EXPECT_EQ(desktop::CredentialModule::Arguments().promptPatience, 2min);
 }
 
+TEST(CredentialModuleTest, AQuestionIsOverAfterTenSeconds) {
+    EXPECT_EQ(desktop::CredentialModule::Arguments().questionLimit, 10s);
+}
+
+TEST_F(KeyringTest, AKeyringThatHangsIsATimeOutOfEachOperation) {
+    session.startKeyring();
+    ASSERT_EQ(create("the secret"), 0);
+    ASSERT_EQ(read(), 0);
+    session.holdKeyring(true);
+    // Its prompts would wait for two minutes.
+    UsersCredentials hasty(root, 120s, 300ms);
+    platform::CredentialStore& store = hasty.desktop.store();
+    data = "untouched";
+    std::unique_ptr<platform::CredentialItemReference> found;
+    EXPECT_EQ(store.findItem("service", "account", &data, &found), platform::kCredentialFindTimedOut);
+    EXPECT_EQ(data, "untouched");
+    EXPECT_EQ(found, nullptr);
+    EXPECT_EQ(store.createItem(kItem, "another"), platform::kCredentialCreateTimedOut);
+    platform::CredentialItem item{"untouched", "", "", {}};
+    EXPECT_EQ(store.readAttributes(*reference, item), platform::kCredentialReadTimedOut);
+    EXPECT_EQ(item.service, "untouched");
+    EXPECT_EQ(store.deleteItem(*reference), platform::kCredentialDeleteTimedOut);
+    EXPECT_EQ(hasty.local.findItem("service", "account", nullptr, nullptr),
+              platform::kCredentialItemNotFound);
+    session.holdKeyring(false);
+}
+
+TEST_F(KeyringTest, ABusThatHangsIsATimeOut) {
+    session.startKeyring();
+    session.holdBus(true);
+    const pid_t reader = ::fork();
+    if (reader == 0) {
+        // Nothing of GLib has been used in this process so far.
+        UsersCredentials own(root, 120s, 300ms);
+        ::_exit(own.desktop.store().findItem("service", "account", &data, nullptr));
+    }
+    int status = -1;
+    EXPECT_EQ(::waitpid(reader, &status, 0), reader);
+    session.holdBus(false);
+    ASSERT_TRUE(WIFEXITED(status));
+    EXPECT_EQ(WEXITSTATUS(status), platform::kCredentialFindTimedOut);
+}
+
+// The prompt's own time is not counted.
+TEST_F(KeyringTest, APersonMayTakeLongerThanAQuestion) {
+    session.startKeyring();
+    ASSERT_EQ(create("the secret"), 0);
+    session.lockKeyring();
+    Daemon prompter = session.startPrompter("silent");
+    UsersCredentials store(root, 5s, 2s);
+    EXPECT_EQ(store.desktop.store().findItem("service", "account", &data, &reference),
+              platform::kCredentialPromptUnanswered);
+}
+
 TEST_F(KeyringTest, ShowingTheReplayItemSaysThatTheKeyringDoesNotEnforceItsAccess) {
     session.startKeyring();
     platform::CredentialItem item{"Welcomer Nimbus Replay Data", "Welcomer", "a user",
@@ -321,10 +376,23 @@ TEST_F(KeyringTest, AnAddressWhereNoBusAnswersIsNoBus) {
     ::setenv("DBUS_SESSION_BUS_ADDRESS", "unix:path=/nonexistent/bus", 1);
     EXPECT_EQ(create("the secret"), 0);
     EXPECT_EQ(readLocally(), 0);
-    EXPECT_EQ(credentials.desktop.report().reason, "the session bus does not answer");
+    const platform::BackendReport report = credentials.desktop.report();
+    EXPECT_EQ(report.backend, "local file");
+    EXPECT_EQ(report.reason, "the session bus is dead, so that the keyring cannot be asked");
 }
 
-TEST_F(KeyringTest, TheProcessOutlivesTheBusAndTheLocalStoreTakesOver) {
+TEST_F(KeyringTest, WithAKeyringsFileNoBusLeavesOpenWhatTheKeyringHolds) {
+    root.addFile("/home/user/.local/share/keyrings/login.keyring", "a keyring");
+    ::unsetenv("DBUS_SESSION_BUS_ADDRESS");
+    EXPECT_EQ(read(), platform::kCredentialNoBus);
+    EXPECT_EQ(create("the secret"), platform::kCredentialNoBus);
+    ::setenv("DBUS_SESSION_BUS_ADDRESS", "unix:path=/nonexistent/bus", 1);
+    EXPECT_EQ(read(), platform::kCredentialBusDied);
+    EXPECT_EQ(create("the secret"), platform::kCredentialBusDied);
+    EXPECT_EQ(readLocally(), platform::kCredentialItemNotFound);
+}
+
+TEST_F(KeyringTest, TheProcessOutlivesTheBusAndSaysThatItIsDead) {
     session.startKeyring();
     ASSERT_EQ(create("the secret"), 0);
     ASSERT_EQ(read(), 0);
@@ -333,10 +401,9 @@ TEST_F(KeyringTest, TheProcessOutlivesTheBusAndTheLocalStoreTakesOver) {
     platform::CredentialItem item;
     EXPECT_NE(credentials.desktop.store().readAttributes(*reference, item), 0);
     EXPECT_NE(credentials.desktop.store().deleteItem(*reference), 0);
-    EXPECT_EQ(read(), platform::kCredentialItemNotFound);
-    EXPECT_EQ(create("the second secret"), 0);
-    EXPECT_EQ(readLocally(), 0);
-    EXPECT_EQ(data, "the second secret");
+    EXPECT_EQ(read(), platform::kCredentialBusDied);
+    EXPECT_EQ(create("the second secret"), platform::kCredentialBusDied);
+    EXPECT_EQ(readLocally(), platform::kCredentialItemNotFound);
 }
 
 TEST_F(KeyringTest, OfTwoProcessesThatCreateAtOnceOneSucceeds) {

@@ -3,6 +3,7 @@
 import fcntl
 import json
 import os
+import re
 import socket
 import subprocess
 import tempfile
@@ -28,14 +29,18 @@ def entry(text, interface):
 
 
 class Doctor(unittest.TestCase):
-    def test_without_a_bus_the_local_store_serves_and_there_is_advice(self):
-        text = doctor("--json")
-        self.assertEqual(entry(text, "CredentialStore")["backend"], "local file")
-        self.assertEqual(entry(text, "CredentialStore")["reason"], "there is no session bus")
-        self.assertIn("Secret Service", entry(text, "CredentialStore")["advice"])
+    # Whether a keyring is installed here decides; tests/integration/desktop has both.
+    WITHOUT_BUS = (("local file", "there is no session bus"),
+                   ("none", "there is no session bus, so that the keyring cannot be asked"))
+
+    def test_without_a_bus_there_is_advice(self):
+        found = entry(doctor("--json"), "CredentialStore")
+        self.assertIn((found["backend"], found["reason"]), self.WITHOUT_BUS)
+        self.assertIn("Secret Service", found["advice"])
 
     def test_every_line_for_people_names_the_backend_and_the_reason(self):
-        self.assertIn("CredentialStore: local file (there is no session bus)\n    advice: ", doctor())
+        found = re.search(r"^CredentialStore: (.+) \((.+)\)\n    advice: ", doctor(), re.MULTILINE)
+        self.assertIn(found.groups(), self.WITHOUT_BUS)
 
     def test_below_a_root_everything_is_local(self):
         with tempfile.TemporaryDirectory() as root:

@@ -4,7 +4,9 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <filesystem>
+#include <functional>
 
 namespace welcomer::desktop {
 
@@ -26,22 +28,34 @@ class SearchListCredentialStoreTest : public testing::Test {
         return status == platform::kCredentialSuccess ? store.deleteItem(*found) : status;
     }
 
+    CredentialItem itemOf(std::int64_t changed) const {
+        CredentialItem other = item;
+        other.changed = changed;
+        return other;
+    }
+
     const CredentialItem item{"service", "account", "label", std::nullopt};
     TemporaryRoot root;
     fakes::CallRecorder recorder;
     FakeCredentialStore service{recorder};
     FakeCredentialStore local{recorder};
     bool serviceIsThere = true;
-    SearchListCredentialStore store{[this] { return serviceIsThere ? &service : nullptr; }, local,
-                                    [this] {
-                                        return local::FileLock(local::RootFolder(root.path()),
-                                                               "/locks/search");
-                                    }};
+    bool serviceIsSomewhere = false;
+    const SearchListCredentialStore::Service access{[this] { return serviceIsThere ? &service : nullptr; },
+                                                    [this] {
+                                                        return serviceIsSomewhere;
+                                                    }};
+    const std::function<local::FileLock()> lock = [this] {
+        return local::FileLock(local::RootFolder(root.path()), "/locks/search");
+    };
+    SearchListCredentialStore store{access, local, lock};
+    SearchListCredentialStore storeForLocalItems{access, local, lock,
+                                                 SearchListCredentialStore::NewItems::ToTheLocalStore};
     std::string data = "untouched";
     std::unique_ptr<platform::CredentialItemReference> reference;
 };
 
-// The statuses that say that there is no service.
+// The statuses of a service that is not there, where it is nowhere else either.
 class WithoutAService : public SearchListCredentialStoreTest,
                         public testing::WithParamInterface<std::int32_t> {
   protected:
@@ -51,7 +65,8 @@ class WithoutAService : public SearchListCredentialStoreTest,
     }
 };
 INSTANTIATE_TEST_SUITE_P(Statuses, WithoutAService,
-                         testing::Values(platform::kCredentialNoService, platform::kCredentialNoBus));
+                         testing::Values(platform::kCredentialNoService, platform::kCredentialNoBus,
+                                         platform::kCredentialBusDied));
 
 // The statuses that say why the service does not do it.
 class WithARefusal : public SearchListCredentialStoreTest, public testing::WithParamInterface<std::int32_t> {
@@ -64,7 +79,10 @@ class WithARefusal : public SearchListCredentialStoreTest, public testing::WithP
 INSTANTIATE_TEST_SUITE_P(Statuses, WithARefusal,
                          testing::Values(platform::kCredentialLocked, platform::kCredentialDismissed,
                                          platform::kCredentialPromptUnanswered, platform::kCredentialTooLarge,
-                                         platform::kCredentialServiceFailed));
+                                         platform::kCredentialServiceFailed,
+                                         platform::kCredentialFindTimedOut,
+                                         platform::kCredentialCreateTimedOut,
+                                         platform::kCredentialStartFailed));
 
 } // namespace
 
@@ -129,13 +147,56 @@ TEST_F(SearchListCredentialStoreTest, DamageToTheLocalStoreIsSaidWhereTheService
     EXPECT_EQ(read(), platform::kCredentialStoreDamaged);
 }
 
-TEST_F(SearchListCredentialStoreTest, DeletingDeletesWhatReadingFoundInTheService) {
+TEST_F(SearchListCredentialStoreTest, OfTwoTheNewestIsReadWithItsAttributes) {
+    struct {
+        std::int64_t ofService;
+        std::int64_t ofLocal;
+        const char* read;
+    } const cases[] = {{2, 1, "of the service"},
+                       {1, 2, "of the local store"},
+                       {1, 1, "of the service"},
+                       {0, 1, "of the local store"}};
+    for (const auto& [ofService, ofLocal, expected] : cases) {
+        service.put(itemOf(ofService), "of the service");
+        local.put(itemOf(ofLocal), "of the local store");
+        EXPECT_EQ(read(), 0);
+        EXPECT_EQ(data, expected);
+        CredentialItem attributes;
+        EXPECT_EQ(store.readAttributes(*reference, attributes), 0);
+        EXPECT_EQ(attributes.changed, std::max(ofService, ofLocal));
+    }
+}
+
+TEST_F(SearchListCredentialStoreTest, DeletingDeletesInBoth) {
+    for (const std::int64_t changed : {1, 3}) {
+        service.put(itemOf(2), "of the service");
+        local.put(itemOf(changed), "of the local store");
+        EXPECT_EQ(read(), 0);
+        EXPECT_EQ(lookUpAndDelete(), 0);
+        EXPECT_TRUE(service.items().empty());
+        EXPECT_TRUE(local.items().empty());
+    }
+}
+
+TEST_F(SearchListCredentialStoreTest, WhereOneOfTwoCannotBeDeletedThatIsSaidAndTheOtherGoes) {
+    for (const std::int64_t changed : {1, 3}) {
+        service.put(itemOf(2), "of the service");
+        local.put(itemOf(changed), "of the local store");
+        service.setStatus(Operation::DeleteItem, platform::kCredentialDismissed);
+        EXPECT_EQ(lookUpAndDelete(), platform::kCredentialDismissed);
+        EXPECT_EQ(service.items().size(), 1U);
+        EXPECT_TRUE(local.items().empty());
+    }
+}
+
+TEST_F(SearchListCredentialStoreTest, WhatHasGoneFromOneMeanwhileIsAsGoodAsDeleted) {
     service.put(item, "of the service");
     local.put(item, "of the local store");
-    EXPECT_EQ(read(), 0);
+    service.setStatus(Operation::DeleteItem, platform::kCredentialItemNotFound);
     EXPECT_EQ(lookUpAndDelete(), 0);
-    EXPECT_TRUE(service.items().empty());
-    EXPECT_EQ(local.items().size(), 1U);
+    local.put(item, "of the local store");
+    local.setStatus(Operation::DeleteItem, platform::kCredentialItemNotFound);
+    EXPECT_EQ(lookUpAndDelete(), platform::kCredentialItemNotFound);
 }
 
 TEST_F(SearchListCredentialStoreTest,
@@ -190,6 +251,46 @@ TEST_P(WithARefusal, ReadingSaysItUnlessTheLocalStoreHasTheItem) {
 TEST_P(WithARefusal, CreatingSaysItAndLeavesTheLocalStoreAlone) {
     EXPECT_EQ(store.createItem(item, "secret"), GetParam());
     EXPECT_TRUE(local.items().empty());
+}
+
+// Where nobody answers, and there is a service all the same.
+TEST_F(SearchListCredentialStoreTest, AServiceThatIsSomewhereIsNotStoodInFor) {
+    serviceIsSomewhere = true;
+    serviceIsThere = false;
+    EXPECT_EQ(read(), platform::kCredentialNoBus);
+    EXPECT_EQ(store.createItem(item, "secret"), platform::kCredentialNoBus);
+    EXPECT_TRUE(local.items().empty());
+    local.put(item, "of the local store");
+    EXPECT_EQ(read(), 0);
+    EXPECT_EQ(data, "of the local store");
+}
+
+TEST_F(SearchListCredentialStoreTest, AServiceThatHasAnsweredDoesNotCeaseToExist) {
+    EXPECT_EQ(read(), platform::kCredentialItemNotFound);
+    service.setStatus(Operation::FindItem, platform::kCredentialBusDied);
+    service.setStatus(Operation::CreateItem, platform::kCredentialBusDied);
+    EXPECT_EQ(read(), platform::kCredentialBusDied);
+    EXPECT_EQ(store.createItem(item, "secret"), platform::kCredentialBusDied);
+    EXPECT_TRUE(local.items().empty());
+}
+
+TEST_P(WithARefusal, AnItemForTheLocalStoreIsStoredAllTheSame) {
+    EXPECT_EQ(storeForLocalItems.createItem(item, "secret"), 0);
+    EXPECT_EQ(local.items().size(), 1U);
+    EXPECT_EQ(read(), 0);
+    EXPECT_EQ(data, "secret");
+}
+
+TEST_F(SearchListCredentialStoreTest, AnItemForTheLocalStoreIsNoSecondOne) {
+    service.put(item, "of the service");
+    EXPECT_EQ(storeForLocalItems.createItem(item, "secret"), platform::kCredentialDuplicateItem);
+    EXPECT_TRUE(local.items().empty());
+}
+
+TEST_F(SearchListCredentialStoreTest, AnItemForTheLocalStoreGoesThereThoughTheServiceIsThere) {
+    EXPECT_EQ(storeForLocalItems.createItem(item, "secret"), 0);
+    EXPECT_TRUE(service.items().empty());
+    EXPECT_EQ(local.items().size(), 1U);
 }
 
 } // namespace welcomer::desktop

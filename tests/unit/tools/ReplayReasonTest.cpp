@@ -25,6 +25,22 @@ TEST(ReplayReason, ExplainsTheStatusOfTheCredentialStore) {
               "Failed to find replay keychain item: -5 (unknown credential store status -5)");
 }
 
+TEST(ReplayReason, OfStoringSaysWhatElseCanBeDoneWhereTheKeyringCouldNotBeAsked) {
+    const auto storing = [](const char* line) {
+        KeptLog log;
+        log.write(115, line);
+        return storingReason(log);
+    };
+    EXPECT_EQ(
+        storing("Failed to create replay keychain item: 12"),
+        "Failed to create replay keychain item: 12 (the keyring could not be asked: there is no session "
+        "bus); --local stores it in the user's local file");
+    EXPECT_EQ(
+        storing("Failed to create replay keychain item: 1"),
+        "Failed to create replay keychain item: 1 (an item with this service and account exists already)");
+    EXPECT_EQ(storing("failed to create /x: no"), "failed to create /x: no");
+}
+
 TEST(ReplayReason, LeavesALineAloneThatEndsInNoStatus) {
     EXPECT_EQ(reasonAfter({"replay keychain item: 1 or 2"}), "replay keychain item: 1 or 2");
     EXPECT_EQ(reasonAfter({"replay keychain item: "}), "replay keychain item: ");
