@@ -1,5 +1,6 @@
 #include "backends/desktop/SecretServiceTraces.h"
 
+#include "platform/Error.h"
 #include "platform/Path.h"
 
 #include <array>
@@ -46,7 +47,12 @@ bool hasFileOfKind(const local::RootFolder& root, const std::string& folder, con
 } // namespace
 
 bool hasSecretServiceTraces(const local::RootFolder& root, platform::ProcessIdentity& identity) {
-    const std::string own = platform::joinPath(identity.homeDirectory(), ".local/share");
+    std::string own;
+    try {
+        own = platform::joinPath(identity.homeDirectory(), ".local/share");
+    } catch (const platform::Exception&) {
+        return false; // a user without a home has no keyring
+    }
     for (const std::string& folder : {own, std::string("/usr/local/share"), std::string("/usr/share")}) {
         if (isServiceFile(root, platform::joinPath(folder, kServiceFile))) {
             return true;

@@ -202,27 +202,34 @@ TEST(CredentialModuleTest, AQuestionIsOverAfterTenSeconds) {
     EXPECT_EQ(desktop::CredentialModule::Arguments().questionLimit, 10s);
 }
 
-TEST_F(KeyringTest, AKeyringThatHangsIsATimeOutOfEachOperation) {
+TEST_F(KeyringTest, AKeyringThatHangsIsATimeOutAndTheLocalStoreDoesNotTakeOver) {
     session.startKeyring();
     ASSERT_EQ(create("the secret"), 0);
-    ASSERT_EQ(read(), 0);
     session.holdKeyring(true);
     // Its prompts would wait for two minutes.
     UsersCredentials hasty(root, 120s, 300ms);
     platform::CredentialStore& store = hasty.desktop.store();
-    data = "untouched";
-    std::unique_ptr<platform::CredentialItemReference> found;
-    EXPECT_EQ(store.findItem("service", "account", &data, &found), platform::kCredentialFindTimedOut);
+    EXPECT_EQ(store.findItem("service", "account", &data, &reference), platform::kCredentialFindTimedOut);
     EXPECT_EQ(data, "untouched");
-    EXPECT_EQ(found, nullptr);
+    EXPECT_EQ(reference, nullptr);
     EXPECT_EQ(store.createItem(kItem, "another"), platform::kCredentialCreateTimedOut);
+    EXPECT_EQ(readLocally(), platform::kCredentialItemNotFound);
+    session.holdKeyring(false);
+}
+
+TEST_F(KeyringTest, AKeyringThatHangsLeavesAnItemThatWasFoundAsItIs) {
+    session.startKeyring();
+    UsersCredentials hasty(root, 120s, 3s);
+    platform::CredentialStore& store = hasty.desktop.store();
+    ASSERT_EQ(store.createItem(kItem, "the secret"), 0);
+    ASSERT_EQ(store.findItem("service", "account", &data, &reference), 0);
+    session.holdKeyring(true);
     platform::CredentialItem item{"untouched", "", "", {}};
     EXPECT_EQ(store.readAttributes(*reference, item), platform::kCredentialReadTimedOut);
     EXPECT_EQ(item.service, "untouched");
     EXPECT_EQ(store.deleteItem(*reference), platform::kCredentialDeleteTimedOut);
-    EXPECT_EQ(hasty.local.findItem("service", "account", nullptr, nullptr),
-              platform::kCredentialItemNotFound);
     session.holdKeyring(false);
+    EXPECT_EQ(lookUpOutside(), "the secret");
 }
 
 TEST_F(KeyringTest, ABusThatHangsIsATimeOut) {

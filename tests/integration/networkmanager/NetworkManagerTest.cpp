@@ -573,6 +573,14 @@ TEST_F(NetworkManagerTest, TheReportsSayWhoServesAndWhatWouldBeNeeded) {
         EXPECT_EQ(report.advice, "");
     }
     EXPECT_EQ(reports[0].interface, "NetworkConfigStore");
+    daemon->hold(true);
+    reports = network.reports();
+    daemon->hold(false);
+    for (const platform::BackendReport& report : reports) {
+        EXPECT_EQ(report.backend, "NetworkManager") << report.interface;
+        EXPECT_EQ(report.reason, "NetworkManager runs, does not answer");
+        EXPECT_NE(report.advice, "");
+    }
     daemon->stop();
     waitFor("test -z \"$(nmcli -t -f RUNNING general | grep running$ | grep -v not)\"");
     reports = network.reports();
