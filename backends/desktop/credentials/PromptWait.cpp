@@ -47,6 +47,8 @@ PromptWait::PromptWait(std::chrono::nanoseconds patience) : _state(std::make_uni
 }
 
 PromptWait::~PromptWait() {
+    // It may hold the last reference to an object.
+    _state->result.reset();
     // What is left to be told, such as to the objects that the call made.
     while (g_main_context_iteration(_state->context, FALSE)) {
     }

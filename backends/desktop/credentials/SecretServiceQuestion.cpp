@@ -1,6 +1,5 @@
 #include "backends/desktop/credentials/SecretServiceQuestion.h"
 
-#include "backends/desktop/credentials/PromptWait.h"
 #include "platform/CredentialStore.h"
 
 #include <string_view>
@@ -132,13 +131,14 @@ Status SecretServiceQuestion::_openLibrary() {
     if (_library) {
         return platform::kCredentialSuccess;
     }
-    PromptWait wait(_deadline.left());
-    secret_service_open(SECRET_TYPE_SERVICE, nullptr, SECRET_SERVICE_NONE, wait.cancellable(),
-                        PromptWait::done, wait.argument());
-    GAsyncResult* const result = wait.wait();
+    _opening = std::make_unique<PromptWait>(_deadline.left());
+    secret_service_open(SECRET_TYPE_SERVICE, nullptr, SECRET_SERVICE_NONE, _opening->cancellable(),
+                        PromptWait::done, _opening->argument());
+    GAsyncResult* const result = _opening->wait();
     ErrorSlot error;
     _library.reset(result ? secret_service_open_finish(result, error.out()) : nullptr);
-    return _library ? static_cast<Status>(platform::kCredentialSuccess) : statusOfCall(wait, error.get());
+    return _library ? static_cast<Status>(platform::kCredentialSuccess)
+                    : statusOfCall(*_opening, error.get());
 }
 
 Status SecretServiceQuestion::openSession() {

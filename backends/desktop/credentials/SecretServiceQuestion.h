@@ -5,6 +5,7 @@
 #include "backends/desktop/BusName.h"
 #include "backends/desktop/credentials/Deadline.h"
 #include "backends/desktop/credentials/LibSecret.h"
+#include "backends/desktop/credentials/PromptWait.h"
 #include "backends/desktop/credentials/SessionBus.h"
 
 #include <chrono>
@@ -81,6 +82,8 @@ class SecretServiceQuestion {
     Deadline _deadline;
     const std::chrono::nanoseconds _promptPatience;
     GDBusConnection* _connection = nullptr; // borrowed from the bus
+    // What the library's object leaves behind is cleared away on the context that it was made on.
+    std::unique_ptr<PromptWait> _opening;
     std::unique_ptr<SecretService, CloseLibrary> _library;
 };
 
