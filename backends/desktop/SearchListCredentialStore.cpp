@@ -132,6 +132,7 @@ SearchListCredentialStore::findItem(const std::string& service, const std::strin
     }
     if (reference) {
         std::vector<Reference::Entry> entries;
+        entries.reserve(found.size());
         for (Found& each : found) {
             entries.push_back({each.store, std::move(each.reference)});
         }
