@@ -128,9 +128,8 @@ std::int32_t LocalCredentialStore::createItem(const platform::CredentialItem& it
     PropertyList::Array items;
     std::int32_t status = openOrMake(folder, _root, _folderPath());
     // Also where nothing can be locked, as in a home that is read-only.
-    if (PropertyList present;
-        status == platform::kCredentialSuccess &&
-        readItem(_root, _folderPath(), item.service, item.account, present) == platform::kCredentialSuccess) {
+    if (status == platform::kCredentialSuccess &&
+        findItem(item.service, item.account, nullptr, nullptr) == platform::kCredentialSuccess) {
         return platform::kCredentialDuplicateItem;
     }
     if (status == platform::kCredentialSuccess) {
