@@ -231,6 +231,33 @@ TEST_F(NimbusTesselDelegateTest, AValidationObservesBeforeItBuildsItsRequestAndA
     EXPECT_EQ(observersThen, (std::vector<std::size_t>{2, 0}));
 }
 
+TEST_F(NimbusTesselDelegateTest, WhatIsAskedForIsLoggedBeforeItObservesAndAFailureOnceItNoLongerDoes) {
+    answerWith(false, {});
+    std::vector<std::size_t> observersThen;
+    PCLogManager::sharedManager().setObserver([&](const PCLogManager::Call& call) {
+        if (call.message.find("_validate") == std::string::npos) { // the notification's own line
+            observersThen.push_back(observers());
+        }
+    });
+    EXPECT_FALSE(signIn());
+    EXPECT_FALSE(validate());
+    PCLogManager::sharedManager().setObserver({});
+    EXPECT_EQ(observersThen, std::vector<std::size_t>(5, 0));
+}
+
+TEST_F(NimbusTesselDelegateTest, WhatAnAccountErrorMeansIsLoggedBeforeItCounts) {
+    for (const int code : {5, 0}) {
+        NimbusTesselDelegate fresh;
+        answerWith(false, {{kSKPropertyAccountError, code}, {kSKPropertyAccountErrorInfo, "info"}});
+        bool countedThen = true;
+        PCLogManager::sharedManager().setObserver(
+            [&](const PCLogManager::Call&) { countedThen = fresh.needsRepair() || fresh.succeeded(); });
+        EXPECT_EQ(fresh.validateNimbusUsernameAndPasswordError("anna", "secret", nullptr), code == 0);
+        PCLogManager::sharedManager().setObserver({});
+        EXPECT_FALSE(countedThen) << code;
+    }
+}
+
 TEST_F(NimbusTesselDelegateTest, AValidationIsLoggedBeforeItsRequestIsBuilt) {
     fakes::InProcessPlugin store{"com.corvid.storefront"};
     installPlugin<0>(store);

@@ -309,6 +309,7 @@ TEST_F(NetworkingManagerTest, ACommitOfNewHardwareThatFailsIsUndoneAndEndsIt) {
               (Lines{"NetworkConfigStore.open com.corvid.FirstRun", "NetworkConfigStore.establish",
                      "NetworkConfigStore.commit", "NetworkConfigStore.synchronize"}));
     EXPECT_EQ(logged(), (Lines{"NCPreferencesCommitChanges failed error code 7 error text of 7"}));
+    EXPECT_EQ(fake.recorder.calls().back(), "NetworkConfigStore.synchronize"); // after its line
 }
 
 TEST_F(NetworkingManagerTest, ACommitThatFailsWithoutACodeIsUndoneAndFollowedByTheApply) {
