@@ -6,10 +6,12 @@
 // fails, and says what became of the mutant. Without tests it is an ordinary test program, and so where a
 // death test starts it.
 
+#include <algorithm>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <gtest/gtest.h>
+#include <string_view>
 #include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -42,11 +44,16 @@ void limit(int resource, rlim_t value) {
 } // namespace
 
 int main(int argc, char** argv) {
+    const bool isDeathTest = std::any_of(argv, argv + argc, [](const char* argument) {
+        return std::string_view(argument).starts_with("--gtest_internal_run_death_test");
+    });
     testing::InitGoogleTest(&argc, argv);
-    if (argc < 3 || testing::internal::InDeathTestChild()) {
+    if (argc >= 3) {
+        wl_mutant = std::atoi(argv[1]);
+    }
+    if (argc < 3 || isDeathTest) {
         return RUN_ALL_TESTS();
     }
-    wl_mutant = std::atoi(argv[1]);
     for (char** name = argv + 2; *name; ++name) {
         const pid_t child = ::fork();
         if (child == 0) {

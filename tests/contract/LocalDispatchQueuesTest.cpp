@@ -217,6 +217,10 @@ TEST(LocalDispatchQueuesTest, WhatABlockHoldsIsReleasedWhileOthersMayPost) {
     queue->async([held = makeHeld()] {}); // the last one of its queue
     while (!threads.waiting.empty())
         threads.runNext();
+    for (const std::future<void>& post : posts)
+        post.wait();
+    while (!threads.waiting.empty()) // of a post that came late, for the queues' end
+        threads.runNext();
     EXPECT_EQ(released, 3);
     EXPECT_EQ(couldPost, 3);
 }
