@@ -1,4 +1,4 @@
-"""What can be changed in a C++ source file, found in its text: there is no parser, what makes no sense does not compile.
+"""What can be changed in a C++ source file, found in its text. There is no parser: what is no sense does not compile.
 
 `find(text)` gives the functions and the mutations. Relies on the repository's formatting: an operator with two operands
 stands between spaces, a template's bracket does not, and every controlled statement has braces.
@@ -81,7 +81,7 @@ class Source:
             i += 1
 
     def statements(self, opening):
-        """The simple statements in a function, lambdas' too, as [(first, last, block)]: tokens' indices, the block's brace."""
+        """The simple statements in a function, lambdas' too, as [(first, last, block)]: token indices, the brace's."""
         found, stack, first = [], [], opening + 1
         for i in range(opening + 1, self.partner[opening]):
             word = self.words[i]
@@ -178,12 +178,11 @@ def _of_token(source, i):
         r"\s\S+\s", source.text[token.start() - 1:token.end() + 1])
     news = []
     if token.lastgroup == "number":
-        number = re.match(r"(0[xX])?([\d']+)(\.\d+)?", word)
-        digits = number.group(2).replace("'", "")
-        base = 16 if number.group(1) else 8 if digits.startswith("0") and len(digits) > 1 and not number.group(3) else 10
-        prefix, form = {16: ("0x", "x"), 8: ("0", "o"), 10: ("", "d")}[base]
-        value = int(digits, base)
-        news = [prefix + format(each, form) + word[number.end(2):] for each in (value + 1, value - 1) if each >= 0]
+        number = re.match(r"[\d']+", word).group()
+        is_octal = re.match(r"0\d", number)
+        value = int(number.replace("'", ""), 8 if is_octal else 10)
+        news = [("0" + format(each, "o") if is_octal else str(each)) + word[len(number):]
+                for each in (value + 1, value - 1) if each >= 0]
     elif word in ("true", "false"):
         news = ["false" if word == "true" else "true"]
     elif word in TURNED and spaced:

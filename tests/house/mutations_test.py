@@ -31,9 +31,11 @@ class Mutations(unittest.TestCase):
 
     def test_statements_are_dropped_and_swapped(self):
         self.assert_broken("f();\n    g();", ";\n    g();", "f();\n    ;", "g();\n    f();")
-        self.assert_broken("run([&] {\n        f();\n        g();\n    });", "run([&] {\n        g();\n        f();\n    });",
-                           "run([&] {\n        f();\n        ;\n    });", ";")
-        self.assert_broken("if (a) {\n        return b;\n    }\n    return a;", "if (a) {\n        ;\n    }\n    return a;")
+        self.assert_broken("run([&] {\n        f();\n        g();\n    });", ";",
+                           "run([&] {\n        g();\n        f();\n    });",
+                           "run([&] {\n        f();\n        ;\n    });")
+        self.assert_broken("if (a) {\n        return b;\n    }\n    return a;",
+                           "if (a) {\n        ;\n    }\n    return a;")
 
     def test_a_function_keeps_its_last_result(self):
         self.assertNotIn(";", self.broken("return a;"))
@@ -61,8 +63,9 @@ class Mutations(unittest.TestCase):
         self.assertEqual([(each.new, opening) for each, opening in found], [("6", None), ("8", None)])
 
     def test_what_is_not_to_change_does_not(self):
-        for text in ("#include <a0.h>\n", "// f(1);\n", "static_assert(a == 1);\n", "void f() noexcept {\n    g(1);\n}\n",
-                     "#ifdef A\nvoid f() {\n    g(1);\n}\n#endif\n", "const char* text = \"a == 1\";\n"):
+        for text in ("#include <a0.h>\n", "// f(1);\n", "static_assert(a == 1);\n",
+                     "void f() noexcept {\n    g(1);\n}\n", "const char* text = \"a == 1\";\n",
+                     "#ifdef A\nvoid f() {\n    g(1);\n}\n#endif\n"):
             self.assertEqual(mutations.find("\n" + text + "\n")[1], [], text)
 
 
