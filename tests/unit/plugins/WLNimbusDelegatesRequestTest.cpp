@@ -123,7 +123,7 @@ TEST_F(WLNimbusDelegatesRequestTest, ARequestOfTheGreatestDepthCanBeWrittenAndRe
     deepest.request = [](wl_error_slot*) {
         return nestedRequest(WL_VALUE_DEPTH_LIMIT);
     };
-    const DelegatePluginArray plugins{AbiDelegatePlugin::create(*deepest.exportAs<0>())};
+    const DelegatePluginArray plugins{AbiDelegatePlugin::create(*deepest.exportAs<0>(), "Deep.ncdplugin")};
     const DelegatePluginSource onlyDeepest = [&]() -> const DelegatePluginArray& {
         return plugins;
     };
