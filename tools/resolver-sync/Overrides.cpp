@@ -104,6 +104,9 @@ OverrideFolder readOverrides(const std::string& folder) {
     for (const std::string& name : names) {
         const std::string path = std::string(folder).append("/").append(name);
         const auto text = files.readText(path);
+        if (text && text->empty()) {
+            continue; // as every file is at first, until it is written; its content is a change of its own
+        }
         OverrideFile file = text ? readOverride(name, *text) : refused("it cannot be read as text");
         if (file.error.empty() && result.overrides.contains(file.domain)) {
             file = refused("an earlier file is for the same domain");

@@ -40,7 +40,7 @@ OverrideFile readOverride(std::string_view name, std::string_view text);
 // What a folder of overrides says, and a line for each file that says nothing.
 struct OverrideFolder {
     Overrides overrides;
-    std::vector<std::string> refusals; // "PATH: reason"
+    std::vector<std::string> refusals; // "PATH: reason"; none for a file with nothing in it (yet)
 };
 
 // Reads every file of a folder; a missing folder has none. Of two files for one domain the first by its name

@@ -89,12 +89,18 @@ TEST_F(OverrideFolderTest, OfTwoFilesForOneDomainTheFirstCounts) {
 }
 
 TEST_F(OverrideFolderTest, AFileThatSaysNothingIsNamedWithTheReason) {
-    _root.addFile("/etc/resolver/a.example", "");
+    _root.addFile("/etc/resolver/a.example", "# nothing\n");
     _root.addDirectory("/etc/resolver/b.example");
     EXPECT_EQ(read().overrides, Overrides());
     EXPECT_EQ(read().refusals,
               (std::vector<std::string>{"/etc/resolver/a.example: it names no nameserver",
                                         "/etc/resolver/b.example: it cannot be read as text"}));
+}
+
+TEST_F(OverrideFolderTest, AFileThatIsStillEmptyIsPassedOverUntilItIsWritten) {
+    _root.addFile("/etc/resolver/a.example", "");
+    EXPECT_EQ(read().overrides, Overrides());
+    EXPECT_EQ(read().refusals, std::vector<std::string>());
 }
 
 } // namespace
