@@ -79,8 +79,9 @@ platform::Outcome AccountFile::_change(const std::function<bool(PropertyList::Di
 bool AccountFile::_setAside(LockedPreferenceFolder& folder, const std::string& path) {
     const std::string other = folder.setAside(kFileName, _onDisk.bytes);
     _log.write(platform::kErrorPriority,
-               "The accounts in " + path + " are damaged (" + _onDisk.reason + ") and " +
-                   (other.empty() ? "still in their place" : "now at " + platform::joinPath(path, other)));
+               "The accounts in " + _root.shown(path) + " are damaged (" + _onDisk.reason + ") and " +
+                   (other.empty() ? "still in their place"
+                                  : "now at " + _root.shown(platform::joinPath(path, other))));
     if (!other.empty()) {
         _onDisk = {};
     }

@@ -147,7 +147,7 @@ TEST_F(LocalAccountDirectoryTest, AValueThatXMLCannotHoldIsTheReason) {
     const Outcome outcome = local.directory.addUser({"anna", "secret", "a\x01", {}});
     EXPECT_FALSE(outcome);
     EXPECT_EQ(outcome.error.message, "cannot write " + local.root.locate(local::kNimbusDirectoryPath) +
-                                         ": it would hold a value that XML cannot hold");
+                                         ": Users/anna/MailAddress holds U+0001, for which XML has no place");
 }
 
 TEST_F(LocalAccountDirectoryTest, ThePasswordIsNotInTheFileWhichIsItsOwnersAlone) {

@@ -275,7 +275,7 @@ class WithoutUserManager(LaunchAgentsTest):
 
     def test_another_argument_is_a_mistake(self):
         self.log_in(with_manager=False)
-        refused = self.login.run([PROGRAM, "--help"])
+        refused = self.login.run([PROGRAM, "--start-of-login"])
         self.assertEqual((refused.returncode, refused.stdout), (2, ""))
         self.assertIn("usage:", refused.stderr)
 
