@@ -194,7 +194,8 @@ std::int32_t NetworkFile::change(const std::vector<std::function<void(Dictionary
     LockedPreferenceFolder folder(_root, kFolder, machineLockPath(kMachineFilesLock), kFolderMode, kFileMode);
     if (!folder) {
         error = folder.error();
-        return error.number == ETIMEDOUT ? platform::kNetworkConfigInUse : platform::kNetworkConfigWriteFailed;
+        return error.number == ETIMEDOUT ? platform::kNetworkConfigInUse
+                                         : platform::kNetworkConfigWriteFailed;
     }
     const std::string path = platform::joinPath(kFolder, kFileName);
     PreferenceFileContent onDisk = readPreferenceFile(_root, path);

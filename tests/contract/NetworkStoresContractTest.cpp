@@ -593,7 +593,8 @@ TEST_F(NetworkStoresTest, ARouterThatTheKernelRefusesIsAnErrorAndTheAddressesSta
     shell("ip addr add 10.0.0.9/8 dev eth7 && ip route add default via 10.0.0.1");
     EXPECT_EQ(configure("eth7", manual("192.0.2.7", "255.255.255.0", "198.51.100.1")),
               platform::kNetworkConfigKernelRefused + ENETUNREACH);
-    EXPECT_EQ(store().errorText(store().lastErrorCode()), "the kernel refused: Network is unreachable (eth7)");
+    EXPECT_EQ(store().errorText(store().lastErrorCode()),
+              "the kernel refused: Network is unreachable (eth7)");
     EXPECT_EQ(addresses("eth7"), "10.0.0.9/8\n");
     EXPECT_EQ(defaultRoutes(), "default via 10.0.0.1 dev eth7\n");
 }

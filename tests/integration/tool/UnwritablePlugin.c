@@ -1,5 +1,5 @@
-/* A plug-in that tries to build a request which no XML property list can hold. It raises when the host refuses each of its
- * values, and sends them when it does not. */
+/* A plug-in that tries to build a request which no XML property list can hold. It raises when the host
+ * refuses each of its values, and sends them when it does not. */
 
 #include <math.h>
 #include <welcomer/delegate_plugin.h>
