@@ -285,6 +285,18 @@ TEST_F(WLNimbusDelegatePluginsTest, KeepsTheEarlierOfTwoWithTheSameIdentifier) {
     EXPECT_EQ(second.destroyed, 1);
 }
 
+TEST_F(WLNimbusDelegatePluginsTest, NamesAndIdentifiersAreOneLineOfTheLogWhateverIsInThem) {
+    first.identifier = second.identifier = "com.corvid.\nforged";
+    add("a\nforged.ncdplugin", nullptr);
+    add("b.ncdplugin", first.exportAs<0>());
+    add("c.ncdplugin", second.exportAs<1>());
+    EXPECT_EQ(identifiers(), Strings{"com.corvid.\nforged"});
+    EXPECT_EQ(lines(),
+              (Strings{R"(Nimbus Plugins: Failed to get principal class for a\nforged.ncdplugin)",
+                       R"(Nimbus Plugins: duplicate plugins with id 'com.corvid.\nforged', only one )"
+                       "will be used"}));
+}
+
 TEST_F(WLNimbusDelegatePluginsTest, ADuplicateIsLoggedBeforeItIsDestroyed) {
     second.identifier = "com.corvid.first";
     add("a.ncdplugin", first.exportAs<0>());

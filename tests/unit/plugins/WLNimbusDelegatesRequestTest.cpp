@@ -157,6 +157,25 @@ TEST_F(WLNimbusDelegatesRequestTest, APluginWithoutARequestOmitsItselfWithALogLi
     EXPECT_EQ(lines(), Strings{"Nimbus Plugins: Delegate com.corvid.vidlink omits itself from Nimbus setup"});
 }
 
+TEST_F(WLNimbusDelegatesRequestTest, AnIdentifierIsOneLineOfTheLogWhateverIsInIt) {
+    add("a\nforged").request = [] {
+        return std::optional<PropertyList>();
+    };
+    RequestingPlugin& raising = add("b\nforged");
+    raising.request = []() -> std::optional<PropertyList> {
+        throw std::runtime_error("no request");
+    };
+    raising.aliases = [](const PropertyList&) -> std::optional<Strings> {
+        throw std::runtime_error("no aliases");
+    };
+    request();
+    WLNimbusGetMessagingAliasesFromDelegateResponse("b\nforged", Dictionary(), source);
+    EXPECT_EQ(lines(),
+              (Strings{R"(Nimbus Plugins: Delegate a\nforged omits itself from Nimbus setup)",
+                       R"(Nimbus Plugins: Exception querying 'b\nforged' for setup request: no request)",
+                       R"(Nimbus Plugins: Exception querying 'b\nforged' for aliases: no aliases)"}));
+}
+
 TEST_F(WLNimbusDelegatesRequestTest, AnEmptyDictionaryIsARequest) {
     add("com.corvid.vidlink").request = [] {
         return std::optional<PropertyList>(Dictionary{});
