@@ -122,6 +122,17 @@ TEST_F(RemainingDelegateSetupTest, WithoutResponsesEveryPluginIsLoggedAndNothing
     EXPECT_EQ(fake.virtualTime.queueNames(), Lines{kSharedQueue});
 }
 
+TEST_F(RemainingDelegateSetupTest, AnIdentifierIsOneLineOfTheLogWhateverIsInIt) {
+    add("a\nforged");
+    add("b\nforged");
+    respond("b\nforged");
+    setUpAndFinish();
+    const Lines lines = fake.systemLog.lines();
+    ASSERT_GE(lines.size(), 4U);
+    EXPECT_EQ(lines[2], R"(no cached response for a\nforged)");
+    EXPECT_EQ(lines[3], R"(setting up b\nforged)");
+}
+
 TEST_F(RemainingDelegateSetupTest, ResponsesWithoutAPluginAreIgnoredSilently) {
     respond("com.corvid.gone");
     setUpAndFinish();
