@@ -3,6 +3,8 @@
 
 #define _GNU_SOURCE
 
+#include "tests/support/exported_plugin.h"
+
 #include <limits.h>
 #include <pthread.h>
 #include <signal.h>
@@ -11,7 +13,6 @@
 #include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
-#include <welcomer/delegate_plugin.h>
 
 static const struct {
     const char* name;
@@ -148,15 +149,4 @@ static wl_delegate* create(const wl_host* host, wl_error_slot* slot) {
     return &delegate;
 }
 
-static void destroy(wl_delegate* self) {
-    (void)self;
-}
-
-const wl_delegate_plugin_descriptor wl_delegate_plugin = {
-    .abi_version = WL_DELEGATE_PLUGIN_ABI_VERSION,
-    .size = sizeof wl_delegate_plugin,
-    .protocol = WL_DELEGATE_PLUGIN_PROTOCOL,
-    .class_name = "EndingPlugin",
-    .create = create,
-    .destroy = destroy,
-};
+EXPORT_TEST_PLUGIN("EndingPlugin");

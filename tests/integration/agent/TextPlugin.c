@@ -3,9 +3,10 @@
  * them it is.
  */
 
+#include "tests/support/exported_plugin.h"
+
 #include <stdlib.h>
 #include <string.h>
-#include <welcomer/delegate_plugin.h>
 
 /* A line's end, a record's beginning, a terminal's escapes, and separators that some programs take for a
  * line's end. */
@@ -67,15 +68,4 @@ static wl_delegate* create(const wl_host* host, wl_error_slot* slot) {
     return &delegate;
 }
 
-static void destroy(wl_delegate* self) {
-    (void)self;
-}
-
-const wl_delegate_plugin_descriptor wl_delegate_plugin = {
-    .abi_version = WL_DELEGATE_PLUGIN_ABI_VERSION,
-    .size = sizeof wl_delegate_plugin,
-    .protocol = WL_DELEGATE_PLUGIN_PROTOCOL,
-    .class_name = "Text" FORGERY,
-    .create = create,
-    .destroy = destroy,
-};
+EXPORT_TEST_PLUGIN("Text" FORGERY);

@@ -1,8 +1,9 @@
 /* A plug-in that writes to the standard output, which is the tool's, and to a file that the test names. */
 
+#include "tests/support/exported_plugin.h"
+
 #include <stdio.h>
 #include <stdlib.h>
-#include <welcomer/delegate_plugin.h>
 
 static const char* identifier(wl_delegate* self, wl_error_slot* slot) {
     (void)self;
@@ -24,15 +25,4 @@ static wl_delegate* create(const wl_host* host, wl_error_slot* slot) {
     return &delegate;
 }
 
-static void destroy(wl_delegate* self) {
-    (void)self;
-}
-
-const wl_delegate_plugin_descriptor wl_delegate_plugin = {
-    .abi_version = WL_DELEGATE_PLUGIN_ABI_VERSION,
-    .size = sizeof wl_delegate_plugin,
-    .protocol = WL_DELEGATE_PLUGIN_PROTOCOL,
-    .class_name = "TalkingPlugin",
-    .create = create,
-    .destroy = destroy,
-};
+EXPORT_TEST_PLUGIN("TalkingPlugin");

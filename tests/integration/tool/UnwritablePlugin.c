@@ -1,8 +1,9 @@
 /* A plug-in that tries to build a request which no XML property list can hold. It raises when the host
  * refuses each of its values, and sends them when it does not. */
 
+#include "tests/support/exported_plugin.h"
+
 #include <math.h>
-#include <welcomer/delegate_plugin.h>
 
 static const wl_host* the_host;
 
@@ -41,15 +42,4 @@ static wl_delegate* create(const wl_host* host, wl_error_slot* slot) {
     return &delegate;
 }
 
-static void destroy(wl_delegate* self) {
-    (void)self;
-}
-
-const wl_delegate_plugin_descriptor wl_delegate_plugin = {
-    .abi_version = WL_DELEGATE_PLUGIN_ABI_VERSION,
-    .size = sizeof wl_delegate_plugin,
-    .protocol = WL_DELEGATE_PLUGIN_PROTOCOL,
-    .class_name = "UnwritablePlugin",
-    .create = create,
-    .destroy = destroy,
-};
+EXPORT_TEST_PLUGIN("UnwritablePlugin");
