@@ -1,10 +1,8 @@
 #include "backends/desktop/DesktopCredentialStore.h"
 
 #include "backends/desktop/SecretServiceTraces.h"
-#include "platform/Path.h"
+#include "backends/desktop/SessionBusTrace.h"
 
-#include <cstdlib>
-#include <unistd.h>
 #include <utility>
 
 namespace welcomer::desktop {
@@ -14,21 +12,7 @@ namespace {
 constexpr char kLockName[] = "CredentialSearch"; // not the local store's own, which it takes meanwhile
 constexpr char kNone[] = "none";                 // who serves where a bus cannot be asked
 
-// Empty where it is not set.
-std::string environmentVariable(const char* name) {
-    const char* const value = std::getenv(name);
-    return value ? value : "";
-}
-
 } // namespace
-
-bool mayHaveSessionBus() {
-    if (!environmentVariable("DBUS_SESSION_BUS_ADDRESS").empty()) {
-        return true;
-    }
-    const std::string runtimeFolder = environmentVariable("XDG_RUNTIME_DIR");
-    return !runtimeFolder.empty() && ::access(platform::joinPath(runtimeFolder, "bus").c_str(), F_OK) == 0;
-}
 
 DesktopCredentialStore::DesktopCredentialStore(local::RootFolder root, platform::ProcessIdentity& identity,
                                                platform::CredentialStore& local,

@@ -12,9 +12,6 @@
 
 namespace welcomer::desktop {
 
-// Whether the environment names a session bus that may be there: costs no connection. Any thread.
-bool mayHaveSessionBus();
-
 // The module is loaded at the first operation that finds a session bus.
 class DesktopCredentialStore {
   public:

@@ -1,5 +1,6 @@
 #include "backends/desktop/DesktopPlatform.h"
 
+#include "backends/desktop/SessionBusTrace.h"
 #include "backends/local/FileLock.h"
 #include "backends/local/LocalAccountService.h"
 #include "backends/local/RootFolder.h"
@@ -88,7 +89,7 @@ std::vector<platform::BackendReport> DesktopPlatform::backendReports() {
 
 OnlineAccountSurroundings DesktopPlatform::_accountSurroundings(const std::string& root) {
     const platform::Platform& local = _local.platform();
-    return {[this] { return _onlineAccounts.service(); },
+    return {[this] { return mayHaveSessionBus() ? _onlineAccounts.service() : nullptr; },
             [root, &local](platform::NotificationCenter& posts) {
                 return std::make_unique<local::LocalAccountService>(
                     local::RootFolder(root), local.processIdentity, local.runLoops, local.dispatchQueues,

@@ -1,13 +1,15 @@
 #include "backends/desktop/SecretServiceTraces.h"
 
+#include "backends/local/Directory.h"
 #include "platform/Error.h"
 #include "platform/Path.h"
 
+#include <algorithm>
 #include <array>
-#include <filesystem>
-#include <optional>
+#include <fcntl.h>
 #include <string>
-#include <system_error>
+#include <string_view>
+#include <sys/stat.h>
 
 namespace welcomer::desktop {
 
@@ -23,25 +25,15 @@ constexpr std::array<KeyringFiles, 2> kKeyringFiles = {{{"keyrings", ".keyring"}
 
 // A file with nothing in it names no service.
 bool isServiceFile(const local::RootFolder& root, const std::string& path) {
-    const std::optional<std::string> found = root.resolve(path);
-    std::error_code error;
-    return found && std::filesystem::is_regular_file(*found, error) &&
-           std::filesystem::file_size(*found, error) > 0;
+    const local::FileDescriptor file = root.open(path, O_PATH);
+    struct stat status = {};
+    return file && ::fstat(file.get(), &status) == 0 && S_ISREG(status.st_mode) && status.st_size > 0;
 }
 
-bool hasFileOfKind(const local::RootFolder& root, const std::string& folder, const char* extension) {
-    const std::optional<std::string> found = root.resolve(folder);
-    if (!found) {
-        return false;
-    }
-    std::error_code error;
-    std::filesystem::directory_iterator file(*found, error);
-    for (; !error && file != std::filesystem::directory_iterator(); file.increment(error)) {
-        if (file->path().extension() == extension) {
-            return true;
-        }
-    }
-    return false;
+bool hasFileOfKind(const local::RootFolder& root, const std::string& folder, std::string_view extension) {
+    const auto names = local::listDirectory(root.open(folder, O_RDONLY | O_DIRECTORY));
+    return names && std::any_of(names->begin(), names->end(),
+                                [extension](const std::string& name) { return name.ends_with(extension); });
 }
 
 } // namespace

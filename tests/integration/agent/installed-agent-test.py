@@ -63,6 +63,8 @@ class InstalledAgent(unittest.TestCase):
         for login in cls.logins:
             login.start()
         for login in cls.logins:
+            login.libraries = login.loaded_after_the_last_service()
+        for login in cls.logins:
             login.status = login.process.wait(timeout=200)
             login.seconds = time.monotonic() - started
             login.first_records = login.records_up_to("exiting")
@@ -146,6 +148,20 @@ class InstalledAgent(unittest.TestCase):
                 shown = login.machine.run(["/usr/local/bin/welcomer", "replay", "show"], user=True)
                 self.assertEqual(shown.returncode, 1, shown)
 
+    def test_without_a_session_bus_no_library_of_one_is_loaded(self):
+        for login in self.logins:
+            with self.subTest(login.name):
+                self.assertIn("/libc.so", login.libraries)
+                for name in ("/libgio-", "/libgoa-", "/libsecret-"):
+                    self.assertNotIn(name, login.libraries)
+
+    def test_without_a_session_bus_no_library_of_one_is_loaded(self):
+        for login in self.logins:
+            with self.subTest(login.name):
+                self.assertIn("/libglib-2.0.so", login.libraries)
+                for name in ("/libgio-2.0.so", "/libgoa-1.0.so", "/libsecret-1.so"):
+                    self.assertNotIn(name, login.libraries)
+
     def test_a_second_login_ends_at_once(self):
         login = self.login("none")
         before = len(login.machine.log_records("wlnimbussetup"))
@@ -207,6 +223,12 @@ class Login:
 
         self.machine.wait_for(has_last, f"the record {last!r}")
         return found
+
+    def loaded_after_the_last_service(self):
+        last = {f"Enabling Nimbus service 'com.corvid.nimbus.service.{name}'" for name in ("calendars", "reminders")}
+        self.machine.wait_for(lambda: last <= {text for _, _, text in self.machine.log_records("wlnimbussetup")},
+                              "the services that come last")
+        return (self.machine.root / "proc" / str(self.process.pid) / "maps").read_text()
 
     def launch_agent(self, label):
         return self.machine.home / "Library/LaunchAgents" / f"{label}.plist"
