@@ -1,6 +1,6 @@
 #include "backends/UnexpectedEnd.h"
 
-#include "backends/local/AlternateStack.h"
+#include "backends/posix/AlternateStack.h"
 
 #include <array>
 #include <atomic>
@@ -210,7 +210,7 @@ static void endByQuickExit() {
 void reportUnexpectedEnd(const UnexpectedEndOptions& options) {
     reportOptions = options;
     reportingProcess = ::getpid();
-    [[maybe_unused]] static const auto* const stack = new local::AlternateStack; // never destroyed
+    [[maybe_unused]] static const auto* const stack = new posix::AlternateStack; // never destroyed
 
     struct sigaction action = {};
     action.sa_handler = endBySignal;

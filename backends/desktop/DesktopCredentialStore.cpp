@@ -14,7 +14,7 @@ constexpr char kNone[] = "none";                 // who serves where a bus canno
 
 } // namespace
 
-DesktopCredentialStore::DesktopCredentialStore(local::RootFolder root, platform::ProcessIdentity& identity,
+DesktopCredentialStore::DesktopCredentialStore(posix::RootFolder root, platform::ProcessIdentity& identity,
                                                platform::CredentialStore& local,
                                                CredentialModule::Arguments arguments,
                                                SearchListCredentialStore::NewItems newItems)
@@ -31,8 +31,8 @@ DesktopCredentialStore::DesktopCredentialStore(local::RootFolder root, platform:
               // Makes the library folder where it is missing.
               const std::vector<std::string> libraries = _identity.userLibraryDirectories();
               return libraries.empty()
-                         ? local::FileLock()
-                         : local::FileLock(_root, local::userLockPath(libraries.front(), kLockName));
+                         ? posix::FileLock()
+                         : posix::FileLock(_root, posix::userLockPath(libraries.front(), kLockName));
           },
           newItems) {}
 

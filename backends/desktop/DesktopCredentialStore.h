@@ -5,7 +5,7 @@
 #include "backends/desktop/CredentialModule.h"
 #include "backends/desktop/DesktopModule.h"
 #include "backends/desktop/SearchListCredentialStore.h"
-#include "backends/local/RootFolder.h"
+#include "backends/posix/RootFolder.h"
 #include "platform/ProcessIdentity.h"
 
 #include <string>
@@ -19,7 +19,7 @@ class DesktopCredentialStore {
     //  identity  says where the user's library is; borrowed
     //  local     the local store; borrowed
     DesktopCredentialStore(
-        local::RootFolder root, platform::ProcessIdentity& identity, platform::CredentialStore& local,
+        posix::RootFolder root, platform::ProcessIdentity& identity, platform::CredentialStore& local,
         CredentialModule::Arguments arguments = {},
         SearchListCredentialStore::NewItems newItems = SearchListCredentialStore::NewItems::ToTheService);
 
@@ -32,7 +32,7 @@ class DesktopCredentialStore {
     // Whether there is a Secret Service though no bus can be asked (SecretServiceTraces.h).
     bool _isSomewhere();
 
-    const local::RootFolder _root;
+    const posix::RootFolder _root;
     platform::ProcessIdentity& _identity;
     DesktopModule<CredentialModule> _module;
     SearchListCredentialStore _store;

@@ -1,9 +1,9 @@
 #include "backends/desktop/DesktopPlatform.h"
 
 #include "backends/desktop/SessionBusTrace.h"
-#include "backends/local/FileLock.h"
-#include "backends/local/LocalAccountService.h"
-#include "backends/local/RootFolder.h"
+#include "backends/local/accounts/LocalAccountService.h"
+#include "backends/posix/FileLock.h"
+#include "backends/posix/RootFolder.h"
 #include "generated/WelcomerConfiguration.h"
 
 #include <memory>
@@ -56,14 +56,14 @@ platform::Platform withDesktop(const platform::Platform& local, platform::Creden
 
 DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
     : _local(withRunLoops(options, _runLoops)),
-      _credentialStore(local::RootFolder(options.root), _local.platform().processIdentity,
+      _credentialStore(posix::RootFolder(options.root), _local.platform().processIdentity,
                        _local.platform().credentialStore, {}, newItemsOf(options)),
       _onlineAccounts(
-          {[root = local::RootFolder(options.root), &identity = _local.platform().processIdentity] {
+          {[root = posix::RootFolder(options.root), &identity = _local.platform().processIdentity] {
               const std::vector<std::string> libraries = identity.userLibraryDirectories();
               return libraries.empty()
-                         ? local::FileLock()
-                         : local::FileLock(root, local::userLockPath(libraries.front(), kOnlineAccountsLock));
+                         ? posix::FileLock()
+                         : posix::FileLock(root, posix::userLockPath(libraries.front(), kOnlineAccountsLock));
           }}),
       _accountService(_accountSurroundings(options.root), {std::string(configuration::kOnlineAccountProvider),
                                                            std::string(configuration::kOnlineAccountServer)}),
@@ -92,7 +92,7 @@ OnlineAccountSurroundings DesktopPlatform::_accountSurroundings(const std::strin
     return {[this] { return mayHaveSessionBus() ? _onlineAccounts.service() : nullptr; },
             [root, &local](platform::NotificationCenter& posts) {
                 return std::make_unique<local::LocalAccountService>(
-                    local::RootFolder(root), local.processIdentity, local.runLoops, local.dispatchQueues,
+                    posix::RootFolder(root), local.processIdentity, local.runLoops, local.dispatchQueues,
                     posts, local.systemLog);
             },
             local.preferenceStore,

@@ -5,7 +5,7 @@
 
 #include "backends/desktop/DesktopModule.h"
 #include "backends/desktop/RunLoopModule.h"
-#include "backends/local/LocalRunLoops.h"
+#include "backends/local/time/LocalRunLoops.h"
 
 namespace welcomer::desktop {
 

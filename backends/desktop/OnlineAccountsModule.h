@@ -3,7 +3,7 @@
 #pragma once
 
 #include "backends/desktop/OnlineAccounts.h"
-#include "backends/local/FileLock.h"
+#include "backends/posix/FileLock.h"
 
 #include <functional>
 
@@ -15,7 +15,7 @@ struct OnlineAccountsModule {
     struct Arguments {
         // Takes the lock that keeps this user's other processes from making an account; asked when one is to
         // be made.
-        std::function<local::FileLock()> lock;
+        std::function<posix::FileLock()> lock;
     };
 };
 

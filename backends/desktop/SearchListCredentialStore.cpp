@@ -74,7 +74,7 @@ bool SearchListCredentialStore::_isWithoutService(std::int32_t status) {
 
 std::int32_t SearchListCredentialStore::createItem(const platform::CredentialItem& item,
                                                    const std::string& data) {
-    const local::FileLock lock = _lock();
+    const posix::FileLock lock = _lock();
     if (!lock) {
         return lock.error().number == ETIMEDOUT ? platform::kCredentialStoreInUse
                                                 : platform::kCredentialWriteFailed;

@@ -2,7 +2,7 @@
 
 #pragma once
 
-#include "backends/local/FileLock.h"
+#include "backends/posix/FileLock.h"
 #include "platform/CredentialStore.h"
 
 #include <cstdint>
@@ -39,7 +39,7 @@ class SearchListCredentialStore final : public platform::CredentialStore {
     //  local  borrowed
     //  lock   takes the lock of this user; asked when an item is created
     SearchListCredentialStore(Service service, platform::CredentialStore& local,
-                              std::function<local::FileLock()> lock,
+                              std::function<posix::FileLock()> lock,
                               NewItems newItems = NewItems::ToTheService)
         : _service(std::move(service)),
           _local(local),
@@ -74,7 +74,7 @@ class SearchListCredentialStore final : public platform::CredentialStore {
 
     const Service _service;
     platform::CredentialStore& _local;
-    const std::function<local::FileLock()> _lock;
+    const std::function<posix::FileLock()> _lock;
     const NewItems _newItems;
     std::mutex _mutex;
     // Whether the service has ever answered: then it does not stop to exist.

@@ -1,6 +1,6 @@
 #include "backends/desktop/SecretServiceTraces.h"
 
-#include "backends/local/Directory.h"
+#include "backends/posix/Directory.h"
 #include "platform/Error.h"
 #include "platform/Path.h"
 
@@ -24,21 +24,21 @@ struct KeyringFiles {
 constexpr std::array<KeyringFiles, 2> kKeyringFiles = {{{"keyrings", ".keyring"}, {"kwalletd", ".kwl"}}};
 
 // A file with nothing in it names no service.
-bool isServiceFile(const local::RootFolder& root, const std::string& path) {
-    const local::FileDescriptor file = root.open(path, O_PATH);
+bool isServiceFile(const posix::RootFolder& root, const std::string& path) {
+    const posix::FileDescriptor file = root.open(path, O_PATH);
     struct stat status = {};
     return file && ::fstat(file.get(), &status) == 0 && S_ISREG(status.st_mode) && status.st_size > 0;
 }
 
-bool hasFileOfKind(const local::RootFolder& root, const std::string& folder, std::string_view extension) {
-    const auto names = local::listDirectory(root.open(folder, O_RDONLY | O_DIRECTORY));
+bool hasFileOfKind(const posix::RootFolder& root, const std::string& folder, std::string_view extension) {
+    const auto names = posix::listDirectory(root.open(folder, O_RDONLY | O_DIRECTORY));
     return names && std::any_of(names->begin(), names->end(),
                                 [extension](const std::string& name) { return name.ends_with(extension); });
 }
 
 } // namespace
 
-bool hasSecretServiceTraces(const local::RootFolder& root, platform::ProcessIdentity& identity) {
+bool hasSecretServiceTraces(const posix::RootFolder& root, platform::ProcessIdentity& identity) {
     std::string own;
     try {
         own = platform::joinPath(identity.homeDirectory(), ".local/share");

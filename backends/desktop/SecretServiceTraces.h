@@ -2,7 +2,7 @@
 
 #pragma once
 
-#include "backends/local/RootFolder.h"
+#include "backends/posix/RootFolder.h"
 #include "platform/ProcessIdentity.h"
 
 namespace welcomer::desktop {
@@ -19,6 +19,6 @@ namespace welcomer::desktop {
 // The last of the three: whether there is a trace.
 //  root  the folder below which everything is looked up
 // Any thread.
-bool hasSecretServiceTraces(const local::RootFolder& root, platform::ProcessIdentity& identity);
+bool hasSecretServiceTraces(const posix::RootFolder& root, platform::ProcessIdentity& identity);
 
 } // namespace welcomer::desktop

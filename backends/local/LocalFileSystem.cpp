@@ -1,9 +1,9 @@
 #include "backends/local/LocalFileSystem.h"
 
-#include "backends/local/Directory.h"
-#include "backends/local/FileContent.h"
-#include "backends/local/FileDescriptor.h"
-#include "backends/local/SystemError.h"
+#include "backends/posix/Directory.h"
+#include "backends/posix/FileContent.h"
+#include "backends/posix/FileDescriptor.h"
+#include "backends/posix/SystemError.h"
 #include "propertylist/UTF8.h"
 
 #include <array>
@@ -36,14 +36,16 @@ int copyContent(int source, int destination) {
         if (count < 0) {
             continue;
         }
-        if (const int error = writeAll(destination, {buffer.data(), static_cast<std::size_t>(count)})) {
+        if (const int error =
+                posix::writeAll(destination, {buffer.data(), static_cast<std::size_t>(count)})) {
             return error;
         }
     }
 }
 
 // Opens a regular file. 0, or the system's error number.
-int openSource(const RootFolder& root, const std::string& path, FileDescriptor& file, mode_t& mode) {
+int openSource(const posix::RootFolder& root, const std::string& path, posix::FileDescriptor& file,
+               mode_t& mode) {
     file = root.open(path, O_RDONLY | O_NONBLOCK); // a pipe must not block
     struct stat status = {};
     if (!file || ::fstat(file.get(), &status) != 0) {
@@ -57,11 +59,11 @@ int openSource(const RootFolder& root, const std::string& path, FileDescriptor& 
 }
 
 // Makes a file under a name that is free. None when that failed; errno then says why.
-FileDescriptor makeTemporary(int folder, std::string& name) {
+posix::FileDescriptor makeTemporary(int folder, std::string& name) {
     std::random_device random;
     while (true) {
         name = ".copy-" + std::to_string(random());
-        FileDescriptor file(
+        posix::FileDescriptor file(
             ::openat(folder, name.c_str(), O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kPrivateMode));
         if (file || errno != EEXIST) {
             return file;
@@ -80,15 +82,15 @@ int finishCopy(int source, mode_t mode, int file, int folder, const std::string&
     return finished ? 0 : errno;
 }
 
-int copyFile(const RootFolder& root, const std::string& from, const std::string& to) {
-    const PathParts destination = splitPath(to);
-    const FileDescriptor folder = root.open(destination.folder, O_RDONLY | O_DIRECTORY);
+int copyFile(const posix::RootFolder& root, const std::string& from, const std::string& to) {
+    const posix::PathParts destination = posix::splitPath(to);
+    const posix::FileDescriptor folder = root.open(destination.folder, O_RDONLY | O_DIRECTORY);
     const int folderError = folder ? 0 : errno;
     struct stat present = {};
     if (folder && ::fstatat(folder.get(), destination.name.c_str(), &present, AT_SYMLINK_NOFOLLOW) == 0) {
         return EEXIST;
     }
-    FileDescriptor source;
+    posix::FileDescriptor source;
     mode_t mode = 0;
     if (const int error = openSource(root, from, source, mode)) {
         return error;
@@ -97,7 +99,7 @@ int copyFile(const RootFolder& root, const std::string& from, const std::string&
         return folderError;
     }
     std::string temporary;
-    const FileDescriptor file = makeTemporary(folder.get(), temporary);
+    const posix::FileDescriptor file = makeTemporary(folder.get(), temporary);
     if (!file) {
         return errno;
     }
@@ -107,7 +109,7 @@ int copyFile(const RootFolder& root, const std::string& from, const std::string&
 }
 
 // Opens a file to be written from its start, making it where it is missing. 0, or the system's error number.
-int openToWrite(const RootFolder& root, const std::string& path, FileDescriptor& file) {
+int openToWrite(const posix::RootFolder& root, const std::string& path, posix::FileDescriptor& file) {
     file = root.open(path, O_WRONLY | O_CREAT | O_EXCL, kNewFileMode);
     if (file) {
         return ::fchmod(file.get(), kNewFileMode) == 0 ? 0 : errno;
@@ -119,14 +121,14 @@ int openToWrite(const RootFolder& root, const std::string& path, FileDescriptor&
     return file ? 0 : errno;
 }
 
-int writeFile(const RootFolder& root, const std::string& path, std::string_view content) {
-    FileDescriptor file;
+int writeFile(const posix::RootFolder& root, const std::string& path, std::string_view content) {
+    posix::FileDescriptor file;
     const int error = openToWrite(root, path, file);
-    return error == 0 ? writeAll(file.get(), content) : error;
+    return error == 0 ? posix::writeAll(file.get(), content) : error;
 }
 
-int removeAll(const FolderEntry& entry) {
-    return entry ? removeTree(entry.folder(), entry.name()) : errno;
+int removeAll(const posix::FolderEntry& entry) {
+    return entry ? posix::removeTree(entry.folder(), entry.name()) : errno;
 }
 
 } // namespace
@@ -136,31 +138,31 @@ bool LocalFileSystem::exists(const std::string& path) {
 }
 
 platform::Outcome LocalFileSystem::remove(const std::string& path) {
-    return systemOutcome("cannot remove " + path, removeAll(_root.entry(path)));
+    return posix::systemOutcome("cannot remove " + path, removeAll(_root.entry(path)));
 }
 
 platform::Outcome LocalFileSystem::createDirectory(const std::string& path, std::uint32_t mode) {
-    return systemOutcome("cannot create " + path, makeDirectory(_root, path, mode));
+    return posix::systemOutcome("cannot create " + path, posix::makeDirectory(_root, path, mode));
 }
 
 platform::Outcome LocalFileSystem::copy(const std::string& source, const std::string& destination) {
-    return systemOutcome("cannot copy " + source + " to " + destination,
-                         copyFile(_root, source, destination));
+    return posix::systemOutcome("cannot copy " + source + " to " + destination,
+                                copyFile(_root, source, destination));
 }
 
 std::optional<std::vector<std::string>> LocalFileSystem::list(const std::string& path) {
-    return listDirectory(_root.open(path, O_RDONLY | O_DIRECTORY));
+    return posix::listDirectory(_root.open(path, O_RDONLY | O_DIRECTORY));
 }
 
 std::optional<std::string> LocalFileSystem::readText(const std::string& path) {
     std::string text;
-    const bool isText = readFile(_root, path, text, platform::kMaximumTextSize) == 0 &&
+    const bool isText = posix::readFile(_root, path, text, platform::kMaximumTextSize) == 0 &&
                         findInvalidUTF8(text) == std::string::npos;
     return isText ? std::optional(std::move(text)) : std::nullopt;
 }
 
 platform::Outcome LocalFileSystem::writeText(const std::string& path, const std::string& text) {
-    return systemOutcome("cannot write " + path, writeFile(_root, path, text));
+    return posix::systemOutcome("cannot write " + path, writeFile(_root, path, text));
 }
 
 } // namespace welcomer::local

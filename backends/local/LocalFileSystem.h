@@ -2,14 +2,14 @@
 
 #pragma once
 
-#include "backends/local/RootFolder.h"
+#include "backends/posix/RootFolder.h"
 #include "platform/FileSystem.h"
 
 namespace welcomer::local {
 
 class LocalFileSystem final : public platform::FileSystem {
   public:
-    explicit LocalFileSystem(RootFolder root) : _root(std::move(root)) {}
+    explicit LocalFileSystem(posix::RootFolder root) : _root(std::move(root)) {}
 
     bool exists(const std::string& path) override;
     platform::Outcome remove(const std::string& path) override;
@@ -24,7 +24,7 @@ class LocalFileSystem final : public platform::FileSystem {
     platform::Outcome writeText(const std::string& path, const std::string& text) override;
 
   private:
-    const RootFolder _root;
+    const posix::RootFolder _root;
 };
 
 } // namespace welcomer::local

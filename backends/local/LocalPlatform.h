@@ -3,26 +3,26 @@
 #pragma once
 
 #include "backends/Backends.h"
-#include "backends/local/LocalAccountDirectory.h"
-#include "backends/local/LocalAccountService.h"
-#include "backends/local/LocalClock.h"
-#include "backends/local/LocalCredentialStore.h"
 #include "backends/local/LocalDirectoryService.h"
-#include "backends/local/LocalDispatchQueues.h"
 #include "backends/local/LocalFileSystem.h"
-#include "backends/local/LocalHostReachability.h"
-#include "backends/local/LocalNetworkConfigStore.h"
-#include "backends/local/LocalNetworkStateStore.h"
 #include "backends/local/LocalNotificationCenter.h"
 #include "backends/local/LocalPluginBundle.h"
-#include "backends/local/LocalPreferenceStore.h"
 #include "backends/local/LocalProcessIdentity.h"
 #include "backends/local/LocalProcessLauncher.h"
 #include "backends/local/LocalResourceBundles.h"
-#include "backends/local/LocalRunLoops.h"
 #include "backends/local/LocalSystemLog.h"
 #include "backends/local/LocalSystemVersionInfo.h"
-#include "backends/local/RootFolder.h"
+#include "backends/local/accounts/LocalAccountDirectory.h"
+#include "backends/local/accounts/LocalAccountService.h"
+#include "backends/local/credentials/LocalCredentialStore.h"
+#include "backends/local/network/LocalHostReachability.h"
+#include "backends/local/network/LocalNetworkConfigStore.h"
+#include "backends/local/network/LocalNetworkStateStore.h"
+#include "backends/local/preferences/LocalPreferenceStore.h"
+#include "backends/local/time/LocalClock.h"
+#include "backends/local/time/LocalDispatchQueues.h"
+#include "backends/local/time/LocalRunLoops.h"
+#include "backends/posix/RootFolder.h"
 
 namespace welcomer::local {
 
@@ -35,7 +35,7 @@ class LocalPlatform final : public PlatformOwner {
     std::vector<platform::BackendReport> backendReports() override;
 
   private:
-    const RootFolder _root;
+    const posix::RootFolder _root;
     LocalSystemLog _systemLog;
     LocalFileSystem _fileSystem{_root};
     LocalProcessIdentity _processIdentity{_root};

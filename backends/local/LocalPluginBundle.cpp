@@ -1,7 +1,7 @@
 #include "backends/local/LocalPluginBundle.h"
 
-#include "backends/local/FileContent.h"
-#include "backends/local/SystemError.h"
+#include "backends/posix/FileContent.h"
+#include "backends/posix/SystemError.h"
 #include "platform/Path.h"
 #include "propertylist/PropertyListReader.h"
 
@@ -17,19 +17,21 @@ namespace {
 
 constexpr std::size_t kMaximumInfoSize = std::size_t{1} << 20;
 
-bool isFolder(const RootFolder& root, const std::string& path) {
-    const FileDescriptor file = root.open(path, O_PATH);
+bool isFolder(const posix::RootFolder& root, const std::string& path) {
+    const posix::FileDescriptor file = root.open(path, O_PATH);
     struct stat status = {};
     return file && ::fstat(file.get(), &status) == 0 && S_ISDIR(status.st_mode);
 }
 
 // The library of a folder as a path of this machine, or none with the reason.
-std::optional<std::string> libraryOf(const RootFolder& root, const std::string& path, std::string& reason) {
+std::optional<std::string> libraryOf(const posix::RootFolder& root, const std::string& path,
+                                     std::string& reason) {
     const std::string folder = root.shown(path);
     const std::string infoPath = platform::joinPath(folder, "Info.plist");
     std::string bytes;
-    if (const int error = readFile(root, platform::joinPath(path, "Info.plist"), bytes, kMaximumInfoSize)) {
-        reason = systemError("cannot read " + infoPath, error).message;
+    if (const int error =
+            posix::readFile(root, platform::joinPath(path, "Info.plist"), bytes, kMaximumInfoSize)) {
+        reason = posix::systemError("cannot read " + infoPath, error).message;
         return std::nullopt;
     }
     const PropertyListReadResult info = readPropertyList(bytes);
@@ -69,7 +71,7 @@ platform::PluginSymbol LocalPluginBundle::load(const std::string& path, const ch
     // would be taken for another's. With the root "/" it follows links as the system does.
     const std::string located = _root.isWholeMachine() ? shown : _root.resolve(path).value_or("");
     if (located.empty()) {
-        return {nullptr, systemError("cannot load " + shown, errno).message};
+        return {nullptr, posix::systemError("cannot load " + shown, errno).message};
     }
     // A library is loaded without a look at what it is: scanning many plug-ins should cost what loading
     // costs.

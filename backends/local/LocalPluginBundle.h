@@ -2,7 +2,7 @@
 
 #pragma once
 
-#include "backends/local/RootFolder.h"
+#include "backends/posix/RootFolder.h"
 #include "platform/PluginBundle.h"
 
 namespace welcomer::local {
@@ -11,12 +11,12 @@ namespace welcomer::local {
 // folder is a path in it: one that leads out of the folder, also by a symbolic link, is refused.
 class LocalPluginBundle final : public platform::PluginBundle {
   public:
-    explicit LocalPluginBundle(RootFolder root) : _root(std::move(root)) {}
+    explicit LocalPluginBundle(posix::RootFolder root) : _root(std::move(root)) {}
 
     platform::PluginSymbol load(const std::string& path, const char* symbol) override;
 
   private:
-    const RootFolder _root;
+    const posix::RootFolder _root;
 };
 
 } // namespace welcomer::local

@@ -1,6 +1,6 @@
 #include "backends/local/LocalProcessIdentity.h"
 
-#include "backends/local/Directory.h"
+#include "backends/posix/Directory.h"
 #include "platform/Error.h"
 #include "platform/Path.h"
 
@@ -67,7 +67,7 @@ std::vector<std::string> LocalProcessIdentity::userLibraryDirectories() {
     }
     const std::string library = platform::joinPath(_homeDirectory, "Library");
     // Fails where the folder exists already or the home folder does not; the path is right all the same.
-    makeDirectory(_root, library, kLibraryMode);
+    posix::makeDirectory(_root, library, kLibraryMode);
     return {library};
 }
 

@@ -2,7 +2,7 @@
 
 #pragma once
 
-#include "backends/local/RootFolder.h"
+#include "backends/posix/RootFolder.h"
 #include "platform/ProcessIdentity.h"
 
 #include <mutex>
@@ -13,7 +13,7 @@ namespace welcomer::local {
 // is read once, when a name or a folder is first asked.
 class LocalProcessIdentity final : public platform::ProcessIdentity {
   public:
-    explicit LocalProcessIdentity(RootFolder root) : _root(std::move(root)) {}
+    explicit LocalProcessIdentity(posix::RootFolder root) : _root(std::move(root)) {}
 
     std::uint32_t effectiveUserID() override;
     std::string loginName() override;
@@ -23,7 +23,7 @@ class LocalProcessIdentity final : public platform::ProcessIdentity {
   private:
     void _readEntry();
 
-    const RootFolder _root;
+    const posix::RootFolder _root;
     std::once_flag _entryRead;
     std::string _loginName;
     std::string _homeDirectory; // empty: there is none

@@ -1,6 +1,6 @@
 #include "backends/local/LocalProcessLauncher.h"
 
-#include "backends/local/SystemError.h"
+#include "backends/posix/SystemError.h"
 
 #include <cerrno>
 #include <csignal>
@@ -76,12 +76,12 @@ int LocalProcessLauncher::launchAndWait(const std::string& program,
     const int launched = ::posix_spawn(&process, program.c_str(), streams.get(), attributes.get(),
                                        argumentList(program, arguments).data(), ::environ);
     if (launched != 0) {
-        throw platform::Exception(systemError("cannot launch " + program, launched).message);
+        throw platform::Exception(posix::systemError("cannot launch " + program, launched).message);
     }
     int status = 0;
     while (::waitpid(process, &status, 0) != process) {
         if (errno != EINTR) {
-            throw platform::Exception(systemError("cannot wait for " + program, errno).message);
+            throw platform::Exception(posix::systemError("cannot wait for " + program, errno).message);
         }
     }
     return WIFEXITED(status) ? WEXITSTATUS(status) : kSignalStatusBase + WTERMSIG(status);

@@ -1,6 +1,6 @@
 #include "backends/local/LocalResourceBundles.h"
 
-#include "backends/local/PreferenceFile.h"
+#include "backends/local/DictionaryFile.h"
 #include "platform/Path.h"
 
 #include <cstdlib>
@@ -36,7 +36,9 @@ std::vector<std::string> languageFolders() {
 
 class LocalResourceBundle final : public platform::ResourceBundle {
   public:
-    LocalResourceBundle(RootFolder root, std::string path) : _root(std::move(root)), _path(std::move(path)) {}
+    LocalResourceBundle(posix::RootFolder root, std::string path)
+        : _root(std::move(root)),
+          _path(std::move(path)) {}
 
     std::optional<std::string> pathForResource(const std::string& name, const std::string& type) override {
         if (name.empty()) {
@@ -50,7 +52,7 @@ class LocalResourceBundle final : public platform::ResourceBundle {
     std::string localizedString(const std::string& key, const std::string& fallback) override {
         for (const std::string& folder : languageFolders()) {
             const PropertyList::Dictionary table =
-                readPreferenceFile(_root, platform::joinPath(_path, "Resources") + folder + kTable).values;
+                readDictionaryFile(_root, platform::joinPath(_path, "Resources") + folder + kTable).values;
             const auto found = table.find(key);
             if (found != table.end() && found->second.string()) {
                 return *found->second.string();
@@ -60,7 +62,7 @@ class LocalResourceBundle final : public platform::ResourceBundle {
     }
 
   private:
-    const RootFolder _root;
+    const posix::RootFolder _root;
     const std::string _path;
 };
 
@@ -71,8 +73,8 @@ std::unique_ptr<platform::ResourceBundle> LocalResourceBundles::open(const std::
 }
 
 std::unique_ptr<platform::ResourceBundle> LocalResourceBundles::openMainBundle() {
-    return std::make_unique<LocalResourceBundle>(RootFolder(_mainBundle.empty() ? "/nonexistent" : "/"),
-                                                 _mainBundle);
+    return std::make_unique<LocalResourceBundle>(
+        posix::RootFolder(_mainBundle.empty() ? "/nonexistent" : "/"), _mainBundle);
 }
 
 } // namespace welcomer::local

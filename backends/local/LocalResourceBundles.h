@@ -4,7 +4,7 @@
 
 #pragma once
 
-#include "backends/local/RootFolder.h"
+#include "backends/posix/RootFolder.h"
 #include "platform/ResourceBundle.h"
 
 #include <string>
@@ -15,7 +15,7 @@ class LocalResourceBundles final : public platform::ResourceBundles {
   public:
     //  mainBundle  the main bundle's folder, a path of this machine: the application is where it is, whatever
     //              the root; empty: it has none
-    explicit LocalResourceBundles(RootFolder root, std::string mainBundle = {})
+    explicit LocalResourceBundles(posix::RootFolder root, std::string mainBundle = {})
         : _root(std::move(root)),
           _mainBundle(std::move(mainBundle)) {}
 
@@ -23,7 +23,7 @@ class LocalResourceBundles final : public platform::ResourceBundles {
     std::unique_ptr<platform::ResourceBundle> openMainBundle() override;
 
   private:
-    const RootFolder _root;
+    const posix::RootFolder _root;
     const std::string _mainBundle;
 };
 

@@ -2,9 +2,9 @@
 // many plug-ins, and a sign-in that is answered at once.
 
 #include "backends/Backends.h"
-#include "backends/local/LocalRunLoops.h"
-#include "backends/local/NimbusDirectory.h"
-#include "backends/local/PasswordHash.h"
+#include "backends/local/accounts/NimbusDirectory.h"
+#include "backends/local/accounts/PasswordHash.h"
+#include "backends/local/time/LocalRunLoops.h"
 #include "backends/simulated/VirtualTime.h"
 #include "cloud/NimbusTesselDelegate.h"
 #include "cloud/WLNimbusServiceCatalogue.h"

@@ -1,6 +1,6 @@
 // Completing jobs that return at once, each on a serial queue of its own, against a thread for each.
 
-#include "backends/local/LocalDispatchQueues.h"
+#include "backends/local/time/LocalDispatchQueues.h"
 
 #include <benchmark/benchmark.h>
 

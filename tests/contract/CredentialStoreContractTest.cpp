@@ -2,7 +2,7 @@
 
 #include "tests/contract/CredentialStoreContract.h"
 
-#include "backends/local/LocalCredentialStore.h"
+#include "backends/local/credentials/LocalCredentialStore.h"
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakeCredentialStore.h"
 #include "tests/fakes/FakeFileSystem.h"
@@ -17,7 +17,7 @@ struct LocalCredentials {
     fakes::FakeFileSystem fileSystem{recorder};
     fakes::FakeProcessIdentity identity{recorder, fileSystem};
     TemporaryRoot root;
-    local::LocalCredentialStore store{local::RootFolder(root.path()), identity};
+    local::LocalCredentialStore store{posix::RootFolder(root.path()), identity};
     const std::string storeName = "local file";
 
     LocalCredentials() { root.addDirectory("/home/user/Library"); }

@@ -18,7 +18,7 @@ using Names = std::vector<std::string>;
 
 struct LocalFiles {
     TemporaryRoot root;
-    local::LocalFileSystem fileSystem{local::RootFolder(root.path())};
+    local::LocalFileSystem fileSystem{posix::RootFolder(root.path())};
 
     void addDirectory(const std::string& path) const { root.addDirectory(path); }
     void addFile(const std::string& path, const std::string& content, mode_t mode) const {

@@ -2,10 +2,10 @@
 
 #pragma once
 
-#include "backends/local/LocalAccountService.h"
 #include "backends/local/LocalNotificationCenter.h"
-#include "backends/local/NimbusDirectory.h"
-#include "backends/local/PasswordHash.h"
+#include "backends/local/accounts/LocalAccountService.h"
+#include "backends/local/accounts/NimbusDirectory.h"
+#include "backends/local/accounts/PasswordHash.h"
 #include "propertylist/PropertyListWriter.h"
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakeFileSystem.h"
@@ -42,7 +42,7 @@ struct LocalAccounts {
     local::LocalNotificationCenter center;
     fakes::FakeSystemLog log{recorder};
     local::LocalAccountService service{
-        local::RootFolder(root.path()), identity, time.runLoops, time.dispatchQueues, center, log};
+        posix::RootFolder(root.path()), identity, time.runLoops, time.dispatchQueues, center, log};
 };
 
 } // namespace welcomer::contract

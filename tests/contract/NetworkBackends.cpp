@@ -1,8 +1,8 @@
 #include "tests/contract/NetworkBackends.h"
 
-#include "backends/local/LocalHostReachability.h"
-#include "backends/local/LocalNetworkConfigStore.h"
-#include "backends/local/LocalNetworkStateStore.h"
+#include "backends/local/network/LocalHostReachability.h"
+#include "backends/local/network/LocalNetworkConfigStore.h"
+#include "backends/local/network/LocalNetworkStateStore.h"
 #ifdef WELCOMER_DESKTOP_NETWORK
 #include "backends/desktop/DesktopNetwork.h"
 #include "tests/support/MountNamespace.h"
@@ -18,8 +18,8 @@ namespace {
 class KernelBackend final : public NetworkBackend {
   public:
     explicit KernelBackend(const TemporaryRoot& root)
-        : _configStore(local::RootFolder(root.path())),
-          _stateStore(local::RootFolder(root.path())) {}
+        : _configStore(posix::RootFolder(root.path())),
+          _stateStore(posix::RootFolder(root.path())) {}
 
     platform::NetworkConfigStore& configStore() override { return _configStore; }
     platform::NetworkStateStore& stateStore() override { return _stateStore; }

@@ -28,7 +28,7 @@ struct OnlineAccountBackend {
             desktop::OnlineAccountSurroundings{online,
                                                [this](platform::NotificationCenter& posts) {
                                                    return std::make_unique<local::LocalAccountService>(
-                                                       local::RootFolder(embedded.root.path()),
+                                                       posix::RootFolder(embedded.root.path()),
                                                        embedded.identity, time.runLoops, time.dispatchQueues,
                                                        posts, embedded.log);
                                                },

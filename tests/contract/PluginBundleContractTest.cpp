@@ -16,7 +16,7 @@ namespace {
 // "/plugins/text.ncdplugin", which is no bundle.
 struct LocalPlugins {
     TemporaryRoot root;
-    local::LocalPluginBundle bundles{local::RootFolder(root.path())};
+    local::LocalPluginBundle bundles{posix::RootFolder(root.path())};
 
     LocalPlugins() {
         root.addFile("/plugins/text.ncdplugin", "text");

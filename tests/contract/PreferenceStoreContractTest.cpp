@@ -1,6 +1,6 @@
 // What every preference store does.
 
-#include "backends/local/LocalPreferenceStore.h"
+#include "backends/local/preferences/LocalPreferenceStore.h"
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakePreferenceStore.h"
@@ -50,7 +50,7 @@ class LocalBackend final : public Backend {
     LocalBackend() { _root.addDirectory("/home/user/Library"); }
     platform::PreferenceStore& store() override { return _store; }
     void storeElsewhere(const std::string& key, const std::optional<PropertyList>& value) override {
-        local::LocalPreferenceStore other(local::RootFolder(_root.path()), _identity, _log);
+        local::LocalPreferenceStore other(posix::RootFolder(_root.path()), _identity, _log);
         if (value) {
             other.setValue(key, *value, kDomain);
         } else {
@@ -59,7 +59,7 @@ class LocalBackend final : public Backend {
         ASSERT_TRUE(other.synchronise(kDomain));
     }
     std::optional<PropertyList> readElsewhere(const std::string& key) override {
-        return local::LocalPreferenceStore(local::RootFolder(_root.path()), _identity, _log)
+        return local::LocalPreferenceStore(posix::RootFolder(_root.path()), _identity, _log)
             .copyValue(key, kDomain);
     }
 
@@ -69,7 +69,7 @@ class LocalBackend final : public Backend {
     fakes::FakeFileSystem _fileSystem{_recorder};
     fakes::FakeProcessIdentity _identity{_recorder, _fileSystem};
     fakes::FakeSystemLog _log{_recorder};
-    local::LocalPreferenceStore _store{local::RootFolder(_root.path()), _identity, _log};
+    local::LocalPreferenceStore _store{posix::RootFolder(_root.path()), _identity, _log};
 };
 
 template <class BackendType>

@@ -14,7 +14,7 @@ namespace {
 
 struct LocalUser {
     TemporaryRoot root;
-    local::LocalProcessIdentity identity{local::RootFolder(root.path())};
+    local::LocalProcessIdentity identity{posix::RootFolder(root.path())};
 
     void addDirectory(const std::string& path, mode_t mode) const {
         root.addDirectory(path);

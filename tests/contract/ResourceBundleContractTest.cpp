@@ -17,7 +17,7 @@ namespace {
 // bundle "/Setup.app".
 struct LocalBundles {
     TemporaryRoot root;
-    local::LocalResourceBundles bundles{local::RootFolder(root.path()), root.locate("/Setup.app")};
+    local::LocalResourceBundles bundles{posix::RootFolder(root.path()), root.locate("/Setup.app")};
 
     LocalBundles() {
         root.addFile("/Setup.app/Resources/agent", "");
@@ -109,7 +109,7 @@ class LocalizedStringTest : public testing::Test {
     std::string textsIn(const char* variable, const char* language) {
         ::setenv(variable, language, 1);
         const auto bundle =
-            local::LocalResourceBundles(local::RootFolder("/"), root.locate("/App")).openMainBundle();
+            local::LocalResourceBundles(posix::RootFolder("/"), root.locate("/App")).openMainBundle();
         return bundle->localizedString("A", "-") + " " + bundle->localizedString("B", "-") + " " +
                bundle->localizedString("C", "-");
     }
@@ -127,7 +127,7 @@ TEST_F(LocalizedStringTest, TheLanguageOfTheEnvironmentComesFirstThenItsRelative
 }
 
 TEST_F(LocalizedStringTest, AnApplicationWithoutAMainBundleHasNoTexts) {
-    const auto bundle = local::LocalResourceBundles(local::RootFolder(root.path())).openMainBundle();
+    const auto bundle = local::LocalResourceBundles(posix::RootFolder(root.path())).openMainBundle();
     EXPECT_EQ(bundle->localizedString("A", "-"), "-");
     EXPECT_EQ(bundle->pathForResource("A", ""), std::nullopt);
 }

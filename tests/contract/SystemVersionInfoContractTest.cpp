@@ -18,7 +18,7 @@ namespace {
 class SystemVersionInfoTest : public testing::Test {
   protected:
     TemporaryRoot root;
-    local::LocalFileSystem fileSystem{local::RootFolder(root.path())};
+    local::LocalFileSystem fileSystem{posix::RootFolder(root.path())};
     local::LocalSystemVersionInfo info{fileSystem};
 };
 

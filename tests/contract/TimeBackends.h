@@ -2,9 +2,9 @@
 
 #pragma once
 
-#include "backends/local/LocalClock.h"
-#include "backends/local/LocalDispatchQueues.h"
-#include "backends/local/LocalRunLoops.h"
+#include "backends/local/time/LocalClock.h"
+#include "backends/local/time/LocalDispatchQueues.h"
+#include "backends/local/time/LocalRunLoops.h"
 #include "backends/simulated/VirtualTime.h"
 #ifdef WELCOMER_DESKTOP_RUNLOOP
 #include "backends/desktop/DesktopRunLoops.h"

@@ -53,13 +53,13 @@ class CheckLayers(unittest.TestCase):
         use = '#include "backends/Backends.h"\n'
         self.assertEqual(self.findings({**backend, "agent/main.cpp": use, "tools/welcomer/main.cpp": use}), [])
         self.assert_one({**backend, "agent/Agent.cpp": use}, "chooses a backend")
-        self.assert_one({**backend, "tools/welcomer/TryCommand.cpp": use}, "chooses a backend")
+        self.assert_one({**backend, "tools/welcomer/commands/TryCommand.cpp": use}, "chooses a backend")
 
     def test_only_a_program_chooses_simulated_time(self):
         time = {"backends/simulated/VirtualTime.h": ""}
         use = '#include "backends/simulated/VirtualTime.h"\n'
         self.assertEqual(self.findings({**time, "tools/welcomer/main.cpp": use}), [])
-        self.assert_one({**time, "tools/welcomer/TryCommand.cpp": use}, "chooses a backend")
+        self.assert_one({**time, "tools/welcomer/commands/TryCommand.cpp": use}, "chooses a backend")
 
     def test_a_program_does_not_reach_past_backends_h(self):
         self.assert_one({"backends/local/A.h": "", "agent/main.cpp": '#include "backends/local/A.h"\n'},

@@ -2,8 +2,8 @@
 
 #include "backends/Backends.h"
 #include "backends/simulated/VirtualTime.h"
-#include "tools/welcomer/Tool.h"
-#include "tools/welcomer/ToolBundle.h"
+#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/cli/ToolBundle.h"
 
 namespace {
 

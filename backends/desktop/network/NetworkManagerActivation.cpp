@@ -1,7 +1,7 @@
 #include "backends/desktop/network/NetworkManagerActivation.h"
 
 #include "backends/desktop/network/NetworkManagerDevices.h"
-#include "backends/local/KernelNetwork.h"
+#include "backends/local/network/KernelNetwork.h"
 
 #include <algorithm>
 #include <utility>
@@ -116,7 +116,7 @@ bool hasRouteOf(const std::string& device, const IPv4Plan& plan) {
     }
     local::KernelNetwork kernel;
     const auto link = kernel.linkNamed(device);
-    return link && std::ranges::any_of(kernel.defaultRoutes(), [&](const local::KernelRoute& route) {
+    return link && std::ranges::any_of(kernel.defaultRoutes(), [&](const posix::KernelRoute& route) {
                return route.linkIndex == link->index;
            });
 }

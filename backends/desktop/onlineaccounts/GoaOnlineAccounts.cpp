@@ -231,7 +231,7 @@ bool GoaOnlineAccounts::makeOnce(const NewOnlineAccount& account) {
         return false;
     }
     const std::lock_guard threads(_making);
-    const local::FileLock lock = _lock();
+    const posix::FileLock lock = _lock();
     if (!lock) {
         return false;
     }

@@ -3,7 +3,7 @@
 #pragma once
 
 #include "backends/desktop/OnlineAccounts.h"
-#include "backends/local/FileLock.h"
+#include "backends/posix/FileLock.h"
 
 #include <atomic>
 #include <functional>
@@ -23,7 +23,7 @@ namespace welcomer::desktop {
 class GoaOnlineAccounts final : public OnlineAccounts {
   public:
     //  lock  keeps the user's other processes out, asked when an account is to be made
-    explicit GoaOnlineAccounts(std::function<local::FileLock()> lock) : _lock(std::move(lock)) {}
+    explicit GoaOnlineAccounts(std::function<posix::FileLock()> lock) : _lock(std::move(lock)) {}
 
     // In what state the daemon is.
     enum class Daemon { WithoutBus, Absent, Startable, Silent, Answers };
@@ -45,7 +45,7 @@ class GoaOnlineAccounts final : public OnlineAccounts {
     Connection _connection();
     bool _add(const NewOnlineAccount& account);
 
-    const std::function<local::FileLock()> _lock;
+    const std::function<posix::FileLock()> _lock;
     std::mutex _making; // keeps other threads out
     std::mutex _mutex;
     Connection _bus; // the last one; closed when the bus has gone

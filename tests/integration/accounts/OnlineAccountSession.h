@@ -26,7 +26,7 @@ struct OnlineAccountSession {
     TemporaryRoot folder;
     DesktopSession session{folder.path()};
     desktop::DesktopModule<desktop::OnlineAccountsModule> module{{[this] {
-        return local::FileLock(local::RootFolder(folder.path()), "/locks/online-accounts");
+        return posix::FileLock(posix::RootFolder(folder.path()), "/locks/online-accounts");
     }}};
 };
 

@@ -1,8 +1,8 @@
 // Switches a service of a cloud account and ends.
 //   switch-service ROOT ACCOUNT SERVICE on|off
 
-#include "backends/local/LocalDispatchQueues.h"
-#include "backends/local/LocalRunLoops.h"
+#include "backends/local/time/LocalDispatchQueues.h"
+#include "backends/local/time/LocalRunLoops.h"
 #include "tests/contract/TimeBackends.h"
 #include "tests/integration/accounts/OnlineAccountSession.h"
 
@@ -11,7 +11,7 @@ int main(int argumentCount, char** arguments) {
     if (argumentCount != 5) {
         return 2;
     }
-    const local::RootFolder root(arguments[1]);
+    const posix::RootFolder root(arguments[1]);
     contract::LocalTime time;
     fakes::CallRecorder recorder;
     fakes::FakeFileSystem fileSystem(recorder);
@@ -20,7 +20,7 @@ int main(int argumentCount, char** arguments) {
     fakes::FakeSystemLog log(recorder);
     local::LocalNotificationCenter center;
     desktop::DesktopModule<desktop::OnlineAccountsModule> module({[&] {
-        return local::FileLock(root, "/online-accounts/lock");
+        return posix::FileLock(root, "/online-accounts/lock");
     }});
     desktop::OnlineAccountService service({[&] { return module.service(); },
                                            [&](platform::NotificationCenter& posts) {

@@ -1,7 +1,7 @@
 // The credential store of a desktop on a real gnome-keyring.
 
 #include "backends/desktop/DesktopCredentialStore.h"
-#include "backends/local/LocalCredentialStore.h"
+#include "backends/local/credentials/LocalCredentialStore.h"
 #include "tests/contract/CredentialStoreContract.h"
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeProcessIdentity.h"
@@ -29,7 +29,7 @@ struct UsersCredentials {
     fakes::CallRecorder recorder;
     fakes::FakeFileSystem fileSystem{recorder};
     fakes::FakeProcessIdentity identity{recorder, fileSystem};
-    local::RootFolder root;
+    posix::RootFolder root;
     local::LocalCredentialStore local;
     desktop::DesktopCredentialStore desktop;
 };

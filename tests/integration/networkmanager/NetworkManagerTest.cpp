@@ -1,9 +1,9 @@
 // The network stores and the reachability probe on a real NetworkManager.
 
 #include "backends/desktop/DesktopNetwork.h"
-#include "backends/local/LocalHostReachability.h"
-#include "backends/local/LocalNetworkConfigStore.h"
-#include "backends/local/LocalNetworkStateStore.h"
+#include "backends/local/network/LocalHostReachability.h"
+#include "backends/local/network/LocalNetworkConfigStore.h"
+#include "backends/local/network/LocalNetworkStateStore.h"
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/support/MountNamespace.h"
 #include "tests/support/NetworkManagerDaemon.h"
@@ -126,8 +126,8 @@ class NetworkManagerTest : public testing::Test {
     }
 
     TemporaryRoot root;
-    local::LocalNetworkConfigStore kernelStore{local::RootFolder(root.path())};
-    local::LocalNetworkStateStore kernelStateStore{local::RootFolder(root.path())};
+    local::LocalNetworkConfigStore kernelStore{posix::RootFolder(root.path())};
+    local::LocalNetworkStateStore kernelStateStore{posix::RootFolder(root.path())};
     local::LocalHostReachability kernelReachability;
     desktop::DesktopNetwork network{{kernelStore, kernelStateStore, kernelReachability}, kNetworkModules};
     platform::NetworkConfigStore& store = network.configStore();

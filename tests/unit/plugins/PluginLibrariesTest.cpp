@@ -392,8 +392,8 @@ class ExamplePluginsOnDisk : public testing::Test {
     }
 
     TemporaryRoot root;
-    local::LocalFileSystem files{local::RootFolder(root.path())};
-    local::LocalPluginBundle bundles{local::RootFolder(root.path())};
+    local::LocalFileSystem files{posix::RootFolder(root.path())};
+    local::LocalPluginBundle bundles{posix::RootFolder(root.path())};
     fakes::FakePlatform fake{files, bundles};
     const platform::ScopedPlatform installed{fake.platform()};
 };

@@ -47,7 +47,7 @@ class SwitchControllerFilesTest : public testing::Test {
     }
 
     TemporaryRoot root;
-    local::LocalFileSystem files{local::RootFolder(root.path())};
+    local::LocalFileSystem files{posix::RootFolder(root.path())};
     fakes::FakePlatform fake{files};
     const platform::ScopedPlatform installed{fake.platform()};
 };

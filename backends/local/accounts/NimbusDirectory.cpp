@@ -1,0 +1,195 @@
+#include "backends/local/accounts/NimbusDirectory.h"
+
+#include "backends/local/DictionaryFile.h"
+#include "backends/local/accounts/PasswordHash.h"
+#include "backends/posix/Directory.h"
+#include "platform/AccountService.h"
+#include "propertylist/PropertyListReadings.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <utility>
+
+namespace welcomer::local {
+
+namespace {
+
+constexpr char kUsersKey[] = "Users";
+constexpr char kPasswordKey[] = "Password";
+constexpr char kResponseKey[] = "Response";
+constexpr char kAccountErrorKey[] = "AccountError";
+constexpr char kAccountErrorInfoKey[] = "AccountErrorInfo";
+constexpr char kFailsKey[] = "Fails";
+constexpr char kDelaySecondsKey[] = "DelaySeconds";
+constexpr char kMailAddressKey[] = "MailAddress";
+constexpr char kServicesKey[] = "Services";
+constexpr char kPropertiesKey[] = "Properties";
+constexpr char kStatusKey[] = "status";
+
+constexpr mode_t kFolderMode = 0755; // the folder is not for the directory alone
+
+platform::Outcome failure(std::string message) {
+    return platform::Outcome::failure({0, std::move(message)});
+}
+
+NimbusAnswer accountError(std::int64_t error) {
+    return {false, {{platform::kSKPropertyAccountError, error}}, 0};
+}
+
+bool isRightPassword(const PropertyList& user, const std::string& password) {
+    const PropertyList* hash = user.find(kPasswordKey);
+    return hash && hash->isString() && passwordMatches(password, *hash->string());
+}
+
+double delaySeconds(const PropertyList& user) {
+    const PropertyList* delay = user.find(kDelaySecondsKey);
+    if (!delay) {
+        return 0;
+    }
+    return std::max(0.0, delay->real().value_or(static_cast<double>(delay->integer().value_or(0))));
+}
+
+// Whatever is no plain "no" has the operation fail.
+bool fails(const PropertyList& user) {
+    const PropertyList* setting = user.find(kFailsKey);
+    return user.find(kAccountErrorKey) || (setting && integerIn(*setting) != 0);
+}
+
+// The answer to the right password.
+NimbusAnswer answerOf(const std::string& username, const PropertyList& user) {
+    const PropertyList* response = user.find(kResponseKey);
+    if (response && !response->isDictionary()) {
+        return accountError(platform::kSKAccountErrorServerUnavailable);
+    }
+    NimbusAnswer answer;
+    answer.isCompleted = !fails(user);
+    answer.delaySeconds = delaySeconds(user);
+    if (response) {
+        answer.contents = *response->dictionary();
+    } else if (answer.isCompleted) {
+        answer.contents = {{kStatusKey, 0}};
+    }
+    answer.contents.insert_or_assign(platform::kSKPropertyAccountID, username);
+    if (const PropertyList* error = user.find(kAccountErrorKey)) {
+        answer.contents.insert_or_assign(platform::kSKPropertyAccountError, *error);
+    }
+    if (const PropertyList* info = user.find(kAccountErrorInfoKey)) {
+        answer.contents.insert_or_assign(platform::kSKPropertyAccountErrorInfo, *info);
+    }
+    return answer;
+}
+
+PropertyList::Dictionary everyService() {
+    PropertyList::Dictionary services;
+    for (const char* identifier :
+         {platform::kSKServiceIDContacts, platform::kSKServiceIDCalendars, platform::kSKServiceIDBookMarks,
+          platform::kSKServiceIDMediaStream, platform::kSKServiceIDReminders,
+          platform::kSKServiceIDAccountSync, platform::kSKServiceIDLOC, platform::kSKServiceIDMail,
+          platform::kSKServiceIDNotes, platform::kSKServiceMobileDocuments}) {
+        services.emplace(identifier, PropertyList::Dictionary{});
+    }
+    return services;
+}
+
+void setMailAddress(PropertyList::Dictionary& services, const PropertyList& address) {
+    const auto mail = services.find(platform::kSKServiceIDMail);
+    if (mail == services.end() || !mail->second.isDictionary()) {
+        return;
+    }
+    PropertyList& properties = (*mail->second.dictionary())[kPropertiesKey];
+    if (PropertyList::Dictionary* values = properties.dictionary()) {
+        values->emplace(platform::kSKPropertyMailEmailAddress, address); // one that is there already stays
+    }
+}
+
+} // namespace
+
+NimbusAnswer NimbusDirectory::answer(const std::string& username, const std::string& password) const {
+    const std::optional<PropertyList::Dictionary> users = _users();
+    if (!users) {
+        return accountError(platform::kSKAccountErrorServerUnavailable);
+    }
+    const auto user = users->find(username);
+    if (user == users->end()) {
+        return accountError(platform::kSKAccountErrorUnknownUser);
+    }
+    if (!isRightPassword(user->second, password)) {
+        return accountError(platform::kSKAccountErrorWrongPassword);
+    }
+    return answerOf(username, user->second);
+}
+
+PropertyList::Dictionary NimbusDirectory::servicesOfNewAccount(const std::string& username) const {
+    const std::optional<PropertyList::Dictionary> users = _users();
+    const auto user = users ? users->find(username) : PropertyList::Dictionary::const_iterator{};
+    if (!users || user == users->end()) {
+        return everyService();
+    }
+    const PropertyList* own = user->second.find(kServicesKey);
+    PropertyList::Dictionary services = own && own->isDictionary() ? *own->dictionary() : everyService();
+    if (const PropertyList* address = user->second.find(kMailAddressKey)) {
+        setMailAddress(services, *address);
+    }
+    return services;
+}
+
+std::optional<std::vector<std::string>> NimbusDirectory::userNames() const {
+    const DictionaryFileContent file = readDictionaryFile(_root, kNimbusDirectoryPath);
+    std::vector<std::string> names;
+    const auto users = file.values.find(kUsersKey);
+    const bool isAbsent = users == file.values.end();
+    if (file.state != DictionaryFileContent::State::Whole || (!isAbsent && !users->second.isDictionary())) {
+        return std::nullopt;
+    }
+    if (!isAbsent) {
+        for (const auto& [name, user] : *users->second.dictionary()) {
+            names.push_back(name);
+        }
+    }
+    return names;
+}
+
+platform::Outcome NimbusDirectory::writeUser(const platform::CloudUser& user, IfThere ifThere) const {
+    const std::optional<std::string> hash = makePasswordHash(user.password);
+    if (!hash) {
+        return failure("the system can make no hash of this password");
+    }
+    PropertyList::Dictionary entry{{kPasswordKey, *hash}, {kResponseKey, user.response}};
+    if (user.mailAddress) {
+        entry[kMailAddressKey] = *user.mailAddress;
+    }
+
+    const posix::PathParts path = posix::splitPath(kNimbusDirectoryPath);
+    posix::makeDirectories(_root, path.folder, kFolderMode);
+    LockedDictionaryFolder folder(_root, path.folder, posix::machineLockPath(posix::kMachineFilesLock),
+                                  kFolderMode);
+    if (!folder) {
+        return platform::Outcome::failure(folder.error());
+    }
+    const std::string shown = _root.shown(kNimbusDirectoryPath);
+    DictionaryFileContent file = readDictionaryFile(_root, kNimbusDirectoryPath);
+    if (file.state != DictionaryFileContent::State::Whole) {
+        return failure(shown + ": " + file.reason);
+    }
+    PropertyList& users = file.values.emplace(kUsersKey, PropertyList::Dictionary{}).first->second;
+    if (!users.isDictionary()) {
+        return failure(shown + ": " + kUsersKey + " is no dictionary");
+    }
+    if (ifThere == IfThere::Fail && users.dictionary()->contains(user.name)) {
+        return platform::Outcome::failure({EEXIST, shown + ": the user " + user.name + " exists already"});
+    }
+    users.dictionary()->insert_or_assign(user.name, std::move(entry));
+    return folder.write(path.name, file.values) ? platform::Outcome::success()
+                                                : platform::Outcome::failure(folder.error());
+}
+
+std::optional<PropertyList::Dictionary> NimbusDirectory::_users() const {
+    const DictionaryFileContent file = readDictionaryFile(_root, kNimbusDirectoryPath);
+    const auto users = file.values.find(kUsersKey);
+    if (users == file.values.end() || !users->second.isDictionary()) {
+        return std::nullopt;
+    }
+    return *users->second.dictionary();
+}
+
+} // namespace welcomer::local

@@ -1,0 +1,71 @@
+// The file of the users that can be authenticated on this machine: the server's side of the embedded account
+// service.
+
+#pragma once
+
+#include "backends/posix/RootFolder.h"
+#include "platform/AccountDirectory.h"
+#include "propertylist/PropertyList.h"
+
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace welcomer::local {
+
+// Where the directory lies, below the platform's root.
+inline constexpr char kNimbusDirectoryPath[] = "/var/lib/welcomer/nimbus-directory.plist";
+
+// A property list in any format with one dictionary under "Users", from user name to user. Each user has
+//     Password          the password's hash, as crypt(3) writes it (yescrypt where this system writes it);
+//                       without one no password is right
+//     Response          dictionary: what the server answers to the right password.
+//                       "status" is an integer, 0 for success; "delegates" maps
+//                       delegate identifiers to their responses, with the aliases on
+//                       offer. Without one the answer is a status of 0; what is there and is no
+//                       dictionary cannot be read
+//     AccountError      integer: has the operation fail with this account error
+//     AccountErrorInfo  anything: goes with the account error
+//     Fails             boolean: has the operation fail although there is no account error; so does what
+//                       is there and reads as none
+//     DelaySeconds      number: how long the answer takes
+//     MailAddress       string: the mail service's address in an account that is made for the user
+//     Services          dictionary from service identifier to service, as the account file has them: the
+//                       services of an account that is made for the user, in place of all of them
+struct NimbusAnswer {
+    bool isCompleted = false;
+    PropertyList::Dictionary contents; // what the notification says
+    double delaySeconds = 0;
+};
+
+class NimbusDirectory {
+  public:
+    explicit NimbusDirectory(posix::RootFolder root) : _root(std::move(root)) {}
+
+    // What the server answers to a user name and a password. Reads the directory and computes the password's
+    // hash, which takes some milliseconds on purpose. Any thread.
+    NimbusAnswer answer(const std::string& username, const std::string& password) const;
+
+    // The services that an account gets when it is made: all of them for a user that the directory does not
+    // know. Any thread.
+    PropertyList::Dictionary servicesOfNewAccount(const std::string& username) const;
+
+    // The users' names in order, nobody's where there is no directory; none when it cannot be read or is
+    // damaged. Any thread.
+    std::optional<std::vector<std::string>> userNames() const;
+
+    // Writes a user. A directory that is made for it is its owner's alone: whoever can read it can try
+    // passwords. A damaged one is left as it is. Any thread and any process.
+    //  ifThere  what is done where the directory has somebody of that name: all that it has about them is
+    //           replaced, or the call fails with EEXIST
+    enum class IfThere { Replace, Fail };
+    platform::Outcome writeUser(const platform::CloudUser& user, IfThere ifThere) const;
+
+  private:
+    // What the directory has about a user; none when it cannot be read.
+    std::optional<PropertyList::Dictionary> _users() const;
+
+    const posix::RootFolder _root;
+};
+
+} // namespace welcomer::local

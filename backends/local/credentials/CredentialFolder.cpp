@@ -1,0 +1,136 @@
+#include "backends/local/credentials/CredentialFolder.h"
+
+#include "backends/local/credentials/CredentialItemFormat.h"
+#include "backends/posix/AtomicFile.h"
+#include "backends/posix/FileContent.h"
+#include "platform/CredentialStore.h"
+#include "platform/Path.h"
+#include "propertylist/PropertyListReader.h"
+#include "propertylist/PropertyListWriter.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <fcntl.h>
+#include <optional>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <utility>
+
+namespace welcomer::local {
+
+namespace {
+
+constexpr char kFileName[] = "Items.plist";
+constexpr char kItemsKey[] = "Items";
+constexpr char kVersionKey[] = "Version";
+constexpr int kVersion = 1;
+constexpr mode_t kFileMode = 0600;
+constexpr mode_t kWritableByOthers = 022;
+
+bool isOwn(const struct stat& status) {
+    return status.st_uid == ::geteuid() && (status.st_mode & kWritableByOthers) == 0;
+}
+
+bool isSymbolicLink(const posix::FolderEntry& entry) {
+    struct stat status = {};
+    return entry && ::fstatat(entry.folder(), entry.name(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
+           S_ISLNK(status.st_mode);
+}
+
+bool takeItems(std::string_view bytes, PropertyList::Array& items) {
+    PropertyListReadResult result = readPropertyList(bytes);
+    PropertyList::Dictionary* store = result ? result.value->dictionary() : nullptr;
+    if (!store || !store->contains(kVersionKey) || !store->contains(kItemsKey) ||
+        store->at(kVersionKey) != PropertyList(kVersion)) {
+        return false;
+    }
+    PropertyList::Array* stored = store->at(kItemsKey).array();
+    if (!stored || !std::all_of(stored->begin(), stored->end(), isCredentialItem)) {
+        return false;
+    }
+    items = std::move(*stored);
+    return true;
+}
+
+} // namespace
+
+bool credentialFileIsAbsent(const posix::RootFolder& root, const std::string& folderPath) {
+    return !root.exists(platform::joinPath(folderPath, kFileName)) && errno == ENOENT;
+}
+
+std::int32_t CredentialFolder::open(const posix::RootFolder& root, const std::string& path) {
+    _folder = root.open(path, O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
+    if (!_folder && errno == ENOENT) {
+        return platform::kCredentialItemNotFound;
+    }
+    if (!_folder) {
+        return isSymbolicLink(root.entry(path)) ? platform::kCredentialStoreUnsafe
+                                                : platform::kCredentialReadFailed;
+    }
+    struct stat status = {};
+    if (::fstat(_folder.get(), &status) != 0) {
+        return platform::kCredentialReadFailed;
+    }
+    return isOwn(status) ? platform::kCredentialSuccess : platform::kCredentialStoreUnsafe;
+}
+
+std::int32_t CredentialFolder::lock(const posix::RootFolder& root, const std::string& path) {
+    _lock = posix::FileLock(root, path);
+    if (!_lock) {
+        return _lock.error().number == ETIMEDOUT ? platform::kCredentialStoreInUse
+                                                 : platform::kCredentialWriteFailed;
+    }
+    posix::removeLeftOver(_folder.get(), kFileName);
+    return platform::kCredentialSuccess;
+}
+
+std::int32_t CredentialFolder::load(PropertyList::Array& items) {
+    items.clear();
+    _changed = 0;
+    // A pipe must not block.
+    const posix::FileDescriptor file(
+        ::openat(_folder.get(), kFileName, O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK));
+    if (!file && errno == ENOENT) {
+        return platform::kCredentialSuccess;
+    }
+    if (!file) {
+        return errno == ELOOP ? platform::kCredentialStoreUnsafe : platform::kCredentialReadFailed;
+    }
+    struct stat status = {};
+    if (::fstat(file.get(), &status) != 0) {
+        return platform::kCredentialReadFailed;
+    }
+    if (!S_ISREG(status.st_mode) || !isOwn(status)) {
+        return platform::kCredentialStoreUnsafe;
+    }
+    _changed = status.st_mtim.tv_sec;
+    std::string bytes;
+    if (posix::readAll(file.get(), bytes) != 0) {
+        return platform::kCredentialReadFailed;
+    }
+    return takeItems(bytes, items) ? platform::kCredentialSuccess : platform::kCredentialStoreDamaged;
+}
+
+std::int32_t CredentialFolder::save(PropertyList::Array items) const {
+    if (items.empty()) {
+        const bool removed = ::unlinkat(_folder.get(), kFileName, 0) == 0;
+        if (removed) {
+            // A deleted item must not come back after a crash.
+            ::fsync(_folder.get());
+            return platform::kCredentialSuccess;
+        }
+        if (errno != EBUSY) {
+            return platform::kCredentialWriteFailed;
+        }
+        // A mount point cannot be removed: it keeps an empty list.
+    }
+    PropertyList::Dictionary store;
+    store[kVersionKey] = kVersion;
+    store[kItemsKey] = std::move(items);
+    const std::optional<std::string> bytes = writeXMLPropertyList(PropertyList(std::move(store)));
+    return bytes && posix::replaceFile(_folder.get(), kFileName, *bytes, kFileMode) == 0
+               ? platform::kCredentialSuccess
+               : platform::kCredentialWriteFailed;
+}
+
+} // namespace welcomer::local

@@ -1,0 +1,52 @@
+// Generic-password items in one file of the user's own.
+
+#pragma once
+
+#include "backends/local/credentials/CredentialFolder.h"
+#include "backends/posix/RootFolder.h"
+#include "platform/CredentialStore.h"
+#include "platform/ProcessIdentity.h"
+
+namespace welcomer::local {
+
+// The file is "Items.plist" (0600) in "<home>/Library/Credentials" (0700), an XML property list. What keeps a
+// secret from others is the file's mode alone: an item's access description and its trusted applications are
+// kept and shown, but NOT enforced. Every program of the user can read every item.
+//
+// The folder and the file are used only when they are the user's own, no symbolic links, and writable by
+// nobody else. Writers take the folder's lock (FileLock.h) and replace the file in one step; readers take no
+// lock. A file that cannot be read as what it should be is never written again, until somebody removes it.
+// Deleting the last item removes the file. All items have one time, the file's. Looking up an item in a store
+// that does not exist makes one system call where the root is "/".
+class LocalCredentialStore final : public platform::CredentialStore {
+  public:
+    // Borrows the identity, which must outlive the store.
+    LocalCredentialStore(posix::RootFolder root, platform::ProcessIdentity& identity)
+        : _root(std::move(root)),
+          _identity(identity) {}
+
+    std::int32_t createTrustedApplication(const std::string& path,
+                                          platform::TrustedApplication& application) override;
+    std::int32_t createAccess(const std::string& description,
+                              std::vector<platform::TrustedApplication> trustedApplications,
+                              platform::CredentialAccess& access) override;
+    std::int32_t createItem(const platform::CredentialItem& item, const std::string& data) override;
+    std::int32_t findItem(const std::string& service, const std::string& account, std::string* data,
+                          std::unique_ptr<platform::CredentialItemReference>* reference) override;
+    std::int32_t readAttributes(const platform::CredentialItemReference& reference,
+                                platform::CredentialItem& item) override;
+    std::int32_t deleteItem(const platform::CredentialItemReference& reference) override;
+
+  private:
+    // The library folder, which is not made.
+    std::string _library();
+    // The folder of the credentials.
+    std::string _folderPath();
+    // Keeps other writers out.
+    std::int32_t _lock(CredentialFolder& folder);
+
+    const posix::RootFolder _root;
+    platform::ProcessIdentity& _identity;
+};
+
+} // namespace welcomer::local

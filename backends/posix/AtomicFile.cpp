@@ -1,0 +1,75 @@
+#include "backends/posix/AtomicFile.h"
+
+#include "backends/posix/FileContent.h"
+#include "backends/posix/FileDescriptor.h"
+
+#include <cerrno>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace welcomer::posix {
+
+namespace {
+
+// One name for all writers: they hold the lock, and so the next one meets and replaces what is left over.
+std::string temporaryName(const std::string& name) {
+    return "." + name + ".new";
+}
+
+int writeNewFile(int folder, const std::string& name, std::string_view content, mode_t mode) {
+    const FileDescriptor file(
+        ::openat(folder, name.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, mode));
+    if (!file || ::fchmod(file.get(), mode) != 0) {
+        return errno;
+    }
+    if (const int error = writeAll(file.get(), content)) {
+        return error;
+    }
+    return ::fsync(file.get()) == 0 ? 0 : errno;
+}
+
+int rewriteInPlace(int folder, const std::string& name, std::string_view content) {
+    const FileDescriptor file(::openat(folder, name.c_str(), O_WRONLY | O_NOFOLLOW | O_CLOEXEC));
+    struct stat before = {};
+    if (!file || ::fstat(file.get(), &before) != 0) {
+        return errno;
+    }
+    const auto size = static_cast<off_t>(content.size());
+    if (const int error = size > before.st_size ? ::posix_fallocate(file.get(), 0, size) : 0) {
+        return ::ftruncate(file.get(), before.st_size) == 0 ? error : errno;
+    }
+    if (const int error = writeAll(file.get(), content)) {
+        return error;
+    }
+    return ::ftruncate(file.get(), size) == 0 && ::fsync(file.get()) == 0 ? 0 : errno;
+}
+
+} // namespace
+
+int replaceFile(int folder, const std::string& name, std::string_view content, mode_t mode,
+                AfterCrash afterCrash) {
+    removeLeftOver(folder, name);
+    const std::string temporary = temporaryName(name);
+    int error = writeNewFile(folder, temporary, content, mode);
+    if (error == 0 && ::renameat(folder, temporary.c_str(), folder, name.c_str()) != 0) {
+        error = errno == EBUSY ? rewriteInPlace(folder, name, content) : errno;
+        removeLeftOver(folder, name);
+        return error;
+    }
+    if (error != 0) {
+        removeLeftOver(folder, name);
+        return error;
+    }
+    if (afterCrash == AfterCrash::New) {
+        // The file is in place already: a folder that cannot be synced takes nothing back.
+        ::fsync(folder);
+    }
+    return 0;
+}
+
+void removeLeftOver(int folder, const std::string& name) {
+    ::unlinkat(folder, temporaryName(name).c_str(), 0);
+}
+
+} // namespace welcomer::posix

@@ -1,0 +1,191 @@
+#include "backends/posix/NetlinkMessages.h"
+
+#include "backends/posix/IPv4Text.h"
+
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <linux/if_link.h>
+#include <linux/netlink.h>
+#include <linux/rtnetlink.h>
+#include <random>
+#include <string>
+#include <sys/socket.h>
+#include <vector>
+
+namespace welcomer::posix {
+namespace {
+
+// The payload of a message: what follows its header.
+std::string payloadOf(NetlinkRequest& request) {
+    return std::string(request.bytes(1).substr(sizeof(nlmsghdr)));
+}
+
+std::string linkMessage() {
+    ifinfomsg body = {};
+    body.ifi_index = 7;
+    body.ifi_type = 1;
+    NetlinkRequest request(RTM_NEWLINK, 0, body);
+    request.addAttribute(IFLA_IFNAME, "eth7", 5);
+    request.addNumber(IFLA_LINK, 3);
+    request.addNumber(IFLA_MASTER, 4);
+    const std::string kind("\x0b\0\x01\0macvlan", 11); // length, type, text
+    request.addAttribute(IFLA_LINKINFO, kind.data(), kind.size());
+    return payloadOf(request);
+}
+
+std::string routeMessage() {
+    rtmsg body = {};
+    body.rtm_family = AF_INET;
+    body.rtm_table = RT_TABLE_MAIN;
+    body.rtm_type = RTN_UNICAST;
+    NetlinkRequest request(RTM_NEWROUTE, 0, body);
+    request.addNumber(RTA_OIF, 7);
+    request.addAddress(RTA_GATEWAY, 0xC0000201);
+    request.addNumber(RTA_PRIORITY, 9);
+    return payloadOf(request);
+}
+
+std::string addressMessage() {
+    ifaddrmsg body = {};
+    body.ifa_family = AF_INET;
+    body.ifa_prefixlen = 24;
+    body.ifa_index = 7;
+    NetlinkRequest request(RTM_NEWADDR, 0, body);
+    request.addAddress(IFA_ADDRESS, 0xC0000202);
+    request.addAddress(IFA_LOCAL, 0xC0000207);
+    return payloadOf(request);
+}
+
+TEST(NetlinkMessagesTest, ALinkIsReadWithItsAttributes) {
+    const auto link = readLink(linkMessage());
+    ASSERT_TRUE(link);
+    EXPECT_EQ(link->index, 7);
+    EXPECT_EQ(link->name, "eth7");
+    EXPECT_EQ(link->kind, "macvlan");
+    EXPECT_EQ(link->linkIndex, 3);
+    EXPECT_EQ(link->masterIndex, 4);
+}
+
+TEST(NetlinkMessagesTest, ALinkOfAnotherNamespaceIsNoLinkBelow) {
+    ifinfomsg body = {};
+    body.ifi_index = 7;
+    NetlinkRequest request(RTM_NEWLINK, 0, body);
+    request.addNumber(IFLA_LINK_NETNSID, 0);
+    request.addNumber(IFLA_LINK, 3);
+    request.addAttribute(IFLA_IFNAME, "eth7", 5);
+    EXPECT_EQ(readLink(payloadOf(request))->linkIndex, 0);
+}
+
+TEST(NetlinkMessagesTest, AnAddressIsTheLinksOwnAndNotItsPeers) {
+    EXPECT_EQ(readAddress(addressMessage()), (KernelAddress{7, 0xC0000207, 24}));
+}
+
+TEST(NetlinkMessagesTest, ADefaultRouteIsReadWithGatewayAndMetric) {
+    EXPECT_EQ(readDefaultRoute(routeMessage()), (KernelRoute{7, 0xC0000201, 9}));
+}
+
+TEST(NetlinkMessagesTest, MessagesOfOtherFamiliesAndRoutesAreNone) {
+    std::string address = addressMessage();
+    address[0] = AF_INET6;
+    EXPECT_FALSE(readAddress(address));
+    address = addressMessage();
+    address[1] = 33; // the prefix length
+    EXPECT_FALSE(readAddress(address));
+    std::string route = routeMessage();
+    route[1] = 8; // the destination's length
+    EXPECT_FALSE(readDefaultRoute(route));
+    route = routeMessage();
+    route[4] = 99; // the table
+    EXPECT_FALSE(readDefaultRoute(route));
+}
+
+TEST(NetlinkMessagesTest, CutOffMessagesAreNone) {
+    for (const auto& [message, read] : std::vector<std::pair<std::string, bool (*)(std::string_view)>>{
+             {linkMessage(),
+              [](std::string_view bytes) {
+                  return readLink(bytes).has_value();
+              }},
+             {addressMessage(),
+              [](std::string_view bytes) {
+                  return readAddress(bytes).has_value();
+              }},
+             {routeMessage(), [](std::string_view bytes) {
+                  return readDefaultRoute(bytes).has_value();
+              }}}) {
+        EXPECT_TRUE(read(message));
+        for (std::size_t size = 0; size < 12; ++size) {
+            EXPECT_FALSE(read(message.substr(0, size)));
+        }
+        EXPECT_FALSE(read(message.substr(0, message.size() - 5)));
+        for (std::size_t size = 0; size < message.size(); ++size) {
+            read(std::string(message.data(), size)); // within its bounds, which the sanitizers watch
+        }
+    }
+}
+
+TEST(NetlinkMessagesTest, LengthsThatMakeNoSenseEndTheReading) {
+    std::string message = linkMessage();
+    for (const char length : {'\0', '\3', '\xff'}) {
+        message[sizeof(ifinfomsg)] = length;
+        EXPECT_FALSE(readLink(message));
+    }
+}
+
+TEST(NetlinkMessagesTest, RandomBytesAreReadWithinTheirBounds) {
+    std::mt19937 random(1);
+    for (int round = 0; round < 20000; ++round) {
+        std::string bytes =
+            round % 3 == 0 ? linkMessage() : (round % 3 == 1 ? addressMessage() : routeMessage());
+        for (int change = 0; change < 4; ++change) {
+            bytes[random() % bytes.size()] = static_cast<char>(random());
+        }
+        const std::string exact(bytes.data(), random() % (bytes.size() + 1));
+        readLink(exact);
+        readAddress(exact);
+        readDefaultRoute(exact);
+        readNetlinkMessages(exact, [](const NetlinkMessage&) { return true; });
+    }
+}
+
+TEST(NetlinkMessagesTest, ADatagramsMessagesAreShownInOrder) {
+    ifinfomsg body = {};
+    NetlinkRequest first(RTM_GETLINK, NLM_F_DUMP, body);
+    NetlinkRequest second(RTM_GETADDR, 0, body);
+    std::string datagram(first.bytes(4));
+    datagram += second.bytes(5);
+    std::vector<std::uint32_t> sequences;
+    const auto take = [&](const NetlinkMessage& message) {
+        sequences.push_back(message.sequence);
+        return sequences.size() < 2;
+    };
+    EXPECT_TRUE(readNetlinkMessages(datagram + "rest", take)); // not looked at any more
+    EXPECT_EQ(sequences, (std::vector<std::uint32_t>{4, 5}));
+    sequences.clear();
+    EXPECT_FALSE(readNetlinkMessages(datagram.substr(0, datagram.size() - 1), take));
+    EXPECT_EQ(sequences, (std::vector<std::uint32_t>{4}));
+}
+
+// Addresses as text
+
+TEST(IPv4TextTest, OnlyFourDecimalNumbersAreAnAddress) {
+    EXPECT_EQ(parseIPv4("192.0.2.7"), 0xC0000207U);
+    for (const char* text :
+         {"", "1.2.3", "1.2.3.4.5", "256.1.1.1", "1.2.3.4 ", " 1.2.3.4", "0x1.2.3.4", "a.b.c.d"}) {
+        EXPECT_EQ(parseIPv4(text), std::nullopt) << text;
+    }
+    EXPECT_EQ(parseIPv4(std::string("1.2.3.4\0x", 9)), std::nullopt);
+    EXPECT_EQ(formatIPv4(0xC0000207U), "192.0.2.7");
+}
+
+TEST(IPv4TextTest, AMaskIsOnesBeforeZeros) {
+    for (int length = 0; length <= 32; ++length) {
+        EXPECT_EQ(prefixLengthOf(maskOf(length)), length);
+    }
+    EXPECT_EQ(formatIPv4(maskOf(23)), "255.255.254.0");
+    EXPECT_EQ(prefixLengthOf(*parseIPv4("255.0.255.0")), std::nullopt);
+    EXPECT_EQ(prefixLengthOf(*parseIPv4("0.0.0.1")), std::nullopt);
+}
+
+} // namespace
+} // namespace welcomer::posix

@@ -1,0 +1,34 @@
+#include "tools/welcomer/cli/Printable.h"
+
+#include <gtest/gtest.h>
+
+namespace welcomer::tool {
+namespace {
+
+TEST(Printable, PlainTextAndUTF8StayAsTheyAre) {
+    EXPECT_EQ(printable("Zürich – 東京 \\n"), "Zürich – 東京 \\n");
+}
+
+TEST(Printable, ControlCharactersCannotReachTheTerminal) {
+    EXPECT_EQ(printable("a\nb\tc\x1b[2Jd\x7f"
+                        "e\r"),
+              "a\\nb\\tc\\x1b[2Jd\\x7fe\\x0d");
+    EXPECT_EQ(printable(std::string_view("\0", 1)), "\\x00");
+}
+
+TEST(Printable, ControlCharactersBeyondAsciiCannotEither) {
+    EXPECT_EQ(printable("\xc2\x9b"
+                        "2J"),
+              "\\x9b2J");
+    EXPECT_EQ(printable("\xc2\xa0"), "\xc2\xa0"); // the first one that is none
+    EXPECT_EQ(printable("\xc2"), "\xc2");
+    EXPECT_EQ(printable("\u2028"), "\\u{2028}");
+}
+
+TEST(Printable, ColumnsCountCharactersNotBytes) {
+    EXPECT_EQ(columns(""), 0U);
+    EXPECT_EQ(columns("Zürich"), 6U);
+}
+
+} // namespace
+} // namespace welcomer::tool

@@ -1,0 +1,199 @@
+#include "tools/welcomer/cli/Tool.h"
+
+#include "tools/welcomer/cli/Commands.h"
+#include "tools/welcomer/cli/Printable.h"
+
+#include <CLI/CLI.hpp>
+#include <filesystem>
+#include <iostream>
+#include <optional>
+#include <utility>
+
+namespace welcomer::tool {
+
+namespace {
+
+int fail(const std::string& reason, int status) {
+    std::cout.flush();
+    std::cerr << "welcomer: " << printable(reason) << '\n';
+    return status;
+}
+
+// What every level of the command line has in common.
+void configure(CLI::App& app) {
+    app.fallthrough(); // the options for every command may stand before and after it
+    app.get_formatter()->label("SUBCOMMAND", "COMMAND");
+    app.get_formatter()->label("SUBCOMMANDS", "COMMAND");
+    app.get_formatter()->label("REQUIRED", "(required)");
+}
+
+CLI::App& addLevel(CLI::App& parent, const std::string& name, const std::string& description) {
+    CLI::App& level = *parent.add_subcommand(name, description);
+    configure(level);
+    level.group("Commands");
+    level.footer("For every command: --root, --json, --verbose (see welcomer --help).");
+    return level;
+}
+
+std::string fullName(const CLI::App& app) {
+    return app.get_parent() ? fullName(*app.get_parent()) + " " + app.get_name() : app.get_name();
+}
+
+// The last of the commands that the arguments named.
+const CLI::App& namedLast(const CLI::App& app) {
+    const std::vector<CLI::App*> named = app.get_subcommands();
+    return named.empty() ? app : namedLast(*named.front());
+}
+
+// What is wrong with the arguments at this level.
+std::string explain(const CLI::ParseError& error, const CLI::App& app, const CLI::App& level) {
+    const bool needsCommand = level.get_require_subcommand_min() > 0;
+    if (!needsCommand || !dynamic_cast<const CLI::RequiredError*>(&error)) {
+        return error.what();
+    }
+    const std::vector<std::string> unknown = app.remaining(true); // they fall through to the top
+    return unknown.empty() ? "a command is needed" : "there is no command " + unknown.front();
+}
+
+void addGlobalOptions(CLI::App& app, Options& options) {
+    app.add_option("--root", options.root,
+                   "Look up every path of the system, the home folder among them, below this folder")
+        ->type_name("DIR")
+        ->check([](const std::string& folder) {
+            return std::string(folder.empty() ? "the folder's name is empty" : "");
+        });
+    app.add_flag("--json", options.json, "Print the result as one JSON document");
+    app.add_flag("--verbose", options.verbose, "Show the system's log lines on stderr as they come");
+    app.set_version_flag("--version", "welcomer " WELCOMER_VERSION);
+}
+
+// Reads the command line.
+//  result  the exit status when there is nothing left to do
+std::optional<int> parse(CLI::App& app, int argc, char** argv) {
+    try {
+        app.parse(argc, argv);
+        return std::nullopt;
+    } catch (const CLI::CallForVersion& version) {
+        std::cout << version.what() << '\n';
+        return kExitSuccess;
+    } catch (const CLI::CallForHelp&) {
+        std::cout << app.help();
+        return kExitSuccess;
+    } catch (const CLI::ParseError& error) {
+        const CLI::App& level = namedLast(app);
+        return fail(explain(error, app, level) + " (see " + fullName(level) + " --help)", kExitUsage);
+    }
+}
+
+void settleRoot(Options& options) {
+    options.rootGiven = !options.root.empty();
+    if (!options.rootGiven) {
+        options.root = "/";
+    } else if (!std::filesystem::is_directory(options.root)) {
+        throw CommandFailure("--root: there is no folder " + options.root);
+    } else {
+        options.root = std::filesystem::canonical(options.root).string();
+    }
+}
+
+// Says on stderr, at its end, which preferences were damaged: they count as empty.
+class DamageReport {
+  public:
+    explicit DamageReport(platform::PreferenceStore& preferences) : _preferences(preferences) {}
+    ~DamageReport() {
+        std::cout.flush();
+        for (const platform::DamagedPreferences& damage : _preferences.damagedPreferences()) {
+            const std::string place =
+                damage.setAsidePath.empty() ? "still in their place" : "now at " + damage.setAsidePath;
+            std::cerr << printable("welcomer: the preferences " + damage.domain + " are damaged (" +
+                                   damage.reason + ") and " + place)
+                      << '\n';
+        }
+    }
+    DamageReport(const DamageReport&) = delete;
+    DamageReport& operator=(const DamageReport&) = delete;
+
+  private:
+    platform::PreferenceStore& _preferences;
+};
+
+int runCommand(const Command& command, const Options& options, const PlatformFactory& buildPlatform) {
+    KeptLog log;
+    log.setVerbose(options.verbose);
+    PlatformRequest request{options.root, &log};
+    request.storesCredentialsLocally = options.storesLocally;
+    const PlatformHandle platform = buildPlatform(request);
+    const platform::ScopedPlatform installed(*platform);
+    const DamageReport damageReport(platform->preferenceStore);
+    Session session{options, buildPlatform, log, std::cout};
+    command(session);
+    std::cout.flush();
+    return std::cout ? kExitSuccess : fail("the output could not be written", kExitFailed);
+}
+
+} // namespace
+
+CLI::App& CommandLine::addGroup(const std::string& name, const std::string& description) {
+    CLI::App& group = addLevel(_app, name, description);
+    group.require_subcommand(1);
+    return group;
+}
+
+CLI::App& CommandLine::addCommand(const std::string& name, const std::string& description, Command command) {
+    return addCommand(_app, name, description, std::move(command));
+}
+
+CLI::App& CommandLine::addCommand(CLI::App& group, const std::string& name, const std::string& description,
+                                  Command command) {
+    if (_needsHome) {
+        command = [command = std::move(command)](Session& session) {
+            platform::current().processIdentity.homeDirectory(); // throws where there is none
+            command(session);
+        };
+    }
+    CLI::App& added = addLevel(group, name, description);
+    added.callback([this, &added, command = std::move(command)] {
+        _chosen = command;
+        _chosenName = fullName(added);
+    });
+    return added;
+}
+
+void CommandLine::addLocalOption(CLI::App& command) {
+    command.add_flag("--local", _options.storesLocally,
+                     "Store the replay item in the user's local file, whatever keyring there is; the agent "
+                     "finds it there");
+}
+
+int runTool(int argc, char** argv, const PlatformFactory& buildPlatform) {
+    CLI::App app(
+        "Finishes a user's cloud-account setup after the first login: looks at it, tries it, prepares it.",
+        "welcomer");
+    configure(app);
+    app.require_subcommand(1);
+    app.footer("Results go to stdout, errors to stderr.\n"
+               "Exit status: 0 done, 1 failed, 2 the command line makes no sense.");
+    Options options;
+    addGlobalOptions(app, options);
+    CommandLine commandLine(app, options);
+    for (const CommandAdder& commands : kCommands) {
+        commandLine.setNeedsHome(commands.needsHome);
+        commands.add(commandLine);
+    }
+    if (const auto status = parse(app, argc, argv)) {
+        return *status;
+    }
+
+    try {
+        settleRoot(options);
+        return runCommand(commandLine.chosen(), options, buildPlatform);
+    } catch (const UsageError& error) {
+        return fail(std::string(error.what()) + " (see " + commandLine.chosenName() + " --help)", kExitUsage);
+    } catch (const std::filesystem::filesystem_error& error) {
+        return fail(error.path1().string() + ": " + error.code().message(), kExitFailed);
+    } catch (const std::exception& error) {
+        return fail(error.what(), kExitFailed);
+    }
+}
+
+} // namespace welcomer::tool

@@ -1,0 +1,95 @@
+// The frame of the tool: its command line, its exit status, and what it hands to each command.
+
+#pragma once
+
+#include "tools/welcomer/cli/PlatformFactory.h"
+#include "tools/welcomer/story/KeptLog.h"
+
+#include <functional>
+#include <iosfwd>
+#include <stdexcept>
+#include <string>
+
+namespace CLI {
+class App;
+}
+
+namespace welcomer::tool {
+
+inline constexpr int kExitSuccess = 0;
+inline constexpr int kExitFailed = 1;
+inline constexpr int kExitUsage = 2;
+
+// The options that every command takes.
+struct Options {
+    std::string root; // absolute; "/" when none was given
+    bool rootGiven = false;
+    bool json = false;
+    bool verbose = false;
+    bool storesLocally = false; // what `--local` asks for, of the commands that have it
+};
+
+// What a command works with. The platform for the chosen root is installed while it runs.
+struct Session {
+    const Options& options;
+    const PlatformFactory& buildPlatform;
+    const KeptLog& log; // the system's own log lines so far
+    std::ostream& out;  // results; errors are thrown
+};
+
+// A command's work. What it throws ends the tool with one line on stderr.
+using Command = std::function<void(Session&)>;
+
+// The command did not do what was asked: exit status 1.
+class CommandFailure : public std::runtime_error {
+  public:
+    using std::runtime_error::runtime_error;
+};
+
+// The command line makes no sense, in a way that only the command itself can tell: exit status 2.
+class UsageError : public std::runtime_error {
+  public:
+    using std::runtime_error::runtime_error;
+};
+
+// What a command registers itself with: the command line being built, and the place for the chosen command.
+class CommandLine {
+  public:
+    //  options  where the options for every command are put; borrowed
+    CommandLine(CLI::App& app, Options& options) : _app(app), _options(options) {}
+
+    // A group of commands, such as `replay`: it is called with one of the commands below it.
+    CLI::App& addGroup(const std::string& name, const std::string& description);
+
+    // A command below the program or a group.
+    //  command  what it does; runs after the whole command line has been read
+    //  result   the place for its options
+    CLI::App& addCommand(const std::string& name, const std::string& description, Command command);
+    CLI::App& addCommand(CLI::App& group, const std::string& name, const std::string& description,
+                         Command command);
+
+    // Whether the commands that are added next need a home folder: where the user has none, they end with one
+    // line that says so.
+    void setNeedsHome(bool needsHome) { _needsHome = needsHome; }
+
+    // Gives a command the option `--local`, which has the platform store new credentials in the local store.
+    void addLocalOption(CLI::App& command);
+
+    // The command that the arguments chose, with its full name.
+    const Command& chosen() const { return _chosen; }
+    const std::string& chosenName() const { return _chosenName; }
+
+  private:
+    CLI::App& _app;
+    Options& _options;
+    bool _needsHome = false;
+    Command _chosen;
+    std::string _chosenName;
+};
+
+// Runs the tool.
+//  result  the exit status: 0, kExitFailed or kExitUsage
+// Main thread, no other thread running.
+int runTool(int argc, char** argv, const PlatformFactory& buildPlatform);
+
+} // namespace welcomer::tool

@@ -1,0 +1,260 @@
+// welcomer account: the accounts of the current user, and who can sign in.
+
+#include "cloud/WLLoggedInNimbusAccount.h"
+#include "platform/Platform.h"
+#include "plugins/DelegateIdentifiers.h"
+#include "plugins/WLNimbusDelegatesRequest.h"
+#include "propertylist/UTF8.h"
+#include "tools/welcomer/cli/Commands.h"
+#include "tools/welcomer/cli/Printable.h"
+#include "tools/welcomer/cli/TextTable.h"
+#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/commands/ServiceStates.h"
+#include "tools/welcomer/story/SetupFlow.h"
+#include "tools/welcomer/terminal/Password.h"
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <cerrno>
+#include <memory>
+#include <ostream>
+#include <set>
+
+namespace welcomer::tool {
+
+namespace {
+
+struct AddArguments {
+    std::string user;
+    std::string mailAddress;
+    std::vector<std::string> aliases;
+    PasswordSource password;
+};
+
+struct SignInArguments {
+    std::string user;
+    PasswordSource password;
+};
+
+void refuseEmpty(const std::string& user) {
+    if (user.empty()) {
+        throw UsageError("the user's name is empty");
+    }
+}
+
+// Whether a text that is UTF-8 has a control character: U+0000 to U+001F and U+007F to U+009F.
+bool hasControlCharacter(const std::string& text) {
+    bool isAfterC2 = false; // the lead byte of U+0080 to U+00BF
+    return std::ranges::any_of(text, [&](char each) {
+        const auto byte = static_cast<unsigned char>(each);
+        const bool isControl = byte < 0x20 || byte == 0x7F || (isAfterC2 && byte < 0xA0);
+        isAfterC2 = byte == 0xC2;
+        return isControl;
+    });
+}
+
+// Refuses names that nobody could type, or that would be taken for an option or a path.
+void refuseUnusable(const std::string& user) {
+    refuseEmpty(user);
+    if (user.starts_with('-')) {
+        throw UsageError("a user's name does not begin with \"-\": " + user);
+    }
+    if (user.find('/') != std::string::npos) {
+        throw UsageError("a user's name holds no slash: " + user);
+    }
+    if (const std::size_t offset = findInvalidXMLText(user); offset != std::string::npos) {
+        throw UsageError("a user's name cannot hold " + describeInvalidXMLText(user, offset));
+    }
+    if (hasControlCharacter(user)) {
+        throw UsageError("a user's name holds no control character: " + user);
+    }
+}
+
+CommandFailure existsAlready(const std::string& user) {
+    return CommandFailure("the user " + user + " exists already");
+}
+
+// What the server will answer: a response for every delegate that the system knows, with the aliases on offer
+// for those that have aliases.
+PropertyList::Dictionary responseFor(const std::vector<std::string>& aliases) {
+    PropertyList::Dictionary delegates;
+    for (const char* identifier : {kVidlinkIdentifier, kChatterIdentifier}) {
+        delegates[identifier] = PropertyList::Dictionary{
+            {"status", 0}, {"aliases", PropertyList::Array(aliases.begin(), aliases.end())}};
+    }
+    for (const std::string& identifier : WLNimbusStoreDelegateIdentifiers()) {
+        delegates[identifier] = PropertyList::Dictionary{{"status", 0}};
+    }
+    return {{"status", 0}, {"delegates", delegates}};
+}
+
+void add(Session& session, const AddArguments& arguments) {
+    refuseUnusable(arguments.user);
+    platform::AccountDirectory& directory = platform::current().accountDirectory;
+    // So that nobody is asked for a password in vain; adding decides.
+    const auto users = directory.users();
+    if (users && std::ranges::find(*users, arguments.user) != users->end()) {
+        throw existsAlready(arguments.user);
+    }
+    const std::string password =
+        getNewPassword(arguments.password, "New password for " + arguments.user + ":");
+    platform::CloudUser user{arguments.user, password, std::nullopt, responseFor(arguments.aliases)};
+    if (!arguments.mailAddress.empty()) {
+        user.mailAddress = arguments.mailAddress;
+    }
+    if (const platform::Outcome outcome = directory.addUser(user); !outcome) {
+        throw outcome.error.number == EEXIST
+            ? existsAlready(arguments.user)
+            : CommandFailure("cannot add " + arguments.user + ": " + outcome.error.message);
+    }
+    if (session.options.json) {
+        printJson(session.out, {{"user", arguments.user}, {"added", true}});
+    } else {
+        session.out << "Added " << printable(arguments.user) << ", who can sign in from now on.\n";
+    }
+}
+
+std::string loggedInName() {
+    const auto account = WLLoggedInNimbusAccount();
+    return account ? account->accountID() : "";
+}
+
+void list(Session& session) {
+    platform::AccountDirectory& directory = platform::current().accountDirectory;
+    const std::vector<std::string> accounts = directory.accounts();
+    const auto users = directory.users();
+    const std::string loggedIn = loggedInName();
+    const auto hasAccount = [&](const std::string& name) {
+        return std::ranges::find(accounts, name) != accounts.end();
+    };
+    const auto canSignIn = [&](const std::string& name) {
+        return users && std::ranges::find(*users, name) != users->end();
+    };
+    std::set<std::string> names(accounts.begin(), accounts.end());
+    if (users) {
+        names.insert(users->begin(), users->end());
+    }
+    if (session.options.json) {
+        Json entries = Json::array();
+        for (const std::string& name : names) {
+            entries.push_back({{"name", name},
+                               {"canSignIn", users ? Json(canSignIn(name)) : Json()},
+                               {"hasAccount", hasAccount(name)},
+                               {"loggedIn", name == loggedIn}});
+        }
+        printJson(session.out, {{"accounts", entries}});
+        return;
+    }
+    if (names.empty()) {
+        session.out << "No accounts, and nobody who can sign in.\n";
+        return;
+    }
+    TextTable table({"NAME", "CAN SIGN IN", "ACCOUNT", "LOGGED IN"});
+    for (const std::string& name : names) {
+        table.addRow({name, users ? (canSignIn(name) ? "yes" : "no") : "unknown",
+                      hasAccount(name) ? "yes" : "no", name == loggedIn ? "yes" : "no"});
+    }
+    table.print(session.out);
+}
+
+void status(Session& session) {
+    const auto account = WLLoggedInNimbusAccount();
+    const std::vector<std::string> enabled = enabledServices(serviceStates(account.get()));
+    const bool noneIsEnabled = WLNoNimbusServicesEnabled();
+    if (session.options.json) {
+        printJson(session.out, {{"loggedIn", account ? Json(account->accountID()) : Json()},
+                                {"enabledServices", enabled},
+                                {"noServicesEnabled", noneIsEnabled}});
+        return;
+    }
+    if (!account) {
+        session.out << "Nobody is logged in to a cloud account.\n";
+        return;
+    }
+    session.out << "Logged in:         " << printable(account->accountID()) << '\n';
+    session.out << "Enabled services:  ";
+    for (const std::string& identifier : enabled) {
+        session.out << (identifier == enabled.front() ? "" : ", ") << serviceName(identifier);
+    }
+    session.out << (noneIsEnabled ? "none\n" : "\n");
+}
+
+void signIn(Session& session, const SignInArguments& arguments) {
+    refuseEmpty(arguments.user);
+    SetupFlow::checkWhoIsLoggedIn(arguments.user);
+    const std::string password = getPassword(arguments.password, "Password for " + arguments.user + ":");
+    SetupFlow flow(session.log, session.out, !session.options.verbose);
+    flow.signIn(arguments.user, password);
+    flow.complete({}, false); // no service: that is for setup
+    if (session.options.json) {
+        printJson(session.out, {{"account", arguments.user}, {"signedIn", true}});
+    } else {
+        session.out << printable(arguments.user) << " is signed in.\n";
+    }
+}
+
+void showServices(Session& session, const std::string& user) {
+    std::shared_ptr<platform::CloudAccount> account;
+    if (user.empty()) {
+        account = WLLoggedInNimbusAccount();
+    } else {
+        account = platform::current().accountService.sharedManager().accountForID(user, false);
+    }
+    if (!account) {
+        throw CommandFailure(user.empty() ? "nobody is logged in to a cloud account; name one"
+                                          : "there is no account " + user);
+    }
+    const std::vector<ServiceState> states = serviceStates(account.get());
+    if (session.options.json) {
+        printJson(session.out, {{"account", account->accountID()}, {"services", toJson(states)}});
+    } else {
+        printServiceStates(session.out, states);
+    }
+}
+
+void addAdd(CommandLine& commandLine, CLI::App& group) {
+    const auto arguments = std::make_shared<AddArguments>();
+    CLI::App& command =
+        commandLine.addCommand(group, "add",
+                               "Let somebody sign in: adds a user to the machine's directory of users, which "
+                               "stands for the server",
+                               [arguments](Session& session) { add(session, *arguments); });
+    command.add_option("user", arguments->user, "The user's name")->type_name("USER")->required();
+    command.add_option("--mail", arguments->mailAddress, "The address of the account's mail service")
+        ->type_name("ADDRESS");
+    command
+        .add_option("--alias", arguments->aliases,
+                    "An alias that is offered for video calling and messaging; may be given several times")
+        ->type_name("A")
+        ->expected(1)
+        ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
+    addPasswordOption(command, arguments->password);
+}
+
+void addSignIn(CommandLine& commandLine, CLI::App& group) {
+    const auto arguments = std::make_shared<SignInArguments>();
+    CLI::App& command =
+        commandLine.addCommand(group, "sign-in", "Sign in to an account, without enabling any service",
+                               [arguments](Session& session) { signIn(session, *arguments); });
+    command.add_option("user", arguments->user, "The user's name")->type_name("USER")->required();
+    addPasswordOption(command, arguments->password);
+}
+
+} // namespace
+
+void addAccountCommands(CommandLine& commandLine) {
+    CLI::App& group = commandLine.addGroup("account", "The user's cloud accounts, and who can sign in");
+    addAdd(commandLine, group);
+    commandLine.addCommand(group, "list", "Show the accounts, and who can sign in", list);
+    commandLine.addCommand(group, "status", "Show who is logged in, with the services that are enabled",
+                           status);
+    addSignIn(commandLine, group);
+
+    const auto user = std::make_shared<std::string>();
+    CLI::App& services = commandLine.addCommand(group, "services", "Show the services of an account",
+                                                [user](Session& session) { showServices(session, *user); });
+    services.add_option("user", *user, "The account; without it the one that is logged in")
+        ->type_name("USER");
+}
+
+} // namespace welcomer::tool

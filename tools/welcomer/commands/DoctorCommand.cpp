@@ -1,0 +1,80 @@
+// welcomer doctor: which backend serves each interface on this machine, and what is missing.
+
+#include "platform/Path.h"
+#include "platform/Platform.h"
+#include "tools/welcomer/cli/Commands.h"
+#include "tools/welcomer/cli/Printable.h"
+#include "tools/welcomer/cli/PropertyListOutput.h"
+#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/commands/ResolverReport.h"
+
+#include <CLI/CLI.hpp>
+#include <cstdlib>
+#include <ostream>
+#include <vector>
+
+namespace welcomer::tool {
+
+namespace {
+
+using platform::BackendReport;
+
+std::string runtimeFolder() {
+    const char* const folder = std::getenv("XDG_RUNTIME_DIR");
+    if (folder && *folder != '\0') {
+        return folder;
+    }
+    return "/run/user/" + std::to_string(platform::current().processIdentity.effectiveUserID());
+}
+
+// Whether launch agents become services of their own.
+BackendReport userManagerReport() {
+    if (platform::current().fileSystem.exists(platform::joinPath(runtimeFolder(), "systemd/private"))) {
+        return {"launch service", "user manager", "a user manager runs", ""};
+    }
+    return {"launch service", "child processes", "no user manager runs for this user",
+            "log in to a session with systemd, so that each launch agent is a service of its own"};
+}
+
+std::vector<BackendReport> allReports(Session& session) {
+    std::vector<BackendReport> reports;
+    PlatformRequest request;
+    request.root = session.options.root;
+    request.systemLog = &platform::current().systemLog;
+    request.backendReports = &reports;
+    const PlatformHandle platform = session.buildPlatform(request);
+    reports.push_back(userManagerReport());
+    reports.push_back(resolverReport(session.options.root));
+    return reports;
+}
+
+void examine(Session& session) {
+    const std::vector<BackendReport> reports = allReports(session);
+    if (session.options.json) {
+        Json entries = Json::array();
+        for (const BackendReport& report : reports) {
+            entries.push_back({{"interface", report.interface},
+                               {"backend", report.backend},
+                               {"reason", report.reason},
+                               {"advice", report.advice.empty() ? Json() : Json(report.advice)}});
+        }
+        printJson(session.out, {{"backends", entries}});
+        return;
+    }
+    for (const BackendReport& report : reports) {
+        session.out << printable(report.interface) << ": " << printable(report.backend) << " ("
+                    << printable(report.reason) << ")\n";
+        if (!report.advice.empty()) {
+            session.out << "    advice: " << printable(report.advice) << '\n';
+        }
+    }
+}
+
+} // namespace
+
+void addDoctorCommand(CommandLine& commandLine) {
+    commandLine.addCommand(
+        "doctor", "Show which service of the desktop serves what here, and what is missing", examine);
+}
+
+} // namespace welcomer::tool

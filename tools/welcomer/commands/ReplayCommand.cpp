@@ -1,0 +1,139 @@
+// welcomer replay: the replay item, as the setup application leaves it for the agent.
+
+#include "handoff/ReplayItem.h"
+#include "handoff/WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup.h"
+#include "propertylist/UnwritableValue.h"
+#include "tools/welcomer/cli/Commands.h"
+#include "tools/welcomer/cli/Printable.h"
+#include "tools/welcomer/cli/PropertyListFile.h"
+#include "tools/welcomer/cli/PropertyListOutput.h"
+#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/commands/ReplayReason.h"
+
+#include <CLI/CLI.hpp>
+#include <filesystem>
+#include <memory>
+#include <ostream>
+
+namespace welcomer::tool {
+
+namespace {
+
+struct StoreArguments {
+    std::string account;
+    std::string file;
+    std::string bundle;
+};
+
+// A path of the system, given on the command line.
+std::string systemPath(const Options& options, const std::string& path) {
+    if (path.starts_with('/')) {
+        return path;
+    }
+    if (options.root != "/") {
+        throw UsageError("--bundle: " + path + " is looked up below --root and needs to begin with /");
+    }
+    return std::filesystem::absolute(path).string();
+}
+
+void store(Session& session, const StoreArguments& arguments) {
+    const platform::Platform& platform = platform::current();
+    const std::string bundlePath = systemPath(session.options, arguments.bundle);
+    const PropertyList replayObject = readPropertyListFile(arguments.file);
+    // The writer would store an item without content in its place.
+    if (const auto unwritable = findUnwritableValue(replayObject)) {
+        throw CommandFailure(arguments.file + " cannot be stored: " + *unwritable);
+    }
+    if (!platform.fileSystem.exists(bundlePath)) {
+        throw CommandFailure("there is no bundle at " + bundlePath +
+                             (session.options.root == "/" ? "" : " below " + session.options.root));
+    }
+    const auto bundle = platform.resourceBundles.open(bundlePath);
+    if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(arguments.account, replayObject,
+                                                                      *bundle)) {
+        throw CommandFailure("cannot store the replay item and install the agent: " +
+                             storingReason(session.log));
+    }
+    if (session.options.json) {
+        printJson(session.out, {{"account", arguments.account}, {"stored", true}});
+    } else {
+        session.out << "Stored the replay item for " << printable(arguments.account)
+                    << " and installed the agent for the next login.\n";
+    }
+}
+
+// No store enforces an item's access: each says who can read the item in truth.
+void printAccess(std::ostream& out, const ReplayItem& found) {
+    out << "Stored in: " << found.store.name << '\n';
+    const std::optional<platform::CredentialAccess>& access = found.item.access;
+    out << "Access:    " << (access ? printable(access->description) : "the store's default") << '\n';
+    if (access) {
+        for (const platform::TrustedApplication& application : access->trustedApplications) {
+            out << "Trusted:   " << printable(application.path) << '\n';
+        }
+        out << "           (kept with the item, but the " << found.store.name << " does not enforce it)\n";
+    }
+    out << "Readers:   " << found.store.readers << '\n';
+}
+
+void show(Session& session) {
+    ReplayItem found;
+    if (!readReplayItem(found)) {
+        throw CommandFailure("cannot read the replay item: " + replayReason(session.log));
+    }
+    const std::string& account = found.item.label;
+    if (session.options.json) {
+        printJson(session.out, {{"account", account}, {"replay", toJson(found.replayObject)}});
+        return;
+    }
+    session.out << "Account:   " << printable(account) << '\n';
+    printAccess(session.out, found);
+    session.out << "Replay object:\n";
+    printOutline(session.out, found.replayObject, "  ");
+}
+
+void remove(Session& session) {
+    if (!WLDeleteNimbusReplayKeychainItem()) {
+        throw CommandFailure("cannot delete the replay item: " + replayReason(session.log));
+    }
+    if (session.options.json) {
+        printJson(session.out, {{"deleted", true}});
+    } else {
+        session.out << "Deleted the replay item.\n";
+    }
+}
+
+void addStore(CommandLine& commandLine, CLI::App& group) {
+    const auto arguments = std::make_shared<StoreArguments>();
+    CLI::App& command = commandLine.addCommand(
+        group, "store",
+        "Store the replay item and install the agent for the next login, as a setup application does",
+        [arguments](Session& session) { store(session, *arguments); });
+    command.add_option("--account", arguments->account, "The user's cloud account name")
+        ->type_name("NAME")
+        ->required();
+    command
+        .add_option("--file", arguments->file,
+                    "The replay object, a property list of any format; - for stdin")
+        ->type_name("PLIST")
+        ->required();
+    command
+        .add_option(
+            "--bundle", arguments->bundle,
+            "The setup application's bundle; like every path of the system it is looked up below --root")
+        ->type_name("DIR")
+        ->required();
+    commandLine.addLocalOption(command);
+}
+
+} // namespace
+
+void addReplayCommands(CommandLine& commandLine) {
+    CLI::App& group =
+        commandLine.addGroup("replay", "The replay item, which waits for the agent of the next login");
+    addStore(commandLine, group);
+    commandLine.addCommand(group, "show", "Show the replay item; it stays where it is", show);
+    commandLine.addCommand(group, "delete", "Delete the replay item; the launch agent stays", remove);
+}
+
+} // namespace welcomer::tool

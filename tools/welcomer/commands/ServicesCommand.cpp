@@ -1,0 +1,153 @@
+// welcomer services: the catalogue of services, and enabling those of one phase.
+
+#include "cloud/WLNimbusServiceCatalogue.h"
+#include "cloud/WLNimbusSetupWithDictionary.h"
+#include "platform/Platform.h"
+#include "tools/welcomer/cli/Commands.h"
+#include "tools/welcomer/cli/Printable.h"
+#include "tools/welcomer/cli/TextTable.h"
+#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/commands/ServiceStates.h"
+#include "tools/welcomer/story/PendingBlocks.h"
+#include "tools/welcomer/terminal/WaitingLine.h"
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <memory>
+#include <mutex>
+#include <ostream>
+
+namespace welcomer::tool {
+
+namespace {
+
+struct EnableArguments {
+    std::string account;
+    std::string phase;
+    std::string only;
+    std::vector<std::string> selected;
+
+    bool isPostLogin() const { return phase == "post"; }
+};
+
+// Keeps every line: they are all that enabling says.
+class LineLog final : public KeptLog {
+  public:
+    void write(int priority, const std::string& message) override {
+        KeptLog::write(priority, message);
+        const std::lock_guard lock(_mutex);
+        _lines.push_back(message);
+    }
+    std::vector<std::string> lines() const {
+        const std::lock_guard lock(_mutex);
+        return _lines;
+    }
+
+  private:
+    mutable std::mutex _mutex; // delayed services are enabled on other threads
+    std::vector<std::string> _lines;
+};
+
+void list(Session& session) {
+    const std::vector<CatalogueEntry> entries = serviceCatalogue();
+    if (session.options.json) {
+        Json services = Json::array();
+        for (const CatalogueEntry& entry : entries) {
+            services.push_back({{"service", entry.name},
+                                {"identifier", entry.identifier},
+                                {"phase", entry.phase()},
+                                {"delayed", entry.isDelayed}});
+        }
+        printJson(session.out, {{"services", services}});
+        return;
+    }
+    TextTable table({"SERVICE", "PHASE", "DELAYED", "IDENTIFIER"});
+    for (const CatalogueEntry& entry : entries) {
+        table.addRow({entry.name, entry.phase(), entry.isDelayed ? "yes" : "no", entry.identifier});
+    }
+    table.print(session.out);
+}
+
+std::vector<std::string> selectedServices(const std::vector<std::string>& names) {
+    if (names.empty()) {
+        return WLNimbusAllSetupServiceIDs();
+    }
+    std::vector<std::string> identifiers;
+    std::ranges::transform(names, std::back_inserter(identifiers), serviceNamed);
+    return identifiers;
+}
+
+std::vector<ServiceState> statesOf(const std::string& account) {
+    return serviceStates(
+        platform::current().accountService.sharedManager().accountForID(account, false).get());
+}
+
+// Calls the module and waits for what it puts off.
+void enableAndWait(const EnableArguments& arguments, const std::vector<std::string>& selected,
+                   PendingBlocks& blocks, const KeptLog& log, bool showsWaiting) {
+    const PropertyList::Dictionary setup{{platform::kSKPropertyAccountID, arguments.account}};
+    if (!WLNimbusSetupWithDictionary2(setup, selected, arguments.only == "kvs", arguments.isPostLogin(),
+                                      nullptr, nullptr)) {
+        throw CommandFailure("no service was enabled: " + log.reason());
+    }
+    const WaitingLine waiting("Waiting for the services that are enabled later", showsWaiting);
+    blocks.wait();
+}
+
+void enable(Session& session, const EnableArguments& arguments) {
+    const std::vector<std::string> selected = selectedServices(arguments.selected);
+    LineLog log;
+    log.setVerbose(session.options.verbose);
+    PendingBlocks blocks(platform::current().dispatchQueues);
+    PlatformRequest request;
+    request.root = session.options.root;
+    request.systemLog = &log;
+    request.dispatchQueues = &blocks;
+    const PlatformHandle platform = session.buildPlatform(request);
+    const platform::ScopedPlatform installed(*platform);
+
+    enableAndWait(arguments, selected, blocks, log, !session.options.verbose);
+    const std::vector<ServiceState> states = statesOf(arguments.account);
+    if (session.options.json) {
+        printJson(session.out, {{"account", arguments.account},
+                                {"phase", arguments.isPostLogin() ? "post-login" : "pre-login"},
+                                {"log", log.lines()},
+                                {"services", toJson(states)}});
+        return;
+    }
+    for (const std::string& line : log.lines()) {
+        session.out << printable(line) << '\n';
+    }
+    session.out << '\n';
+    printServiceStates(session.out, states);
+}
+
+} // namespace
+
+void addServicesCommands(CommandLine& commandLine) {
+    CLI::App& group = commandLine.addGroup("services", "The services of the cloud account");
+    commandLine.addCommand(group, "list", "Show every service with the phase in which setup enables it",
+                           list);
+
+    const auto arguments = std::make_shared<EnableArguments>();
+    CLI::App& command = commandLine.addCommand(
+        group, "enable",
+        "Enable an account's services of one phase and wait for those that are enabled later; what is "
+        "decided about each is shown as it is logged. An account that is missing is made.",
+        [arguments](Session& session) { enable(session, *arguments); });
+    command.add_option("--account", arguments->account, "The cloud account")->type_name("USER")->required();
+    command.add_option("--phase", arguments->phase, "pre: before the first login; post: after it")
+        ->required()
+        ->check(CLI::IsMember({"pre", "post"}));
+    command.add_option("--only", arguments->only, "kvs: documents and data alone, whatever else is given")
+        ->check(CLI::IsMember({"kvs"}));
+    command
+        .add_option("--select", arguments->selected,
+                    "A service that the user kept selected, by name or identifier; may be given several "
+                    "times. Without it every service is selected.")
+        ->type_name("ID")
+        ->expected(1)
+        ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
+}
+
+} // namespace welcomer::tool

@@ -1,0 +1,83 @@
+// welcomer switch: which environment of the cloud service this machine's resolver is pointed to.
+
+#include "switch/SwitchController.h"
+#include "tools/welcomer/cli/Commands.h"
+#include "tools/welcomer/cli/PropertyListOutput.h"
+#include "tools/welcomer/cli/Tool.h"
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <memory>
+#include <ostream>
+
+namespace welcomer::tool {
+
+namespace {
+
+Json currentAsJson(const SwitchController& controller) {
+    const auto name = controller.theCurrentServerName();
+    return name ? Json(*name) : Json();
+}
+
+void list(Session& session) {
+    SwitchController& controller = SwitchController::sharedController();
+    if (session.options.json) {
+        printJson(session.out,
+                  {{"servers", controller.availableServers()}, {"current", currentAsJson(controller)}});
+        return;
+    }
+    for (const std::string& name : controller.availableServers()) {
+        session.out << (name == controller.theCurrentServerName() ? "* " : "  ") << name << '\n';
+    }
+}
+
+void show(Session& session) {
+    const SwitchController& controller = SwitchController::sharedController();
+    if (session.options.json) {
+        printJson(session.out, {{"current", currentAsJson(controller)},
+                                {"isPointedToProd", controller.isPointedToProd()},
+                                {"canChangeConfiguration", controller.canChangeConfiguration()}});
+        return;
+    }
+    session.out << controller.theCurrentServerName().value_or(
+                       "Unknown: the overrides are not the switch's own")
+                << '\n';
+}
+
+void select(Session& session, const std::string& name) {
+    SwitchController& controller = SwitchController::sharedController();
+    const auto& names = controller.availableServers();
+    const auto found = std::ranges::find(names, name);
+    if (found == names.end()) {
+        throw UsageError("there is no environment " + name);
+    }
+    if (!controller.canChangeConfiguration()) {
+        throw CommandFailure("only the superuser can switch the environment");
+    }
+    controller.setSelectedIndex(static_cast<std::uint64_t>(found - names.begin()));
+    if (controller.theCurrentServerName() != name) {
+        throw CommandFailure("cannot switch to " + name + ": " + session.log.reason());
+    }
+    if (session.options.json) {
+        printJson(session.out, {{"current", name}});
+    } else {
+        session.out << "Pointed to " << name << ".\n";
+    }
+}
+
+} // namespace
+
+void addSwitchCommands(CommandLine& commandLine) {
+    CLI::App& group =
+        commandLine.addGroup("switch", "The cloud service's environment that the resolver is pointed to");
+    commandLine.addCommand(group, "list", "List the environments; a star marks the current one", list);
+    commandLine.addCommand(group, "show", "Show the current environment", show);
+    const auto name = std::make_shared<std::string>();
+    CLI::App& selector = commandLine.addCommand(
+        group, "select",
+        "Point the resolver at an environment; every file in /etc/resolver is replaced. For the superuser",
+        [=](Session& session) { select(session, *name); });
+    selector.add_option("name", *name, "The environment's name, or Prod")->type_name("NAME")->required();
+}
+
+} // namespace welcomer::tool

@@ -1,0 +1,193 @@
+#include "tools/welcomer/story/SetupFlow.h"
+
+#include "cloud/WLLoggedInNimbusAccount.h"
+#include "cloud/WLSetupProbes.h"
+#include "handoff/LaunchAgentFile.h"
+#include "handoff/ReplayItem.h"
+#include "handoff/WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup.h"
+#include "platform/Path.h"
+#include "platform/Platform.h"
+#include "plugins/DelegateIdentifiers.h"
+#include "plugins/WLNimbusDelegatesRequest.h"
+#include "propertylist/PropertyListReadings.h"
+#include "propertylist/UnwritableValue.h"
+#include "text/Describe.h"
+#include "tools/welcomer/cli/StandardOutputGuard.h"
+#include "tools/welcomer/commands/ReplayReason.h"
+#include "tools/welcomer/terminal/WaitingLine.h"
+
+#include <algorithm>
+#include <memory>
+#include <optional>
+#include <utility>
+
+namespace welcomer::tool {
+
+namespace {
+
+const PropertyList* find(const PropertyList::Dictionary& dictionary, const char* key) {
+    const auto found = dictionary.find(key);
+    return found == dictionary.end() ? nullptr : &found->second;
+}
+
+std::string textOf(std::int64_t accountError) {
+    switch (accountError) {
+    case platform::kSKAccountErrorWrongPassword:
+        return "the password is wrong";
+    case platform::kSKAccountErrorUnknownUser:
+        return "there is no such user";
+    case platform::kSKAccountErrorTermsOfService:
+        return "the terms of service are to be accepted first";
+    case platform::kSKAccountErrorServerUnavailable:
+        return "the server's directory of users is missing or cannot be read";
+    case platform::kSKAccountErrorRepair:
+        return "the account is to be repaired first";
+    case platform::kSKAccountErrorNotStored:
+        return "the account could not be stored";
+    default:
+        return "account error " + std::to_string(accountError);
+    }
+}
+
+std::optional<std::int64_t> accountErrorOf(const PropertyList::Dictionary& response) {
+    const PropertyList* error = find(response, platform::kSKPropertyAccountError);
+    return error ? integerIn(*error) : std::nullopt;
+}
+
+// Why the account service refused, for people.
+std::string refusal(const PropertyList::Dictionary& response) {
+    const PropertyList* error = find(response, platform::kSKPropertyAccountError);
+    if (!error) {
+        return "the server gave no reason";
+    }
+    const std::optional<std::int64_t> code = integerIn(*error);
+    if (!code) {
+        return "the server's account error is no number: " + text::describe(*error);
+    }
+    const PropertyList* information = find(response, platform::kSKPropertyAccountErrorInfo);
+    return textOf(*code) + (information ? " (" + text::describe(*information) + ")" : "");
+}
+
+} // namespace
+
+void SetupFlow::checkWhoIsLoggedIn(const std::string& account) {
+    const auto loggedIn = WLLoggedInNimbusAccount();
+    if (loggedIn && loggedIn->accountID() != account) {
+        throw CommandFailure(loggedIn->accountID() + " is logged in to the cloud already");
+    }
+}
+
+void SetupFlow::checkNothingIsWaiting(bool storesLocally) {
+    const platform::Platform& platform = platform::current();
+    const std::int32_t status =
+        platform.credentialStore.findItem(kReplayItemService, kReplayItemAccount, nullptr, nullptr);
+    if (status == platform::kCredentialSuccess) {
+        throw CommandFailure("a replay item is waiting for the next login already (see welcomer replay)");
+    }
+    if (status != platform::kCredentialItemNotFound && !storesLocally) {
+        throw CommandFailure("cannot tell whether a replay item is waiting for the next login already: " +
+                             platform::credentialStatusText(status) + storingAdvice(status));
+    }
+    const std::string agent =
+        platform::joinPath(platform.processIdentity.homeDirectory(),
+                           std::string("Library/LaunchAgents/") + kLaunchAgentLabel + ".plist");
+    if (platform.fileSystem.exists(agent)) {
+        throw CommandFailure("the agent is installed already: " + agent);
+    }
+}
+
+void SetupFlow::signIn(const std::string& account, const std::string& password) {
+    const StandardOutputGuard guard(_out);
+    const WaitingLine waiting("Signing in", _showsWaiting);
+    _account = account;
+    _password = password;
+    _delegate = std::make_unique<NimbusTesselDelegate>(); // one is meant for one sign-in
+    if (!_delegate->signInWithUsernameAndPasswordAdditionalDelegatesOmittingDelegatesError(account, password,
+                                                                                           {}, {}, nullptr)) {
+        throw _signInFailure();
+    }
+}
+
+std::vector<AliasOffer> SetupFlow::aliasOffers() {
+    const StandardOutputGuard guard(_out);
+    std::vector<AliasOffer> offers{
+        {kVidlinkIdentifier, "video calling", kReplayVidlinkAliasesKey, {}},
+        {kChatterIdentifier, "messaging", kReplayChatterAliasesKey, {}},
+    };
+    std::erase_if(offers, [this](AliasOffer& offer) {
+        const PropertyList* response = _response(offer.identifier);
+        const auto aliases =
+            response ? WLNimbusGetMessagingAliasesFromDelegateResponse(offer.identifier, *response)
+                     : std::nullopt;
+        offer.aliases = aliases.value_or(std::vector<std::string>());
+        return !aliases;
+    });
+    return offers;
+}
+
+std::vector<std::string> SetupFlow::delegates() {
+    const StandardOutputGuard guard(_out);
+    std::vector<std::string> identifiers = WLNimbusAllDelegateIdentifiers();
+    std::erase_if(identifiers, [this](const std::string& identifier) {
+        return identifier == kSkylarkIdentifier || !_response(identifier);
+    });
+    std::ranges::sort(identifiers);
+    return identifiers;
+}
+
+void SetupFlow::checkHandOver(const ChosenAliases& aliases) const {
+    if (const auto unwritable = findUnwritableValue(_replayObject(aliases))) {
+        throw CommandFailure("cannot hand over to the next login what the server answered: " + *unwritable);
+    }
+}
+
+void SetupFlow::complete(const std::vector<std::string>& services, bool justTheAccountAndKVS) {
+    const WaitingLine waiting("Setting up the account", _showsWaiting);
+    std::string reason;
+    const auto observation = platform::current().notificationCenter.addObserver(
+        platform::kSKNotificationSignInFailed,
+        [&](const platform::Notification& notification) { reason = refusal(notification.contents); });
+    const PropertyList::Dictionary setup{{platform::kSKPropertyAccountID, _account}};
+    if (!_delegate
+             ->completeSetupWithUsernamePasswordNimbusDictionarySelectedServicesJustTheAccountAndKVSWindowError(
+                 _account, _password, setup, services, justTheAccountAndKVS, nullptr, nullptr)) {
+        throw CommandFailure("the sign-in could not be completed: " +
+                             (reason.empty() ? _log.reason() : reason));
+    }
+}
+
+void SetupFlow::handOver(const ChosenAliases& aliases, platform::ResourceBundle& bundle) {
+    if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(_account, _replayObject(aliases),
+                                                                      bundle)) {
+        throw CommandFailure("cannot hand over to the next login: " + storingReason(_log));
+    }
+    WLCallTesselFinishedSetup();
+}
+
+PropertyList::Dictionary SetupFlow::_replayObject(const ChosenAliases& aliases) const {
+    PropertyList::Dictionary replay{{kReplayResponsesKey, *_delegate->delegatesResponseDict()}};
+    for (const auto& [identifier, key] : {std::pair{kVidlinkIdentifier, kReplayVidlinkAliasesKey},
+                                          std::pair{kChatterIdentifier, kReplayChatterAliasesKey}}) {
+        const auto chosen = aliases.find(identifier);
+        if (chosen != aliases.end()) {
+            replay[key] = PropertyList::Array(chosen->second.begin(), chosen->second.end());
+        }
+    }
+    return replay;
+}
+
+SignInFailure SetupFlow::_signInFailure() const {
+    const std::string who = "cannot sign in " + _account + ": ";
+    const auto& response = _delegate->delegatesResponseDict();
+    if (!response) {
+        return {who + "the server answered with a status other than 0", std::nullopt};
+    }
+    return {who + refusal(*response), accountErrorOf(*response)};
+}
+
+const PropertyList* SetupFlow::_response(const std::string& delegate) const {
+    const PropertyList* responses = find(*_delegate->delegatesResponseDict(), kReplayDelegatesKey);
+    return responses ? responses->find(delegate) : nullptr;
+}
+
+} // namespace welcomer::tool

@@ -1,0 +1,72 @@
+#include "tools/welcomer/terminal/Password.h"
+
+#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/terminal/Terminal.h"
+
+#include <CLI/CLI.hpp>
+#include <cerrno>
+#include <system_error>
+#include <unistd.h>
+
+namespace welcomer::tool {
+
+namespace {
+
+constexpr std::size_t kLongestPassword = 4096;
+constexpr const char* kInsteadOfTerminal = "--password-fd N";
+
+// One byte at a time: what follows the line is somebody else's. A carriage return before the line's end
+// belongs to that.
+std::string readLine(int descriptor) {
+    const std::string option = "--password-fd " + std::to_string(descriptor) + ": ";
+    std::string line;
+    for (;;) {
+        char byte = 0;
+        const ssize_t count = ::read(descriptor, &byte, 1);
+        if (count < 0 && errno == EINTR) {
+            continue;
+        }
+        if (count < 0) {
+            throw CommandFailure(option + std::generic_category().message(errno));
+        }
+        if (count == 0 || byte == '\n') {
+            if (line.ends_with('\r')) {
+                line.pop_back();
+            }
+            if (line.size() <= kLongestPassword) {
+                return line;
+            }
+        }
+        if (line.size() > kLongestPassword) {
+            throw CommandFailure(option + "the password is too long");
+        }
+        line += byte;
+    }
+}
+
+} // namespace
+
+void addPasswordOption(CLI::App& command, PasswordSource& source) {
+    command
+        .add_option("--password-fd", source,
+                    "Read the password, one line, from this open descriptor instead of the terminal")
+        ->type_name("N")
+        ->check(CLI::NonNegativeNumber);
+}
+
+std::string getPassword(const PasswordSource& source, const std::string& question) {
+    return source ? readLine(*source) : Terminal(kInsteadOfTerminal).askWithoutEcho(question);
+}
+
+std::string getNewPassword(const PasswordSource& source, const std::string& question) {
+    std::string password = getPassword(source, question);
+    if (password.empty()) {
+        throw CommandFailure("the password is empty");
+    }
+    if (!source && Terminal(kInsteadOfTerminal).askWithoutEcho("Once more:") != password) {
+        throw CommandFailure("the two passwords differ");
+    }
+    return password;
+}
+
+} // namespace welcomer::tool

@@ -1,0 +1,52 @@
+#include "tools/welcomer/terminal/ProgressLine.h"
+
+#include "tools/welcomer/cli/Printable.h"
+
+#include <algorithm>
+#include <iostream>
+#include <sys/ioctl.h>
+#include <unistd.h>
+
+namespace welcomer::tool {
+
+namespace {
+
+constexpr std::size_t kBarWidth = 40;
+
+std::size_t terminalWidth() {
+    winsize size{};
+    const bool known = ioctl(STDERR_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col > 0;
+    return known ? size.ws_col : 80;
+}
+
+} // namespace
+
+ProgressLine::ProgressLine() : _visible(isatty(STDERR_FILENO) == 1) {}
+
+ProgressLine::~ProgressLine() {
+    clear();
+}
+
+void ProgressLine::show(const std::string& text) {
+    if (!_visible) {
+        return;
+    }
+    std::cout.flush();
+    // One column stays free: a full line would wrap and could not be written over.
+    std::cerr << '\r' << printable(text).substr(0, terminalWidth() - 1) << "\x1b[K" << std::flush;
+    _shown = true;
+}
+
+void ProgressLine::clear() {
+    if (_shown) {
+        std::cerr << "\r\x1b[K" << std::flush;
+        _shown = false;
+    }
+}
+
+std::string ProgressLine::bar(double done) {
+    const auto filled = static_cast<std::size_t>(std::clamp(done, 0.0, 1.0) * kBarWidth);
+    return "[" + std::string(filled, '#') + std::string(kBarWidth - filled, '-') + "]";
+}
+
+} // namespace welcomer::tool

@@ -1,0 +1,181 @@
+#include "tools/welcomer/terminal/Terminal.h"
+
+#include "tools/welcomer/cli/Printable.h"
+#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/story/AgentProcess.h"
+
+#include <array>
+#include <cerrno>
+#include <charconv>
+#include <fcntl.h>
+#include <poll.h>
+#include <set>
+#include <sstream>
+#include <string_view>
+#include <termios.h>
+#include <unistd.h>
+
+namespace welcomer::tool {
+
+namespace {
+
+constexpr std::size_t kLongestLine = 4096; // what a terminal takes in one line
+
+// While it lives, the terminal does not show what is typed.
+class EchoGuard {
+  public:
+    explicit EchoGuard(int terminal) : _terminal(terminal) {
+        tcgetattr(terminal, &_before);
+        termios quiet = _before;
+        quiet.c_lflag &= ~static_cast<tcflag_t>(ECHO);
+        quiet.c_cc[VSUSP] = _POSIX_VDISABLE; // stopped here, the shell would get a terminal without echo
+        tcsetattr(terminal, TCSAFLUSH, &quiet);
+    }
+    ~EchoGuard() { tcsetattr(_terminal, TCSAFLUSH, &_before); }
+    EchoGuard(const EchoGuard&) = delete;
+    EchoGuard& operator=(const EchoGuard&) = delete;
+
+  private:
+    const int _terminal;
+    termios _before{};
+};
+
+std::string trimmed(const std::string& text) {
+    const std::size_t first = text.find_first_not_of(" \t");
+    return first == std::string::npos ? "" : text.substr(first, text.find_last_not_of(" \t") - first + 1);
+}
+
+int openTerminal(const std::string& instead) {
+    const int descriptor = open("/dev/tty", O_RDWR | O_CLOEXEC);
+    if (descriptor < 0) {
+        throw UsageError("there is no terminal to ask at: use " + instead);
+    }
+    return descriptor;
+}
+
+} // namespace
+
+Terminal::Terminal(const std::string& instead) : _descriptor(openTerminal(instead)) {}
+
+Terminal::~Terminal() {
+    close(_descriptor);
+}
+
+void Terminal::say(const std::string& line) {
+    _write(printable(line) + '\n');
+}
+
+std::string Terminal::ask(const std::string& question) {
+    _write(printable(question) + ' ');
+    return trimmed(_readLine(-1));
+}
+
+std::string Terminal::askWithoutEcho(const std::string& question) {
+    InterruptionGuard guard;
+    try {
+        const EchoGuard quiet(_descriptor);
+        _write(printable(question) + ' ');
+        std::string line = _readLine(guard.descriptor());
+        _write("\n"); // the one that was typed is not shown either
+        return line;
+    } catch (const Interrupted&) {
+        _write("\n");
+        guard.release(); // the signal takes its course here
+        throw CommandFailure("interrupted");
+    }
+}
+
+bool Terminal::confirm(const std::string& question) {
+    for (;;) {
+        const std::string answer = ask(question + " [Y/n]");
+        if (answer.empty() || answer == "y" || answer == "Y" || answer == "yes") {
+            return true;
+        }
+        if (answer == "n" || answer == "N" || answer == "no") {
+            return false;
+        }
+    }
+}
+
+std::vector<std::size_t> Terminal::choose(const std::string& title, const std::vector<std::string>& items) {
+    say(title);
+    for (std::size_t i = 0; i < items.size(); ++i) {
+        say("  " + std::to_string(i + 1) + "  " + items[i]);
+    }
+    for (;;) {
+        const std::string answer = ask("Which ones? Numbers, all or none [all]:");
+        if (auto chosen = parseChoice(answer, items.size())) {
+            return *chosen;
+        }
+        say("Please give numbers from 1 to " + std::to_string(items.size()) + ", all or none.");
+    }
+}
+
+void Terminal::_write(const std::string& text) {
+    std::string_view rest = text;
+    while (!rest.empty()) {
+        const ssize_t count = ::write(_descriptor, rest.data(), rest.size());
+        if (count < 0 && errno != EINTR) {
+            throw CommandFailure("the terminal is gone");
+        }
+        rest.remove_prefix(count < 0 ? 0 : static_cast<std::size_t>(count));
+    }
+}
+
+// Throws Interrupted when the descriptor given for that is readable first.
+std::string Terminal::_readLine(int interruption) {
+    std::string line;
+    for (;;) {
+        std::array<pollfd, 2> watched{{{_descriptor, POLLIN, 0}, {interruption, POLLIN, 0}}};
+        if (poll(watched.data(), watched.size(), -1) < 0 && errno == EINTR) {
+            continue;
+        }
+        if (watched[1].revents != 0) {
+            throw Interrupted();
+        }
+        std::array<char, kLongestLine> buffer;
+        const ssize_t count = ::read(_descriptor, buffer.data(), buffer.size());
+        if (count < 0 && errno == EINTR) {
+            continue;
+        }
+        if (count <= 0) {
+            _write("\n");
+            throw CommandFailure("the input has ended");
+        }
+        line.append(buffer.data(), static_cast<std::size_t>(count));
+        if (line.ends_with('\n')) {
+            line.pop_back();
+            return line;
+        }
+    }
+}
+
+std::optional<std::vector<std::size_t>> parseChoice(const std::string& answer, std::size_t count) {
+    std::set<std::size_t> chosen;
+    if (answer.empty() || answer == "all") {
+        for (std::size_t i = 0; i < count; ++i) {
+            chosen.insert(i);
+        }
+        return std::vector(chosen.begin(), chosen.end());
+    }
+    if (answer == "none") {
+        return std::vector<std::size_t>();
+    }
+    std::string separated = answer;
+    for (char& character : separated) {
+        character = character == ',' ? ' ' : character;
+    }
+    std::istringstream words(separated);
+    for (std::string word; words >> word;) {
+        std::size_t number = 0;
+        const char* const end = word.data() + word.size();
+        const auto result = std::from_chars(word.data(), end, number);
+        if (result.ec != std::errc() || result.ptr != end || number < 1 || number > count) {
+            return std::nullopt;
+        }
+        chosen.insert(number - 1);
+    }
+    return chosen.empty() ? std::nullopt : std::optional(std::vector(chosen.begin(), chosen.end()));
+}
+
+} // namespace welcomer::tool
