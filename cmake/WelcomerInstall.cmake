@@ -10,14 +10,12 @@ install(TARGETS welcomer welcomer-sdk EXPORT WelcomerTargets ARCHIVE DESTINATION
 install(EXPORT WelcomerTargets NAMESPACE Welcomer:: DESTINATION "${WELCOMER_CMAKE_DIR}")
 
 # Every folder of the module by its own name, so that an installed header includes its neighbours as in the source tree.
-foreach(folder propertylist text platform log handoff plugins network switch cloud state agent)
-    if(IS_DIRECTORY "${PROJECT_SOURCE_DIR}/${folder}")
-        install(DIRECTORY "${PROJECT_SOURCE_DIR}/${folder}" DESTINATION "${WELCOMER_MODULE_INCLUDE_DIR}"
-                FILES_MATCHING PATTERN "*.h"
-                # The host's side of the C ABI is nothing for a setup application.
-                PATTERN AbiDelegatePlugin.h EXCLUDE PATTERN CompletionHandlers.h EXCLUDE
-                PATTERN PropertyListHandles.h EXCLUDE)
-    endif()
+foreach(room IN LISTS WELCOMER_ROOMS)
+    install(DIRECTORY "${PROJECT_SOURCE_DIR}/${room}" DESTINATION "${WELCOMER_MODULE_INCLUDE_DIR}"
+            FILES_MATCHING PATTERN "*.h"
+            # The SDK has a place of its own, and the host's side of the C ABI is nothing for a setup application.
+            PATTERN sdk EXCLUDE PATTERN AbiDelegatePlugin.h EXCLUDE PATTERN CompletionHandlers.h EXCLUDE
+            PATTERN PropertyListHandles.h EXCLUDE)
 endforeach()
 install(FILES "${PROJECT_SOURCE_DIR}/backends/Backends.h" DESTINATION "${WELCOMER_MODULE_INCLUDE_DIR}/backends")
 install(DIRECTORY "${PROJECT_SOURCE_DIR}/sdk/welcomer" DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}"
