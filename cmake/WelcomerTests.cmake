@@ -11,6 +11,7 @@ function(welcomer_precompile_tests)
     file(WRITE "${CMAKE_CURRENT_BINARY_DIR}/precompiled.cpp" "int main() { return 0; }\n")
     add_executable(test-beginnings EXCLUDE_FROM_ALL "${CMAKE_CURRENT_BINARY_DIR}/precompiled.cpp")
     welcomer_configure_target(test-beginnings)
+    set_target_properties(test-beginnings PROPERTIES RUNTIME_OUTPUT_DIRECTORY "${CMAKE_BINARY_DIR}/tests")
     target_link_libraries(test-beginnings PRIVATE welcomer-fakes welcomer GTest::gtest GTest::gtest_main)
     # The desktop's libraries ask for -pthread; the other options have a compiler cache see through to what was precompiled.
     if(CMAKE_CXX_COMPILER_ID STREQUAL GNU)

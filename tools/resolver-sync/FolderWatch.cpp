@@ -1,57 +1,57 @@
 #include "tools/resolver-sync/FolderWatch.h"
 
-#include <cerrno>
 #include <filesystem>
 #include <sys/inotify.h>
 #include <system_error>
-#include <unistd.h>
+#include <systemd/sd-event.h>
 
 namespace welcomer::resolver {
 
-FolderWatch::FolderWatch(const std::string& folder)
-    : _folder(folder),
-      _name(std::filesystem::path(folder).filename()),
-      _inotify(::inotify_init1(IN_CLOEXEC | IN_NONBLOCK)) {
-    const std::string above = std::filesystem::path(folder).parent_path();
-    _above = ::inotify_add_watch(_inotify, above.c_str(),
-                                 IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO | IN_ONLYDIR);
-    if (_above < 0) {
-        const int number = errno;
-        ::close(_inotify);
-        throw std::system_error(number, std::generic_category(), above);
-    }
+namespace {
+
+constexpr std::uint32_t kEntries = IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO | IN_ONLYDIR;
+constexpr std::uint32_t kContent = IN_MODIFY | IN_CLOSE_WRITE | IN_ATTRIB | IN_DELETE_SELF | IN_MOVE_SELF;
+
+} // namespace
+
+void FolderWatch::DropSource::operator()(sd_event_source* source) const {
+    sd_event_source_disable_unref(source);
 }
 
-FolderWatch::~FolderWatch() {
-    ::close(_inotify);
+FolderWatch::FolderWatch(sd_event* event, const std::string& folder, std::function<void()> changed)
+    : _event(event),
+      _folder(folder),
+      _name(std::filesystem::path(folder).filename()),
+      _changed(std::move(changed)) {
+    const std::string above = std::filesystem::path(folder).parent_path();
+    sd_event_source* source = nullptr;
+    const int result = sd_event_add_inotify(_event, &source, above.c_str(), kEntries, _toldAbove, this);
+    if (result < 0) {
+        throw std::system_error(-result, std::generic_category(), above);
+    }
+    _above.reset(source);
 }
+
+FolderWatch::~FolderWatch() = default;
 
 void FolderWatch::rearm() {
-    const int now =
-        ::inotify_add_watch(_inotify, _folder.c_str(),
-                            IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO | IN_MODIFY | IN_CLOSE_WRITE |
-                                IN_ATTRIB | IN_DELETE_SELF | IN_MOVE_SELF | IN_ONLYDIR);
-    if (_inside >= 0 && _inside != now) {
-        // The one before may live on under another name. Its watch is gone already when it was removed.
-        ::inotify_rm_watch(_inotify, _inside);
-    }
-    _inside = now;
+    sd_event_source* source = nullptr;
+    sd_event_add_inotify(_event, &source, _folder.c_str(), kEntries | kContent, _toldInside, this);
+    _inside.reset(source);
 }
 
-bool FolderWatch::drain() {
-    bool changed = false;
-    alignas(inotify_event) char buffer[8192];
-    ssize_t count = 0;
-    while ((count = ::read(_inotify, buffer, sizeof buffer)) > 0) {
-        for (ssize_t at = 0; at < count;) {
-            const auto* const event = reinterpret_cast<const inotify_event*>(buffer + at);
-            at += static_cast<ssize_t>(sizeof(inotify_event) + event->len);
-            const bool lost = (event->mask & IN_Q_OVERFLOW) != 0;
-            changed = changed || lost || (event->wd == _inside && _inside >= 0) ||
-                      (event->wd == _above && event->len > 0 && _name == event->name);
-        }
+int FolderWatch::_toldAbove(sd_event_source* /*source*/, const inotify_event* told, void* self) {
+    const auto* const watch = static_cast<const FolderWatch*>(self);
+    const bool lost = (told->mask & IN_Q_OVERFLOW) != 0;
+    if (lost || (told->len > 0 && watch->_name == static_cast<const char*>(told->name))) {
+        watch->_changed();
     }
-    return changed;
+    return 0;
+}
+
+int FolderWatch::_toldInside(sd_event_source* /*source*/, const inotify_event* /*told*/, void* self) {
+    static_cast<const FolderWatch*>(self)->_changed();
+    return 0;
 }
 
 } // namespace welcomer::resolver

@@ -6,7 +6,6 @@
 #include <algorithm>
 #include <csignal>
 #include <ctime>
-#include <sys/epoll.h>
 #include <sys/wait.h>
 #include <system_error>
 #include <systemd/sd-daemon.h>
@@ -49,7 +48,7 @@ ResolverSync::ResolverSync(const std::string& folder, const std::string& runtime
     : _folder(folder),
       _mark(mark),
       _event(_newEvent()),
-      _watch(folder),
+      _watch(_event.get(), folder, [this] { _folderChanged(); }),
       _resolver(_event.get(), [this](bool running) { _resolverAppeared(running); }),
       _forwarder(runtimeFolder),
       _linkRouting(_resolver, _forwarder),
@@ -63,14 +62,6 @@ ResolverSync::ResolverSync(const std::string& folder, const std::string& runtime
     ::sigprocmask(SIG_BLOCK, &signals, nullptr);
     check(sd_event_add_signal(_event.get(), nullptr, SIGTERM, nullptr, nullptr), "SIGTERM");
     check(sd_event_add_signal(_event.get(), nullptr, SIGINT, nullptr, nullptr), "SIGINT");
-    check(sd_event_add_io(
-              _event.get(), nullptr, _watch.descriptor(), EPOLLIN,
-              [](sd_event_source*, int, std::uint32_t, void* self) {
-                  static_cast<ResolverSync*>(self)->_folderChanged();
-                  return 0;
-              },
-              this),
-          "watching the folder");
     sd_event_source* timer = nullptr;
     check(sd_event_add_time(
               _event.get(), &timer, CLOCK_MONOTONIC, 0, 1,
@@ -99,9 +90,6 @@ int ResolverSync::run() {
 }
 
 void ResolverSync::_folderChanged() {
-    if (!_watch.drain()) {
-        return;
-    }
     std::uint64_t now = 0;
     sd_event_now(_event.get(), CLOCK_MONOTONIC, &now);
     if (!_firstChange) {
