@@ -2,47 +2,11 @@
 
 #pragma once
 
-#include "platform/BackendReport.h"
-#include "platform/Platform.h"
+#include "platform/PlatformOwner.h"
 
 #include <memory>
-#include <string>
-#include <vector>
 
 namespace welcomer {
-
-// A platform with everything it stands on.
-class PlatformOwner {
-  public:
-    virtual ~PlatformOwner() = default;
-
-    // Borrowed: lives as long as this object.
-    virtual const platform::Platform& platform() const = 0;
-
-    // How the interfaces that have more than one backend are served now. Asks every service: may block.
-    virtual std::vector<platform::BackendReport> backendReports() { return {}; }
-};
-
-// What a program may choose.
-struct PlatformOptions {
-    // Every file of the system and the home folder are looked up below this folder.
-    std::string root = "/";
-
-    // Takes the records in place of the system log, or null. Borrowed: must outlive the platform.
-    platform::SystemLog* systemLog = nullptr;
-
-    // Each takes the place of the machine's own, or null. Borrowed: must outlive the platform.
-    platform::Clock* clock = nullptr;
-    platform::RunLoops* runLoops = nullptr;
-    platform::DispatchQueues* dispatchQueues = nullptr;
-    platform::HostReachability* hostReachability = nullptr;
-
-    // The folder of the application's main bundle, a path of this machine; empty: the application has none.
-    std::string mainBundle = {};
-
-    // New credentials go to the local store, whatever keyring there is. They are found either way.
-    bool storesCredentialsLocally = false;
-};
 
 // Builds the platform: on the desktop's own services for the root "/", where they are built in and there, and
 // on nothing but the kernel and files elsewhere. Opens nothing and starts no thread: each service does its

@@ -1,7 +1,8 @@
 #include "platform/Platform.h"
 
 #include <atomic>
-#include <cassert>
+#include <cstdio>
+#include <cstdlib>
 
 namespace welcomer::platform {
 
@@ -13,7 +14,12 @@ std::atomic<const Platform*> installed = nullptr;
 
 const Platform& current() {
     const Platform* platform = installed.load(std::memory_order_acquire);
-    assert(platform && "no platform is installed");
+    if (!platform) {
+        std::fputs("welcomer: no platform is installed; build one with buildPlatform() and install it with "
+                   "ScopedPlatform before anything else is called\n",
+                   stderr);
+        std::abort();
+    }
     return *platform;
 }
 

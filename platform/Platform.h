@@ -2,7 +2,6 @@
 
 #pragma once
 
-#include "platform/AccountDirectory.h"
 #include "platform/AccountService.h"
 #include "platform/Clock.h"
 #include "platform/CredentialStore.h"
@@ -24,7 +23,8 @@
 
 namespace welcomer::platform {
 
-// References to the services that the system runs on; a backend owns them.
+// References to the services that the system runs on; a backend owns them. Built by names: the compiler
+// refuses a platform that lacks one.
 struct Platform {
     SystemLog& systemLog;
     FileSystem& fileSystem;
@@ -40,7 +40,6 @@ struct Platform {
     HostReachability& hostReachability;
     NotificationCenter& notificationCenter;
     AccountService& accountService;
-    AccountDirectory& accountDirectory;
     ProcessLauncher& processLauncher;
     NetworkConfigStore& networkConfigStore;
     NetworkStateStore& networkStateStore;
@@ -48,7 +47,7 @@ struct Platform {
 };
 
 // The installed platform. A program installs one at its start, before anything else of the system is called,
-// and keeps it until it ends. Any thread, once one is installed.
+// and keeps it until it ends: without one, this ends the process with a line that says so. Any thread.
 const Platform& current();
 
 // Installs a platform for the lifetime of this object and puts back the one before. It borrows the platform,

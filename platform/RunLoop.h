@@ -20,7 +20,8 @@ class RunLoop {
     virtual ~RunLoop() = default;
 
     // Processes performed blocks and attached sources until the duration is over, or until nothing is
-    // attached and nothing is pending; with neither at the start it returns at once. Blocks that are pending
+    // attached and nothing is pending; with neither at the start it returns at once. A loop to which others
+    // may attach sources of their own always counts as having one. Blocks that are pending
     // at the start are run even when the duration is 0 or less. Only on the loop's own thread, also from
     // within a block.
     virtual void run(std::chrono::nanoseconds duration) = 0;
@@ -31,10 +32,6 @@ class RunLoop {
 
     // Attaches a source that never fires. Any thread.
     virtual std::unique_ptr<RunLoopPort> attachPort() = 0;
-
-    // Whether sources may be attached that this interface does not know of. Such a loop always counts as
-    // having one.
-    virtual bool hasForeignSources() const = 0;
 };
 
 // Gives each thread its own loop.

@@ -15,6 +15,10 @@
 
 namespace welcomer {
 
+// Every integer type that fits 64 bits, signed or unsigned; a boolean and a character are none.
+template <class T>
+concept PropertyListInteger = std::integral<T> && !std::same_as<T, bool> && !std::same_as<T, char>;
+
 // A property-list value: a dictionary, array, string, integer, real, boolean, data or date. It is a plain
 // value: copying copies everything below it, moving is cheap. Booleans are kept apart from integers, and
 // integers from reals. No operation blocks, and distinct values may be used on distinct threads.
@@ -52,10 +56,8 @@ class PropertyList {
     PropertyList(std::same_as<bool> auto value) : _value(value) {}
     PropertyList(std::floating_point auto value) : _value(static_cast<double>(value)) {}
 
-    // Every integer that fits 64 bits, signed or unsigned. Equal numbers are equal values, whatever the C++
-    // type.
-    template <std::integral T>
-    requires(!std::same_as<T, bool> && !std::same_as<T, char>) PropertyList(T value) {
+    // Equal numbers are equal values, whatever the C++ type.
+    PropertyList(PropertyListInteger auto value) {
         if (std::in_range<std::int64_t>(value)) {
             _value = static_cast<std::int64_t>(value);
         } else {

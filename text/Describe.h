@@ -38,9 +38,12 @@ std::string describe(const std::exception_ptr& value);
 // with the texts inside them on one line (text/OneLine.h).
 std::string describe(const PropertyList& value);
 
+// Every integer type; a boolean is none.
 template <class T>
-requires std::integral<T> &&(!std::same_as<T, bool>)std::string describe(T value) {
-    if constexpr (std::signed_integral<T>) {
+concept Integer = std::integral<T> && !std::same_as<T, bool>;
+
+std::string describe(Integer auto value) {
+    if constexpr (std::signed_integral<decltype(value)>) {
         return describe(static_cast<std::int64_t>(value));
     } else {
         return describe(static_cast<std::uint64_t>(value));

@@ -25,6 +25,7 @@ class DesktopPlatform final : public PlatformOwner {
     explicit DesktopPlatform(const PlatformOptions& options);
 
     const platform::Platform& platform() const override { return _platform; }
+    platform::AccountDirectory& accountDirectory() override { return _local.accountDirectory(); }
     std::vector<platform::BackendReport> backendReports() override;
 
   private:

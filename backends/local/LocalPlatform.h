@@ -32,6 +32,7 @@ class LocalPlatform final : public PlatformOwner {
     explicit LocalPlatform(const PlatformOptions& options);
 
     const platform::Platform& platform() const override { return _platform; }
+    platform::AccountDirectory& accountDirectory() override { return _accountDirectory; }
     std::vector<platform::BackendReport> backendReports() override;
 
   private:

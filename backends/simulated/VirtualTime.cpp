@@ -249,8 +249,6 @@ class VirtualTime::Loop final : public platform::RunLoop {
         return std::make_unique<Port>(_core, _destination);
     }
 
-    bool hasForeignSources() const override { return false; }
-
   private:
     const std::shared_ptr<Core> _core;
     const std::shared_ptr<Destination> _destination;

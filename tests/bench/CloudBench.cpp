@@ -211,7 +211,6 @@ class CountingRunLoops final : public platform::RunLoops {
         }
         void perform(std::function<void()> block) override { _loop->perform(std::move(block)); }
         std::unique_ptr<platform::RunLoopPort> attachPort() override { return _loop->attachPort(); }
-        bool hasForeignSources() const override { return _loop->hasForeignSources(); }
 
       private:
         const std::shared_ptr<platform::RunLoop> _loop;

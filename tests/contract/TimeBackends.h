@@ -20,12 +20,17 @@ namespace welcomer::contract {
 // a suite has something done "meanwhile" by posting it to the global queue with a delay, not on a thread of
 // its own.
 struct LocalTime {
+    // Whether others may attach sources of their own to its loops, which then never return early.
+    static constexpr bool hasForeignSources = false;
+
     local::LocalClock clock;
     local::LocalRunLoops runLoops;
     local::LocalDispatchQueues dispatchQueues;
 };
 
 struct SimulatedTime {
+    static constexpr bool hasForeignSources = false;
+
     simulated::VirtualTime time;
     platform::Clock& clock = time;
     platform::RunLoops& runLoops = time;
@@ -35,6 +40,8 @@ struct SimulatedTime {
 #ifdef WELCOMER_DESKTOP_RUNLOOP
 // GLib's main context on the main thread.
 struct DesktopTime {
+    static constexpr bool hasForeignSources = true;
+
     local::LocalClock clock;
     desktop::DesktopRunLoops runLoops;
     local::LocalDispatchQueues dispatchQueues;

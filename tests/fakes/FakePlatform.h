@@ -5,7 +5,6 @@
 #include "backends/simulated/VirtualTime.h"
 #include "platform/Platform.h"
 #include "tests/fakes/CallRecorder.h"
-#include "tests/fakes/FakeAccountDirectory.h"
 #include "tests/fakes/FakeAccountService.h"
 #include "tests/fakes/FakeCredentialStore.h"
 #include "tests/fakes/FakeDirectoryService.h"
@@ -22,6 +21,8 @@
 #include "tests/fakes/FakeSystemLog.h"
 #include "tests/fakes/FakeSystemVersionInfo.h"
 
+#include <type_traits>
+
 namespace welcomer::fakes {
 
 // A test makes one, sets up its members and installs it:
@@ -29,15 +30,15 @@ namespace welcomer::fakes {
 //     const platform::ScopedPlatform installed(fake.platform());
 class FakePlatform {
   public:
+    // What stands in a fake's place, each null or borrowed.
+    struct Instead {
+        platform::FileSystem* fileSystem = nullptr;
+        platform::PluginBundle* pluginBundle = nullptr;
+        platform::RunLoops* runLoops = nullptr;
+    };
+
     FakePlatform() = default;
-
-    // The same, but with other files than the fake ones; borrowed.
-    explicit FakePlatform(platform::FileSystem& otherFiles) : _files(otherFiles) {}
-
-    // The same, and with other plug-in bundles too.
-    FakePlatform(platform::FileSystem& otherFiles, platform::PluginBundle& otherPlugins)
-        : _files(otherFiles),
-          _plugins(otherPlugins) {}
+    explicit FakePlatform(const Instead& instead) : _instead(instead) {}
 
     // Every call to any of the fakes, in order.
     CallRecorder recorder;
@@ -54,7 +55,6 @@ class FakePlatform {
     simulated::VirtualTime virtualTime; // the clock, the run loops and the queues
     FakeNotificationCenter notificationCenter;
     FakeAccountService accountService{recorder, notificationCenter, virtualTime, virtualTime};
-    FakeAccountDirectory accountDirectory{accountService};
     FakeProcessLauncher processLauncher{recorder};
     FakeNetworkConfigStore networkConfigStore{recorder};
     FakeNetworkStateStore networkStateStore{recorder};
@@ -64,18 +64,30 @@ class FakePlatform {
     const platform::Platform& platform() const { return _platform; }
 
   private:
-    platform::FileSystem& _files = fileSystem;
-    platform::PluginBundle& _plugins = pluginBundle;
-    platform::Platform _platform{systemLog,          _files,
-                                 processIdentity,    credentialStore,
-                                 _plugins,           resourceBundles,
-                                 virtualTime,        virtualTime,
-                                 virtualTime,        preferenceStore,
-                                 systemVersionInfo,  hostReachability,
-                                 notificationCenter, accountService,
-                                 accountDirectory,   processLauncher,
-                                 networkConfigStore, networkStateStore,
-                                 directoryService};
+    template <class Interface>
+    static Interface& _chosen(Interface* instead, std::type_identity_t<Interface>& fake) {
+        return instead ? *instead : fake;
+    }
+
+    const Instead _instead = {};
+    const platform::Platform _platform{.systemLog = systemLog,
+                                       .fileSystem = _chosen(_instead.fileSystem, fileSystem),
+                                       .processIdentity = processIdentity,
+                                       .credentialStore = credentialStore,
+                                       .pluginBundle = _chosen(_instead.pluginBundle, pluginBundle),
+                                       .resourceBundles = resourceBundles,
+                                       .clock = virtualTime,
+                                       .runLoops = _chosen(_instead.runLoops, virtualTime),
+                                       .dispatchQueues = virtualTime,
+                                       .preferenceStore = preferenceStore,
+                                       .systemVersionInfo = systemVersionInfo,
+                                       .hostReachability = hostReachability,
+                                       .notificationCenter = notificationCenter,
+                                       .accountService = accountService,
+                                       .processLauncher = processLauncher,
+                                       .networkConfigStore = networkConfigStore,
+                                       .networkStateStore = networkStateStore,
+                                       .directoryService = directoryService};
 };
 
 } // namespace welcomer::fakes

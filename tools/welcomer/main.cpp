@@ -10,31 +10,24 @@ namespace {
 using namespace welcomer;
 using simulated::VirtualTime;
 
-// A platform with everything that it stands on.
-struct OwnedPlatform {
+// A platform and the simulated time that it stands on.
+struct SimulatedPlatform {
     // Plug-ins do their work on real threads.
-    std::unique_ptr<VirtualTime> simulatedTime;
+    VirtualTime time{VirtualTime::OutstandingWork::OnRealThreads};
     std::unique_ptr<PlatformOwner> owner;
 };
 
-tool::PlatformHandle build(const tool::PlatformRequest& request) {
-    const auto owned = std::make_shared<OwnedPlatform>();
-    PlatformOptions options{.root = request.root, .systemLog = request.systemLog};
-    options.hostReachability = request.hostReachability;
-    options.dispatchQueues = request.dispatchQueues;
-    options.storesCredentialsLocally = request.storesCredentialsLocally;
+std::shared_ptr<PlatformOwner> build(PlatformOptions options, tool::TimeKind time) {
     options.mainBundle = tool::findToolBundle();
-    if (request.simulatedTime) {
-        owned->simulatedTime = std::make_unique<VirtualTime>(VirtualTime::OutstandingWork::OnRealThreads);
-        options.clock = owned->simulatedTime.get();
-        options.runLoops = owned->simulatedTime.get();
-        options.dispatchQueues = owned->simulatedTime.get();
+    if (time == tool::TimeKind::Real) {
+        return buildPlatform(options);
     }
-    owned->owner = buildPlatform(options);
-    if (request.backendReports) {
-        *request.backendReports = owned->owner->backendReports();
-    }
-    return {owned, &owned->owner->platform()};
+    const auto simulated = std::make_shared<SimulatedPlatform>();
+    options.clock = &simulated->time;
+    options.runLoops = &simulated->time;
+    options.dispatchQueues = &simulated->time;
+    simulated->owner = buildPlatform(options);
+    return {simulated, simulated->owner.get()};
 }
 
 } // namespace

@@ -26,7 +26,6 @@ class GLibRunLoop final : public platform::RunLoop {
     void run(std::chrono::nanoseconds duration) override;
     void perform(std::function<void()> block) override;
     std::unique_ptr<platform::RunLoopPort> attachPort() override;
-    bool hasForeignSources() const override { return true; }
 
     // Runs the block that has waited longest. GLib calls this, which is C: a block that throws ends the
     // process.

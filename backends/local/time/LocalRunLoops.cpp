@@ -25,7 +25,6 @@ class LocalRunLoop final : public platform::RunLoop, public std::enable_shared_f
     void run(std::chrono::nanoseconds duration) override;
     void perform(std::function<void()> block) override;
     std::unique_ptr<platform::RunLoopPort> attachPort() override;
-    bool hasForeignSources() const override { return false; }
 
     void addPort();
     void removePort();

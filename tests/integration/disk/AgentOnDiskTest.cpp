@@ -73,7 +73,7 @@ class AgentOnDiskTest : public testing::Test {
         fs::create_directories(root.string() + "/Setup.app");
         fs::copy(fs::path(WELCOMER_SETUP_BUNDLE) / "Resources", root / "Setup.app/Resources",
                  fs::copy_options::recursive);
-        owner = buildPlatform({root.string(), &log});
+        owner = buildPlatform({.root = root.string(), .systemLog = &log});
         installed.emplace(owner->platform());
         home = root.string() + owner->platform().processIdentity.homeDirectory();
         agents = home / "Library/LaunchAgents";
@@ -105,27 +105,12 @@ class AgentOnDiskTest : public testing::Test {
     // The agent on this root with simulated time, so that the linger takes none.
     int runAgent() {
         simulated::VirtualTime time;
-        const platform::Platform& real = owner->platform();
-        const platform::Platform mixed{real.systemLog,
-                                       real.fileSystem,
-                                       real.processIdentity,
-                                       real.credentialStore,
-                                       real.pluginBundle,
-                                       real.resourceBundles,
-                                       time,
-                                       time,
-                                       time,
-                                       real.preferenceStore,
-                                       real.systemVersionInfo,
-                                       real.hostReachability,
-                                       real.notificationCenter,
-                                       real.accountService,
-                                       real.accountDirectory,
-                                       real.processLauncher,
-                                       real.networkConfigStore,
-                                       real.networkStateStore,
-                                       real.directoryService};
-        const platform::ScopedPlatform scope(mixed);
+        const auto simulated = buildPlatform({.root = root.string(),
+                                              .systemLog = &log,
+                                              .clock = &time,
+                                              .runLoops = &time,
+                                              .dispatchQueues = &time});
+        const platform::ScopedPlatform scope(simulated->platform());
         const std::array<const char*, 2> arguments{"wlnimbussetup", nullptr};
         return wlnimbussetup(1, arguments.data());
     }

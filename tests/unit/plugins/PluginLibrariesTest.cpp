@@ -394,7 +394,7 @@ class ExamplePluginsOnDisk : public testing::Test {
     TemporaryRoot root;
     local::LocalFileSystem files{posix::RootFolder(root.path())};
     local::LocalPluginBundle bundles{posix::RootFolder(root.path())};
-    fakes::FakePlatform fake{files, bundles};
+    fakes::FakePlatform fake{{.fileSystem = &files, .pluginBundle = &bundles}};
     const platform::ScopedPlatform installed{fake.platform()};
 };
 

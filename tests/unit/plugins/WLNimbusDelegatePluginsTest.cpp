@@ -74,27 +74,9 @@ TEST_F(WLNimbusDelegatePluginsTest, GivesThePluginsInTheOrderInWhichTheyWereMet)
 TEST_F(WLNimbusDelegatePluginsTest, TheThreadHasItsRunLoopBeforeTheFirstPluginIsLoaded) {
     add("a.ncdplugin", first.exportAs<0>());
     RecordedRunLoops runLoops(fake.virtualTime, fake.recorder);
-    const platform::Platform& plain = fake.platform();
-    const platform::Platform watched{plain.systemLog,
-                                     plain.fileSystem,
-                                     plain.processIdentity,
-                                     plain.credentialStore,
-                                     plain.pluginBundle,
-                                     plain.resourceBundles,
-                                     plain.clock,
-                                     runLoops,
-                                     plain.dispatchQueues,
-                                     plain.preferenceStore,
-                                     plain.systemVersionInfo,
-                                     plain.hostReachability,
-                                     plain.notificationCenter,
-                                     plain.accountService,
-                                     plain.accountDirectory,
-                                     plain.processLauncher,
-                                     plain.networkConfigStore,
-                                     plain.networkStateStore,
-                                     plain.directoryService};
-    const platform::ScopedPlatform watchedInstalled(watched);
+    fakes::FakePlatform watched(
+        {.fileSystem = &fake.fileSystem, .pluginBundle = &fake.pluginBundle, .runLoops = &runLoops});
+    const platform::ScopedPlatform watchedInstalled(watched.platform());
     EXPECT_EQ(identifiers(), Strings{"com.corvid.first"});
     ASSERT_FALSE(fake.recorder.callsTo("PluginBundle.load").empty());
     EXPECT_EQ(fake.recorder.calls().at(0), "RunLoops.current");

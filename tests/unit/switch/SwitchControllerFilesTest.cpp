@@ -48,7 +48,7 @@ class SwitchControllerFilesTest : public testing::Test {
 
     TemporaryRoot root;
     local::LocalFileSystem files{posix::RootFolder(root.path())};
-    fakes::FakePlatform fake{files};
+    fakes::FakePlatform fake{{.fileSystem = &files}};
     const platform::ScopedPlatform installed{fake.platform()};
 };
 

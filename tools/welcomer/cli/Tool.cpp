@@ -120,12 +120,12 @@ class DamageReport {
 int runCommand(const Command& command, const Options& options, const PlatformFactory& buildPlatform) {
     KeptLog log;
     log.setVerbose(options.verbose);
-    PlatformRequest request{options.root, &log};
-    request.storesCredentialsLocally = options.storesLocally;
-    const PlatformHandle platform = buildPlatform(request);
-    const platform::ScopedPlatform installed(*platform);
-    const DamageReport damageReport(platform->preferenceStore);
-    Session session{options, buildPlatform, log, std::cout};
+    const auto owner = buildPlatform(
+        {.root = options.root, .systemLog = &log, .storesCredentialsLocally = options.storesLocally},
+        TimeKind::Real);
+    const platform::ScopedPlatform installed(owner->platform());
+    const DamageReport damageReport(owner->platform().preferenceStore);
+    Session session{options, buildPlatform, owner->accountDirectory(), log, std::cout};
     command(session);
     std::cout.flush();
     return std::cout ? kExitSuccess : fail("the output could not be written", kExitFailed);

@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "platform/AccountDirectory.h"
 #include "tools/welcomer/cli/PlatformFactory.h"
 #include "tools/welcomer/story/KeptLog.h"
 
@@ -33,8 +34,9 @@ struct Options {
 struct Session {
     const Options& options;
     const PlatformFactory& buildPlatform;
-    const KeptLog& log; // the system's own log lines so far
-    std::ostream& out;  // results; errors are thrown
+    platform::AccountDirectory& accountDirectory; // below the chosen root
+    const KeptLog& log;                           // the system's own log lines so far
+    std::ostream& out;                            // results; errors are thrown
 };
 
 // A command's work. What it throws ends the tool with one line on stderr.

@@ -90,7 +90,7 @@ PropertyList::Dictionary responseFor(const std::vector<std::string>& aliases) {
 
 void add(Session& session, const AddArguments& arguments) {
     refuseUnusable(arguments.user);
-    platform::AccountDirectory& directory = platform::current().accountDirectory;
+    platform::AccountDirectory& directory = session.accountDirectory;
     // So that nobody is asked for a password in vain; adding decides.
     const auto users = directory.users();
     if (users && std::ranges::find(*users, arguments.user) != users->end()) {
@@ -120,7 +120,7 @@ std::string loggedInName() {
 }
 
 void list(Session& session) {
-    platform::AccountDirectory& directory = platform::current().accountDirectory;
+    platform::AccountDirectory& directory = session.accountDirectory;
     const std::vector<std::string> accounts = directory.accounts();
     const auto users = directory.users();
     const std::string loggedIn = loggedInName();

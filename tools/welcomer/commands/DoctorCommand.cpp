@@ -37,12 +37,9 @@ BackendReport userManagerReport() {
 }
 
 std::vector<BackendReport> allReports(Session& session) {
-    std::vector<BackendReport> reports;
-    PlatformRequest request;
-    request.root = session.options.root;
-    request.systemLog = &platform::current().systemLog;
-    request.backendReports = &reports;
-    const PlatformHandle platform = session.buildPlatform(request);
+    const auto owner = session.buildPlatform(
+        {.root = session.options.root, .systemLog = &platform::current().systemLog}, TimeKind::Real);
+    std::vector<BackendReport> reports = owner->backendReports();
     reports.push_back(userManagerReport());
     reports.push_back(resolverReport(session.options.root));
     return reports;

@@ -99,12 +99,9 @@ void enable(Session& session, const EnableArguments& arguments) {
     LineLog log;
     log.setVerbose(session.options.verbose);
     PendingBlocks blocks(platform::current().dispatchQueues);
-    PlatformRequest request;
-    request.root = session.options.root;
-    request.systemLog = &log;
-    request.dispatchQueues = &blocks;
-    const PlatformHandle platform = session.buildPlatform(request);
-    const platform::ScopedPlatform installed(*platform);
+    const auto owner = session.buildPlatform(
+        {.root = session.options.root, .systemLog = &log, .dispatchQueues = &blocks}, TimeKind::Real);
+    const platform::ScopedPlatform installed(owner->platform());
 
     enableAndWait(arguments, selected, blocks, log, !session.options.verbose);
     const std::vector<ServiceState> states = statesOf(arguments.account);

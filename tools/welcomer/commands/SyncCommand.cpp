@@ -100,12 +100,11 @@ void determineDestination(Session& session, const std::string& file, bool checkO
     if (const auto answer = host.internetIsReachable()) {
         given.emplace(*answer);
     }
-    PlatformRequest request;
-    request.root = session.options.root;
-    request.systemLog = &platform::current().systemLog;
-    request.hostReachability = given ? &*given : nullptr;
-    const PlatformHandle platform = session.buildPlatform(request);
-    const platform::ScopedPlatform installed(*platform);
+    const auto owner = session.buildPlatform({.root = session.options.root,
+                                              .systemLog = &platform::current().systemLog,
+                                              .hostReachability = given ? &*given : nullptr},
+                                             TimeKind::Real);
+    const platform::ScopedPlatform installed(owner->platform());
 
     const Decision decision = decide(host, checkOnly);
     if (session.options.json) {

@@ -122,9 +122,9 @@ class Story {
           _timeLapse(timeLapse),
           _root(root),
           _guard(guard),
-          _platform(session.buildPlatform({root.string(), &_log, false})),
-          _installed(*_platform),
-          _home(_platform->processIdentity.homeDirectory()) {}
+          _owner(session.buildPlatform({.root = root.string(), .systemLog = &_log}, TimeKind::Real)),
+          _installed(_owner->platform()),
+          _home(_owner->platform().processIdentity.homeDirectory()) {}
 
     void tell() {
         _prepare();
@@ -190,7 +190,7 @@ class Story {
         copyTree(examples.setupBundle, _below(kSetupBundlePath));
 
         const platform::CloudUser user = exampleUser();
-        if (const platform::Outcome outcome = _platform->accountDirectory.storeUser(user); !outcome) {
+        if (const platform::Outcome outcome = _owner->accountDirectory().storeUser(user); !outcome) {
             throw CommandFailure("cannot add the user: " + outcome.error.message);
         }
         _password = user.password;
@@ -220,8 +220,8 @@ class Story {
         listener.told = [&](const std::string& text) {
             setup.result = Json::parse(text);
         };
-        const AgentEnd end = runChildProcess(_session.buildPlatform, _root.string(), false, _guard, listener,
-                                             setupLife(_password));
+        const AgentEnd end = runChildProcess(_session.buildPlatform, _root.string(), TimeKind::Real, _guard,
+                                             listener, setupLife(_password));
         if (!end.succeeded()) {
             throw CommandFailure(setup.result.contains("failure")
                                      ? setup.result["failure"].get<std::string>()
@@ -241,7 +241,7 @@ class Story {
 
     std::vector<ServiceState> _services() const {
         return serviceStates(
-            _platform->accountService.sharedManager().accountForID(kAccountName, false).get());
+            _owner->platform().accountService.sharedManager().accountForID(kAccountName, false).get());
     }
 
     void _showServices(const std::vector<ServiceState>& services) {
@@ -277,7 +277,8 @@ class Story {
                 _showProgress(progress, login.report, started, lingering);
             };
         }
-        login.end = runAgentProcess(_session.buildPlatform, _root.string(), _timeLapse, _guard, listener);
+        login.end = runAgentProcess(_session.buildPlatform, _root.string(),
+                                    _timeLapse ? TimeKind::Simulated : TimeKind::Real, _guard, listener);
         progress.clear();
         _say("  The agent has ended with " + login.end.description() + ".");
         return login;
@@ -317,7 +318,7 @@ class Story {
 
     LeftOnDisk _look() {
         LeftOnDisk left;
-        left.launchAgent = _platform->fileSystem.exists(_launchAgentPath());
+        left.launchAgent = _owner->platform().fileSystem.exists(_launchAgentPath());
         left.replayItem = WLGetNimbusReplayKeychainItem(nullptr, nullptr);
         left.services = _services();
         const fs::path home = _below(_home);
@@ -405,7 +406,7 @@ class Story {
     const fs::path _root;
     InterruptionGuard& _guard;
     KeptLog _log;
-    const PlatformHandle _platform;
+    const std::shared_ptr<PlatformOwner> _owner;
     const platform::ScopedPlatform _installed;
     const std::string _home;
     std::string _password; // of the story's user

@@ -164,7 +164,7 @@ class RecordReader {
 };
 
 // The child's whole life.
-[[noreturn]] void beChild(const PlatformFactory& buildPlatform, const std::string& root, bool simulatedTime,
+[[noreturn]] void beChild(const PlatformFactory& buildPlatform, const std::string& root, TimeKind time,
                           pid_t parent, int logDescriptor, const ChildLife& life) {
     // Should the tool be killed, its child goes with it.
     prctl(PR_SET_PDEATHSIG, SIGKILL);
@@ -173,9 +173,9 @@ class RecordReader {
     }
     dup2(STDERR_FILENO, STDOUT_FILENO); // a plug-in's own words are no result of the tool
     PipeLog log(logDescriptor);
-    const PlatformHandle platform = buildPlatform({root, &log, simulatedTime});
-    log.setClock(platform->clock);
-    const platform::ScopedPlatform installed(*platform);
+    const auto owner = buildPlatform({.root = root, .systemLog = &log}, time);
+    log.setClock(owner->platform().clock);
+    const platform::ScopedPlatform installed(owner->platform());
     leaveProcess(life(log, [&log](const std::string& text) { log.tell(text); }));
 }
 
@@ -238,12 +238,12 @@ std::string AgentEnd::description() const {
                       : "signal " + std::to_string(signal) + " (" + strsignal(signal) + ")";
 }
 
-AgentEnd runAgentProcess(const PlatformFactory& buildPlatform, const std::string& root, bool simulatedTime,
+AgentEnd runAgentProcess(const PlatformFactory& buildPlatform, const std::string& root, TimeKind time,
                          InterruptionGuard& guard, const AgentListener& listener) {
-    return runChildProcess(buildPlatform, root, simulatedTime, guard, listener, beAgent);
+    return runChildProcess(buildPlatform, root, time, guard, listener, beAgent);
 }
 
-AgentEnd runChildProcess(const PlatformFactory& buildPlatform, const std::string& root, bool simulatedTime,
+AgentEnd runChildProcess(const PlatformFactory& buildPlatform, const std::string& root, TimeKind time,
                          InterruptionGuard& guard, const AgentListener& listener, const ChildLife& life) {
     int ends[2];
     if (pipe2(ends, O_CLOEXEC) != 0) {
@@ -261,7 +261,7 @@ AgentEnd runChildProcess(const PlatformFactory& buildPlatform, const std::string
     }
     if (id == 0) {
         guard.release();
-        beChild(buildPlatform, root, simulatedTime, parent, input.number(), life);
+        beChild(buildPlatform, root, time, parent, input.number(), life);
     }
     Child child(id);
     input.close();

@@ -63,14 +63,14 @@ struct AgentEnd {
 class Interrupted {};
 
 // Runs a child process and waits for its end. The child's standard output goes to stderr.
-//  root           the folder below which the child looks up everything
-//  simulatedTime  whether the child runs on simulated time
+//  root  the folder below which the child looks up everything
+//  time  what the child runs on
 // Main thread, no other thread running. Throws CommandFailure when no process can be made, and Interrupted.
-AgentEnd runChildProcess(const PlatformFactory& buildPlatform, const std::string& root, bool simulatedTime,
+AgentEnd runChildProcess(const PlatformFactory& buildPlatform, const std::string& root, TimeKind time,
                          InterruptionGuard& guard, const AgentListener& listener, const ChildLife& life);
 
 // The same, with the agent as it is at a login.
-AgentEnd runAgentProcess(const PlatformFactory& buildPlatform, const std::string& root, bool simulatedTime,
+AgentEnd runAgentProcess(const PlatformFactory& buildPlatform, const std::string& root, TimeKind time,
                          InterruptionGuard& guard, const AgentListener& listener);
 
 } // namespace welcomer::tool

@@ -8,6 +8,7 @@
 #include <ctime>
 #include <memory>
 #include <thread>
+#include <typeinfo>
 
 namespace welcomer::desktop {
 
@@ -127,7 +128,10 @@ TEST(GLibRunLoopTest, WhereAnotherThreadHasTheContextFirstTheMainThreadHasALocal
     const LoopThread owner;
     DesktopRunLoops runLoops;
     const auto loop = runLoops.current();
-    EXPECT_FALSE(loop->hasForeignSources());
+    const auto local = local::LocalRunLoops().current();
+    const platform::RunLoop& given = *loop;
+    const platform::RunLoop& localOne = *local;
+    EXPECT_TRUE(typeid(given) == typeid(localOne));
     const auto port = loop->attachPort();
     std::thread::id ranOn;
     std::thread([&] { loop->perform([&] { ranOn = std::this_thread::get_id(); }); }).join();
