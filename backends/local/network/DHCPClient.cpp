@@ -1,10 +1,10 @@
 #include "backends/local/network/DHCPClient.h"
 
 #include "backends/local/LocalProcessLauncher.h"
+#include "backends/network/IPv4Text.h"
 #include "backends/posix/Directory.h"
 #include "backends/posix/FileContent.h"
 #include "backends/posix/FileDescriptor.h"
-#include "backends/posix/IPv4Text.h"
 #include "platform/Error.h"
 #include "platform/NetworkConfigStore.h"
 
@@ -64,7 +64,7 @@ std::string configurationText(const DHCPRequest& request) {
     }
     std::string servers;
     for (const std::string& server : request.servers) {
-        if (posix::parseIPv4(server)) { // the option has no place for others
+        if (network::parseIPv4(server)) { // the option has no place for others
             servers += (servers.empty() ? "" : ", ") + server;
         }
     }

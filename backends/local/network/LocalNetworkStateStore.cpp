@@ -3,7 +3,7 @@
 #include "backends/local/network/KernelNetwork.h"
 #include "backends/local/network/NetworkFile.h"
 #include "backends/local/network/ResolverFile.h"
-#include "backends/posix/IPv4Text.h"
+#include "backends/network/IPv4Text.h"
 #include "platform/NetworkConfigStore.h"
 
 #include <algorithm>
@@ -54,7 +54,7 @@ class Connection final : public platform::NetworkStateConnection {
         Dictionary value{{platform::kNetworkPrimaryService,
                           networkfile::serviceOfDevice(_content(), link->name).value_or(link->name)}};
         if (best->gateway) {
-            value.emplace(platform::kNetworkRouter, posix::formatIPv4(*best->gateway));
+            value.emplace(platform::kNetworkRouter, network::formatIPv4(*best->gateway));
         }
         return value;
     }
@@ -89,8 +89,8 @@ class Connection final : public platform::NetworkStateConnection {
         PropertyList::Array masks;
         for (const posix::KernelAddress& each :
              link ? _kernel.addressesOf(link->index) : std::vector<posix::KernelAddress>()) {
-            addresses.emplace_back(posix::formatIPv4(each.address));
-            masks.emplace_back(posix::formatIPv4(posix::maskOf(each.prefixLength)));
+            addresses.emplace_back(network::formatIPv4(each.address));
+            masks.emplace_back(network::formatIPv4(network::maskOf(each.prefixLength)));
         }
         if (addresses.empty()) {
             return std::nullopt;

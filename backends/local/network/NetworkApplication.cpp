@@ -3,7 +3,7 @@
 #include "backends/local/network/DHCPClient.h"
 #include "backends/local/network/KernelNetwork.h"
 #include "backends/local/network/ResolverFile.h"
-#include "backends/posix/IPv4Text.h"
+#include "backends/network/IPv4Text.h"
 #include "platform/NetworkConfigStore.h"
 
 #include <algorithm>
@@ -53,13 +53,13 @@ std::optional<posix::IPv4Address> firstAddress(const Dictionary& values, const c
     const PropertyList* value = valueIn(values, key);
     const PropertyList::Array* list = value ? value->array() : nullptr;
     const std::string* text = list && !list->empty() ? list->front().string() : nullptr;
-    return text ? posix::parseIPv4(*text) : std::nullopt;
+    return text ? network::parseIPv4(*text) : std::nullopt;
 }
 
 std::int32_t planStatic(const Dictionary& ipv4, Plan& plan) {
     const auto address = firstAddress(ipv4, platform::kNetworkAddresses);
     const auto mask = firstAddress(ipv4, platform::kNetworkSubnetMasks);
-    const int length = posix::prefixLengthOf(mask.value_or(0)).value_or(0);
+    const int length = network::prefixLengthOf(mask.value_or(0)).value_or(0);
     if (!address || *address == 0 || length == 0) {
         return kNetworkConfigInvalid;
     }
@@ -68,7 +68,7 @@ std::int32_t planStatic(const Dictionary& ipv4, Plan& plan) {
     const PropertyList* value = valueIn(ipv4, platform::kNetworkRouter);
     const std::string* router = value ? value->string() : nullptr;
     if (value && (!router || !router->empty())) {
-        plan.router = router ? posix::parseIPv4(*router) : std::nullopt;
+        plan.router = router ? network::parseIPv4(*router) : std::nullopt;
         if (!plan.router) {
             return kNetworkConfigInvalid;
         }
@@ -104,7 +104,7 @@ std::int32_t planServers(const Dictionary& dns, Plan& plan) {
     for (const PropertyList& each : value->array() ? *value->array() : PropertyList::Array()) {
         std::string server = each.string() ? *each.string() : std::string();
         server.erase(server.find_last_not_of(' ') + 1); // spaces may stand behind it
-        if (!posix::isAddress(server)) {
+        if (!network::isAddress(server)) {
             return kNetworkConfigInvalid;
         }
         plan.servers.push_back(std::move(server));

@@ -1,15 +1,17 @@
-// IPv4 addresses and masks as text.
+// Addresses and masks as text.
 
 #pragma once
 
-#include "backends/posix/NetlinkMessages.h"
-
+#include <cstdint>
 #include <optional>
 #include <string>
 
-namespace welcomer::posix {
+namespace welcomer::network {
 
-// Four decimal numbers with dots between them; none for everything else. Any thread.
+// An IPv4 address in the host's byte order.
+using IPv4Address = std::uint32_t;
+
+// Four decimal numbers with dots between them; none for everything else. Any thread, as all of this.
 std::optional<IPv4Address> parseIPv4(const std::string& text);
 std::string formatIPv4(IPv4Address address);
 
@@ -20,4 +22,4 @@ IPv4Address maskOf(int prefixLength);
 // Whether a text is an IPv4 address or an IPv6 address, with a zone where it has one.
 bool isAddress(const std::string& text);
 
-} // namespace welcomer::posix
+} // namespace welcomer::network

@@ -1,10 +1,10 @@
-#include "backends/posix/IPv4Text.h"
+#include "backends/network/IPv4Text.h"
 
 #include <arpa/inet.h>
 #include <array>
 #include <bit>
 
-namespace welcomer::posix {
+namespace welcomer::network {
 
 std::optional<IPv4Address> parseIPv4(const std::string& text) {
     in_addr address = {};
@@ -45,4 +45,4 @@ bool isAddress(const std::string& text) {
            ::inet_pton(AF_INET6, text.substr(0, zone).c_str(), &address) == 1;
 }
 
-} // namespace welcomer::posix
+} // namespace welcomer::network
