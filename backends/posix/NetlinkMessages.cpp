@@ -1,11 +1,10 @@
 #include "backends/posix/NetlinkMessages.h"
 
-#include <algorithm>
 #include <arpa/inet.h>
 #include <cstring>
+#include <libmnl/libmnl.h>
 #include <linux/if_addr.h>
 #include <linux/if_link.h>
-#include <linux/netlink.h>
 #include <linux/rtnetlink.h>
 #include <net/if.h>
 
@@ -15,76 +14,46 @@ namespace {
 
 constexpr unsigned int kLowerUp = 1U << 16U; // IFF_LOWER_UP, which <net/if.h> has no name for
 
-constexpr std::size_t aligned(std::size_t size) {
-    return (size + NLMSG_ALIGNTO - 1) & ~std::size_t{NLMSG_ALIGNTO - 1};
+// The structure that a message begins with, or null when it is too short for that.
+template <class Body>
+const Body* bodyOf(const nlmsghdr& message) {
+    const bool isThere = mnl_nlmsg_get_payload_len(&message) >= sizeof(Body);
+    return isThere ? static_cast<const Body*>(mnl_nlmsg_get_payload(&message)) : nullptr;
 }
 
-// Takes a structure from the front of a payload, wherever it lies in memory.
-template <class Structure>
-bool takeStructure(std::string_view& payload, Structure& structure) {
-    if (payload.size() < sizeof structure) {
-        return false;
-    }
-    std::memcpy(&structure, payload.data(), sizeof structure);
-    payload.remove_prefix(std::min(aligned(sizeof structure), payload.size()));
-    return true;
+// The attributes behind that structure.
+template <class Body, class Take>
+bool readAttributesBehind(const nlmsghdr& message, const Take& take) {
+    return readAttributes(mnl_nlmsg_get_payload_offset(&message, sizeof(Body)),
+                          mnl_nlmsg_get_payload_len(&message) - sizeof(Body), take);
 }
 
-// Shows the attributes with their types, flag bits removed.
-//  result  false when they are cut off
-template <class Take>
-bool readAttributes(std::string_view attributes, const Take& take) {
-    while (attributes.size() >= sizeof(rtattr)) {
-        rtattr header = {};
-        std::memcpy(&header, attributes.data(), sizeof header);
-        if (header.rta_len < sizeof header || header.rta_len > attributes.size()) {
-            return false;
+int indexIn(const nlattr& attribute) {
+    return static_cast<int>(numberIn(attribute));
+}
+
+std::optional<IPv4Address> addressIn(const nlattr& attribute) {
+    const bool isAddress = mnl_attr_get_payload_len(&attribute) == sizeof(IPv4Address);
+    return isAddress ? std::optional(ntohl(numberIn(attribute))) : std::nullopt;
+}
+
+// What a route with several hops says: the first one, and whether others are on other links.
+void readHops(const nlattr& hops, KernelRoute& route) {
+    const auto* hop = static_cast<const rtnexthop*>(mnl_attr_get_payload(&hops));
+    int size = mnl_attr_get_payload_len(&hops);
+    while (size >= static_cast<int>(sizeof *hop) && RTNH_OK(hop, size)) {
+        if (route.linkIndex == 0) {
+            route.linkIndex = hop->rtnh_ifindex;
+            readAttributes(RTNH_DATA(hop), hop->rtnh_len - sizeof *hop, [&](int type, const nlattr& each) {
+                if (type == RTA_GATEWAY) {
+                    route.gateway = addressIn(each);
+                }
+            });
         }
-        take(header.rta_type & NLA_TYPE_MASK,
-             attributes.substr(sizeof header, header.rta_len - sizeof header));
-        attributes.remove_prefix(std::min(aligned(header.rta_len), attributes.size()));
+        route.isShared = route.isShared || hop->rtnh_ifindex != route.linkIndex;
+        size -= RTNH_ALIGN(hop->rtnh_len);
+        hop = RTNH_NEXT(hop);
     }
-    return attributes.empty();
-}
-
-// A number of an attribute; 0 when the attribute is no such number.
-std::uint32_t number(std::string_view data) {
-    std::uint32_t value = 0;
-    if (data.size() == sizeof value) {
-        std::memcpy(&value, data.data(), sizeof value);
-    }
-    return value;
-}
-
-int indexIn(std::string_view data) {
-    return static_cast<int>(number(data));
-}
-
-std::optional<IPv4Address> addressIn(std::string_view data) {
-    return data.size() == sizeof(std::uint32_t) ? std::optional(ntohl(number(data))) : std::nullopt;
-}
-
-// A text, which may or may not end with a zero byte.
-std::string textIn(std::string_view data) {
-    return std::string(data.substr(0, data.find('\0')));
-}
-
-// The first hop of a route with several.
-void readFirstHop(std::string_view hops, KernelRoute& route) {
-    rtnexthop hop = {};
-    if (hops.size() < sizeof hop) {
-        return;
-    }
-    std::memcpy(&hop, hops.data(), sizeof hop);
-    if (hop.rtnh_len < sizeof hop || hop.rtnh_len > hops.size()) {
-        return;
-    }
-    route.linkIndex = hop.rtnh_ifindex;
-    readAttributes(hops.substr(sizeof hop, hop.rtnh_len - sizeof hop), [&](int type, std::string_view data) {
-        if (type == RTA_GATEWAY) {
-            route.gateway = addressIn(data);
-        }
-    });
 }
 
 } // namespace
@@ -93,50 +62,55 @@ bool KernelLink::isActive() const {
     return (flags & IFF_UP) != 0 && (flags & kLowerUp) != 0;
 }
 
-bool readNetlinkMessages(std::string_view datagram, const std::function<bool(const NetlinkMessage&)>& take) {
-    while (!datagram.empty()) {
-        nlmsghdr header = {};
-        if (datagram.size() < sizeof header) {
-            return false;
-        }
-        std::memcpy(&header, datagram.data(), sizeof header);
-        if (header.nlmsg_len < sizeof header || header.nlmsg_len > datagram.size()) {
-            return false;
-        }
-        if (!take({header.nlmsg_type, header.nlmsg_flags, header.nlmsg_seq,
-                   datagram.substr(sizeof header, header.nlmsg_len - sizeof header)})) {
-            return true;
-        }
-        datagram.remove_prefix(std::min(aligned(header.nlmsg_len), datagram.size()));
+bool readAttributes(const void* begin, std::size_t size,
+                    const std::function<void(int type, const nlattr& attribute)>& take) {
+    const auto* attribute = static_cast<const nlattr*>(begin);
+    const auto left = [&] {
+        return static_cast<int>(static_cast<const char*>(begin) + size -
+                                reinterpret_cast<const char*>(attribute));
+    };
+    for (; mnl_attr_ok(attribute, left()); attribute = mnl_attr_next(attribute)) {
+        take(mnl_attr_get_type(attribute), *attribute);
     }
-    return true;
+    return left() <= 0;
 }
 
-std::optional<KernelLink> readLink(std::string_view payload) {
-    ifinfomsg body = {};
-    if (!takeStructure(payload, body) || body.ifi_index <= 0) {
+std::uint32_t numberIn(const nlattr& attribute) {
+    const bool isNumber = mnl_attr_get_payload_len(&attribute) == sizeof(std::uint32_t);
+    return isNumber ? mnl_attr_get_u32(&attribute) : 0;
+}
+
+std::string textIn(const nlattr& attribute) {
+    const char* const text = mnl_attr_get_str(&attribute);
+    return {text, ::strnlen(text, mnl_attr_get_payload_len(&attribute))};
+}
+
+std::optional<KernelLink> readLink(const nlmsghdr& message) {
+    const auto* const body = bodyOf<ifinfomsg>(message);
+    if (!body || body->ifi_index <= 0) {
         return std::nullopt;
     }
     KernelLink link;
-    link.index = body.ifi_index;
-    link.hardwareType = body.ifi_type;
-    link.flags = body.ifi_flags;
+    link.index = body->ifi_index;
+    link.hardwareType = body->ifi_type;
+    link.flags = body->ifi_flags;
     bool isElsewhere = false;
-    const bool isWhole = readAttributes(payload, [&](int type, std::string_view data) {
+    const bool isWhole = readAttributesBehind<ifinfomsg>(message, [&](int type, const nlattr& each) {
         if (type == IFLA_IFNAME) {
-            link.name = textIn(data);
+            link.name = textIn(each);
         } else if (type == IFLA_LINK) {
-            link.linkIndex = indexIn(data);
+            link.linkIndex = indexIn(each);
         } else if (type == IFLA_LINK_NETNSID) {
             isElsewhere = true;
         } else if (type == IFLA_MASTER) {
-            link.masterIndex = indexIn(data);
+            link.masterIndex = indexIn(each);
         } else if (type == IFLA_LINKINFO) {
-            readAttributes(data, [&](int inner, std::string_view innerData) {
-                if (inner == IFLA_INFO_KIND) {
-                    link.kind = textIn(innerData);
-                }
-            });
+            readAttributes(mnl_attr_get_payload(&each), mnl_attr_get_payload_len(&each),
+                           [&](int inner, const nlattr& information) {
+                               if (inner == IFLA_INFO_KIND) {
+                                   link.kind = textIn(information);
+                               }
+                           });
         }
     });
     if (isElsewhere) {
@@ -145,82 +119,87 @@ std::optional<KernelLink> readLink(std::string_view payload) {
     return isWhole && !link.name.empty() ? std::optional(link) : std::nullopt;
 }
 
-std::optional<KernelAddress> readAddress(std::string_view payload) {
-    ifaddrmsg body = {};
-    if (!takeStructure(payload, body) || body.ifa_family != AF_INET || body.ifa_prefixlen > 32) {
+std::optional<KernelAddress> readAddress(const nlmsghdr& message) {
+    const auto* const body = bodyOf<ifaddrmsg>(message);
+    if (!body || body->ifa_family != AF_INET || body->ifa_prefixlen > 32) {
         return std::nullopt;
     }
     std::optional<IPv4Address> own;
     std::optional<IPv4Address> peer;
-    const bool isWhole = readAttributes(payload, [&](int type, std::string_view data) {
+    const bool isWhole = readAttributesBehind<ifaddrmsg>(message, [&](int type, const nlattr& each) {
         if (type == IFA_LOCAL) {
-            own = addressIn(data);
+            own = addressIn(each);
         } else if (type == IFA_ADDRESS) {
-            peer = addressIn(data);
+            peer = addressIn(each);
         }
     });
     const std::optional<IPv4Address> address = own ? own : peer;
     if (!isWhole || !address) {
         return std::nullopt;
     }
-    return KernelAddress{static_cast<int>(body.ifa_index), *address, body.ifa_prefixlen};
+    return KernelAddress{static_cast<int>(body->ifa_index), *address, body->ifa_prefixlen};
 }
 
-std::optional<KernelRoute> readDefaultRoute(std::string_view payload) {
-    rtmsg body = {};
-    if (!takeStructure(payload, body) || body.rtm_family != AF_INET || body.rtm_dst_len != 0 ||
-        body.rtm_type != RTN_UNICAST || (body.rtm_flags & RTNH_F_DEAD) != 0) {
+std::optional<KernelRoute> readDefaultRoute(const nlmsghdr& message) {
+    const auto* const body = bodyOf<rtmsg>(message);
+    if (!body || body->rtm_family != AF_INET || body->rtm_dst_len != 0 || body->rtm_type != RTN_UNICAST ||
+        (body->rtm_flags & RTNH_F_DEAD) != 0) {
         return std::nullopt;
     }
-    std::uint32_t table = body.rtm_table;
+    std::uint32_t table = body->rtm_table;
     KernelRoute route;
-    const bool isWhole = readAttributes(payload, [&](int type, std::string_view data) {
+    const bool isWhole = readAttributesBehind<rtmsg>(message, [&](int type, const nlattr& each) {
         if (type == RTA_TABLE) {
-            table = number(data);
+            table = numberIn(each);
         } else if (type == RTA_OIF) {
-            route.linkIndex = indexIn(data);
+            route.linkIndex = indexIn(each);
         } else if (type == RTA_GATEWAY) {
-            route.gateway = addressIn(data);
+            route.gateway = addressIn(each);
         } else if (type == RTA_PRIORITY) {
-            route.metric = number(data);
+            route.metric = numberIn(each);
         } else if (type == RTA_MULTIPATH) {
-            readFirstHop(data, route);
+            readHops(each, route);
         }
     });
     return isWhole && table == RT_TABLE_MAIN && route.linkIndex > 0 ? std::optional(route) : std::nullopt;
 }
 
-void NetlinkRequest::_begin(std::uint16_t type, std::uint16_t flags) {
-    nlmsghdr header = {};
-    header.nlmsg_type = type;
-    header.nlmsg_flags = static_cast<std::uint16_t>(flags | NLM_F_REQUEST);
-    _append(&header, sizeof header);
+NetlinkRequest::NetlinkRequest(std::uint16_t type, std::uint16_t flags, std::string_view payload)
+    : _bytes(MNL_NLMSG_HDRLEN) {
+    nlmsghdr* const header = mnl_nlmsg_put_header(_bytes.data());
+    header->nlmsg_type = type;
+    header->nlmsg_flags = static_cast<std::uint16_t>(flags | NLM_F_REQUEST);
+    _append(payload);
 }
 
-void NetlinkRequest::_append(const void* data, std::size_t size) {
-    _bytes.append(static_cast<const char*>(data), size);
-    _bytes.resize(aligned(_bytes.size()));
-}
-
-void NetlinkRequest::addAttribute(std::uint16_t type, const void* data, std::size_t size) {
-    rtattr header = {};
-    header.rta_type = type;
-    header.rta_len = static_cast<std::uint16_t>(sizeof header + size);
-    _bytes.append(reinterpret_cast<const char*>(&header), sizeof header);
-    _append(data, size);
+void NetlinkRequest::addNumber(std::uint16_t type, std::uint32_t value) {
+    addNested(type, [&] { addBody(value); });
 }
 
 void NetlinkRequest::addAddress(std::uint16_t type, IPv4Address address) {
     addNumber(type, htonl(address));
 }
 
-std::string_view NetlinkRequest::bytes(std::uint32_t sequence) {
-    nlmsghdr header = {};
-    std::memcpy(&header, _bytes.data(), sizeof header);
-    header.nlmsg_len = static_cast<std::uint32_t>(_bytes.size());
-    header.nlmsg_seq = sequence;
-    std::memcpy(_bytes.data(), &header, sizeof header);
-    return _bytes;
+void NetlinkRequest::addText(std::uint16_t type, const std::string& text) {
+    _bytes.resize(message().nlmsg_len + MNL_ATTR_HDRLEN + MNL_ALIGN(text.size() + 1));
+    mnl_attr_put_strz(&message(), type, text.c_str());
+}
+
+std::size_t NetlinkRequest::_open(std::uint16_t type) {
+    const std::size_t begin = message().nlmsg_len;
+    _bytes.resize(begin + MNL_ATTR_HDRLEN);
+    mnl_attr_put(&message(), type, 0, nullptr);
+    return begin;
+}
+
+void NetlinkRequest::_close(std::size_t begin) {
+    mnl_attr_nest_end(&message(), reinterpret_cast<nlattr*>(_bytes.data() + begin));
+}
+
+void NetlinkRequest::_append(std::string_view data) {
+    const std::size_t begin = message().nlmsg_len;
+    _bytes.resize(begin + MNL_ALIGN(data.size()));
+    data.copy(static_cast<char*>(mnl_nlmsg_put_extra_header(&message(), data.size())), data.size());
 }
 
 } // namespace welcomer::posix

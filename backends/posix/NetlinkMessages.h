@@ -5,6 +5,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <linux/netlink.h>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -40,54 +41,67 @@ struct KernelAddress {
 
 // An IPv4 default route of the main table.
 struct KernelRoute {
-    int linkIndex = 0;
+    int linkIndex = 0; // of several hops, the first one's, as the gateway
     std::optional<IPv4Address> gateway;
     std::uint32_t metric = 0;
+    bool isShared = false; // whether it has hops on other links too
     friend bool operator==(const KernelRoute&, const KernelRoute&) = default;
 };
 
-// One message of a datagram; its payload is borrowed from that.
-struct NetlinkMessage {
-    std::uint16_t type = 0;
-    std::uint16_t flags = 0;
-    std::uint32_t sequence = 0;
-    std::string_view payload;
-};
+// What a message says, or none when it is cut off, makes no sense or is about something else: another family,
+// a route that is no default route of the main table, or one that cannot be used. Any thread, as all of this.
+std::optional<KernelLink> readLink(const nlmsghdr& message);
+std::optional<KernelAddress> readAddress(const nlmsghdr& message);
+std::optional<KernelRoute> readDefaultRoute(const nlmsghdr& message);
 
-// Shows the messages of a datagram in order, until `take` returns false.
-//  result  false when the datagram is cut off or makes no sense; `take` has then seen what comes before
-// Any thread, as all of this.
-bool readNetlinkMessages(std::string_view datagram, const std::function<bool(const NetlinkMessage&)>& take);
+// Shows the attributes in a piece of memory, which begins where an attribute may, with their types, flag bits
+// removed.
+//  result  false when they are cut off or make no sense; `take` has then seen what comes before
+bool readAttributes(const void* begin, std::size_t size,
+                    const std::function<void(int type, const nlattr& attribute)>& take);
 
-// What a message's payload says, or none when it is cut off, makes no sense or is about something else:
-// another family, a route that is no default route of the main table, or one that cannot be used.
-std::optional<KernelLink> readLink(std::string_view payload);
-std::optional<KernelAddress> readAddress(std::string_view payload);
-std::optional<KernelRoute> readDefaultRoute(std::string_view payload);
+// What an attribute holds: a number, which is 0 when it is none, and a text, which may or may not end with a
+// zero byte.
+std::uint32_t numberIn(const nlattr& attribute);
+std::string textIn(const nlattr& attribute);
 
 // A request: a header, a body and attributes.
 class NetlinkRequest {
   public:
-    //  type   RTM_...
-    //  flags  NLM_F_... besides NLM_F_REQUEST
+    //  type     RTM_... or another family's
+    //  flags    NLM_F_... besides NLM_F_REQUEST
+    //  body     the structure that messages of this type begin with
+    //  payload  that and attributes, as a message had them
     template <class Body>
-    NetlinkRequest(std::uint16_t type, std::uint16_t flags, const Body& body) {
-        _begin(type, flags);
-        _append(&body, sizeof body);
+    NetlinkRequest(std::uint16_t type, std::uint16_t flags, const Body& body)
+        : NetlinkRequest(type, flags, std::string_view(reinterpret_cast<const char*>(&body), sizeof body)) {}
+    NetlinkRequest(std::uint16_t type, std::uint16_t flags, std::string_view payload);
+
+    void addNumber(std::uint16_t type, std::uint32_t value);
+    void addAddress(std::uint16_t type, IPv4Address address);  // in the network's byte order
+    void addText(std::uint16_t type, const std::string& text); // with a zero byte
+
+    // An attribute that holds what `add` adds: others, behind a structure where there is one.
+    template <class Add>
+    void addNested(std::uint16_t type, const Add& add) {
+        const std::size_t begin = _open(type);
+        add();
+        _close(begin);
+    }
+    template <class Body>
+    void addBody(const Body& body) {
+        _append(std::string_view(reinterpret_cast<const char*>(&body), sizeof body));
     }
 
-    void addAttribute(std::uint16_t type, const void* data, std::size_t size);
-    void addNumber(std::uint16_t type, std::uint32_t value) { addAttribute(type, &value, sizeof value); }
-    void addAddress(std::uint16_t type, IPv4Address address); // in the network's byte order
-
-    // The bytes to send, with this sequence number.
-    std::string_view bytes(std::uint32_t sequence);
+    // The whole, to be sent; valid until something is added.
+    nlmsghdr& message() { return *reinterpret_cast<nlmsghdr*>(_bytes.data()); }
 
   private:
-    void _begin(std::uint16_t type, std::uint16_t flags);
-    void _append(const void* data, std::size_t size); // and pads it
+    std::size_t _open(std::uint16_t type);
+    void _close(std::size_t begin);
+    void _append(std::string_view data);
 
-    std::string _bytes;
+    std::vector<char> _bytes; // at least the message, which says its own length
 };
 
 } // namespace welcomer::posix

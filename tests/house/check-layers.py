@@ -35,6 +35,8 @@ TESTS = {"tests"}
 # The only files, besides tests and the backends themselves, that may choose a backend, and what is offered to them.
 PROGRAMS = re.compile(r"^(agent/main\.cpp|tools/[^/]+/main\.cpp)$")
 OFFERED = re.compile(r"^backends/(Backends|UnexpectedEnd|simulated/.+)\.h$")
+# The one base on the kernel, which tools may use too.
+BASE = re.compile(r"^backends/posix/[^/]+\.h$")
 
 SOURCES = {".h", ".hpp", ".c", ".cpp"}
 INCLUDE = re.compile(r'^\s*#\s*include\s*([<"])([^>"]+)[>"]')
@@ -74,7 +76,7 @@ def refusal(source, target, quoted, tree):
     if aim in TESTS:
         return "includes a test"
     if aim == "backends" and room != "backends":
-        if OFFERED.match(target) and PROGRAMS.match(str(source)):
+        if OFFERED.match(target) and PROGRAMS.match(str(source)) or room == "tools" and BASE.match(target):
             return None
         return "chooses a backend; only a program's main.cpp does"
     if aim == room:

@@ -55,6 +55,12 @@ class CheckLayers(unittest.TestCase):
         self.assert_one({**backend, "agent/Agent.cpp": use}, "chooses a backend")
         self.assert_one({**backend, "tools/welcomer/commands/TryCommand.cpp": use}, "chooses a backend")
 
+    def test_tools_use_the_base_on_the_kernel_and_nobody_else_does(self):
+        base = {"backends/posix/A.h": "", "backends/local/B.h": ""}
+        self.assertEqual(self.findings({**base, "tools/one/C.cpp": '#include "backends/posix/A.h"\n'}), [])
+        self.assert_one({**base, "agent/C.cpp": '#include "backends/posix/A.h"\n'}, "chooses a backend")
+        self.assert_one({**base, "tools/one/C.cpp": '#include "backends/local/B.h"\n'}, "chooses a backend")
+
     def test_only_a_program_chooses_simulated_time(self):
         time = {"backends/simulated/VirtualTime.h": ""}
         use = '#include "backends/simulated/VirtualTime.h"\n'

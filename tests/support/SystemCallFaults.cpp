@@ -7,6 +7,7 @@
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <sys/file.h>
+#include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/types.h>
 #include <unistd.h>
@@ -121,6 +122,19 @@ int ftruncate(int file, off_t size) noexcept {
 int linkat(int fromFolder, const char* from, int toFolder, const char* to, int flags) noexcept {
     static const auto next = real<int(int, const char*, int, const char*, int)>("linkat");
     return mustFail("linkat") ? -1 : next(fromFolder, from, toFolder, to, flags);
+}
+
+// These two a library makes for the program, which has to find them here.
+[[gnu::visibility("default")]] ssize_t sendto(int socket, const void* data, size_t size, int flags,
+                                              const sockaddr* to, socklen_t length) {
+    static const auto next =
+        real<ssize_t(int, const void*, size_t, int, const sockaddr*, socklen_t)>("sendto");
+    return mustFail("sendto") ? -1 : next(socket, data, size, flags, to, length);
+}
+
+[[gnu::visibility("default")]] ssize_t recvmsg(int socket, msghdr* message, int flags) {
+    static const auto next = real<ssize_t(int, msghdr*, int)>("recvmsg");
+    return mustFail("recvmsg") ? -1 : next(socket, message, flags);
 }
 
 int mkdirat(int folder, const char* path, mode_t mode) noexcept {

@@ -1,9 +1,9 @@
 // Has the system calls of this test program fail, or the process end, at a chosen one.
 //
 // A program that links SystemCallFaults.cpp makes its own calls of fchmod, fchmodat, fstat, fsync, flock,
-// ftruncate, linkat, mkdirat, open, openat, posix_fallocate, read, renameat, stat, unlink, unlinkat and
-// write through this counter; those that the C library makes within itself are not seen. One thread at a
-// time.
+// ftruncate, linkat, mkdirat, open, openat, posix_fallocate, read, recvmsg, renameat, sendto, stat, unlink,
+// unlinkat and write through this counter, and libraries do so with theirs of recvmsg and sendto; those that
+// the C library makes within itself are not seen. One thread at a time.
 
 #pragma once
 

@@ -2,8 +2,8 @@
 
 #pragma once
 
-#include "backends/posix/FileDescriptor.h"
 #include "backends/posix/NetlinkMessages.h"
+#include "backends/posix/NetlinkSocket.h"
 
 #include <optional>
 #include <string>
@@ -27,26 +27,22 @@ class KernelNetwork {
 
     // Each gives 0 or the system's error number. Adding what is there already and removing what is not are no
     // failures.
-    int bringUp(int linkIndex);
+    int setUp(int linkIndex, bool isUp);
     int addAddress(const posix::KernelAddress& address);
     int removeAddress(const posix::KernelAddress& address);
-    int addDefaultRoute(const posix::KernelRoute& route);
+    int addDefaultRoute(const posix::KernelRoute& route); // in place of its link's one of that metric
     int removeDefaultRoute(const posix::KernelRoute& route);
 
+    // The connection that this asks through, for what else there is to ask.
+    posix::NetlinkSocket& socket() { return _socket; }
+
   private:
-    // Sends a request and shows the payloads of its answers.
-    //  result  0 or the system's error number
-    int _ask(posix::NetlinkRequest& request, const std::function<void(std::string_view payload)>& take);
-    // The same, again and again for as long as the kernel's tables change under a listing.
-    int _list(posix::NetlinkRequest& request, const std::function<void()>& begin,
-              const std::function<void(std::string_view payload)>& take);
-    int _change(posix::NetlinkRequest& request);
-    int _open();
+    template <class Value>
+    std::vector<Value> _list(posix::NetlinkRequest request,
+                             std::optional<Value> (*read)(const nlmsghdr& message));
     std::optional<posix::KernelLink> _oneLink(posix::NetlinkRequest& request);
 
-    posix::FileDescriptor _socket;
-    std::string _buffer;
-    std::uint32_t _sequence = 0;
+    posix::NetlinkSocket _socket;
 };
 
 } // namespace welcomer::local

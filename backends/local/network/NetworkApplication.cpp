@@ -140,7 +140,7 @@ std::int32_t applyStatic(KernelNetwork& kernel, const posix::KernelLink& link, c
     const std::vector<posix::KernelAddress> before = kernel.addressesOf(link.index);
     const bool wasThere = std::ranges::count(before, address) > 0;
     const posix::KernelRoute route{link.index, plan.router, 0};
-    int error = kernel.bringUp(link.index);
+    int error = kernel.setUp(link.index, true);
     if (error == 0 && !wasThere) {
         error = kernel.addAddress(address);
     }
@@ -170,7 +170,7 @@ std::int32_t applyDynamic(const posix::RootFolder& root, KernelNetwork& kernel, 
     if (!client.isInstalled()) {
         return platform::kNetworkConfigNoDHCPClient;
     }
-    int error = kernel.bringUp(link.index);
+    int error = kernel.setUp(link.index, true);
     if (error == 0) {
         error = removeOthers(kernel, link.index, nullptr, nullptr);
     }

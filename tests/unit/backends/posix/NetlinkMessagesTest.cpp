@@ -2,10 +2,12 @@
 
 #include <gtest/gtest.h>
 
+#include <array>
 #include <cstring>
+#include <linux/if_addr.h>
 #include <linux/if_link.h>
-#include <linux/netlink.h>
 #include <linux/rtnetlink.h>
+#include <memory>
 #include <random>
 #include <string>
 #include <sys/socket.h>
@@ -14,9 +16,37 @@
 namespace welcomer::posix {
 namespace {
 
+// A message as the kernel has it in memory, and no byte more: its header with these bytes behind it.
+class Message {
+  public:
+    explicit Message(std::string_view payload) : _bytes(new char[sizeof(nlmsghdr) + payload.size()]) {
+        payload.copy(_bytes.get() + sizeof(nlmsghdr), payload.size());
+        nlmsghdr header = {};
+        header.nlmsg_len = static_cast<std::uint32_t>(sizeof header + payload.size());
+        std::memcpy(_bytes.get(), &header, sizeof header);
+    }
+    const nlmsghdr& operator*() const { return *reinterpret_cast<const nlmsghdr*>(_bytes.get()); }
+
+  private:
+    std::unique_ptr<char[]> _bytes;
+};
+
 // The payload of a message: what follows its header.
 std::string payloadOf(NetlinkRequest& request) {
-    return std::string(request.bytes(1).substr(sizeof(nlmsghdr)));
+    const nlmsghdr& message = request.message();
+    return {reinterpret_cast<const char*>(&message + 1), message.nlmsg_len - sizeof message};
+}
+
+std::optional<KernelLink> readLink(std::string_view payload) {
+    return posix::readLink(*Message(payload));
+}
+
+std::optional<KernelAddress> readAddress(std::string_view payload) {
+    return posix::readAddress(*Message(payload));
+}
+
+std::optional<KernelRoute> readDefaultRoute(std::string_view payload) {
+    return posix::readDefaultRoute(*Message(payload));
 }
 
 std::string linkMessage() {
@@ -24,11 +54,11 @@ std::string linkMessage() {
     body.ifi_index = 7;
     body.ifi_type = 1;
     NetlinkRequest request(RTM_NEWLINK, 0, body);
-    request.addAttribute(IFLA_IFNAME, "eth7", 5);
+    request.addText(IFLA_IFNAME, "eth7");
     request.addNumber(IFLA_LINK, 3);
     request.addNumber(IFLA_MASTER, 4);
-    const std::string kind("\x0b\0\x01\0macvlan", 11); // length, type, text
-    request.addAttribute(IFLA_LINKINFO, kind.data(), kind.size());
+    const std::array<char, 12> kind = {11, 0, IFLA_INFO_KIND, 0, 'm', 'a', 'c', 'v', 'l', 'a', 'n'};
+    request.addNested(IFLA_LINKINFO, [&] { request.addBody(kind); }); // its text has no zero byte of its own
     return payloadOf(request);
 }
 
@@ -71,7 +101,7 @@ TEST(NetlinkMessagesTest, ALinkOfAnotherNamespaceIsNoLinkBelow) {
     NetlinkRequest request(RTM_NEWLINK, 0, body);
     request.addNumber(IFLA_LINK_NETNSID, 0);
     request.addNumber(IFLA_LINK, 3);
-    request.addAttribute(IFLA_IFNAME, "eth7", 5);
+    request.addText(IFLA_IFNAME, "eth7");
     EXPECT_EQ(readLink(payloadOf(request))->linkIndex, 0);
 }
 
@@ -80,7 +110,7 @@ TEST(NetlinkMessagesTest, AnAddressIsTheLinksOwnAndNotItsPeers) {
 }
 
 TEST(NetlinkMessagesTest, ADefaultRouteIsReadWithGatewayAndMetric) {
-    EXPECT_EQ(readDefaultRoute(routeMessage()), (KernelRoute{7, 0xC0000201, 9}));
+    EXPECT_EQ(readDefaultRoute(routeMessage()), (KernelRoute{7, 0xC0000201, 9, false}));
 }
 
 TEST(NetlinkMessagesTest, MessagesOfOtherFamiliesAndRoutesAreNone) {
@@ -142,26 +172,27 @@ TEST(NetlinkMessagesTest, RandomBytesAreReadWithinTheirBounds) {
         readLink(exact);
         readAddress(exact);
         readDefaultRoute(exact);
-        readNetlinkMessages(exact, [](const NetlinkMessage&) { return true; });
     }
 }
 
-TEST(NetlinkMessagesTest, ADatagramsMessagesAreShownInOrder) {
-    ifinfomsg body = {};
-    NetlinkRequest first(RTM_GETLINK, NLM_F_DUMP, body);
-    NetlinkRequest second(RTM_GETADDR, 0, body);
-    std::string datagram(first.bytes(4));
-    datagram += second.bytes(5);
-    std::vector<std::uint32_t> sequences;
-    const auto take = [&](const NetlinkMessage& message) {
-        sequences.push_back(message.sequence);
-        return sequences.size() < 2;
-    };
-    EXPECT_TRUE(readNetlinkMessages(datagram + "rest", take)); // not looked at any more
-    EXPECT_EQ(sequences, (std::vector<std::uint32_t>{4, 5}));
-    sequences.clear();
-    EXPECT_FALSE(readNetlinkMessages(datagram.substr(0, datagram.size() - 1), take));
-    EXPECT_EQ(sequences, (std::vector<std::uint32_t>{4}));
+TEST(NetlinkMessagesTest, OfARouteWithSeveralHopsTheFirstOneCountsAndOthersShareIt) {
+    for (const int other : {7, 8}) {
+        rtmsg body = {};
+        body.rtm_family = AF_INET;
+        body.rtm_table = RT_TABLE_MAIN;
+        body.rtm_type = RTN_UNICAST;
+        NetlinkRequest request(RTM_NEWROUTE, 0, body);
+        request.addNested(RTA_MULTIPATH, [&] {
+            request.addBody(rtnexthop{16, 0, 0, 7});
+            request.addAddress(RTA_GATEWAY, 0xC0000201);
+            request.addBody(rtnexthop{16, 0, 0, other});
+            request.addAddress(RTA_GATEWAY, 0xC0000202);
+        });
+        EXPECT_EQ(readDefaultRoute(payloadOf(request)), (KernelRoute{7, 0xC0000201, 0, other != 7}));
+        std::string cut = payloadOf(request);
+        cut[sizeof(rtmsg) + 4] = 60; // the first hop's length
+        EXPECT_FALSE(readDefaultRoute(cut));
+    }
 }
 
 } // namespace
