@@ -29,20 +29,36 @@ int writeNewFile(int folder, const std::string& name, std::string_view content, 
     return ::fsync(file.get()) == 0 ? 0 : errno;
 }
 
-int rewriteInPlace(int folder, const std::string& name, std::string_view content) {
-    const FileDescriptor file(::openat(folder, name.c_str(), O_WRONLY | O_NOFOLLOW | O_CLOEXEC));
-    struct stat before = {};
-    if (!file || ::fstat(file.get(), &before) != 0) {
+// Has an open file hold this content and no more.
+int overwrite(int file, std::string_view content) {
+    if (::lseek(file, 0, SEEK_SET) < 0) {
         return errno;
     }
-    const auto size = static_cast<off_t>(content.size());
-    if (const int error = size > before.st_size ? ::posix_fallocate(file.get(), 0, size) : 0) {
-        return ::ftruncate(file.get(), before.st_size) == 0 ? error : errno;
-    }
-    if (const int error = writeAll(file.get(), content)) {
+    if (const int error = writeAll(file, content)) {
         return error;
     }
-    return ::ftruncate(file.get(), size) == 0 && ::fsync(file.get()) == 0 ? 0 : errno;
+    return ::ftruncate(file, static_cast<off_t>(content.size())) == 0 && ::fsync(file) == 0 ? 0 : errno;
+}
+
+int rewriteInPlace(int folder, const std::string& name, std::string_view content) {
+    const FileDescriptor file(::openat(folder, name.c_str(), O_RDWR | O_NOFOLLOW | O_CLOEXEC));
+    struct stat status = {};
+    if (!file || ::fstat(file.get(), &status) != 0) {
+        return errno;
+    }
+    std::string before;
+    if (const int error = readAll(file.get(), before, static_cast<std::size_t>(status.st_size))) {
+        return error;
+    }
+    const auto size = static_cast<off_t>(content.size());
+    if (const int error = size > status.st_size ? ::posix_fallocate(file.get(), 0, size) : 0) {
+        return ::ftruncate(file.get(), status.st_size) == 0 ? error : errno;
+    }
+    const int error = overwrite(file.get(), content);
+    if (error != 0) {
+        overwrite(file.get(), before); // its space is there
+    }
+    return error;
 }
 
 } // namespace

@@ -142,8 +142,7 @@ std::optional<KernelAddress> readAddress(const nlmsghdr& message) {
 
 std::optional<KernelRoute> readDefaultRoute(const nlmsghdr& message) {
     const auto* const body = bodyOf<rtmsg>(message);
-    if (!body || body->rtm_family != AF_INET || body->rtm_dst_len != 0 || body->rtm_type != RTN_UNICAST ||
-        (body->rtm_flags & RTNH_F_DEAD) != 0) {
+    if (!body || body->rtm_family != AF_INET || body->rtm_dst_len != 0) {
         return std::nullopt;
     }
     std::uint32_t table = body->rtm_table;
@@ -161,7 +160,9 @@ std::optional<KernelRoute> readDefaultRoute(const nlmsghdr& message) {
             readHops(each, route);
         }
     });
-    return isWhole && table == RT_TABLE_MAIN && route.linkIndex > 0 ? std::optional(route) : std::nullopt;
+    route.isUsable =
+        body->rtm_type == RTN_UNICAST && (body->rtm_flags & RTNH_F_DEAD) == 0 && route.linkIndex > 0;
+    return isWhole && table == RT_TABLE_MAIN ? std::optional(route) : std::nullopt;
 }
 
 NetlinkRequest::NetlinkRequest(std::uint16_t type, std::uint16_t flags, std::string_view payload)

@@ -9,6 +9,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <type_traits>
 #include <vector>
 
 namespace welcomer::posix {
@@ -45,11 +46,12 @@ struct KernelRoute {
     std::optional<IPv4Address> gateway;
     std::uint32_t metric = 0;
     bool isShared = false; // whether it has hops on other links too
+    bool isUsable = true;  // whether it leads anywhere: others say that there is no way
     friend bool operator==(const KernelRoute&, const KernelRoute&) = default;
 };
 
 // What a message says, or none when it is cut off, makes no sense or is about something else: another family,
-// a route that is no default route of the main table, or one that cannot be used. Any thread, as all of this.
+// a route that is no default route of the main table. Any thread, as all of this.
 std::optional<KernelLink> readLink(const nlmsghdr& message);
 std::optional<KernelAddress> readAddress(const nlmsghdr& message);
 std::optional<KernelRoute> readDefaultRoute(const nlmsghdr& message);
@@ -73,7 +75,8 @@ class NetlinkRequest {
     //  body     the structure that messages of this type begin with
     //  payload  that and attributes, as a message had them
     template <class Body>
-    NetlinkRequest(std::uint16_t type, std::uint16_t flags, const Body& body)
+    requires std::is_aggregate_v<Body> NetlinkRequest(std::uint16_t type, std::uint16_t flags,
+                                                      const Body& body)
         : NetlinkRequest(type, flags, std::string_view(reinterpret_cast<const char*>(&body), sizeof body)) {}
     NetlinkRequest(std::uint16_t type, std::uint16_t flags, std::string_view payload);
 

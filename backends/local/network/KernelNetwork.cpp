@@ -58,23 +58,22 @@ int unless(int tolerated, int error) {
 } // namespace
 
 template <class Value>
-std::vector<Value> KernelNetwork::_list(posix::NetlinkRequest request,
-                                        std::optional<Value> (*read)(const nlmsghdr& message)) {
-    std::vector<Value> found;
-    _socket.list(
+int KernelNetwork::_list(posix::NetlinkRequest& request,
+                         std::optional<Value> (*read)(const nlmsghdr& message), std::vector<Value>& found) {
+    return _socket.list(
         request, [&] { found.clear(); },
         [&](const nlmsghdr& message) {
             if (auto value = read(message)) {
                 found.push_back(std::move(*value));
             }
         });
-    return found;
 }
 
 std::vector<posix::KernelLink> KernelNetwork::links() {
     posix::NetlinkRequest request(RTM_GETLINK, NLM_F_DUMP, linkBody(0));
     request.addNumber(IFLA_EXT_MASK, kWithoutStatistics);
-    auto found = _list(std::move(request), posix::readLink);
+    std::vector<posix::KernelLink> found;
+    _list(request, posix::readLink, found);
     std::ranges::stable_sort(found, {}, &posix::KernelLink::index);
     return found;
 }
@@ -101,19 +100,33 @@ std::optional<posix::KernelLink> KernelNetwork::_oneLink(posix::NetlinkRequest& 
 }
 
 std::vector<posix::KernelAddress> KernelNetwork::addressesOf(int linkIndex) {
-    ifaddrmsg body = {};
-    body.ifa_family = AF_INET;
-    body.ifa_index = static_cast<unsigned int>(linkIndex); // kernels that know no filter list all
-    auto found = _list(posix::NetlinkRequest(RTM_GETADDR, NLM_F_DUMP, body), posix::readAddress);
-    std::erase_if(found, [&](const posix::KernelAddress& each) { return each.linkIndex != linkIndex; });
+    std::vector<posix::KernelAddress> found;
+    listAddresses(linkIndex, found);
     return found;
 }
 
 std::vector<posix::KernelRoute> KernelNetwork::defaultRoutes() {
+    std::vector<posix::KernelRoute> found;
+    listDefaultRoutes(found);
+    return found;
+}
+
+int KernelNetwork::listAddresses(int linkIndex, std::vector<posix::KernelAddress>& found) {
+    ifaddrmsg body = {};
+    body.ifa_family = AF_INET;
+    body.ifa_index = static_cast<unsigned int>(linkIndex); // kernels that know no filter list all
+    posix::NetlinkRequest request(RTM_GETADDR, NLM_F_DUMP, body);
+    const int error = _list(request, posix::readAddress, found);
+    std::erase_if(found, [&](const posix::KernelAddress& each) { return each.linkIndex != linkIndex; });
+    return error;
+}
+
+int KernelNetwork::listDefaultRoutes(std::vector<posix::KernelRoute>& found) {
     rtmsg body = {};
     body.rtm_family = AF_INET;
     body.rtm_table = RT_TABLE_MAIN;
-    return _list(posix::NetlinkRequest(RTM_GETROUTE, NLM_F_DUMP, body), posix::readDefaultRoute);
+    posix::NetlinkRequest request(RTM_GETROUTE, NLM_F_DUMP, body);
+    return _list(request, posix::readDefaultRoute, found);
 }
 
 int KernelNetwork::setUp(int linkIndex, bool isUp) {

@@ -21,9 +21,14 @@ class KernelNetwork {
     std::optional<posix::KernelLink> linkNamed(const std::string& name);
     std::optional<posix::KernelLink> linkNumbered(int index);
 
-    // A link's IPv4 addresses and default routes, in the kernel's order.
+    // A link's IPv4 addresses, and all default routes, in the kernel's order.
     std::vector<posix::KernelAddress> addressesOf(int linkIndex);
     std::vector<posix::KernelRoute> defaultRoutes();
+
+    // The same for whom it matters whether they could be read.
+    //  result  0 or the system's error number
+    int listAddresses(int linkIndex, std::vector<posix::KernelAddress>& found);
+    int listDefaultRoutes(std::vector<posix::KernelRoute>& found);
 
     // Each gives 0 or the system's error number. Adding what is there already and removing what is not are no
     // failures.
@@ -38,8 +43,8 @@ class KernelNetwork {
 
   private:
     template <class Value>
-    std::vector<Value> _list(posix::NetlinkRequest request,
-                             std::optional<Value> (*read)(const nlmsghdr& message));
+    int _list(posix::NetlinkRequest& request, std::optional<Value> (*read)(const nlmsghdr& message),
+              std::vector<Value>& found);
     std::optional<posix::KernelLink> _oneLink(posix::NetlinkRequest& request);
 
     posix::NetlinkSocket _socket;

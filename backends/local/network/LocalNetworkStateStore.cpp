@@ -45,7 +45,8 @@ class Connection final : public platform::NetworkStateConnection {
 
   private:
     Value _globalIPv4() {
-        const std::vector<posix::KernelRoute> routes = _kernel.defaultRoutes();
+        std::vector<posix::KernelRoute> routes = _kernel.defaultRoutes();
+        std::erase_if(routes, [](const posix::KernelRoute& each) { return !each.isUsable; });
         const auto best = std::ranges::min_element(routes, {}, &posix::KernelRoute::metric);
         const auto link = best == routes.end() ? std::nullopt : _kernel.linkNumbered(best->linkIndex);
         if (!link) {

@@ -10,9 +10,12 @@
 #include "platform/NetworkConfigStore.h"
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
+#include <climits>
 #include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 namespace welcomer::local {
 
@@ -25,6 +28,10 @@ constexpr mode_t kMode = 0644;
 constexpr char kLocksParent[] = "/var/lib/welcomer";
 constexpr mode_t kLocksParentMode = 0755;
 constexpr mode_t kPermissions = 07777;
+// What the machine's resolver may be a link to, absolute or relative, where that is systemd-resolved.
+constexpr std::array<std::string_view, 4> kResolvedFiles = {
+    "/run/systemd/resolve/stub-resolv.conf", "/run/systemd/resolve/resolv.conf",
+    "/usr/lib/systemd/resolv.conf", "/lib/systemd/resolv.conf"};
 constexpr std::string_view kBlanks = " \t\r";
 constexpr std::string_view kServer = "nameserver";
 
@@ -111,6 +118,14 @@ ResolverConfiguration ResolverFile::read() const {
         return {};
     }
     return readResolverText(text);
+}
+
+bool ResolverFile::isOfResolved() const {
+    const posix::FileDescriptor folder = _root.open(kFolder, O_RDONLY | O_DIRECTORY);
+    std::array<char, PATH_MAX> buffer = {};
+    const ssize_t size = ::readlinkat(folder.get(), kName, buffer.data(), buffer.size());
+    const std::string_view target(buffer.data(), size < 0 ? 0 : static_cast<std::size_t>(size));
+    return std::ranges::any_of(kResolvedFiles, [&](std::string_view each) { return target.ends_with(each); });
 }
 
 std::int32_t ResolverFile::writeServers(const std::vector<std::string>& servers, std::string& detail) const {

@@ -34,6 +34,9 @@ class ResolverFile {
     // What the file says; nothing when it cannot be read or is longer than a text may be.
     ResolverConfiguration read() const;
 
+    // Whether it is a link to one of the files that systemd-resolved keeps.
+    bool isOfResolved() const;
+
     // Puts other servers in, all or nothing.
     //  servers  addresses, checked before
     //  detail   receives on failure what the file is called here and, where that is known, what the system
