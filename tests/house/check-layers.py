@@ -30,6 +30,9 @@ SIDES = {
     "backends": {"platform", "propertylist"},
     "examples": {"sdk"},
 }
+# The rooms of one program, from the lowest: a room includes itself and those before it. What stands beside them may
+# include all of them.
+TOOL_ROOMS = {"tools/welcomer": ["terminal", "cli", "story", "commands"]}
 # Free to include everything: nothing includes them.
 TESTS = {"tests"}
 # The only files, besides tests and the backends themselves, that may choose a backend, and what is offered to them.
@@ -59,6 +62,20 @@ def includes(path):
             yield number, match.group(1) == '"', match.group(2)
 
 
+def room_refusal(source, target):
+    """Why this file of a tool may not include that one of the same tool, or None."""
+    for tool, rooms in TOOL_ROOMS.items():
+        pair = [Path(path).relative_to(tool).parts for path in (source, target) if Path(path).is_relative_to(tool)]
+        if len(pair) < 2 or len(pair[0]) == 1:
+            continue
+        for parts in pair:
+            if parts[0] not in rooms:
+                return f"{tool}/{parts[0]} is none of the rooms {', '.join(rooms)}"
+        if rooms.index(pair[1][0]) > rooms.index(pair[0][0]):
+            return f"room {pair[1][0]}/ is not below {pair[0][0]}/"
+    return None
+
+
 def refusal(source, target, quoted, tree):
     """Why this file may not include that one, or None."""
     room = source.parts[0]
@@ -80,7 +97,7 @@ def refusal(source, target, quoted, tree):
             return None
         return "chooses a backend; only a program's main.cpp does"
     if aim == room:
-        return None
+        return room_refusal(source, target)
     if room in SIDES:
         return None if aim in SIDES[room] else f"{room}/ includes {', '.join(sorted(SIDES[room]))} only"
     if FLOORS[aim] >= FLOORS[room]:

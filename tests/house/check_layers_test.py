@@ -76,6 +76,17 @@ class CheckLayers(unittest.TestCase):
         self.assert_one({"agent/A.cpp": "#include <sys/stat.h>\n"}, "standard library alone")
         self.assertEqual(self.findings({"backends/local/A.cpp": "#include <unistd.h>\n"}), [])
 
+    def test_a_tools_rooms_include_what_is_below_them(self):
+        tool = "tools/welcomer"
+        files = {f"{tool}/{room}/A.h": "" for room in ("terminal", "cli", "story", "commands")}
+        def use(room):
+            return f'#include "{tool}/{room}/A.h"\n'
+        self.assertEqual(self.findings({**files, f"{tool}/main.cpp": use("commands") + use("terminal"),
+                                        f"{tool}/story/B.cpp": use("story") + use("cli") + use("terminal")}), [])
+        self.assert_one({**files, f"{tool}/terminal/B.cpp": use("cli")}, "room cli/ is not below terminal/")
+        self.assert_one({**files, f"{tool}/cli/B.cpp": use("commands")}, "room commands/ is not below cli/")
+        self.assert_one({**files, f"{tool}/other/B.cpp": use("cli")}, "tools/welcomer/other is none of the rooms")
+
     def test_a_missing_file_is_found(self):
         self.assert_one({"log/A.cpp": '#include "A.h"\n'}, "not in the tree")
 

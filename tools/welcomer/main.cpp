@@ -4,6 +4,7 @@
 #include "backends/simulated/VirtualTime.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/cli/ToolBundle.h"
+#include "tools/welcomer/commands/Commands.h"
 
 namespace {
 
@@ -33,5 +34,5 @@ std::shared_ptr<PlatformOwner> build(PlatformOptions options, tool::TimeKind tim
 } // namespace
 
 int main(int argc, char** argv) {
-    return tool::runTool(argc, argv, build);
+    return tool::runTool(argc, argv, build, tool::kCommands);
 }

@@ -1,7 +1,7 @@
 #include "tools/welcomer/cli/PropertyListFile.h"
 
 #include "propertylist/PropertyListReader.h"
-#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/terminal/Failure.h"
 
 #include <cerrno>
 #include <fstream>

@@ -2,7 +2,7 @@
 
 #include "propertylist/Base64.h"
 #include "text/Describe.h"
-#include "tools/welcomer/cli/Printable.h"
+#include "tools/welcomer/terminal/Printable.h"
 
 #include <ostream>
 

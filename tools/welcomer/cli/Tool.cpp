@@ -1,7 +1,6 @@
 #include "tools/welcomer/cli/Tool.h"
 
-#include "tools/welcomer/cli/Commands.h"
-#include "tools/welcomer/cli/Printable.h"
+#include "tools/welcomer/terminal/Printable.h"
 
 #include <CLI/CLI.hpp>
 #include <filesystem>
@@ -165,7 +164,16 @@ void CommandLine::addLocalOption(CLI::App& command) {
                      "finds it there");
 }
 
-int runTool(int argc, char** argv, const PlatformFactory& buildPlatform) {
+void CommandLine::addPasswordOption(CLI::App& command, PasswordSource& source) {
+    command
+        .add_option("--password-fd", source,
+                    "Read the password, one line, from this open descriptor instead of the terminal")
+        ->type_name("N")
+        ->check(CLI::NonNegativeNumber);
+}
+
+int runTool(int argc, char** argv, const PlatformFactory& buildPlatform,
+            std::span<const CommandAdder> commands) {
     CLI::App app(
         "Finishes a user's cloud-account setup after the first login: looks at it, tries it, prepares it.",
         "welcomer");
@@ -176,9 +184,9 @@ int runTool(int argc, char** argv, const PlatformFactory& buildPlatform) {
     Options options;
     addGlobalOptions(app, options);
     CommandLine commandLine(app, options);
-    for (const CommandAdder& commands : kCommands) {
-        commandLine.setNeedsHome(commands.needsHome);
-        commands.add(commandLine);
+    for (const CommandAdder& adder : commands) {
+        commandLine.setNeedsHome(adder.needsHome);
+        adder.add(commandLine);
     }
     if (const auto status = parse(app, argc, argv)) {
         return *status;

@@ -3,12 +3,14 @@
 #pragma once
 
 #include "platform/AccountDirectory.h"
+#include "tools/welcomer/cli/KeptLog.h"
 #include "tools/welcomer/cli/PlatformFactory.h"
-#include "tools/welcomer/story/KeptLog.h"
+#include "tools/welcomer/terminal/Failure.h"
+#include "tools/welcomer/terminal/Password.h"
 
 #include <functional>
 #include <iosfwd>
-#include <stdexcept>
+#include <span>
 #include <string>
 
 namespace CLI {
@@ -42,18 +44,6 @@ struct Session {
 // A command's work. What it throws ends the tool with one line on stderr.
 using Command = std::function<void(Session&)>;
 
-// The command did not do what was asked: exit status 1.
-class CommandFailure : public std::runtime_error {
-  public:
-    using std::runtime_error::runtime_error;
-};
-
-// The command line makes no sense, in a way that only the command itself can tell: exit status 2.
-class UsageError : public std::runtime_error {
-  public:
-    using std::runtime_error::runtime_error;
-};
-
 // What a command registers itself with: the command line being built, and the place for the chosen command.
 class CommandLine {
   public:
@@ -77,6 +67,9 @@ class CommandLine {
     // Gives a command the option `--local`, which has the platform store new credentials in the local store.
     void addLocalOption(CLI::App& command);
 
+    // Gives a command the option `--password-fd`.
+    static void addPasswordOption(CLI::App& command, PasswordSource& source);
+
     // The command that the arguments chose, with its full name.
     const Command& chosen() const { return _chosen; }
     const std::string& chosenName() const { return _chosenName; }
@@ -89,9 +82,17 @@ class CommandLine {
     std::string _chosenName;
 };
 
+// What adds commands, and whether these work with what lies in the user's home.
+struct CommandAdder {
+    void (*add)(CommandLine& commandLine);
+    bool needsHome;
+};
+
 // Runs the tool.
-//  result  the exit status: 0, kExitFailed or kExitUsage
+//  commands  all that it has, in the order in which --help shows them
+//  result    the exit status: 0, kExitFailed or kExitUsage
 // Main thread, no other thread running.
-int runTool(int argc, char** argv, const PlatformFactory& buildPlatform);
+int runTool(int argc, char** argv, const PlatformFactory& buildPlatform,
+            std::span<const CommandAdder> commands);
 
 } // namespace welcomer::tool

@@ -5,13 +5,13 @@
 #include "plugins/DelegateIdentifiers.h"
 #include "plugins/WLNimbusDelegatesRequest.h"
 #include "propertylist/UTF8.h"
-#include "tools/welcomer/cli/Commands.h"
-#include "tools/welcomer/cli/Printable.h"
-#include "tools/welcomer/cli/TextTable.h"
 #include "tools/welcomer/cli/Tool.h"
-#include "tools/welcomer/commands/ServiceStates.h"
+#include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/story/ServiceStates.h"
 #include "tools/welcomer/story/SetupFlow.h"
 #include "tools/welcomer/terminal/Password.h"
+#include "tools/welcomer/terminal/Printable.h"
+#include "tools/welcomer/terminal/TextTable.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
@@ -228,7 +228,7 @@ void addAdd(CommandLine& commandLine, CLI::App& group) {
         ->type_name("A")
         ->expected(1)
         ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
-    addPasswordOption(command, arguments->password);
+    CommandLine::addPasswordOption(command, arguments->password);
 }
 
 void addSignIn(CommandLine& commandLine, CLI::App& group) {
@@ -237,7 +237,7 @@ void addSignIn(CommandLine& commandLine, CLI::App& group) {
         commandLine.addCommand(group, "sign-in", "Sign in to an account, without enabling any service",
                                [arguments](Session& session) { signIn(session, *arguments); });
     command.add_option("user", arguments->user, "The user's name")->type_name("USER")->required();
-    addPasswordOption(command, arguments->password);
+    CommandLine::addPasswordOption(command, arguments->password);
 }
 
 } // namespace

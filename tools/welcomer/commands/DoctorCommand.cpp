@@ -2,11 +2,11 @@
 
 #include "platform/Path.h"
 #include "platform/Platform.h"
-#include "tools/welcomer/cli/Commands.h"
-#include "tools/welcomer/cli/Printable.h"
 #include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/commands/ResolverReport.h"
+#include "tools/welcomer/terminal/Printable.h"
 
 #include <CLI/CLI.hpp>
 #include <cstdlib>

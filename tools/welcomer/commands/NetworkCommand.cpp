@@ -3,11 +3,11 @@
 #include "network/NetworkingManager.h"
 #include "network/WLPortScanner.h"
 #include "platform/Platform.h"
-#include "tools/welcomer/cli/Commands.h"
-#include "tools/welcomer/cli/Printable.h"
 #include "tools/welcomer/cli/PropertyListOutput.h"
-#include "tools/welcomer/cli/TextTable.h"
 #include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/terminal/Printable.h"
+#include "tools/welcomer/terminal/TextTable.h"
 #include "tools/welcomer/terminal/WaitingLine.h"
 
 #include <CLI/CLI.hpp>

@@ -1,11 +1,11 @@
 // welcomer plugins: what is in the plug-in directory, and what became of it.
 
 #include "plugins/WLNimbusDelegatePlugins.h"
-#include "tools/welcomer/cli/Commands.h"
 #include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/StandardOutputGuard.h"
-#include "tools/welcomer/cli/TextTable.h"
 #include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/terminal/TextTable.h"
 
 #include <CLI/CLI.hpp>
 #include <ostream>

@@ -3,12 +3,12 @@
 #include "handoff/ReplayItem.h"
 #include "handoff/WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup.h"
 #include "propertylist/UnwritableValue.h"
-#include "tools/welcomer/cli/Commands.h"
-#include "tools/welcomer/cli/Printable.h"
 #include "tools/welcomer/cli/PropertyListFile.h"
 #include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
-#include "tools/welcomer/commands/ReplayReason.h"
+#include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/story/ReplayReason.h"
+#include "tools/welcomer/terminal/Printable.h"
 
 #include <CLI/CLI.hpp>
 #include <filesystem>

@@ -3,12 +3,12 @@
 #include "cloud/WLNimbusServiceCatalogue.h"
 #include "cloud/WLNimbusSetupWithDictionary.h"
 #include "platform/Platform.h"
-#include "tools/welcomer/cli/Commands.h"
-#include "tools/welcomer/cli/Printable.h"
-#include "tools/welcomer/cli/TextTable.h"
 #include "tools/welcomer/cli/Tool.h"
-#include "tools/welcomer/commands/ServiceStates.h"
+#include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/story/PendingBlocks.h"
+#include "tools/welcomer/story/ServiceStates.h"
+#include "tools/welcomer/terminal/Printable.h"
+#include "tools/welcomer/terminal/TextTable.h"
 #include "tools/welcomer/terminal/WaitingLine.h"
 
 #include <CLI/CLI.hpp>

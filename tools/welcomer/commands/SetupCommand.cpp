@@ -4,15 +4,15 @@
 #include "handoff/LaunchAgentFile.h"
 #include "platform/Platform.h"
 #include "text/Format.h"
-#include "tools/welcomer/cli/Commands.h"
-#include "tools/welcomer/cli/Printable.h"
 #include "tools/welcomer/cli/PropertyListFile.h"
 #include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/cli/ToolBundle.h"
-#include "tools/welcomer/commands/ServiceStates.h"
+#include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/story/ServiceStates.h"
 #include "tools/welcomer/story/SetupFlow.h"
 #include "tools/welcomer/terminal/Password.h"
+#include "tools/welcomer/terminal/Printable.h"
 #include "tools/welcomer/terminal/Terminal.h"
 
 #include <CLI/CLI.hpp>
@@ -346,7 +346,7 @@ void addSetupCommand(CommandLine& commandLine) {
             "wanted, Services (an array of names or identifiers), Aliases (a dictionary from delegate "
             "identifier to an array) and JustTheAccountAndKVS (a boolean); - for stdin")
         ->type_name("PLIST");
-    addPasswordOption(command, arguments->password);
+    CommandLine::addPasswordOption(command, arguments->password);
     command
         .add_option("--bundle", arguments->bundle,
                     std::string("The setup application's bundle, looked up below --root [the one that comes "

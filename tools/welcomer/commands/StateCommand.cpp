@@ -5,10 +5,10 @@
 #include "state/WLPerUserState.h"
 #include "state/WLRecordSetupSeen.h"
 #include "text/Describe.h"
-#include "tools/welcomer/cli/Commands.h"
 #include "tools/welcomer/cli/PropertyListOutput.h"
-#include "tools/welcomer/cli/TextTable.h"
 #include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/terminal/TextTable.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>

@@ -1,9 +1,9 @@
 // welcomer switch: which environment of the cloud service this machine's resolver is pointed to.
 
 #include "switch/SwitchController.h"
-#include "tools/welcomer/cli/Commands.h"
 #include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/commands/Commands.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>

@@ -4,12 +4,12 @@
 #include "platform/Platform.h"
 #include "state/WLKeychainSyncDestination.h"
 #include "state/WLSyncUpsell.h"
-#include "tools/welcomer/cli/Commands.h"
-#include "tools/welcomer/cli/Printable.h"
 #include "tools/welcomer/cli/PropertyListFile.h"
 #include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/story/ScenarioHost.h"
+#include "tools/welcomer/terminal/Printable.h"
 
 #include <CLI/CLI.hpp>
 #include <memory>

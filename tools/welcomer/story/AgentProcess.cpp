@@ -2,7 +2,7 @@
 
 #include "agent/leaveProcess.h"
 #include "agent/wlnimbussetup.h"
-#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/terminal/Failure.h"
 
 #include <array>
 #include <cerrno>
@@ -14,7 +14,6 @@
 #include <mutex>
 #include <poll.h>
 #include <sys/prctl.h>
-#include <sys/signalfd.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 #include <system_error>
@@ -26,21 +25,6 @@ namespace welcomer::tool {
 namespace {
 
 constexpr int kTickMilliseconds = 200;
-
-// The signals that end a program from outside, a reader that went away among them, but for those that this
-// process was started to ignore.
-sigset_t interruptions() {
-    sigset_t signals;
-    sigemptyset(&signals);
-    for (const int signal : {SIGINT, SIGTERM, SIGHUP, SIGQUIT, SIGPIPE}) {
-        struct sigaction action {};
-        sigaction(signal, nullptr, &action);
-        if (action.sa_handler != SIG_IGN) {
-            sigaddset(&signals, signal);
-        }
-    }
-    return signals;
-}
 
 [[noreturn]] void failed(const char* what) {
     throw CommandFailure(std::string(what) + ": " + std::generic_category().message(errno));
@@ -211,27 +195,6 @@ class Child {
 };
 
 } // namespace
-
-InterruptionGuard::InterruptionGuard() {
-    const sigset_t signals = interruptions();
-    sigprocmask(SIG_BLOCK, &signals, nullptr);
-    _descriptor = signalfd(-1, &signals, SFD_CLOEXEC);
-    if (_descriptor < 0) {
-        failed("cannot watch for signals");
-    }
-}
-
-InterruptionGuard::~InterruptionGuard() {
-    release();
-}
-
-void InterruptionGuard::release() {
-    if (_descriptor >= 0) {
-        ::close(std::exchange(_descriptor, -1));
-        const sigset_t signals = interruptions();
-        sigprocmask(SIG_UNBLOCK, &signals, nullptr);
-    }
-}
 
 std::string AgentEnd::description() const {
     return exitStatus ? "status " + std::to_string(*exitStatus)

@@ -2,8 +2,9 @@
 
 #pragma once
 
+#include "tools/welcomer/cli/KeptLog.h"
 #include "tools/welcomer/cli/PlatformFactory.h"
-#include "tools/welcomer/story/KeptLog.h"
+#include "tools/welcomer/terminal/InterruptionGuard.h"
 
 #include <chrono>
 #include <functional>
@@ -11,25 +12,6 @@
 #include <string>
 
 namespace welcomer::tool {
-
-// Holds back the signals that end a program from outside (Ctrl-C, a closed terminal, SIGTERM), so that what
-// was made can be taken away first. When this ends, a signal that came meanwhile takes its course.
-class InterruptionGuard {
-  public:
-    InterruptionGuard();
-    ~InterruptionGuard();
-    InterruptionGuard(const InterruptionGuard&) = delete;
-    InterruptionGuard& operator=(const InterruptionGuard&) = delete;
-
-    // A descriptor that is readable once such a signal has come.
-    int descriptor() const { return _descriptor; }
-
-    // To be called in a child process: signals take their course there at once.
-    void release();
-
-  private:
-    int _descriptor = -1;
-};
 
 // One record of the child's log.
 struct AgentLogRecord {
@@ -58,9 +40,6 @@ struct AgentEnd {
     bool succeeded() const { return exitStatus == 0; }
     std::string description() const; // "status 0", "signal 11 (Segmentation fault)"
 };
-
-// Thrown when a signal came: the child is gone, and the caller's guard passes the signal on.
-class Interrupted {};
 
 // Runs a child process and waits for its end. The child's standard output goes to stderr.
 //  root  the folder below which the child looks up everything

@@ -1,7 +1,7 @@
 #include "tools/welcomer/story/ExampleFiles.h"
 
 #include "plugins/WLNimbusDelegatePlugins.h"
-#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/terminal/Failure.h"
 
 #include <algorithm>
 

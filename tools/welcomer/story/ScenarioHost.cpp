@@ -1,7 +1,7 @@
 #include "tools/welcomer/story/ScenarioHost.h"
 
 #include "propertylist/PropertyListReadings.h"
-#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/terminal/Failure.h"
 
 #include <map>
 #include <string_view>

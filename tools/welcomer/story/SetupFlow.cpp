@@ -13,7 +13,7 @@
 #include "propertylist/UnwritableValue.h"
 #include "text/Describe.h"
 #include "tools/welcomer/cli/StandardOutputGuard.h"
-#include "tools/welcomer/commands/ReplayReason.h"
+#include "tools/welcomer/story/ReplayReason.h"
 #include "tools/welcomer/terminal/WaitingLine.h"
 
 #include <algorithm>

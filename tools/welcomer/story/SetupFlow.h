@@ -5,7 +5,8 @@
 #include "cloud/NimbusTesselDelegate.h"
 #include "platform/AccountService.h"
 #include "platform/ResourceBundle.h"
-#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/cli/KeptLog.h"
+#include "tools/welcomer/terminal/Failure.h"
 
 #include <cstdint>
 #include <iosfwd>

@@ -1,6 +1,6 @@
 #include "tools/welcomer/story/TemporaryFolder.h"
 
-#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/terminal/Failure.h"
 
 #include <cerrno>
 #include <cstdlib>

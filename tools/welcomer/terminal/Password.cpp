@@ -1,9 +1,8 @@
 #include "tools/welcomer/terminal/Password.h"
 
-#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/terminal/Failure.h"
 #include "tools/welcomer/terminal/Terminal.h"
 
-#include <CLI/CLI.hpp>
 #include <cerrno>
 #include <system_error>
 #include <unistd.h>
@@ -45,14 +44,6 @@ std::string readLine(int descriptor) {
 }
 
 } // namespace
-
-void addPasswordOption(CLI::App& command, PasswordSource& source) {
-    command
-        .add_option("--password-fd", source,
-                    "Read the password, one line, from this open descriptor instead of the terminal")
-        ->type_name("N")
-        ->check(CLI::NonNegativeNumber);
-}
 
 std::string getPassword(const PasswordSource& source, const std::string& question) {
     return source ? readLine(*source) : Terminal(kInsteadOfTerminal).askWithoutEcho(question);

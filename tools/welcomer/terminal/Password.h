@@ -5,17 +5,10 @@
 #include <optional>
 #include <string>
 
-namespace CLI {
-class App;
-}
-
 namespace welcomer::tool {
 
 // Where a command's password comes from: a descriptor, or the terminal.
 using PasswordSource = std::optional<int>;
-
-// Gives a command the option --password-fd.
-void addPasswordOption(CLI::App& command, PasswordSource& source);
 
 // Gets the password: the descriptor's first line, ended by LF or CR LF, or what is typed. Nothing beyond the
 // line is read.

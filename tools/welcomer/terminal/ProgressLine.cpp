@@ -1,6 +1,6 @@
 #include "tools/welcomer/terminal/ProgressLine.h"
 
-#include "tools/welcomer/cli/Printable.h"
+#include "tools/welcomer/terminal/Printable.h"
 
 #include <algorithm>
 #include <iostream>

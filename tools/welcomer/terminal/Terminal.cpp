@@ -1,8 +1,8 @@
 #include "tools/welcomer/terminal/Terminal.h"
 
-#include "tools/welcomer/cli/Printable.h"
-#include "tools/welcomer/cli/Tool.h"
-#include "tools/welcomer/story/AgentProcess.h"
+#include "tools/welcomer/terminal/Failure.h"
+#include "tools/welcomer/terminal/InterruptionGuard.h"
+#include "tools/welcomer/terminal/Printable.h"
 
 #include <array>
 #include <cerrno>

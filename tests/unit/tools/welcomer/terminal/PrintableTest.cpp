@@ -1,4 +1,4 @@
-#include "tools/welcomer/cli/Printable.h"
+#include "tools/welcomer/terminal/Printable.h"
 
 #include <gtest/gtest.h>
 

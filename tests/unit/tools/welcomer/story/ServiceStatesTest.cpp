@@ -1,4 +1,4 @@
-#include "tools/welcomer/commands/ServiceStates.h"
+#include "tools/welcomer/story/ServiceStates.h"
 
 #include "tests/fakes/FakePlatform.h"
 #include "tools/welcomer/cli/Tool.h"

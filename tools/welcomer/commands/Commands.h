@@ -2,9 +2,9 @@
 
 #pragma once
 
-namespace welcomer::tool {
+#include "tools/welcomer/cli/Tool.h"
 
-class CommandLine;
+namespace welcomer::tool {
 
 void addTryCommand(CommandLine& commandLine);
 void addSetupCommand(CommandLine& commandLine);
@@ -17,12 +17,6 @@ void addSyncCommands(CommandLine& commandLine);
 void addSwitchCommands(CommandLine& commandLine);
 void addDoctorCommand(CommandLine& commandLine);
 void addNetworkCommands(CommandLine& commandLine);
-
-// What adds commands, and whether these work with what lies in the user's home.
-struct CommandAdder {
-    void (*add)(CommandLine& commandLine);
-    bool needsHome;
-};
 
 // In the order in which --help shows them.
 inline constexpr CommandAdder kCommands[] = {

@@ -1,6 +1,6 @@
-#include "tools/welcomer/story/KeptLog.h"
+#include "tools/welcomer/cli/KeptLog.h"
 
-#include "tools/welcomer/cli/Printable.h"
+#include "tools/welcomer/terminal/Printable.h"
 
 #include <iostream>
 

@@ -1,9 +1,9 @@
-#include "tools/welcomer/commands/ServiceStates.h"
+#include "tools/welcomer/story/ServiceStates.h"
 
 #include "cloud/WLNimbusServiceCatalogue.h"
 #include "platform/Platform.h"
-#include "tools/welcomer/cli/TextTable.h"
-#include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/terminal/Failure.h"
+#include "tools/welcomer/terminal/TextTable.h"
 
 #include <algorithm>
 #include <map>

@@ -2,7 +2,7 @@
 
 #pragma once
 
-#include "tools/welcomer/story/KeptLog.h"
+#include "tools/welcomer/cli/KeptLog.h"
 
 #include <cstdint>
 #include <string>

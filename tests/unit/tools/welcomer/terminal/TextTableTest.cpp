@@ -1,4 +1,4 @@
-#include "tools/welcomer/cli/TextTable.h"
+#include "tools/welcomer/terminal/TextTable.h"
 
 #include <gtest/gtest.h>
 #include <sstream>

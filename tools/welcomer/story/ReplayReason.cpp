@@ -1,4 +1,4 @@
-#include "tools/welcomer/commands/ReplayReason.h"
+#include "tools/welcomer/story/ReplayReason.h"
 
 #include "platform/CredentialStore.h"
 
