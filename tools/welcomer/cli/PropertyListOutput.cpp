@@ -8,6 +8,34 @@
 
 namespace welcomer::tool {
 
+namespace {
+
+//  head    the line that the value stands on or below; empty for none
+//  indent  of the lines below
+void appendOutline(std::vector<std::string>& lines, const std::string& head, const PropertyList& value,
+                   const std::string& indent) {
+    const auto* const dictionary = value.dictionary();
+    const auto* const array = value.array();
+    if ((dictionary && !dictionary->empty()) || (array && !array->empty())) {
+        if (!head.empty()) {
+            lines.push_back(head);
+        }
+        for (const auto& [key, entry] : dictionary ? *dictionary : PropertyList::Dictionary()) {
+            appendOutline(lines, indent + printable(key) + ":", entry, indent + "  ");
+        }
+        for (const PropertyList& entry : array ? *array : PropertyList::Array()) {
+            appendOutline(lines, indent + "-", entry, indent + "  ");
+        }
+        return;
+    }
+    const std::string text = dictionary ? "(empty dictionary)"
+                             : array    ? "(empty array)"
+                                        : printable(text::describe(value));
+    lines.push_back((head.empty() ? indent : head + " ") + text);
+}
+
+} // namespace
+
 Json toJson(const PropertyList& value) {
     switch (value.type()) {
     case PropertyList::Type::Dictionary: {
@@ -53,32 +81,10 @@ void printJson(std::ostream& out, const Json& document) {
     out << document.dump(2, ' ', true, Json::error_handler_t::replace) << '\n';
 }
 
-void printOutline(std::ostream& out, const PropertyList& value, const std::string& indent) {
-    const auto print = [&](const std::string& label, const PropertyList& entry) {
-        out << indent << label;
-        const bool nested = (entry.dictionary() && !entry.dictionary()->empty()) ||
-                            (entry.array() && !entry.array()->empty());
-        if (nested) {
-            out << '\n';
-            printOutline(out, entry, indent + "  ");
-        } else {
-            out << ' ';
-            printOutline(out, entry, "");
-        }
-    };
-    if (const auto* dictionary = value.dictionary(); dictionary && !dictionary->empty()) {
-        for (const auto& [key, entry] : *dictionary) {
-            print(printable(key) + ":", entry);
-        }
-    } else if (const auto* array = value.array(); array && !array->empty()) {
-        for (const PropertyList& entry : *array) {
-            print("-", entry);
-        }
-    } else if (dictionary || array) {
-        out << indent << (dictionary ? "(empty dictionary)" : "(empty array)") << '\n';
-    } else {
-        out << indent << printable(text::describe(value)) << '\n';
-    }
+std::vector<std::string> outline(const PropertyList& value, const std::string& indent) {
+    std::vector<std::string> lines;
+    appendOutline(lines, "", value, indent);
+    return lines;
 }
 
 } // namespace welcomer::tool

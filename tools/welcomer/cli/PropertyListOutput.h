@@ -7,6 +7,7 @@
 #include <iosfwd>
 #include <nlohmann/json.hpp>
 #include <string>
+#include <vector>
 
 namespace welcomer::tool {
 
@@ -20,7 +21,7 @@ Json toJson(const PropertyList& value);
 // character beyond. Bytes that are no UTF-8 become the replacement character.
 void printJson(std::ostream& out, const Json& document);
 
-// Prints the value as an indented outline, one entry per line.
-void printOutline(std::ostream& out, const PropertyList& value, const std::string& indent);
+// The lines of the value as an indented outline, one entry on each.
+std::vector<std::string> outline(const PropertyList& value, const std::string& indent);
 
 } // namespace welcomer::tool

@@ -2,14 +2,13 @@
 
 #include <cstdio>
 #include <fcntl.h>
-#include <ostream>
+#include <iostream>
 #include <unistd.h>
 
 namespace welcomer::tool {
 
-StandardOutputGuard::StandardOutputGuard(std::ostream& out)
-    : _real(fcntl(STDOUT_FILENO, F_DUPFD_CLOEXEC, 3)) {
-    out.flush();
+StandardOutputGuard::StandardOutputGuard() : _real(fcntl(STDOUT_FILENO, F_DUPFD_CLOEXEC, 3)) {
+    std::cout.flush();
     dup2(STDERR_FILENO, STDOUT_FILENO);
 }
 

@@ -2,15 +2,12 @@
 
 #pragma once
 
-#include <iosfwd>
-
 namespace welcomer::tool {
 
 // While it lives, what is written to the standard output goes to stderr. Around every call into plug-ins.
 class StandardOutputGuard {
   public:
-    //  out  the tool's results, flushed first
-    explicit StandardOutputGuard(std::ostream& out);
+    StandardOutputGuard();
     ~StandardOutputGuard();
     StandardOutputGuard(const StandardOutputGuard&) = delete;
     StandardOutputGuard& operator=(const StandardOutputGuard&) = delete;

@@ -124,10 +124,15 @@ int runCommand(const Command& command, const Options& options, const PlatformFac
         TimeKind::Real);
     const platform::ScopedPlatform installed(owner->platform());
     const DamageReport damageReport(owner->platform().preferenceStore);
-    Session session{options, buildPlatform, owner->accountDirectory(), log, std::cout};
-    command(session);
+    ReportPrinter printer(std::cout, options.json);
+    Session session{options, buildPlatform, owner->accountDirectory(), log, printer};
+    const Report report = command(session);
+    printer.print(report);
     std::cout.flush();
-    return std::cout ? kExitSuccess : fail("the output could not be written", kExitFailed);
+    if (!std::cout) {
+        return fail("the output could not be written", kExitFailed);
+    }
+    return report.failure ? fail(*report.failure, kExitFailed) : kExitSuccess;
 }
 
 } // namespace
@@ -147,7 +152,7 @@ CLI::App& CommandLine::addCommand(CLI::App& group, const std::string& name, cons
     if (_needsHome) {
         command = [command = std::move(command)](Session& session) {
             platform::current().processIdentity.homeDirectory(); // throws where there is none
-            command(session);
+            return command(session);
         };
     }
     CLI::App& added = addLevel(group, name, description);

@@ -5,11 +5,11 @@
 #include "platform/AccountDirectory.h"
 #include "tools/welcomer/cli/KeptLog.h"
 #include "tools/welcomer/cli/PlatformFactory.h"
+#include "tools/welcomer/cli/Report.h"
 #include "tools/welcomer/terminal/Failure.h"
 #include "tools/welcomer/terminal/Password.h"
 
 #include <functional>
-#include <iosfwd>
 #include <span>
 #include <string>
 
@@ -38,11 +38,11 @@ struct Session {
     const PlatformFactory& buildPlatform;
     platform::AccountDirectory& accountDirectory; // below the chosen root
     const KeptLog& log;                           // the system's own log lines so far
-    std::ostream& out;                            // results; errors are thrown
+    ReportPrinter& printer;                       // for what people are told on the way
 };
 
-// A command's work. What it throws ends the tool with one line on stderr.
-using Command = std::function<void(Session&)>;
+// A command's work: it returns what it has to say, and what it throws ends the tool with one line on stderr.
+using Command = std::function<Report(Session&)>;
 
 // What a command registers itself with: the command line being built, and the place for the chosen command.
 class CommandLine {

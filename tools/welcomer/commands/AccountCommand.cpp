@@ -10,14 +10,11 @@
 #include "tools/welcomer/story/ServiceStates.h"
 #include "tools/welcomer/story/SetupFlow.h"
 #include "tools/welcomer/terminal/Password.h"
-#include "tools/welcomer/terminal/Printable.h"
-#include "tools/welcomer/terminal/TextTable.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cerrno>
 #include <memory>
-#include <ostream>
 #include <set>
 
 namespace welcomer::tool {
@@ -88,7 +85,7 @@ PropertyList::Dictionary responseFor(const std::vector<std::string>& aliases) {
     return {{"status", 0}, {"delegates", delegates}};
 }
 
-void add(Session& session, const AddArguments& arguments) {
+Report add(Session& session, const AddArguments& arguments) {
     refuseUnusable(arguments.user);
     platform::AccountDirectory& directory = session.accountDirectory;
     // So that nobody is asked for a password in vain; adding decides.
@@ -107,11 +104,8 @@ void add(Session& session, const AddArguments& arguments) {
             ? existsAlready(arguments.user)
             : CommandFailure("cannot add " + arguments.user + ": " + outcome.error.message);
     }
-    if (session.options.json) {
-        printJson(session.out, {{"user", arguments.user}, {"added", true}});
-    } else {
-        session.out << "Added " << printable(arguments.user) << ", who can sign in from now on.\n";
-    }
+    return Report({{"user", arguments.user}, {"added", true}},
+                  "Added " + arguments.user + ", who can sign in from now on.");
 }
 
 std::string loggedInName() {
@@ -119,7 +113,7 @@ std::string loggedInName() {
     return account ? account->accountID() : "";
 }
 
-void list(Session& session) {
+Report list(Session& session) {
     platform::AccountDirectory& directory = session.accountDirectory;
     const std::vector<std::string> accounts = directory.accounts();
     const auto users = directory.users();
@@ -134,66 +128,54 @@ void list(Session& session) {
     if (users) {
         names.insert(users->begin(), users->end());
     }
-    if (session.options.json) {
-        Json entries = Json::array();
-        for (const std::string& name : names) {
-            entries.push_back({{"name", name},
-                               {"canSignIn", users ? Json(canSignIn(name)) : Json()},
-                               {"hasAccount", hasAccount(name)},
-                               {"loggedIn", name == loggedIn}});
-        }
-        printJson(session.out, {{"accounts", entries}});
-        return;
-    }
-    if (names.empty()) {
-        session.out << "No accounts, and nobody who can sign in.\n";
-        return;
-    }
-    TextTable table({"NAME", "CAN SIGN IN", "ACCOUNT", "LOGGED IN"});
+    Json entries = Json::array();
     for (const std::string& name : names) {
-        table.addRow({name, users ? (canSignIn(name) ? "yes" : "no") : "unknown",
-                      hasAccount(name) ? "yes" : "no", name == loggedIn ? "yes" : "no"});
+        entries.push_back({{"name", name},
+                           {"canSignIn", users ? Json(canSignIn(name)) : Json()},
+                           {"hasAccount", hasAccount(name)},
+                           {"loggedIn", name == loggedIn}});
     }
-    table.print(session.out);
+    Report report;
+    report.document = {{"accounts", entries}};
+    if (names.empty()) {
+        return report.line("No accounts, and nobody who can sign in.");
+    }
+    return report.table(entries, {{"NAME", "name"},
+                                  {"CAN SIGN IN", "canSignIn", "unknown"},
+                                  {"ACCOUNT", "hasAccount"},
+                                  {"LOGGED IN", "loggedIn"}});
 }
 
-void status(Session& session) {
+Report status(Session& /*session*/) {
     const auto account = WLLoggedInNimbusAccount();
     const std::vector<std::string> enabled = enabledServices(serviceStates(account.get()));
     const bool noneIsEnabled = WLNoNimbusServicesEnabled();
-    if (session.options.json) {
-        printJson(session.out, {{"loggedIn", account ? Json(account->accountID()) : Json()},
-                                {"enabledServices", enabled},
-                                {"noServicesEnabled", noneIsEnabled}});
-        return;
-    }
+    Report report;
+    report.document = {{"loggedIn", account ? Json(account->accountID()) : Json()},
+                       {"enabledServices", enabled},
+                       {"noServicesEnabled", noneIsEnabled}};
     if (!account) {
-        session.out << "Nobody is logged in to a cloud account.\n";
-        return;
+        return report.line("Nobody is logged in to a cloud account.");
     }
-    session.out << "Logged in:         " << printable(account->accountID()) << '\n';
-    session.out << "Enabled services:  ";
+    std::string names;
     for (const std::string& identifier : enabled) {
-        session.out << (identifier == enabled.front() ? "" : ", ") << serviceName(identifier);
+        names += (names.empty() ? "" : ", ") + serviceName(identifier);
     }
-    session.out << (noneIsEnabled ? "none\n" : "\n");
+    return report.fields(
+        {{"Logged in:", account->accountID()}, {"Enabled services:", names + (noneIsEnabled ? "none" : "")}});
 }
 
-void signIn(Session& session, const SignInArguments& arguments) {
+Report signIn(Session& session, const SignInArguments& arguments) {
     refuseEmpty(arguments.user);
     SetupFlow::checkWhoIsLoggedIn(arguments.user);
     const std::string password = getPassword(arguments.password, "Password for " + arguments.user + ":");
-    SetupFlow flow(session.log, session.out, !session.options.verbose);
+    SetupFlow flow(session.log, !session.options.verbose);
     flow.signIn(arguments.user, password);
     flow.complete({}, false); // no service: that is for setup
-    if (session.options.json) {
-        printJson(session.out, {{"account", arguments.user}, {"signedIn", true}});
-    } else {
-        session.out << printable(arguments.user) << " is signed in.\n";
-    }
+    return Report({{"account", arguments.user}, {"signedIn", true}}, arguments.user + " is signed in.");
 }
 
-void showServices(Session& session, const std::string& user) {
+Report showServices(const std::string& user) {
     std::shared_ptr<platform::CloudAccount> account;
     if (user.empty()) {
         account = WLLoggedInNimbusAccount();
@@ -204,12 +186,10 @@ void showServices(Session& session, const std::string& user) {
         throw CommandFailure(user.empty() ? "nobody is logged in to a cloud account; name one"
                                           : "there is no account " + user);
     }
-    const std::vector<ServiceState> states = serviceStates(account.get());
-    if (session.options.json) {
-        printJson(session.out, {{"account", account->accountID()}, {"services", toJson(states)}});
-    } else {
-        printServiceStates(session.out, states);
-    }
+    Report report;
+    report.document = {{"account", account->accountID()}, {"services", toJson(serviceStates(account.get()))}};
+    addServiceTable(report, report.document["services"]);
+    return report;
 }
 
 void addAdd(CommandLine& commandLine, CLI::App& group) {
@@ -218,7 +198,7 @@ void addAdd(CommandLine& commandLine, CLI::App& group) {
         commandLine.addCommand(group, "add",
                                "Let somebody sign in: adds a user to the machine's directory of users, which "
                                "stands for the server",
-                               [arguments](Session& session) { add(session, *arguments); });
+                               [arguments](Session& session) { return add(session, *arguments); });
     command.add_option("user", arguments->user, "The user's name")->type_name("USER")->required();
     command.add_option("--mail", arguments->mailAddress, "The address of the account's mail service")
         ->type_name("ADDRESS");
@@ -235,7 +215,7 @@ void addSignIn(CommandLine& commandLine, CLI::App& group) {
     const auto arguments = std::make_shared<SignInArguments>();
     CLI::App& command =
         commandLine.addCommand(group, "sign-in", "Sign in to an account, without enabling any service",
-                               [arguments](Session& session) { signIn(session, *arguments); });
+                               [arguments](Session& session) { return signIn(session, *arguments); });
     command.add_option("user", arguments->user, "The user's name")->type_name("USER")->required();
     CommandLine::addPasswordOption(command, arguments->password);
 }
@@ -252,7 +232,7 @@ void addAccountCommands(CommandLine& commandLine) {
 
     const auto user = std::make_shared<std::string>();
     CLI::App& services = commandLine.addCommand(group, "services", "Show the services of an account",
-                                                [user](Session& session) { showServices(session, *user); });
+                                                [user](Session&) { return showServices(*user); });
     services.add_option("user", *user, "The account; without it the one that is logged in")
         ->type_name("USER");
 }

@@ -2,15 +2,12 @@
 
 #include "platform/Path.h"
 #include "platform/Platform.h"
-#include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/commands/ResolverReport.h"
-#include "tools/welcomer/terminal/Printable.h"
 
 #include <CLI/CLI.hpp>
 #include <cstdlib>
-#include <ostream>
 #include <vector>
 
 namespace welcomer::tool {
@@ -45,26 +42,20 @@ std::vector<BackendReport> allReports(Session& session) {
     return reports;
 }
 
-void examine(Session& session) {
-    const std::vector<BackendReport> reports = allReports(session);
-    if (session.options.json) {
-        Json entries = Json::array();
-        for (const BackendReport& report : reports) {
-            entries.push_back({{"interface", report.interface},
-                               {"backend", report.backend},
-                               {"reason", report.reason},
-                               {"advice", report.advice.empty() ? Json() : Json(report.advice)}});
-        }
-        printJson(session.out, {{"backends", entries}});
-        return;
-    }
-    for (const BackendReport& report : reports) {
-        session.out << printable(report.interface) << ": " << printable(report.backend) << " ("
-                    << printable(report.reason) << ")\n";
-        if (!report.advice.empty()) {
-            session.out << "    advice: " << printable(report.advice) << '\n';
+Report examine(Session& session) {
+    Report report;
+    report.document = {{"backends", Json::array()}};
+    for (const BackendReport& each : allReports(session)) {
+        report.document["backends"].push_back({{"interface", each.interface},
+                                               {"backend", each.backend},
+                                               {"reason", each.reason},
+                                               {"advice", each.advice.empty() ? Json() : Json(each.advice)}});
+        report.line(each.interface + ": " + each.backend + " (" + each.reason + ")");
+        if (!each.advice.empty()) {
+            report.line("    advice: " + each.advice);
         }
     }
+    return report;
 }
 
 } // namespace

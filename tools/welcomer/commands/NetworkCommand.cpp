@@ -3,18 +3,14 @@
 #include "network/NetworkingManager.h"
 #include "network/WLPortScanner.h"
 #include "platform/Platform.h"
-#include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
-#include "tools/welcomer/terminal/Printable.h"
-#include "tools/welcomer/terminal/TextTable.h"
 #include "tools/welcomer/terminal/WaitingLine.h"
 
 #include <CLI/CLI.hpp>
 #include <cstdint>
 #include <memory>
 #include <optional>
-#include <ostream>
 #include <string>
 #include <vector>
 
@@ -51,100 +47,58 @@ Json asJson(const TextList& list) {
     return list ? Json(*list) : Json();
 }
 
-std::string shown(const Text& text) {
-    return text ? printable(*text) : "-";
-}
-
-std::string shown(const TextList& list) {
-    std::string text;
-    for (const std::string& each : list.value_or(std::vector<std::string>())) {
-        text += (text.empty() ? "" : " ") + printable(each);
-    }
-    return text.empty() ? "-" : text;
-}
-
-std::string shown(bool answer) {
-    return answer ? "yes" : "no";
-}
-
 std::string entry(const PropertyList::Dictionary& values, const char* key) {
     const auto found = values.find(key);
     return found == values.end() || !found->second.string() ? "" : *found->second.string();
 }
 
-void show(Session& session) {
+Report show(Session& /*session*/) {
     const NetworkingManager manager;
-    if (session.options.json) {
-        printJson(session.out, {{"method", asJson(manager.defaultConfigurationMethod())},
-                                {"address", asJson(manager.defaultIPAddress())},
-                                {"subnetMask", asJson(manager.defaultSubnetMask())},
-                                {"router", asJson(manager.defaultRouter())},
-                                {"dns", asJson(manager.defaultDNS())},
-                                {"searchDomains", asJson(manager.defaultSearchDomains())}});
-        return;
-    }
-    session.out << "Method:          " << shown(manager.defaultConfigurationMethod())
-                << "\nAddress:         " << shown(manager.defaultIPAddress())
-                << "\nSubnet mask:     " << shown(manager.defaultSubnetMask())
-                << "\nRouter:          " << shown(manager.defaultRouter())
-                << "\nDNS servers:     " << shown(manager.defaultDNS())
-                << "\nSearch domains:  " << shown(manager.defaultSearchDomains()) << '\n';
+    Report report;
+    report.document = {{"method", asJson(manager.defaultConfigurationMethod())},
+                       {"address", asJson(manager.defaultIPAddress())},
+                       {"subnetMask", asJson(manager.defaultSubnetMask())},
+                       {"router", asJson(manager.defaultRouter())},
+                       {"dns", asJson(manager.defaultDNS())},
+                       {"searchDomains", asJson(manager.defaultSearchDomains())}};
+    return report.fields({{"Method:", "method"},
+                          {"Address:", "address"},
+                          {"Subnet mask:", "subnetMask"},
+                          {"Router:", "router"},
+                          {"DNS servers:", "dns"},
+                          {"Search domains:", "searchDomains"}});
 }
 
-void listPorts(Session& session) {
-    const std::vector<PropertyList::Dictionary> ports = machinePortList();
-    if (session.options.json) {
-        Json list = Json::array();
-        for (const PropertyList::Dictionary& port : ports) {
-            list.push_back({{"device", entry(port, WLMachinePortUID)},
-                            {"kind", entry(port, WLMachinePortConnectionType)},
-                            {"name", entry(port, WLMachinePortName)}});
-        }
-        printJson(session.out, {{"ports", list}});
-        return;
+Report listPorts(Session& /*session*/) {
+    Json ports = Json::array();
+    for (const PropertyList::Dictionary& port : machinePortList()) {
+        ports.push_back({{"device", entry(port, WLMachinePortUID)},
+                         {"kind", entry(port, WLMachinePortConnectionType)},
+                         {"name", entry(port, WLMachinePortName)}});
     }
+    Report report;
+    report.document = {{"ports", ports}};
     if (ports.empty()) {
-        session.out << "This machine has no network ports.\n";
-        return;
+        return report.line("This machine has no network ports.");
     }
-    TextTable table({"DEVICE", "KIND", "NAME"});
-    for (const PropertyList::Dictionary& port : ports) {
-        table.addRow({entry(port, WLMachinePortUID), entry(port, WLMachinePortConnectionType),
-                      entry(port, WLMachinePortName)});
-    }
-    table.print(session.out);
+    return report.table(ports, {{"DEVICE", "device"}, {"KIND", "kind"}, {"NAME", "name"}});
 }
 
-void probe(Session& session) {
-    struct Answers {
-        bool isReachable = false;
-        bool hasCable = false;
-        bool isDynamic = false;
-        bool hasDirectories = false;
-        bool isInternal = false;
-    } answers;
-    {
-        const WaitingLine waiting("Asking the network", true);
-        NetworkingManager manager;
-        answers.isReachable = NetworkingManager::internetIsReachable();
-        answers.hasCable = manager.isEthernetCablePluggedIn();
-        answers.isDynamic = manager.hasUsableDynamicEthernetConfiguration();
-        answers.hasDirectories = manager.dirServiceNodesExist();
-        answers.isInternal = NetworkingManager::isOnCorvidInternalNetwork();
-    }
-    if (session.options.json) {
-        printJson(session.out, {{"internetIsReachable", answers.isReachable},
-                                {"isEthernetCablePluggedIn", answers.hasCable},
-                                {"hasUsableDynamicEthernetConfiguration", answers.isDynamic},
-                                {"dirServiceNodesExist", answers.hasDirectories},
-                                {"isOnCorvidInternalNetwork", answers.isInternal}});
-        return;
-    }
-    session.out << "The internet is reachable:      " << shown(answers.isReachable)
-                << "\nAn Ethernet cable is in:        " << shown(answers.hasCable)
-                << "\nDynamic configuration usable:   " << shown(answers.isDynamic)
-                << "\nNetwork directories reachable:  " << shown(answers.hasDirectories)
-                << "\nOn the maker's own network:     " << shown(answers.isInternal) << '\n';
+Report probe(Session& /*session*/) {
+    const WaitingLine waiting("Asking the network", true);
+    NetworkingManager manager;
+    Report report;
+    report.document = {
+        {"internetIsReachable", NetworkingManager::internetIsReachable()},
+        {"isEthernetCablePluggedIn", manager.isEthernetCablePluggedIn()},
+        {"hasUsableDynamicEthernetConfiguration", manager.hasUsableDynamicEthernetConfiguration()},
+        {"dirServiceNodesExist", manager.dirServiceNodesExist()},
+        {"isOnCorvidInternalNetwork", NetworkingManager::isOnCorvidInternalNetwork()}};
+    return report.fields({{"The internet is reachable:", "internetIsReachable"},
+                          {"An Ethernet cable is in:", "isEthernetCablePluggedIn"},
+                          {"Dynamic configuration usable:", "hasUsableDynamicEthernetConfiguration"},
+                          {"Network directories reachable:", "dirServiceNodesExist"},
+                          {"On the maker's own network:", "isOnCorvidInternalNetwork"}});
 }
 
 void checkSettings(const Settings& settings) {
@@ -173,7 +127,7 @@ std::string storeFailure(const KeptLog& log) {
     return line.find(kStoreFailed) == std::string::npos ? "" : " (" + line + ")";
 }
 
-void apply(Session& session, const Settings& settings) {
+Report apply(Session& session, const Settings& settings) {
     checkSettings(settings);
     PropertyList::Dictionary error;
     bool succeeded = false;
@@ -199,15 +153,11 @@ void apply(Session& session, const Settings& settings) {
         throw CommandFailure(entry(error, "title") + ". " + entry(error, "body") + storeFailure(session.log));
     }
     const bool applied = !leaveNothingToDo(settings);
-    if (session.options.json) {
-        printJson(session.out, {{"applied", applied}});
-    } else {
-        session.out << (applied ? "Done.\n"
-                                : "Nothing was to be done: nothing is configured, and nothing checked.\n");
-    }
+    return Report({{"applied", applied}},
+                  applied ? "Done." : "Nothing was to be done: nothing is configured, and nothing checked.");
 }
 
-void registerServices(Session& session) {
+Report registerServices(Session& session) {
     std::vector<std::string> names;
     {
         const WaitingLine waiting("Waiting for the network configuration", true);
@@ -227,14 +177,11 @@ void registerServices(Session& session) {
     if (outcome.find(kStoreFailed) != std::string::npos) {
         throw CommandFailure(outcome);
     }
-    if (session.options.json) {
-        printJson(session.out, {{"services", names}});
-        return;
-    }
-    session.out << "The network services are stored:\n";
+    Report report({{"services", names}}, "The network services are stored:");
     for (const std::string& name : names) {
-        session.out << "  " << printable(name) << '\n';
+        report.line("  " + name);
     }
+    return report;
 }
 
 void addApplyCommand(CommandLine& commandLine, CLI::App& group) {
@@ -242,7 +189,7 @@ void addApplyCommand(CommandLine& commandLine, CLI::App& group) {
     CLI::App& command = commandLine.addCommand(group, "apply",
                                                "Configure the network of this machine, also with --root, as "
                                                "the user chooses, and check that it works",
-                                               [=](Session& session) { apply(session, *settings); });
+                                               [=](Session& session) { return apply(session, *settings); });
     command.add_option("--choice", settings->choice, "lan, wifi or no; only lan configures anything")
         ->required()
         ->check(CLI::IsMember({kUserChoiceLAN, kUserChoiceWiFi, kUserChoiceNoInternet}));

@@ -8,12 +8,10 @@
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/story/ReplayReason.h"
-#include "tools/welcomer/terminal/Printable.h"
 
 #include <CLI/CLI.hpp>
 #include <filesystem>
 #include <memory>
-#include <ostream>
 
 namespace welcomer::tool {
 
@@ -36,7 +34,7 @@ std::string systemPath(const Options& options, const std::string& path) {
     return std::filesystem::absolute(path).string();
 }
 
-void store(Session& session, const StoreArguments& arguments) {
+Report store(Session& session, const StoreArguments& arguments) {
     const platform::Platform& platform = platform::current();
     const std::string bundlePath = systemPath(session.options, arguments.bundle);
     const PropertyList replayObject = readPropertyListFile(arguments.file);
@@ -54,53 +52,42 @@ void store(Session& session, const StoreArguments& arguments) {
         throw CommandFailure("cannot store the replay item and install the agent: " +
                              storingReason(session.log));
     }
-    if (session.options.json) {
-        printJson(session.out, {{"account", arguments.account}, {"stored", true}});
-    } else {
-        session.out << "Stored the replay item for " << printable(arguments.account)
-                    << " and installed the agent for the next login.\n";
-    }
+    return Report({{"account", arguments.account}, {"stored", true}},
+                  "Stored the replay item for " + arguments.account +
+                      " and installed the agent for the next login.");
 }
 
 // No store enforces an item's access: each says who can read the item in truth.
-void printAccess(std::ostream& out, const ReplayItem& found) {
-    out << "Stored in: " << found.store.name << '\n';
+void addAccess(Report& report, const ReplayItem& found) {
+    report.line("Stored in: " + std::string(found.store.name));
     const std::optional<platform::CredentialAccess>& access = found.item.access;
-    out << "Access:    " << (access ? printable(access->description) : "the store's default") << '\n';
+    report.line("Access:    " + (access ? access->description : "the store's default"));
     if (access) {
         for (const platform::TrustedApplication& application : access->trustedApplications) {
-            out << "Trusted:   " << printable(application.path) << '\n';
+            report.line("Trusted:   " + application.path);
         }
-        out << "           (kept with the item, but the " << found.store.name << " does not enforce it)\n";
+        report.line("           (kept with the item, but the " + std::string(found.store.name) +
+                    " does not enforce it)");
     }
-    out << "Readers:   " << found.store.readers << '\n';
+    report.line("Readers:   " + std::string(found.store.readers));
 }
 
-void show(Session& session) {
+Report show(Session& session) {
     ReplayItem found;
     if (!readReplayItem(found)) {
         throw CommandFailure("cannot read the replay item: " + replayReason(session.log));
     }
     const std::string& account = found.item.label;
-    if (session.options.json) {
-        printJson(session.out, {{"account", account}, {"replay", toJson(found.replayObject)}});
-        return;
-    }
-    session.out << "Account:   " << printable(account) << '\n';
-    printAccess(session.out, found);
-    session.out << "Replay object:\n";
-    printOutline(session.out, found.replayObject, "  ");
+    Report report({{"account", account}, {"replay", toJson(found.replayObject)}}, "Account:   " + account);
+    addAccess(report, found);
+    return report.line("Replay object:").lines(outline(found.replayObject, "  "));
 }
 
-void remove(Session& session) {
+Report remove(Session& session) {
     if (!WLDeleteNimbusReplayKeychainItem()) {
         throw CommandFailure("cannot delete the replay item: " + replayReason(session.log));
     }
-    if (session.options.json) {
-        printJson(session.out, {{"deleted", true}});
-    } else {
-        session.out << "Deleted the replay item.\n";
-    }
+    return Report({{"deleted", true}}, "Deleted the replay item.");
 }
 
 void addStore(CommandLine& commandLine, CLI::App& group) {
@@ -108,7 +95,7 @@ void addStore(CommandLine& commandLine, CLI::App& group) {
     CLI::App& command = commandLine.addCommand(
         group, "store",
         "Store the replay item and install the agent for the next login, as a setup application does",
-        [arguments](Session& session) { store(session, *arguments); });
+        [arguments](Session& session) { return store(session, *arguments); });
     command.add_option("--account", arguments->account, "The user's cloud account name")
         ->type_name("NAME")
         ->required();

@@ -7,15 +7,12 @@
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/story/PendingBlocks.h"
 #include "tools/welcomer/story/ServiceStates.h"
-#include "tools/welcomer/terminal/Printable.h"
-#include "tools/welcomer/terminal/TextTable.h"
 #include "tools/welcomer/terminal/WaitingLine.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
 #include <mutex>
-#include <ostream>
 
 namespace welcomer::tool {
 
@@ -48,24 +45,19 @@ class LineLog final : public KeptLog {
     std::vector<std::string> _lines;
 };
 
-void list(Session& session) {
-    const std::vector<CatalogueEntry> entries = serviceCatalogue();
-    if (session.options.json) {
-        Json services = Json::array();
-        for (const CatalogueEntry& entry : entries) {
-            services.push_back({{"service", entry.name},
-                                {"identifier", entry.identifier},
-                                {"phase", entry.phase()},
-                                {"delayed", entry.isDelayed}});
-        }
-        printJson(session.out, {{"services", services}});
-        return;
+Report list(Session& /*session*/) {
+    Json services = Json::array();
+    for (const CatalogueEntry& entry : serviceCatalogue()) {
+        services.push_back({{"service", entry.name},
+                            {"identifier", entry.identifier},
+                            {"phase", entry.phase()},
+                            {"delayed", entry.isDelayed}});
     }
-    TextTable table({"SERVICE", "PHASE", "DELAYED", "IDENTIFIER"});
-    for (const CatalogueEntry& entry : entries) {
-        table.addRow({entry.name, entry.phase(), entry.isDelayed ? "yes" : "no", entry.identifier});
-    }
-    table.print(session.out);
+    Report report;
+    report.document = {{"services", services}};
+    return report.table(
+        services,
+        {{"SERVICE", "service"}, {"PHASE", "phase"}, {"DELAYED", "delayed"}, {"IDENTIFIER", "identifier"}});
 }
 
 std::vector<std::string> selectedServices(const std::vector<std::string>& names) {
@@ -94,7 +86,7 @@ void enableAndWait(const EnableArguments& arguments, const std::vector<std::stri
     blocks.wait();
 }
 
-void enable(Session& session, const EnableArguments& arguments) {
+Report enable(Session& session, const EnableArguments& arguments) {
     const std::vector<std::string> selected = selectedServices(arguments.selected);
     LineLog log;
     log.setVerbose(session.options.verbose);
@@ -104,19 +96,14 @@ void enable(Session& session, const EnableArguments& arguments) {
     const platform::ScopedPlatform installed(owner->platform());
 
     enableAndWait(arguments, selected, blocks, log, !session.options.verbose);
-    const std::vector<ServiceState> states = statesOf(arguments.account);
-    if (session.options.json) {
-        printJson(session.out, {{"account", arguments.account},
-                                {"phase", arguments.isPostLogin() ? "post-login" : "pre-login"},
-                                {"log", log.lines()},
-                                {"services", toJson(states)}});
-        return;
-    }
-    for (const std::string& line : log.lines()) {
-        session.out << printable(line) << '\n';
-    }
-    session.out << '\n';
-    printServiceStates(session.out, states);
+    Report report;
+    report.document = {{"account", arguments.account},
+                       {"phase", arguments.isPostLogin() ? "post-login" : "pre-login"},
+                       {"log", log.lines()},
+                       {"services", toJson(statesOf(arguments.account))}};
+    report.lines(log.lines()).line("");
+    addServiceTable(report, report.document["services"]);
+    return report;
 }
 
 } // namespace
@@ -131,7 +118,7 @@ void addServicesCommands(CommandLine& commandLine) {
         group, "enable",
         "Enable an account's services of one phase and wait for those that are enabled later; what is "
         "decided about each is shown as it is logged. An account that is missing is made.",
-        [arguments](Session& session) { enable(session, *arguments); });
+        [arguments](Session& session) { return enable(session, *arguments); });
     command.add_option("--account", arguments->account, "The cloud account")->type_name("USER")->required();
     command.add_option("--phase", arguments->phase, "pre: before the first login; post: after it")
         ->required()

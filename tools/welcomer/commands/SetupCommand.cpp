@@ -5,21 +5,18 @@
 #include "platform/Platform.h"
 #include "text/Format.h"
 #include "tools/welcomer/cli/PropertyListFile.h"
-#include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/cli/ToolBundle.h"
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/story/ServiceStates.h"
 #include "tools/welcomer/story/SetupFlow.h"
 #include "tools/welcomer/terminal/Password.h"
-#include "tools/welcomer/terminal/Printable.h"
 #include "tools/welcomer/terminal/Terminal.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
 #include <optional>
-#include <ostream>
 #include <utility>
 
 namespace welcomer::tool {
@@ -254,7 +251,7 @@ void confirm(Terminal& terminal, const std::vector<AliasOffer>& offers, const De
     }
 }
 
-void printResult(Session& session, const Decisions& decisions, SetupFlow& flow) {
+Report result(const Decisions& decisions, SetupFlow& flow) {
     const auto account =
         platform::current().accountService.sharedManager().accountForID(decisions.account, false);
     const std::vector<ServiceState> states = serviceStates(account.get());
@@ -265,20 +262,18 @@ void printResult(Session& session, const Decisions& decisions, SetupFlow& flow) 
         }
     }
     const std::vector<std::string> delegates = flow.delegates();
-    if (session.options.json) {
-        printJson(session.out, {{"account", decisions.account},
-                                {"services", toJson(states)},
-                                {"aliases", decisions.aliases},
-                                {"launchAgent", kLaunchAgentLabel},
-                                {"atNextLogin", {{"services", later}, {"delegates", delegates}}}});
-        return;
-    }
-    session.out << '\n' << printable(decisions.account) << " is set up.\n\n";
-    printServiceStates(session.out, states, "  ");
-    session.out << "\nAt the next login the agent starts, once. It\n"
-                << "  - turns on " << namesOf(later) << ",\n"
-                << "  - lets the delegates finish: " << printable(joined(delegates)) << ",\n"
-                << "  - and ends two minutes after the last of them.\n";
+    Report report;
+    report.document = {{"account", decisions.account},
+                       {"services", toJson(states)},
+                       {"aliases", decisions.aliases},
+                       {"launchAgent", kLaunchAgentLabel},
+                       {"atNextLogin", {{"services", later}, {"delegates", delegates}}}};
+    report.lines({"", decisions.account + " is set up.", ""});
+    addServiceTable(report, report.document["services"], "  ");
+    return report.lines({"", "At the next login the agent starts, once. It",
+                         "  - turns on " + namesOf(later) + ",",
+                         "  - lets the delegates finish: " + joined(delegates) + ",",
+                         "  - and ends two minutes after the last of them."});
 }
 
 // The path of the setup application's bundle, below the root.
@@ -290,7 +285,7 @@ std::string bundlePath(const Session& session, const SetupArguments& arguments) 
     return found.empty() ? kSetupBundlePath : found;
 }
 
-void setUp(Session& session, const SetupArguments& arguments) {
+Report setUp(Session& session, const SetupArguments& arguments) {
     const platform::Platform& platform = platform::current();
     std::optional<Answers> answers;
     std::optional<Terminal> terminal;
@@ -307,7 +302,7 @@ void setUp(Session& session, const SetupArguments& arguments) {
     }
     SetupFlow::checkNothingIsWaiting(session.options.storesLocally);
 
-    SetupFlow flow(session.log, session.out, !session.options.verbose);
+    SetupFlow flow(session.log, !session.options.verbose);
     Decisions decisions;
     if (answers) {
         SetupFlow::checkWhoIsLoggedIn(answers->decisions.account);
@@ -327,7 +322,7 @@ void setUp(Session& session, const SetupArguments& arguments) {
     flow.complete(decisions.services, decisions.justTheAccountAndKVS);
     const auto bundle = platform.resourceBundles.open(path);
     flow.handOver(decisions.aliases, *bundle);
-    printResult(session, decisions, flow);
+    return result(decisions, flow);
 }
 
 } // namespace
@@ -338,7 +333,7 @@ void addSetupCommand(CommandLine& commandLine) {
         "setup",
         "Set up a cloud account as a setup application does: sign in, choose aliases and services, hand over "
         "to the agent of the next login",
-        [arguments](Session& session) { setUp(session, *arguments); });
+        [arguments](Session& session) { return setUp(session, *arguments); });
     command
         .add_option(
             "--answers", arguments->answers,

@@ -5,16 +5,13 @@
 #include "state/WLPerUserState.h"
 #include "state/WLRecordSetupSeen.h"
 #include "text/Describe.h"
-#include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
-#include "tools/welcomer/terminal/TextTable.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
 #include <optional>
-#include <ostream>
 
 namespace welcomer::tool {
 
@@ -86,34 +83,30 @@ std::string valueOf(const Key& key, const PropertyList::Dictionary& record) {
     return found == record.end() ? "-" : text::describe(found->second);
 }
 
-void show(Session& session) {
+Report show(Session& /*session*/) {
     const WLPerUserState& state = WLPerUserState::currentPerUserState();
     const PropertyList::Dictionary record = state.dictionaryRepresentation();
-    if (session.options.json) {
-        Json values = Json::object();
-        for (const Key& key : kKeys) {
-            const auto found = record.find(key.name);
-            values[key.name] =
-                found != record.end() ? toJson(found->second) : (key.setFlag ? Json(false) : Json());
-        }
-        printJson(
-            session.out,
-            {{"loaded", !isSuperuser()}, {"isNewUserAccount", state.isNewUserAccount()}, {"state", values}});
-        return;
-    }
+    Json values = Json::object();
     TextTable table({"KEY", "VALUE"});
     for (const Key& key : kKeys) {
+        const auto found = record.find(key.name);
+        values[key.name] =
+            found != record.end() ? toJson(found->second) : (key.setFlag ? Json(false) : Json());
         table.addRow({key.name, valueOf(key, record)});
     }
-    table.print(session.out);
-    session.out << (state.isNewUserAccount() ? "A new user account: no version of the system ran before.\n"
-                                             : "Not a new user account.\n");
+    Report report;
+    report.document = {
+        {"loaded", !isSuperuser()}, {"isNewUserAccount", state.isNewUserAccount()}, {"state", values}};
+    report.table(std::move(table));
+    report.line(state.isNewUserAccount() ? "A new user account: no version of the system ran before."
+                                         : "Not a new user account.");
     if (isSuperuser()) {
-        session.out << "The superuser's record is not loaded, whatever is stored.\n";
+        report.line("The superuser's record is not loaded, whatever is stored.");
     }
+    return report;
 }
 
-void set(Session& session, const std::string& name, const std::string& value) {
+Report set(Session& session, const std::string& name, const std::string& value) {
     const Key& key = keyNamed(name);
     if (const auto unwritable = findUnwritableEntry(name, value)) {
         throw CommandFailure("the value could not be stored: " + *unwritable);
@@ -126,14 +119,10 @@ void set(Session& session, const std::string& name, const std::string& value) {
         (state.*key.setText)(value);
     }
     storeRecord(session);
-    if (session.options.json) {
-        printJson(session.out, {{"key", name}, {"value", stored}});
-    } else {
-        session.out << "Stored " << name << ".\n";
-    }
+    return Report({{"key", name}, {"value", stored}}, "Stored " + name + ".");
 }
 
-void remove(Session& session, const std::string& name) {
+Report remove(Session& session, const std::string& name) {
     const Key& key = keyNamed(name);
     WLPerUserState& state = recordToChange();
     if (key.setFlag) {
@@ -142,14 +131,10 @@ void remove(Session& session, const std::string& name) {
         (state.*key.setText)(std::nullopt);
     }
     storeRecord(session);
-    if (session.options.json) {
-        printJson(session.out, {{"key", name}, {"removed", true}});
-    } else {
-        session.out << "Removed " << name << ".\n";
-    }
+    return Report({{"key", name}, {"removed", true}}, "Removed " + name + ".");
 }
 
-void recordSeen(Session& session, const std::string& setup) {
+Report recordSeen(Session& session, const std::string& setup) {
     recordToChange();
     if (setup == "cloud") {
         WLRecordCloudSetupSeen();
@@ -157,11 +142,7 @@ void recordSeen(Session& session, const std::string& setup) {
         WLRecordSyncSetupSeen();
     }
     storeRecord(session);
-    if (session.options.json) {
-        printJson(session.out, {{"seen", setup}});
-    } else {
-        session.out << "Recorded the " << setup << " setup as seen.\n";
-    }
+    return Report({{"seen", setup}}, "Recorded the " + setup + " setup as seen.");
 }
 
 } // namespace
@@ -173,19 +154,19 @@ void addStateCommands(CommandLine& commandLine) {
     const auto key = std::make_shared<std::string>();
     const auto value = std::make_shared<std::string>();
     CLI::App& setter = commandLine.addCommand(group, "set", "Set one value of the record and store it",
-                                              [=](Session& session) { set(session, *key, *value); });
+                                              [=](Session& session) { return set(session, *key, *value); });
     setter.add_option("key", *key, "The value's key")->type_name("KEY")->required();
     setter.add_option("value", *value, "A text, or true or false for a flag")->type_name("VALUE")->required();
 
     CLI::App& remover =
         commandLine.addCommand(group, "remove", "Remove one value of the record; a flag becomes false",
-                               [=](Session& session) { remove(session, *key); });
+                               [=](Session& session) { return remove(session, *key); });
     remover.add_option("key", *key, "The value's key")->type_name("KEY")->required();
 
     const auto setup = std::make_shared<std::string>();
     CLI::App& seen = commandLine.addCommand(
         group, "seen", "Record that the cloud or the sync setup was seen, at the running system's version",
-        [=](Session& session) { recordSeen(session, *setup); });
+        [=](Session& session) { return recordSeen(session, *setup); });
     seen.add_option("setup", *setup, "cloud or sync")->required()->check(CLI::IsMember({"cloud", "sync"}));
 }
 

@@ -1,14 +1,12 @@
 // welcomer switch: which environment of the cloud service this machine's resolver is pointed to.
 
 #include "switch/SwitchController.h"
-#include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
-#include <ostream>
 
 namespace welcomer::tool {
 
@@ -19,32 +17,26 @@ Json currentAsJson(const SwitchController& controller) {
     return name ? Json(*name) : Json();
 }
 
-void list(Session& session) {
+Report list(Session& /*session*/) {
     SwitchController& controller = SwitchController::sharedController();
-    if (session.options.json) {
-        printJson(session.out,
-                  {{"servers", controller.availableServers()}, {"current", currentAsJson(controller)}});
-        return;
-    }
+    Report report;
+    report.document = {{"servers", controller.availableServers()}, {"current", currentAsJson(controller)}};
     for (const std::string& name : controller.availableServers()) {
-        session.out << (name == controller.theCurrentServerName() ? "* " : "  ") << name << '\n';
+        report.line((name == controller.theCurrentServerName() ? "* " : "  ") + name);
     }
+    return report;
 }
 
-void show(Session& session) {
+Report show(Session& /*session*/) {
     const SwitchController& controller = SwitchController::sharedController();
-    if (session.options.json) {
-        printJson(session.out, {{"current", currentAsJson(controller)},
-                                {"isPointedToProd", controller.isPointedToProd()},
-                                {"canChangeConfiguration", controller.canChangeConfiguration()}});
-        return;
-    }
-    session.out << controller.theCurrentServerName().value_or(
-                       "Unknown: the overrides are not the switch's own")
-                << '\n';
+    return Report(
+        {{"current", currentAsJson(controller)},
+         {"isPointedToProd", controller.isPointedToProd()},
+         {"canChangeConfiguration", controller.canChangeConfiguration()}},
+        controller.theCurrentServerName().value_or("Unknown: the overrides are not the switch's own"));
 }
 
-void select(Session& session, const std::string& name) {
+Report select(Session& session, const std::string& name) {
     SwitchController& controller = SwitchController::sharedController();
     const auto& names = controller.availableServers();
     const auto found = std::ranges::find(names, name);
@@ -58,11 +50,7 @@ void select(Session& session, const std::string& name) {
     if (controller.theCurrentServerName() != name) {
         throw CommandFailure("cannot switch to " + name + ": " + session.log.reason());
     }
-    if (session.options.json) {
-        printJson(session.out, {{"current", name}});
-    } else {
-        session.out << "Pointed to " << name << ".\n";
-    }
+    return Report({{"current", name}}, "Pointed to " + name + ".");
 }
 
 } // namespace
@@ -76,7 +64,7 @@ void addSwitchCommands(CommandLine& commandLine) {
     CLI::App& selector = commandLine.addCommand(
         group, "select",
         "Point the resolver at an environment; every file in /etc/resolver is replaced. For the superuser",
-        [=](Session& session) { select(session, *name); });
+        [=](Session& session) { return select(session, *name); });
     selector.add_option("name", *name, "The environment's name, or Prod")->type_name("NAME")->required();
 }
 

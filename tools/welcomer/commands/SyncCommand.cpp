@@ -5,16 +5,13 @@
 #include "state/WLKeychainSyncDestination.h"
 #include "state/WLSyncUpsell.h"
 #include "tools/welcomer/cli/PropertyListFile.h"
-#include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/story/ScenarioHost.h"
-#include "tools/welcomer/terminal/Printable.h"
 
 #include <CLI/CLI.hpp>
 #include <memory>
 #include <optional>
-#include <ostream>
 
 namespace welcomer::tool {
 
@@ -59,39 +56,36 @@ Decision decide(ScenarioHost& host, bool checkOnly) {
     return decision;
 }
 
-void printAsJson(std::ostream& out, const Decision& decision, const ScenarioHost& host) {
-    const ScenarioHost::Flags& flags = host.flags();
-    printJson(out, {{"result", decision.result},
-                    {"destination", decision.destination ? Json(*decision.destination) : Json()},
-                    {"name", decision.name ? Json(*decision.name) : Json()},
-                    {"calls", host.calls()},
-                    {"flags",
-                     {{"backupIsEnabled", flags.backupIsEnabled},
-                      {"isBackupNoCircleRecovery", flags.isBackupNoCircleRecovery},
-                      {"abortSyncSetup", flags.abortSyncSetup}}}});
+std::string shown(bool flag) {
+    return flag ? "true" : "false";
 }
 
-void printForPeople(std::ostream& out, const Decision& decision, const ScenarioHost& host) {
+Report reportOn(const Decision& decision, const ScenarioHost& host) {
     const ScenarioHost::Flags& flags = host.flags();
-    out << "Result:       " << (decision.result ? "keychain sync goes on" : "keychain sync is skipped")
-        << '\n';
-    out << "Destination:  ";
-    if (decision.destination) {
-        out << *decision.destination << '\n';
-    } else {
-        out << "none was asked for\n";
-    }
-    out << "Name:         " << decision.name.value_or("none") << '\n';
-    out << "Flags:        backupIsEnabled " << (flags.backupIsEnabled ? "true" : "false")
-        << ", isBackupNoCircleRecovery " << (flags.isBackupNoCircleRecovery ? "true" : "false")
-        << ", abortSyncSetup " << (flags.abortSyncSetup ? "true" : "false") << '\n';
-    out << "Calls:\n";
+    Report report;
+    report.document = {{"result", decision.result},
+                       {"destination", decision.destination ? Json(*decision.destination) : Json()},
+                       {"name", decision.name ? Json(*decision.name) : Json()},
+                       {"calls", host.calls()},
+                       {"flags",
+                        {{"backupIsEnabled", flags.backupIsEnabled},
+                         {"isBackupNoCircleRecovery", flags.isBackupNoCircleRecovery},
+                         {"abortSyncSetup", flags.abortSyncSetup}}}};
+    report.fields({{"Result:", decision.result ? "keychain sync goes on" : "keychain sync is skipped"},
+                   {"Destination:",
+                    decision.destination ? std::to_string(*decision.destination) : "none was asked for"},
+                   {"Name:", decision.name.value_or("none")},
+                   {"Flags:", "backupIsEnabled " + shown(flags.backupIsEnabled) +
+                                  ", isBackupNoCircleRecovery " + shown(flags.isBackupNoCircleRecovery) +
+                                  ", abortSyncSetup " + shown(flags.abortSyncSetup)}});
+    report.line("Calls:");
     for (const std::string& call : host.calls()) {
-        out << "  " << printable(call) << '\n';
+        report.line("  " + call);
     }
+    return report;
 }
 
-void determineDestination(Session& session, const std::string& file, bool checkOnly) {
+Report determineDestination(Session& session, const std::string& file, bool checkOnly) {
     ScenarioHost host(readPropertyListFile(file));
     if (const auto answer = host.screenLockRequiresPassword()) {
         WLSetScreenLockRequiresPasswordOverride(*answer);
@@ -106,12 +100,7 @@ void determineDestination(Session& session, const std::string& file, bool checkO
                                              TimeKind::Real);
     const platform::ScopedPlatform installed(owner->platform());
 
-    const Decision decision = decide(host, checkOnly);
-    if (session.options.json) {
-        printAsJson(session.out, decision, host);
-    } else {
-        printForPeople(session.out, decision, host);
-    }
+    return reportOn(decide(host, checkOnly), host);
 }
 
 std::string reasonForNoUpsell(const Session& session) {
@@ -121,17 +110,13 @@ std::string reasonForNoUpsell(const Session& session) {
     return session.log.isEmpty() ? "the user has seen it already" : session.log.reason();
 }
 
-void decideUpsell(Session& session) {
-    const bool isOffered = WLCurrentUserGetsSyncUpsell();
-    if (session.options.json) {
-        printJson(session.out, {{"offered", isOffered},
-                                {"reason", isOffered ? Json() : Json(reasonForNoUpsell(session))}});
-    } else if (isOffered) {
-        session.out << "The user is offered the sync setup.\n";
-    } else {
-        session.out << "The user is not offered the sync setup: " << printable(reasonForNoUpsell(session))
-                    << '\n';
+Report decideUpsell(Session& session) {
+    if (WLCurrentUserGetsSyncUpsell()) {
+        return Report({{"offered", true}, {"reason", Json()}}, "The user is offered the sync setup.");
     }
+    const std::string reason = reasonForNoUpsell(session);
+    return Report({{"offered", false}, {"reason", reason}},
+                  "The user is not offered the sync setup: " + reason);
 }
 
 } // namespace
@@ -146,7 +131,7 @@ void addSyncCommands(CommandLine& commandLine) {
     const auto checkOnly = std::make_shared<bool>(false);
     CLI::App& destination = commandLine.addCommand(
         group, "destination", "Decide where keychain sync goes, for a host whose answers are given",
-        [=](Session& session) { determineDestination(session, *file, *checkOnly); });
+        [=](Session& session) { return determineDestination(session, *file, *checkOnly); });
     destination
         .add_option("--scenario", *file, "The host's answers, a property list of any format; - for stdin")
         ->type_name("PLIST")

@@ -3,11 +3,9 @@
 #include "cloud/WLNimbusServiceCatalogue.h"
 #include "platform/Platform.h"
 #include "tools/welcomer/terminal/Failure.h"
-#include "tools/welcomer/terminal/TextTable.h"
 
 #include <algorithm>
 #include <map>
-#include <ostream>
 
 namespace welcomer::tool {
 
@@ -26,10 +24,6 @@ const std::map<std::string, std::string>& shortNames() {
 
 bool contains(const std::vector<std::string>& identifiers, const std::string& identifier) {
     return std::ranges::find(identifiers, identifier) != identifiers.end();
-}
-
-const char* yesOrNo(bool value) {
-    return value ? "yes" : "no";
 }
 
 } // namespace
@@ -68,16 +62,6 @@ std::vector<ServiceState> serviceStates(platform::CloudAccount* account) {
     return states;
 }
 
-void printServiceStates(std::ostream& out, const std::vector<ServiceState>& states,
-                        const std::string& indent) {
-    TextTable table({"SERVICE", "PHASE", "PRESENT", "CAN BE ENABLED", "ENABLED"});
-    for (const ServiceState& state : states) {
-        table.addRow({state.entry.name, state.entry.phase(), yesOrNo(state.isPresent),
-                      yesOrNo(state.canBeEnabled), yesOrNo(state.isEnabled)});
-    }
-    table.print(out, indent);
-}
-
 Json toJson(const std::vector<ServiceState>& states) {
     Json services = Json::array();
     for (const ServiceState& state : states) {
@@ -89,6 +73,16 @@ Json toJson(const std::vector<ServiceState>& states) {
                             {"enabled", state.isEnabled}});
     }
     return services;
+}
+
+void addServiceTable(Report& report, const Json& services, const std::string& indent) {
+    report.table(services,
+                 {{"SERVICE", "service"},
+                  {"PHASE", "phase"},
+                  {"PRESENT", "present"},
+                  {"CAN BE ENABLED", "canBeEnabled"},
+                  {"ENABLED", "enabled"}},
+                 indent);
 }
 
 std::vector<std::string> enabledServices(const std::vector<ServiceState>& states) {

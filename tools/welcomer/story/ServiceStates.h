@@ -3,9 +3,8 @@
 #pragma once
 
 #include "platform/AccountService.h"
-#include "tools/welcomer/cli/PropertyListOutput.h"
+#include "tools/welcomer/cli/Report.h"
 
-#include <iosfwd>
 #include <string>
 #include <vector>
 
@@ -44,12 +43,11 @@ struct ServiceState {
 //  account  may be null: an account that does not exist has no service
 std::vector<ServiceState> serviceStates(platform::CloudAccount* account);
 
-// For people: a table.
-void printServiceStates(std::ostream& out, const std::vector<ServiceState>& states,
-                        const std::string& indent = "");
-
-// For programs: an array.
+// An array with an object for each.
 Json toJson(const std::vector<ServiceState>& states);
+
+// Shows such an array to people.
+void addServiceTable(Report& report, const Json& services, const std::string& indent = "");
 
 // The identifiers of the enabled ones.
 std::vector<std::string> enabledServices(const std::vector<ServiceState>& states);

@@ -97,7 +97,7 @@ void SetupFlow::checkNothingIsWaiting(bool storesLocally) {
 }
 
 void SetupFlow::signIn(const std::string& account, const std::string& password) {
-    const StandardOutputGuard guard(_out);
+    const StandardOutputGuard guard;
     const WaitingLine waiting("Signing in", _showsWaiting);
     _account = account;
     _password = password;
@@ -109,7 +109,7 @@ void SetupFlow::signIn(const std::string& account, const std::string& password) 
 }
 
 std::vector<AliasOffer> SetupFlow::aliasOffers() {
-    const StandardOutputGuard guard(_out);
+    const StandardOutputGuard guard;
     std::vector<AliasOffer> offers{
         {kVidlinkIdentifier, "video calling", kReplayVidlinkAliasesKey, {}},
         {kChatterIdentifier, "messaging", kReplayChatterAliasesKey, {}},
@@ -126,7 +126,7 @@ std::vector<AliasOffer> SetupFlow::aliasOffers() {
 }
 
 std::vector<std::string> SetupFlow::delegates() {
-    const StandardOutputGuard guard(_out);
+    const StandardOutputGuard guard;
     std::vector<std::string> identifiers = WLNimbusAllDelegateIdentifiers();
     std::erase_if(identifiers, [this](const std::string& identifier) {
         return identifier == kSkylarkIdentifier || !_response(identifier);

@@ -9,7 +9,6 @@
 #include "tools/welcomer/terminal/Failure.h"
 
 #include <cstdint>
-#include <iosfwd>
 #include <map>
 #include <memory>
 #include <optional>
@@ -55,12 +54,8 @@ using ChosenAliases = std::map<std::string, std::vector<std::string>>;
 class SetupFlow {
   public:
     //  log           where the reasons of failures are read; borrowed
-    //  out           the tool's results, which plug-ins are kept away from; borrowed
     //  showsWaiting  whether a terminal is shown what is waited for
-    SetupFlow(const KeptLog& log, std::ostream& out, bool showsWaiting)
-        : _log(log),
-          _out(out),
-          _showsWaiting(showsWaiting) {}
+    SetupFlow(const KeptLog& log, bool showsWaiting) : _log(log), _showsWaiting(showsWaiting) {}
 
     // Refuses to begin while somebody else is logged in to a cloud account: completing the setup would take
     // the one for the other.
@@ -100,7 +95,6 @@ class SetupFlow {
     const PropertyList* _response(const std::string& delegate) const;
 
     const KeptLog& _log;
-    std::ostream& _out;
     const bool _showsWaiting;
     std::string _account;
     std::string _password;

@@ -9,7 +9,7 @@
 
 namespace welcomer::tool {
 
-TextTable::TextTable(std::vector<std::string> header) {
+TextTable::TextTable(std::vector<std::string> header, std::string indent) : _indent(std::move(indent)) {
     _lines.push_back(std::move(header));
 }
 
@@ -19,7 +19,7 @@ void TextTable::addRow(const std::vector<std::string>& cells) {
     std::transform(cells.begin(), cells.end(), std::back_inserter(line), printable);
 }
 
-void TextTable::print(std::ostream& out, const std::string& indent) const {
+void TextTable::print(std::ostream& out) const {
     std::vector<std::size_t> widths(_lines.front().size());
     for (const auto& line : _lines) {
         for (std::size_t i = 0; i < line.size(); ++i) {
@@ -27,7 +27,7 @@ void TextTable::print(std::ostream& out, const std::string& indent) const {
         }
     }
     for (const auto& line : _lines) {
-        out << indent;
+        out << _indent;
         for (std::size_t i = 0; i < line.size(); ++i) {
             out << line[i];
             if (i + 1 < line.size()) {

@@ -10,15 +10,17 @@ namespace welcomer::tool {
 
 class TextTable {
   public:
-    explicit TextTable(std::vector<std::string> header);
+    //  indent  stands before each line
+    explicit TextTable(std::vector<std::string> header, std::string indent = "");
 
     // One cell per column; a cell's control characters are shown, not sent to the terminal.
     void addRow(const std::vector<std::string>& cells);
 
-    // Prints the header and the rows, each line after the indent.
-    void print(std::ostream& out, const std::string& indent = "") const;
+    // Prints the header and the rows.
+    void print(std::ostream& out) const;
 
   private:
+    std::string _indent;
     std::vector<std::vector<std::string>> _lines;
 };
 

@@ -10,10 +10,12 @@ namespace {
 using Array = PropertyList::Array;
 using Dictionary = PropertyList::Dictionary;
 
-std::string outline(const PropertyList& value) {
-    std::ostringstream out;
-    printOutline(out, value, "  ");
-    return out.str();
+std::string outlineText(const PropertyList& value) {
+    std::string text;
+    for (const std::string& line : outline(value, "  ")) {
+        text += line + "\n";
+    }
+    return text;
 }
 
 TEST(ToJson, DataIsBase64AndADateIsISO8601InUTC) {
@@ -53,13 +55,13 @@ TEST(PrintJson, NothingInItCanControlATerminal) {
     EXPECT_EQ(out.str(), "{\n  " + escaped + ": " + escaped + "\n}\n");
 }
 
-TEST(PrintOutline, ShowsOneEntryPerLine) {
+TEST(Outline, ShowsOneEntryPerLine) {
     const PropertyList value = Dictionary{{"aliases", Array{"one", "two"}},
                                           {"empty", Array{}},
                                           {"none", Dictionary{}},
                                           {"yes", true},
                                           {"nested", Dictionary{{"number", 7}}}};
-    EXPECT_EQ(outline(value), "  aliases:\n"
+    EXPECT_EQ(outlineText(value), "  aliases:\n"
                               "    - one\n"
                               "    - two\n"
                               "  empty: (empty array)\n"
@@ -69,12 +71,12 @@ TEST(PrintOutline, ShowsOneEntryPerLine) {
                               "  yes: 1\n");
 }
 
-TEST(PrintOutline, ShowsAValueThatIsNoContainer) {
-    EXPECT_EQ(outline("only\ntext"), "  only\\ntext\n");
+TEST(Outline, ShowsAValueThatIsNoContainer) {
+    EXPECT_EQ(outlineText("only\ntext"), "  only\\ntext\n");
 }
 
-TEST(PrintOutline, KeysCannotControlTheTerminal) {
-    EXPECT_EQ(outline(Dictionary{{"\x1b[2J", 1}}), "  \\x1b[2J: 1\n");
+TEST(Outline, KeysCannotControlTheTerminal) {
+    EXPECT_EQ(outlineText(Dictionary{{"\x1b[2J", 1}}), "  \\x1b[2J: 1\n");
 }
 
 } // namespace

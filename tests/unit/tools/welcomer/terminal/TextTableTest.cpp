@@ -6,9 +6,9 @@
 namespace welcomer::tool {
 namespace {
 
-std::string printed(const TextTable& table, const std::string& indent = "") {
+std::string printed(const TextTable& table) {
     std::ostringstream out;
-    table.print(out, indent);
+    table.print(out);
     return out.str();
 }
 
@@ -22,9 +22,9 @@ TEST(TextTable, ColumnsAreAsWideAsTheirWidestCell) {
 }
 
 TEST(TextTable, CharactersBeyondAsciiStayInLine) {
-    TextTable table({"A", "B"});
+    TextTable table({"A", "B"}, "  ");
     table.addRow({"äöü", "1"});
-    EXPECT_EQ(printed(table, "  "), "  A    B\n  äöü  1\n");
+    EXPECT_EQ(printed(table), "  A    B\n  äöü  1\n");
 }
 
 TEST(TextTable, ACellCannotEndItsLine) {
