@@ -54,7 +54,7 @@ CredentialItem itemFrom(const std::string& label, const std::map<std::string, st
 }
 
 void addProperty(GVariantBuilder& properties, const char* name, GVariant* value) {
-    const CharacterPointer full(g_strconcat(kItemInterface, ".", name, nullptr));
+    const TextPointer full(g_strconcat(kItemInterface, ".", name, nullptr));
     g_variant_builder_add(&properties, "{sv}", full.get(), value);
 }
 

@@ -2,7 +2,7 @@
 
 #pragma once
 
-#include "backends/desktop/GLibPointer.h"
+#include "backends/desktop/glib/Pointers.h"
 #include "platform/CredentialStore.h"
 
 #include <string>

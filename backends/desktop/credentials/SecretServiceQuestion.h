@@ -2,11 +2,11 @@
 
 #pragma once
 
-#include "backends/desktop/BusName.h"
-#include "backends/desktop/credentials/Deadline.h"
 #include "backends/desktop/credentials/LibSecret.h"
-#include "backends/desktop/credentials/PromptWait.h"
-#include "backends/desktop/credentials/SessionBus.h"
+#include "backends/desktop/credentials/SecretServiceItem.h"
+#include "backends/desktop/credentials/SecretServiceStatus.h"
+#include "backends/desktop/glib/AsyncCall.h"
+#include "backends/desktop/glib/Bus.h"
 
 #include <chrono>
 #include <cstdint>
@@ -17,9 +17,12 @@
 namespace welcomer::desktop {
 
 inline constexpr char kNoObject[] = "/"; // the path that stands for none
-inline constexpr char kServiceInterface[] = "org.freedesktop.Secret.Service";
-inline constexpr char kCollectionInterface[] = "org.freedesktop.Secret.Collection";
-inline constexpr char kPropertiesInterface[] = "org.freedesktop.DBus.Properties";
+
+// The service, and its objects once they have a path.
+inline constexpr Peer kSecretService = {"org.freedesktop.secrets", "/org/freedesktop/secrets",
+                                        "org.freedesktop.Secret.Service", kReportLimit};
+inline constexpr Peer kSecretItem = kSecretService.as(kItemInterface);
+inline constexpr Peer kSecretCollection = kSecretService.as("org.freedesktop.Secret.Collection");
 
 // All of a question together (to reach the bus, to start the service, to open a session, and every call) has
 // one limit. What a person takes to answer a prompt does not count for it, and has a limit of its own.
@@ -28,8 +31,7 @@ inline constexpr char kPropertiesInterface[] = "org.freedesktop.DBus.Properties"
 class SecretServiceQuestion {
   public:
     //  bus  borrowed
-    SecretServiceQuestion(SessionBus& bus, std::chrono::nanoseconds limit,
-                          std::chrono::nanoseconds promptPatience)
+    SecretServiceQuestion(Bus& bus, std::chrono::nanoseconds limit, std::chrono::nanoseconds promptPatience)
         : _bus(bus),
           _deadline(limit),
           _promptPatience(promptPatience) {}
@@ -41,12 +43,13 @@ class SecretServiceQuestion {
     //  name  what the bus says about the service's name
     std::int32_t beginToLook(BusName& name);
 
-    // Calls a method of one of the service's objects.
-    //  arguments  a floating reference is taken
-    //  type       that of the answer; another one is kCredentialServiceFailed
-    //  result     the answer, or null
-    VariantPointer call(const char* path, const char* interface, const char* method, GVariant* arguments,
-                        const char* type, std::int32_t& status);
+    // The bus's calls within what is left of the time.
+    //  status  kCredentialSuccess, or what the error means; an answer of another type is
+    //          kCredentialServiceFailed
+    VariantPointer call(const Peer& peer, const char* method, GVariant* arguments, const char* type,
+                        std::int32_t& status);
+    VariantPointer readProperty(const Peer& peer, const char* name, std::int32_t& status);
+    VariantPointer readProperties(const Peer& peer, std::int32_t& status);
 
     // Has the service put a prompt before the user.
     //  path    of the prompt
@@ -76,14 +79,15 @@ class SecretServiceQuestion {
         void operator()(SecretService* library) const;
     };
 
+    std::int32_t _connect();
     std::int32_t _openLibrary();
 
-    SessionBus& _bus;
+    Bus& _bus;
     Deadline _deadline;
     const std::chrono::nanoseconds _promptPatience;
-    GDBusConnection* _connection = nullptr; // borrowed from the bus
+    BusConnection _connection;
     // What the library's object leaves behind is cleared away on the context that it was made on.
-    std::unique_ptr<PromptWait> _opening;
+    std::unique_ptr<AsyncCall> _opening;
     std::unique_ptr<SecretService, CloseLibrary> _library;
 };
 

@@ -10,15 +10,9 @@ namespace {
 using Status = std::int32_t;
 
 bool isLocked(SecretServiceQuestion& question, const std::string& collection, Status& status) {
-    const VariantPointer answer =
-        question.call(collection.c_str(), kPropertiesInterface, "Get",
-                      g_variant_new("(ss)", kCollectionInterface, "Locked"), "(v)", status);
-    if (!answer) {
-        return false;
-    }
-    const VariantPointer boxed(g_variant_get_child_value(answer.get(), 0));
-    const VariantPointer value(g_variant_get_variant(boxed.get()));
-    return g_variant_is_of_type(value.get(), G_VARIANT_TYPE_BOOLEAN) &&
+    const VariantPointer value =
+        question.readProperty(kSecretCollection.at(collection.c_str()), "Locked", status);
+    return value && g_variant_is_of_type(value.get(), G_VARIANT_TYPE_BOOLEAN) &&
            g_variant_get_boolean(value.get()) != FALSE;
 }
 
@@ -48,9 +42,8 @@ void reportRunning(SecretServiceQuestion& question, platform::BackendReport& rep
 } // namespace
 
 bool reportSecretService(platform::BackendReport& report) {
-    SessionBus bus;
-    const std::chrono::nanoseconds limit = std::chrono::milliseconds(kReportMilliseconds);
-    SecretServiceQuestion question(bus, limit, limit);
+    Bus bus(G_BUS_TYPE_SESSION, Bus::Sharing::WithLibraries);
+    SecretServiceQuestion question(bus, kReportLimit, kReportLimit);
     BusName name = BusName::Unknown;
     const Status status = question.beginToLook(name);
     if (status != platform::kCredentialSuccess) {

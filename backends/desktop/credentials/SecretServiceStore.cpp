@@ -47,7 +47,7 @@ Status search(SecretServiceQuestion& question, const std::string& service, const
               SearchResult& result) {
     Status status = platform::kCredentialSuccess;
     const VariantPointer answer =
-        question.call(kSecretServicePath, kServiceInterface, "SearchItems",
+        question.call(kSecretService, "SearchItems",
                       g_variant_new("(@a{ss})", searchAttributes(service, account)), "(aoao)", status);
     if (!answer) {
         // A service that knows no search.
@@ -69,10 +69,8 @@ Status search(SecretServiceQuestion& question, const std::string& service, const
 
 Status readItem(SecretServiceQuestion& question, const char* path, CredentialItem& item) {
     Status status = platform::kCredentialSuccess;
-    const VariantPointer answer = question.call(path, kPropertiesInterface, "GetAll",
-                                                g_variant_new("(s)", kItemInterface), "(a{sv})", status);
-    if (answer) {
-        const VariantPointer properties(g_variant_get_child_value(answer.get(), 0));
+    const VariantPointer properties = question.readProperties(kSecretItem.at(path), status);
+    if (properties) {
         item = itemFrom(properties.get());
     }
     return status;
@@ -100,7 +98,7 @@ Status loadSecret(SecretServiceQuestion& question, const std::string& path, std:
     }
     SecretService* const library = question.library();
     const VariantPointer answer = question.call(
-        path.c_str(), kItemInterface, "GetSecret",
+        kSecretItem.at(path.c_str()), "GetSecret",
         g_variant_new("(o)", secret_service_get_session_dbus_path(library)), "((oayays))", status);
     if (!answer) {
         return status;
@@ -150,7 +148,7 @@ Status openDefaultCollection(SecretServiceQuestion& question, std::string& path)
     g_variant_builder_add(&properties, "{sv}", "org.freedesktop.Secret.Collection.Label",
                           g_variant_new_string("Default"));
     const VariantPointer answer =
-        question.call(kSecretServicePath, kServiceInterface, "CreateCollection",
+        question.call(kSecretService, "CreateCollection",
                       g_variant_new("(a{sv}s)", &properties, SECRET_COLLECTION_DEFAULT), "(oo)", status);
     return answer ? takeCreated(question, answer.get(), path) : status;
 }
@@ -166,7 +164,7 @@ Status createIn(SecretServiceQuestion& question, const std::string& collection, 
     GVariant* const encrypted = secret_service_encode_dbus_secret(question.library(), value);
     secret_value_unref(value);
     const VariantPointer answer = question.call(
-        collection.c_str(), kCollectionInterface, "CreateItem",
+        kSecretCollection.at(collection.c_str()), "CreateItem",
         g_variant_new("(@a{sv}@(oayays)b)", itemProperties(item), encrypted, FALSE), "(oo)", status);
     if (answer) {
         std::string path;
@@ -181,7 +179,7 @@ Status createIn(SecretServiceQuestion& question, const std::string& collection, 
 Status deleteObject(SecretServiceQuestion& question, const std::string& path) {
     Status status = platform::kCredentialSuccess;
     const VariantPointer answer =
-        question.call(path.c_str(), kItemInterface, "Delete", nullptr, "(o)", status);
+        question.call(kSecretItem.at(path.c_str()), "Delete", nullptr, "(o)", status);
     if (answer) {
         const char* prompt = nullptr;
         g_variant_get(answer.get(), "(&o)", &prompt);

@@ -4,7 +4,6 @@
 
 #include "backends/desktop/CredentialModule.h"
 #include "backends/desktop/credentials/SecretServiceQuestion.h"
-#include "backends/desktop/credentials/SessionBus.h"
 
 #include <mutex>
 #include <string>
@@ -56,7 +55,8 @@ class SecretServiceStore final : public platform::CredentialStore {
 
     const CredentialModule::Arguments _arguments;
     std::mutex _mutex;
-    SessionBus _bus;
+    // So that whatever shares the connection in this process survives the bus, too.
+    Bus _bus{G_BUS_TYPE_SESSION, Bus::Sharing::WithLibraries};
 };
 
 } // namespace welcomer::desktop

@@ -2,7 +2,9 @@
 
 #pragma once
 
-#include "backends/desktop/network/GLibPointers.h"
+#include "backends/desktop/glib/Bus.h"
+
+#include <nm-dbus-interface.h>
 
 #include <chrono>
 #include <cstdint>
@@ -41,16 +43,19 @@ class NetworkManagerProperties {
     VariantPointer _all; // of type a{sv}, or null
 };
 
-// A connection to the system bus of this process's own, so that losing the bus never ends the process. It
-// needs no main loop. Any thread; a child process cannot use its parent's.
+// NetworkManager. Its object at this path is the manager itself.
+inline constexpr Peer kNetworkManager = {NM_DBUS_SERVICE, NM_DBUS_PATH, NM_DBUS_INTERFACE,
+                                         std::chrono::seconds(25)};
+
+// Calls on a connection to the system bus of this process's own. It needs no main loop. Any thread; a child
+// process cannot use its parent's.
 class NetworkManagerBus {
   public:
     // The process's connection, made when it is first asked for and again when it was lost.
-    //  result  null when there is no system bus or NetworkManager is not on it
+    //  result  null when there is no system bus that answers, or NetworkManager is not on it
     static std::shared_ptr<NetworkManagerBus> open();
 
-    explicit NetworkManagerBus(ObjectPointer<GDBusConnection> connection)
-        : _connection(std::move(connection)) {}
+    explicit NetworkManagerBus(BusConnection connection) : _connection(std::move(connection)) {}
 
     // Borrowed.
     GDBusConnection* connection() const { return _connection.get(); }
@@ -70,9 +75,7 @@ class NetworkManagerBus {
     static constexpr std::chrono::milliseconds kCallLimit{25'000};
 
   private:
-    bool _isServed() const;
-
-    const ObjectPointer<GDBusConnection> _connection;
+    const BusConnection _connection;
 };
 
 } // namespace welcomer::desktop

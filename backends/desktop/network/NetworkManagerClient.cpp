@@ -2,59 +2,12 @@
 
 namespace welcomer::desktop {
 
-namespace {
-
-// Makes a context the thread's own for a scope, which is where the client library delivers to.
-class ScopedContext {
-  public:
-    explicit ScopedContext(GMainContext* context) : _context(context) {
-        g_main_context_push_thread_default(_context);
-    }
-    ~ScopedContext() { g_main_context_pop_thread_default(_context); }
-    ScopedContext(const ScopedContext&) = delete;
-    ScopedContext& operator=(const ScopedContext&) = delete;
-
-  private:
-    GMainContext* const _context;
-};
-
-// A flag that is set after a while.
-class Deadline {
-  public:
-    Deadline(GMainContext* context, std::chrono::milliseconds limit)
-        : _source(g_timeout_source_new(static_cast<guint>(limit.count()))) {
-        g_source_set_callback(
-            _source,
-            [](gpointer hasPassed) -> gboolean {
-                *static_cast<bool*>(hasPassed) = true;
-                return G_SOURCE_REMOVE;
-            },
-            &_hasPassed, nullptr);
-        g_source_attach(_source, context);
-    }
-    ~Deadline() {
-        g_source_destroy(_source);
-        g_source_unref(_source);
-    }
-    Deadline(const Deadline&) = delete;
-    Deadline& operator=(const Deadline&) = delete;
-
-    bool hasPassed() const { return _hasPassed; }
-
-  private:
-    GSource* const _source;
-    bool _hasPassed = false;
-};
-
-} // namespace
-
 std::unique_ptr<NetworkManagerClient> NetworkManagerClient::open(std::shared_ptr<NetworkManagerBus> bus) {
     if (!bus) {
         return nullptr;
     }
-    std::unique_ptr<NetworkManagerClient> opened(
-        new NetworkManagerClient(std::move(bus), ContextPointer(g_main_context_new())));
-    const ScopedContext scope(opened->_context.get());
+    std::unique_ptr<NetworkManagerClient> opened(new NetworkManagerClient(std::move(bus)));
+    const MainContext::Scope scope(opened->_context);
     // Permissions are asked for when something is refused, not before.
     opened->_client.reset(static_cast<NMClient*>(
         g_initable_new(NM_TYPE_CLIENT, nullptr, nullptr, NM_CLIENT_DBUS_CONNECTION,
@@ -70,37 +23,34 @@ NetworkManagerClient::~NetworkManagerClient() {
     if (!_client) {
         return;
     }
-    const ScopedContext scope(_context.get());
+    const MainContext::Scope scope(_context);
     // The library has calls under way of its own; it is done with the context when this object goes.
     bool isBusy = true;
     g_object_weak_ref(
         nm_client_get_context_busy_watcher(_client.get()),
         [](gpointer busy, GObject*) { *static_cast<bool*>(busy) = false; }, &isBusy);
     _client.reset();
-    while (isBusy) {
-        g_main_context_iteration(_context.get(), TRUE);
-    }
+    _context.waitUntil([&isBusy] { return !isBusy; });
 }
 
 void NetworkManagerClient::refresh() {
     // After the answer to this, everything that was told before has arrived.
     static_cast<void>(_bus->property(NM_DBUS_PATH, NM_DBUS_INTERFACE, "Version"));
-    const ScopedContext scope(_context.get());
-    while (g_main_context_iteration(_context.get(), FALSE) != FALSE) {
-    }
+    const MainContext::Scope scope(_context);
+    _context.deliver();
 }
 
 bool NetworkManagerClient::waitUntil(const std::function<bool()>& condition,
                                      std::chrono::milliseconds limit) {
-    const ScopedContext scope(_context.get());
-    const Deadline deadline(_context.get(), limit);
-    while (!condition()) {
-        if (deadline.hasPassed() || nm_client_get_nm_running(get()) == FALSE) {
-            return false;
-        }
-        g_main_context_iteration(_context.get(), TRUE);
-    }
-    return true;
+    const MainContext::Scope scope(_context);
+    bool holds = false;
+    _context.waitUntil(
+        [&] {
+            holds = condition();
+            return holds || nm_client_get_nm_running(get()) == FALSE;
+        },
+        Deadline(limit));
+    return holds;
 }
 
 } // namespace welcomer::desktop

@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "backends/desktop/glib/MainContext.h"
 #include "backends/desktop/network/NetworkManagerBus.h"
 
 #include <NetworkManager.h>
@@ -36,12 +37,10 @@ class NetworkManagerClient {
     bool waitUntil(const std::function<bool()>& condition, std::chrono::milliseconds limit);
 
   private:
-    NetworkManagerClient(std::shared_ptr<NetworkManagerBus> bus, ContextPointer context)
-        : _bus(std::move(bus)),
-          _context(std::move(context)) {}
+    explicit NetworkManagerClient(std::shared_ptr<NetworkManagerBus> bus) : _bus(std::move(bus)) {}
 
     const std::shared_ptr<NetworkManagerBus> _bus;
-    const ContextPointer _context;
+    MainContext _context;
     ObjectPointer<NMClient> _client;
 };
 

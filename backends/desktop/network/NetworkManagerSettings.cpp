@@ -1,6 +1,6 @@
 #include "backends/desktop/network/NetworkManagerSettings.h"
 
-#include "backends/desktop/network/GLibPointers.h"
+#include "backends/desktop/glib/Pointers.h"
 #include "platform/NetworkConfigStore.h"
 #include "propertylist/XMLPropertyListReader.h"
 

@@ -1,9 +1,10 @@
 #include "backends/desktop/onlineaccounts/GoaOnlineAccounts.h"
 
-#include "backends/desktop/BusName.h"
+#include "backends/desktop/glib/MainContext.h"
 
 #include <algorithm>
 #include <array>
+#include <chrono>
 #include <utility>
 
 #define GOA_API_IS_SUBJECT_TO_CHANGE
@@ -13,71 +14,15 @@ namespace welcomer::desktop {
 
 namespace {
 
-constexpr char kBusName[] = "org.gnome.OnlineAccounts";
-constexpr char kObjectManagerPath[] = "/org/gnome/OnlineAccounts";
-constexpr char kManagerPath[] = "/org/gnome/OnlineAccounts/Manager";
-constexpr char kManagerInterface[] = "org.gnome.OnlineAccounts.Manager";
-constexpr char kAccountInterface[] = "org.gnome.OnlineAccounts.Account";
+constexpr Peer kManager = {"org.gnome.OnlineAccounts", "/org/gnome/OnlineAccounts/Manager",
+                           "org.gnome.OnlineAccounts.Manager", std::chrono::minutes(2)};
+constexpr Peer kObjectManager = {kManager.name, "/org/gnome/OnlineAccounts",
+                                 "org.freedesktop.DBus.ObjectManager", kReportLimit};
+// An account, once it has a path.
+constexpr Peer kAccount = {kManager.name, "/", "org.gnome.OnlineAccounts.Account", std::chrono::seconds(25)};
 
-constexpr int kWriteMilliseconds = 25 * 1000;
-constexpr int kMakeMilliseconds = 120 * 1000;
-constexpr int kEffectMilliseconds = 10 * 1000;
-constexpr gint64 kPatienceMicroseconds = gint64{10} * G_USEC_PER_SEC;
-
-struct UnreferenceObject {
-    void operator()(gpointer object) const { g_object_unref(object); }
-};
-template <typename T>
-using ObjectPointer = std::unique_ptr<T, UnreferenceObject>;
-
-struct Free {
-    void operator()(gpointer memory) const { g_free(memory); }
-};
-using CString = std::unique_ptr<char, Free>;
-
-struct UnreferenceVariant {
-    void operator()(GVariant* variant) const { g_variant_unref(variant); }
-};
-using VariantPointer = std::unique_ptr<GVariant, UnreferenceVariant>;
-
-// Where the library delivers what concerns the objects that are made meanwhile on this thread.
-class PrivateMainContext {
-  public:
-    PrivateMainContext() { g_main_context_push_thread_default(_context); }
-    ~PrivateMainContext() {
-        while (g_main_context_iteration(_context, FALSE)) { // what the objects have left behind is freed
-        }
-        g_main_context_pop_thread_default(_context);
-        g_main_context_unref(_context);
-    }
-    PrivateMainContext(const PrivateMainContext&) = delete;
-    PrivateMainContext& operator=(const PrivateMainContext&) = delete;
-
-    // Sleeps between deliveries until a condition holds, or the time is up.
-    //  result  whether it holds
-    template <typename Condition>
-    bool waitFor(int milliseconds, Condition condition) const {
-        bool isTimeUp = false;
-        GSource* const timer = g_timeout_source_new(static_cast<guint>(milliseconds));
-        g_source_set_callback(
-            timer,
-            [](gpointer flag) -> gboolean {
-                *static_cast<bool*>(flag) = true;
-                return G_SOURCE_REMOVE;
-            },
-            &isTimeUp, nullptr);
-        g_source_attach(timer, _context);
-        while (!condition() && !isTimeUp) {
-            g_main_context_iteration(_context, TRUE);
-        }
-        g_source_destroy(timer);
-        g_source_unref(timer);
-        return condition();
-    }
-
-  private:
-    GMainContext* const _context = g_main_context_new();
-};
+constexpr std::chrono::seconds kEffectLimit{10};
+constexpr std::chrono::seconds kPatience{10};
 
 // By OnlineFeature: what the account's switch, the feature's interface, and the detail of a new account are
 // called.
@@ -106,14 +51,30 @@ bool canBeSent(const std::string& string) {
     return g_utf8_validate(string.data(), static_cast<gssize>(string.size()), nullptr) != FALSE;
 }
 
+// Where the library delivers what concerns the objects that are made meanwhile on this thread.
+class PrivateContext {
+  public:
+    PrivateContext() = default;
+    ~PrivateContext() { _context.deliver(); } // what the objects have left behind is freed
+    PrivateContext(const PrivateContext&) = delete;
+    PrivateContext& operator=(const PrivateContext&) = delete;
+
+    const MainContext& get() const { return _context; }
+
+  private:
+    MainContext _context;
+    const MainContext::Scope _scope{_context};
+};
+
 using ObjectManager = ObjectPointer<GDBusObjectManager>;
 
 // What the daemon has, kept up to date while this thread's context is iterated; null where nobody has the
 // daemon's name. Without a daemon the library gives an object all the same, an empty one.
 ObjectManager lookAtDaemon(GDBusConnection* bus) {
     ObjectManager manager(goa_object_manager_client_new_sync(bus, G_DBUS_OBJECT_MANAGER_CLIENT_FLAGS_NONE,
-                                                             kBusName, kObjectManagerPath, nullptr, nullptr));
-    const CString owner(
+                                                             kObjectManager.name, kObjectManager.path,
+                                                             nullptr, nullptr));
+    const TextPointer owner(
         manager ? g_dbus_object_manager_client_get_name_owner(G_DBUS_OBJECT_MANAGER_CLIENT(manager.get()))
                 : nullptr);
     return owner ? std::move(manager) : nullptr;
@@ -154,7 +115,7 @@ std::string presentation(const NewOnlineAccount& account) {
     char* host = nullptr;
     g_uri_split(account.serverAddress.c_str(), G_URI_FLAGS_NONE, nullptr, nullptr, &host, nullptr, nullptr,
                 nullptr, nullptr, nullptr);
-    const CString owner(host);
+    const TextPointer owner(host);
     return !host || account.identity.find('@') != std::string::npos ? account.identity
                                                                     : account.identity + "@" + host;
 }
@@ -162,9 +123,8 @@ std::string presentation(const NewOnlineAccount& account) {
 } // namespace
 
 GoaOnlineAccounts::Daemon GoaOnlineAccounts::look() {
-    const Connection bus = _connection();
-    const BusName name = bus ? lookAtBusName(bus.get(), kBusName, kReportMilliseconds) : BusName::Unknown;
-    switch (name) {
+    const BusConnection bus = _connection(Deadline(kReportLimit));
+    switch (bus ? lookAtName(bus.get(), kObjectManager) : BusName::Unknown) {
     case BusName::Unknown:
         return Daemon::WithoutBus;
     case BusName::Nobody:
@@ -174,22 +134,22 @@ GoaOnlineAccounts::Daemon GoaOnlineAccounts::look() {
     case BusName::Owned:
         break;
     }
-    const VariantPointer answer(g_dbus_connection_call_sync(
-        bus.get(), kBusName, kObjectManagerPath, "org.freedesktop.DBus.ObjectManager", "GetManagedObjects",
-        nullptr, nullptr, G_DBUS_CALL_FLAGS_NO_AUTO_START, kReportMilliseconds, nullptr, nullptr));
+    ErrorSlot error;
+    const VariantPointer answer =
+        call(bus.get(), kObjectManager, "GetManagedObjects", nullptr, nullptr, error);
     return answer ? Daemon::Answers : Daemon::Silent;
 }
 
 std::optional<std::vector<OnlineAccount>> GoaOnlineAccounts::list() {
-    const Connection bus = _connection();
+    const Deadline patience(kPatience);
+    const BusConnection bus = _connection(patience);
     if (!bus) {
         return std::nullopt;
     }
-    const gint64 start = g_get_monotonic_time();
-    const PrivateMainContext context;
+    const PrivateContext context;
     const ObjectManager manager = lookAtDaemon(bus.get());
     if (!manager) {
-        _isGivenUp = _isGivenUp || g_get_monotonic_time() - start > kPatienceMicroseconds;
+        _isGivenUp = _isGivenUp || patience.left().count() == 0;
         return std::nullopt;
     }
     std::vector<OnlineAccount> accounts;
@@ -207,23 +167,19 @@ std::optional<std::vector<OnlineAccount>> GoaOnlineAccounts::list() {
 
 // The library's setters return before the daemon has the value: a short process would lose it.
 bool GoaOnlineAccounts::setFeature(const OnlineAccount& account, OnlineFeature feature, bool isOn) {
-    const Connection bus = _connection();
+    const BusConnection bus = _connection(Deadline(kPatience));
     if (!bus) {
         return false;
     }
-    const PrivateMainContext context;
+    const PrivateContext context;
     const ObjectManager manager = lookAtDaemon(bus.get());
-    const VariantPointer answer(
-        manager ? g_dbus_connection_call_sync(
-                      bus.get(), kBusName, account.path.c_str(), "org.freedesktop.DBus.Properties", "Set",
-                      g_variant_new("(ssv)", kAccountInterface, namesOf(feature).property,
-                                    g_variant_new_boolean(!isOn)),
-                      nullptr, G_DBUS_CALL_FLAGS_NO_AUTO_START, kWriteMilliseconds, nullptr, nullptr)
-                : nullptr);
+    ErrorSlot error;
     // An account that has gone has no interface and gets none; so has one whose daemon has gone.
-    return answer && context.waitFor(kEffectMilliseconds, [&] {
-        return hasInterface(manager.get(), account.path, feature) == isOn;
-    });
+    return manager &&
+           writeProperty(bus.get(), kAccount.at(account.path.c_str()), namesOf(feature).property,
+                         g_variant_new_boolean(!isOn), error) &&
+           context.get().waitUntil([&] { return hasInterface(manager.get(), account.path, feature) == isOn; },
+                                   Deadline(kEffectLimit));
 }
 
 bool GoaOnlineAccounts::makeOnce(const NewOnlineAccount& account) {
@@ -246,7 +202,7 @@ bool GoaOnlineAccounts::makeOnce(const NewOnlineAccount& account) {
 }
 
 bool GoaOnlineAccounts::_add(const NewOnlineAccount& account) {
-    const Connection bus = _connection();
+    const BusConnection bus = _connection(Deadline(kPatience));
     if (!bus) {
         return false;
     }
@@ -260,31 +216,23 @@ bool GoaOnlineAccounts::_add(const NewOnlineAccount& account) {
     for (std::size_t i = 0; i < kOnlineFeatureCount; ++i) {
         g_variant_builder_add(&details, "{ss}", kFeatureNames[i].detail, account.isOn[i] ? "true" : "false");
     }
-    const VariantPointer answer(g_dbus_connection_call_sync(
-        bus.get(), kBusName, kManagerPath, kManagerInterface, "AddAccount",
-        g_variant_new("(sssa{sv}a{ss})", account.providerType.c_str(), account.identity.c_str(),
-                      presentation(account).c_str(), &credentials, &details),
-        G_VARIANT_TYPE("(o)"), G_DBUS_CALL_FLAGS_NO_AUTO_START, kMakeMilliseconds, nullptr, nullptr));
+    ErrorSlot error;
+    const VariantPointer answer =
+        call(bus.get(), kManager, "AddAccount",
+             g_variant_new("(sssa{sv}a{ss})", account.providerType.c_str(), account.identity.c_str(),
+                           presentation(account).c_str(), &credentials, &details),
+             "(o)", error);
     return answer != nullptr;
 }
 
-// A connection of our own leaves exit-on-close off and the process's shared connection alone.
-GoaOnlineAccounts::Connection GoaOnlineAccounts::_connection() {
-    const std::lock_guard lock(_mutex);
+BusConnection GoaOnlineAccounts::_connection(const Deadline& deadline) {
     if (_isGivenUp) {
         return nullptr;
     }
-    if (!_bus || g_dbus_connection_is_closed(_bus.get())) {
-        const CString address(g_dbus_address_get_for_bus_sync(G_BUS_TYPE_SESSION, nullptr, nullptr));
-        _bus.reset(
-            address ? g_dbus_connection_new_for_address_sync(
-                          address.get(),
-                          static_cast<GDBusConnectionFlags>(G_DBUS_CONNECTION_FLAGS_AUTHENTICATION_CLIENT |
-                                                            G_DBUS_CONNECTION_FLAGS_MESSAGE_BUS_CONNECTION),
-                          nullptr, nullptr, nullptr)
-                    : nullptr);
-    }
-    return Connection(_bus ? static_cast<GDBusConnection*>(g_object_ref(_bus.get())) : nullptr);
+    ErrorSlot error;
+    BusConnection connection = _bus.connection(deadline, error);
+    _isGivenUp = _isGivenUp || isTimeOut(error);
+    return connection;
 }
 
 } // namespace welcomer::desktop

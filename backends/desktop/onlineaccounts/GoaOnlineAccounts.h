@@ -3,12 +3,11 @@
 #pragma once
 
 #include "backends/desktop/OnlineAccounts.h"
+#include "backends/desktop/glib/Bus.h"
 #include "backends/posix/FileLock.h"
 
 #include <atomic>
 #include <functional>
-#include <gio/gio.h>
-#include <memory>
 #include <mutex>
 #include <utility>
 
@@ -17,7 +16,8 @@ namespace welcomer::desktop {
 // Every question asks the daemon anew, which takes about 2 ms, on a connection to the session bus that is
 // this object's own: nothing of it runs on a main context of the process, and the end of the bus does not end
 // the process. A daemon that does not run is started by the bus where it can be. One that has kept a question
-// waiting until the time was up, after 25 s, is not asked again. A switch takes effect after some 300 ms; it
+// waiting until the time was up, after 25 s, is not asked again; nor is a bus that has not answered after
+// ten. A switch takes effect after some 300 ms; it
 // is waited for up to ten seconds. Where no keyring takes the password the daemon makes the account all the
 // same, and has the user give it again.
 class GoaOnlineAccounts final : public OnlineAccounts {
@@ -37,18 +37,12 @@ class GoaOnlineAccounts final : public OnlineAccounts {
     bool makeOnce(const NewOnlineAccount& account) override;
 
   private:
-    struct Unreference {
-        void operator()(GDBusConnection* connection) const { g_object_unref(connection); }
-    };
-    using Connection = std::unique_ptr<GDBusConnection, Unreference>;
-
-    Connection _connection();
+    BusConnection _connection(const Deadline& deadline);
     bool _add(const NewOnlineAccount& account);
 
     const std::function<posix::FileLock()> _lock;
-    std::mutex _making; // keeps other threads out
-    std::mutex _mutex;
-    Connection _bus; // the last one; closed when the bus has gone
+    std::mutex _making;                              // keeps other threads out
+    Bus _bus{G_BUS_TYPE_SESSION, Bus::Sharing::Own}; // leaves the process's shared one alone
     std::atomic<bool> _isGivenUp{false};
 };
 

@@ -1,6 +1,6 @@
-#include "backends/desktop/GLibPointer.h"
 #include "backends/desktop/ModuleEntry.h"
 #include "backends/desktop/ScreenLockModule.h"
+#include "backends/desktop/glib/Pointers.h"
 
 namespace welcomer::desktop {
 

@@ -24,6 +24,7 @@ import machine  # noqa: E402
 TOOL, AGENT = "/usr/local/bin/welcomer", "/usr/local/libexec/wlnimbussetup"
 BUNDLE = "/usr/local/share/welcomer/setup-bundle"
 BUS = f"unix:path=/run/user/{machine.UID}/bus"
+SYSTEM_BUS = "unix:path=/var/run/dbus/system_bus_socket"
 SECRETS, ONLINE_ACCOUNTS = "org.freedesktop.secrets", "org.gnome.OnlineAccounts"
 KEY = ("service", "Welcomer Nimbus Replay Data", "account", "Welcomer")
 REPLAY = plistlib.dumps({"delegatesResponseDict": {"delegates": {}}})
@@ -349,6 +350,32 @@ class Doctor(SilentServices):
     def test_without_a_session_bus_the_keyring_cannot_be_asked(self):
         self.assertEqual(self.reports(bus=False)["CredentialStore"],
                          ("none", "there is no session bus, so that the keyring cannot be asked"))
+
+    def test_a_session_bus_that_hangs_is_given_up(self):
+        self.stop(self.start_bus())
+        reports = self.reports()
+        self.assertEqual(reports["CredentialStore"],
+                         ("none", "the session bus runs, does not answer, so that the keyring cannot be asked"))
+        self.assertEqual(reports["AccountService"], ("account file", "no session bus answers"))
+
+    def test_a_system_bus_that_hangs_is_given_up(self):
+        (self.machine.root / "var/run/dbus").mkdir(parents=True, exist_ok=True)
+        bus = self.machine.start(["dbus-daemon", "--session", "--nofork", "--nopidfile", f"--address={SYSTEM_BUS}"])
+
+        def end():
+            bus.send_signal(signal.SIGKILL)
+            bus.wait(timeout=60)
+
+        self.addCleanup(end)
+        machine.Machine.wait_for(lambda: self.machine.run(["gdbus", "call", "--address", SYSTEM_BUS, "-d",
+                                                           "org.freedesktop.DBus", "-o", "/", "-m",
+                                                           "org.freedesktop.DBus.GetId"]).returncode == 0, "the bus")
+        self.stop(bus)
+        reports = self.reports(bus=False)
+        self.assertEqual(reports["NetworkConfigStore"], ("local file and kernel", "the system bus does not answer"))
+        self.assertEqual(reports["NetworkStateStore"], ("kernel", "the system bus does not answer"))
+        self.assertEqual(reports["HostReachability"],
+                         ("name lookup and routes", "the system bus does not answer"))
 
     def test_a_bus_that_has_died_is_told_from_none(self):
         bus = self.start_bus()

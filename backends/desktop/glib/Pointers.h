@@ -1,4 +1,4 @@
-// Owning pointers to what GLib hands out. For modules only.
+// Owners of what GLib hands out. For modules only, as all of this folder.
 
 #pragma once
 
@@ -19,8 +19,7 @@ struct GLibDelete {
 template <class Object>
 using ObjectPointer = std::unique_ptr<Object, GLibDelete<g_object_unref>>;
 using VariantPointer = std::unique_ptr<GVariant, GLibDelete<g_variant_unref>>;
-using CharacterPointer = std::unique_ptr<char, GLibDelete<g_free>>;
-using HashTablePointer = std::unique_ptr<GHashTable, GLibDelete<g_hash_table_unref>>;
+using TextPointer = std::unique_ptr<char, GLibDelete<g_free>>;
 
 // Takes a GError: pass out() where one is expected.
 class ErrorSlot {

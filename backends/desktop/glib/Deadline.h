@@ -1,11 +1,19 @@
-// How long a question to the keyring may take, with all the calls that it consists of.
+// How long something may take, with all the calls that it consists of.
 
 #pragma once
 
 #include <algorithm>
 #include <chrono>
+#include <cstdint>
+#include <limits>
 
 namespace welcomer::desktop {
+
+// A duration as GLib takes it, rounded up.
+inline int wholeMilliseconds(std::chrono::nanoseconds duration) {
+    const std::int64_t count = std::chrono::ceil<std::chrono::milliseconds>(duration).count();
+    return static_cast<int>(std::clamp<std::int64_t>(count, 0, std::numeric_limits<int>::max()));
+}
 
 // One thread.
 class Deadline {
