@@ -80,6 +80,11 @@ std::uint32_t numberIn(const nlattr& attribute) {
     return isNumber ? mnl_attr_get_u32(&attribute) : 0;
 }
 
+std::uint16_t shortNumberIn(const nlattr& attribute) {
+    const bool isNumber = mnl_attr_get_payload_len(&attribute) == sizeof(std::uint16_t);
+    return isNumber ? mnl_attr_get_u16(&attribute) : std::uint16_t{0};
+}
+
 std::string textIn(const nlattr& attribute) {
     const char* const text = mnl_attr_get_str(&attribute);
     return {text, ::strnlen(text, mnl_attr_get_payload_len(&attribute))};

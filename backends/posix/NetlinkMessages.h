@@ -62,9 +62,10 @@ std::optional<KernelRoute> readDefaultRoute(const nlmsghdr& message);
 bool readAttributes(const void* begin, std::size_t size,
                     const std::function<void(int type, const nlattr& attribute)>& take);
 
-// What an attribute holds: a number, which is 0 when it is none, and a text, which may or may not end with a
-// zero byte.
+// What an attribute holds: a number, which is 0 when it is none of that size, and a text, which may or may
+// not end with a zero byte.
 std::uint32_t numberIn(const nlattr& attribute);
+std::uint16_t shortNumberIn(const nlattr& attribute);
 std::string textIn(const nlattr& attribute);
 
 // A request: a header, a body and attributes.

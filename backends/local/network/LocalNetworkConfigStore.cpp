@@ -1,6 +1,5 @@
 #include "backends/local/network/LocalNetworkConfigStore.h"
 
-#include "backends/local/network/KernelNetwork.h"
 #include "backends/local/network/MachineInterfaces.h"
 #include "backends/local/network/NetworkApplication.h"
 #include "backends/local/network/NetworkFile.h"
@@ -28,10 +27,6 @@ bool succeeded(std::int32_t status, const std::string& detail = {}) {
     return status == platform::kNetworkConfigSuccess;
 }
 
-std::vector<MachineLink> machineLinks(const posix::RootFolder& root) {
-    return listMachineLinks(KernelNetwork().links(), root);
-}
-
 // What a connection and its handles work on.
 class Core {
   public:
@@ -41,7 +36,7 @@ class Core {
         _changes.clear();
         _configured.clear();
         _content = _file.read();
-        _links = machineLinks(_root);
+        _links = listMachineLinks();
         _addHardware();
     }
 
@@ -51,7 +46,7 @@ class Core {
 
     // Has the services of hardware stored that are only listed so far.
     bool establish() {
-        _links = machineLinks(_root);
+        _links = listMachineLinks();
         _addHardware();
         const bool isAnythingNew = !_onlyListed.empty();
         if (isAnythingNew) {
@@ -288,7 +283,7 @@ std::shared_ptr<platform::NetworkConfigConnection> LocalNetworkConfigStore::open
 }
 
 std::vector<std::shared_ptr<platform::NetworkInterface>> LocalNetworkConfigStore::copyInterfaces() {
-    const std::vector<MachineLink> links = machineLinks(_root);
+    const std::vector<MachineLink> links = listMachineLinks();
     std::vector<std::shared_ptr<platform::NetworkInterface>> interfaces;
     interfaces.reserve(links.size());
     for (const MachineLink& link : links) {

@@ -1,13 +1,12 @@
 #include "backends/local/network/MachineInterfaces.h"
 
-#include "backends/posix/Directory.h"
+#include "backends/local/network/KernelNetwork.h"
+#include "backends/local/network/WirelessLinks.h"
 
 #include <algorithm>
 #include <array>
-#include <fcntl.h>
 #include <net/if.h>
 #include <net/if_arp.h>
-#include <set>
 #include <string_view>
 
 namespace welcomer::local {
@@ -39,23 +38,20 @@ bool hasPorts(const posix::KernelLink& link) {
     return link.kind == "bridge" || link.kind == "bond";
 }
 
-bool hasWirelessHardware(const posix::RootFolder& root) {
-    const auto devices = posix::listDirectory(root.open("/sys/class/ieee80211", O_RDONLY | O_DIRECTORY));
-    return devices && !devices->empty();
-}
-
-bool isWireless(const posix::KernelLink& link, const posix::RootFolder& root) {
-    return root.exists("/sys/class/net/" + link.name + "/phy80211");
-}
-
-std::string typeOf(const posix::KernelLink& link, const posix::RootFolder& root, bool mayBeWireless) {
+std::string typeOf(const posix::KernelLink& link, const std::set<int>& wireless) {
     if (const Kind* kind = stackedKind(link)) {
         return kind->type;
     }
-    if (mayBeWireless && isWireless(link, root)) {
+    if (wireless.contains(link.index)) {
         return platform::kNetworkWireless;
     }
     return link.hardwareType == ARPHRD_ETHER ? platform::kNetworkEthernet : kOtherType;
+}
+
+const MachineLink* named(const std::vector<MachineLink>& links, const std::string& device) {
+    const auto found =
+        std::ranges::find_if(links, [&](const MachineLink& each) { return each.link.name == device; });
+    return found == links.end() ? nullptr : &*found;
 }
 
 // The link that another one stands on, or null.
@@ -101,17 +97,27 @@ class LocalInterface final : public platform::NetworkInterface {
 
 } // namespace
 
+std::vector<MachineLink> listMachineLinks() {
+    return listMachineLinks(KernelNetwork().links(), wirelessLinks());
+}
+
 std::vector<MachineLink> listMachineLinks(const std::vector<posix::KernelLink>& links,
-                                          const posix::RootFolder& root) {
-    const bool mayBeWireless = hasWirelessHardware(root);
+                                          const std::set<int>& wireless) {
     std::vector<MachineLink> found;
     found.reserve(links.size());
     for (const posix::KernelLink& link : links) {
         if ((link.flags & IFF_LOOPBACK) == 0) {
-            found.push_back({link, typeOf(link, root, mayBeWireless)});
+            found.push_back({link, typeOf(link, wireless)});
         }
     }
     return found;
+}
+
+bool isPort(const std::vector<MachineLink>& links, const std::string& device) {
+    const MachineLink* const found = named(links, device);
+    return found && std::ranges::any_of(links, [&](const MachineLink& each) {
+               return each.link.index == found->link.masterIndex && hasPorts(each.link);
+           });
 }
 
 std::vector<MachineLink> listHardware(const std::vector<MachineLink>& links) {
@@ -127,12 +133,8 @@ std::vector<MachineLink> listHardware(const std::vector<MachineLink>& links) {
 
 std::unique_ptr<platform::NetworkInterface> makeInterface(const std::vector<MachineLink>& links,
                                                           const std::string& device) {
-    const auto found =
-        std::ranges::find_if(links, [&](const MachineLink& each) { return each.link.name == device; });
-    if (found == links.end()) {
-        return std::make_unique<LocalInterface>(device);
-    }
-    return makeInterface(links, *found);
+    const MachineLink* const found = named(links, device);
+    return found ? makeInterface(links, *found) : std::make_unique<LocalInterface>(device);
 }
 
 std::unique_ptr<platform::NetworkInterface> makeInterface(const std::vector<MachineLink>& links,

@@ -3,10 +3,10 @@
 #pragma once
 
 #include "backends/posix/NetlinkMessages.h"
-#include "backends/posix/RootFolder.h"
 #include "platform/NetworkConfigStore.h"
 
 #include <memory>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -18,11 +18,18 @@ struct MachineLink {
     std::string type;
 };
 
-// Every link but the loopback, in the order of their numbers. A link is wireless when /sys (below the root)
-// has a physical wireless device for it; a bridge, a bond, a VLAN and the like have types of their own; what
-// else speaks Ethernet is Ethernet. Any thread.
+// Every link but the loopback, in the order of their numbers. A bridge, a bond, a VLAN and the like have
+// types of their own; what else speaks Ethernet is Ethernet unless it is wireless.
+//  links     all links; by default those of this network namespace, whatever /sys shows
+//  wireless  the numbers of the wireless ones
+// Any thread.
+std::vector<MachineLink> listMachineLinks();
 std::vector<MachineLink> listMachineLinks(const std::vector<posix::KernelLink>& links,
-                                          const posix::RootFolder& root);
+                                          const std::set<int>& wireless);
+
+// Whether a device is a port of a bridge or a bond, which has the addresses in its place; no device of the
+// list is none.
+bool isPort(const std::vector<MachineLink>& links, const std::string& device);
 
 // The links that are network hardware as far as a service is concerned: Ethernet, wireless, and bridges and
 // bonds that have taken over some; not those that are ports of another link.
