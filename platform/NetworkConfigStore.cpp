@@ -36,6 +36,8 @@ std::string networkConfigStatusText(std::int32_t status) {
         return "the network did not come up with this configuration";
     case kNetworkConfigInUse:
         return "the configuration is locked by another process: waited 10 seconds";
+    case kNetworkConfigNameServiceSilent:
+        return "the service that decides about the name servers does not answer";
     default:
         break;
     }

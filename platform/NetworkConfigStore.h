@@ -60,7 +60,8 @@ enum NetworkConfigStatus : std::int32_t {
     kNetworkConfigNameServersNotWritten = 12, // the system refused to store them
     kNetworkConfigNotActivated = 13,          // the machine's network service could not put it to use
     kNetworkConfigInUse = 14, // another process holds what is stored, and did not let go of it in time
-    kNetworkConfigKernelRefused = 1000, // and above: the kernel refused, with its error number added
+    kNetworkConfigNameServiceSilent = 15, // the program that decides about the name servers does not answer
+    kNetworkConfigKernelRefused = 1000,   // and above: the kernel refused, with its error number added
 };
 
 // The text of a code, for people. Any thread.

@@ -67,8 +67,8 @@ DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
       _accountService(_accountSurroundings(options.root), {std::string(configuration::kOnlineAccountProvider),
                                                            std::string(configuration::kOnlineAccountServer)}),
       _preferenceStore(_local.platform().preferenceStore),
-      _network({_local.platform().networkConfigStore, _local.platform().networkStateStore,
-                _local.platform().hostReachability}),
+      _kernelConfigStore(posix::RootFolder(options.root), &_nameServers),
+      _network({_kernelConfigStore, _local.platform().networkStateStore, _local.platform().hostReachability}),
       _platform(withDesktop(
           _local.platform(), _credentialStore.store(), _preferenceStore, _accountService, _network,
           options.hostReachability ? *options.hostReachability : _network.hostReachability())) {}

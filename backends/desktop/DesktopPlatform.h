@@ -6,6 +6,7 @@
 #include "backends/Backends.h"
 #include "backends/desktop/DesktopCredentialStore.h"
 #include "backends/desktop/DesktopModule.h"
+#include "backends/desktop/DesktopNameServers.h"
 #include "backends/desktop/DesktopNetwork.h"
 #include "backends/desktop/DesktopPreferenceStore.h"
 #include "backends/desktop/DesktopRunLoops.h"
@@ -37,6 +38,8 @@ class DesktopPlatform final : public PlatformOwner {
     DesktopModule<OnlineAccountsModule> _onlineAccounts;
     OnlineAccountService _accountService;
     DesktopPreferenceStore _preferenceStore;
+    DesktopNameServers _nameServers;
+    local::LocalNetworkConfigStore _kernelConfigStore; // tells _nameServers
     DesktopNetwork _network;
     const platform::Platform _platform;
 };

@@ -65,11 +65,11 @@ class ResolverMachine(machine.Machine):
 </busconfig>
 """)
         # Ready once it has told its address.
-        bus = self.start(["/usr/bin/dbus-daemon", "--config-file=/etc/bus.conf", "--nofork", "--nopidfile",
-                          "--print-address"], stdout=subprocess.PIPE, stderr=subprocess.DEVNULL)
-        self._daemons.append(bus)
-        bus.stdout.readline()
-        bus.stdout.close()
+        self.bus = self.start(["/usr/bin/dbus-daemon", "--config-file=/etc/bus.conf", "--nofork", "--nopidfile",
+                               "--print-address"], stdout=subprocess.PIPE, stderr=subprocess.DEVNULL)
+        self._daemons.append(self.bus)
+        self.bus.stdout.readline()
+        self.bus.stdout.close()
 
     def start_resolver(self):
         folder = self.root / "run/systemd/resolve"

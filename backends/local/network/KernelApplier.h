@@ -18,9 +18,7 @@ namespace welcomer::local {
 // One thread at a time for each device.
 class KernelApplier {
   public:
-    //  nameServers  who decides about the name servers where /etc/resolv.conf is systemd-resolved's; null:
-    //  nobody.
-    //               Borrowed
+    //  nameServers  told of the name servers where /etc/resolv.conf is systemd-resolved's; borrowed, or null
     explicit KernelApplier(posix::RootFolder root, NameServerService* nameServers = nullptr)
         : _root(std::move(root)),
           _client(_root),
@@ -29,10 +27,9 @@ class KernelApplier {
     // Applies it, all or nothing: after a failure the link's addresses and routes are those of before, and so
     // are the machine's name servers.
     //  manual, inform  the address becomes the link's only IPv4 address, and the router its only default
-    //  route,
-    //                  with the lowest metric that no other link's has: theirs stay as they are. No router
-    //                  means no default route. The DHCP clients that are used here cannot ask for the rest
-    //                  alone. One that was started here for the link is ended.
+    //                  route, with the lowest metric that no other link's has; theirs stay. No router, no
+    //                  route. The DHCP clients that are used here cannot ask for the rest alone. One that was
+    //                  started here for the link is ended.
     //  DHCP, BootP     the link loses its IPv4 addresses and default routes, and the machine's DHCP client is
     //                  started for it; it waits for no answer
     //  others          the link stays as it is

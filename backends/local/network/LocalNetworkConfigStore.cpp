@@ -30,7 +30,12 @@ bool succeeded(std::int32_t status, const std::string& detail = {}) {
 // What a connection and its handles work on.
 class Core {
   public:
-    explicit Core(const posix::RootFolder& root) : _root(root), _file(root) { reload(); }
+    Core(const posix::RootFolder& root, NameServerService* nameServers)
+        : _root(root),
+          _file(root),
+          _nameServers(nameServers) {
+        reload();
+    }
 
     void reload() {
         _changes.clear();
@@ -143,11 +148,13 @@ class Core {
         }
         return applyNetworkConfiguration(
             _root, *device, networkfile::configuration(_content, serviceID, platform::kNetworkProtocolIPv4),
-            networkfile::configuration(_content, serviceID, platform::kNetworkProtocolDNS), detail);
+            networkfile::configuration(_content, serviceID, platform::kNetworkProtocolDNS), detail,
+            _nameServers);
     }
 
     const posix::RootFolder _root;
     const NetworkFile _file;
+    NameServerService* const _nameServers;
     Dictionary _content; // what was stored, with the changes and the services that are only listed
     std::vector<std::function<void(Dictionary&)>> _changes;
     std::vector<networkfile::NewService> _onlyListed;
@@ -263,7 +270,8 @@ class Set final : public platform::NetworkSet {
 
 class Connection final : public platform::NetworkConfigConnection {
   public:
-    explicit Connection(const posix::RootFolder& root) : _core(std::make_shared<Core>(root)) {}
+    Connection(const posix::RootFolder& root, NameServerService* nameServers)
+        : _core(std::make_shared<Core>(root, nameServers)) {}
 
     std::shared_ptr<platform::NetworkSet> copyCurrentSet() override {
         return _core->hasSet() ? std::make_shared<Set>(_core) : nullptr;
@@ -279,7 +287,7 @@ class Connection final : public platform::NetworkConfigConnection {
 } // namespace
 
 std::shared_ptr<platform::NetworkConfigConnection> LocalNetworkConfigStore::open(const std::string&) {
-    return std::make_shared<Connection>(_root);
+    return std::make_shared<Connection>(_root, _nameServers);
 }
 
 std::vector<std::shared_ptr<platform::NetworkInterface>> LocalNetworkConfigStore::copyInterfaces() {

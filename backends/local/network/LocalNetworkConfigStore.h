@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "backends/local/network/NameServerService.h"
 #include "backends/posix/RootFolder.h"
 #include "platform/NetworkConfigStore.h"
 
@@ -18,7 +19,10 @@ namespace welcomer::local {
 // whether enabled or not, and leaves all others alone: a default that was merely stored starts nothing.
 class LocalNetworkConfigStore final : public platform::NetworkConfigStore {
   public:
-    explicit LocalNetworkConfigStore(posix::RootFolder root) : _root(std::move(root)) {}
+    //  nameServers  as KernelApplier.h has it; borrowed
+    explicit LocalNetworkConfigStore(posix::RootFolder root, NameServerService* nameServers = nullptr)
+        : _root(std::move(root)),
+          _nameServers(nameServers) {}
 
     std::shared_ptr<platform::NetworkConfigConnection> open(const std::string& name) override;
     std::vector<std::shared_ptr<platform::NetworkInterface>> copyInterfaces() override;
@@ -27,6 +31,7 @@ class LocalNetworkConfigStore final : public platform::NetworkConfigStore {
 
   private:
     const posix::RootFolder _root;
+    NameServerService* const _nameServers;
 };
 
 } // namespace welcomer::local

@@ -114,6 +114,14 @@ class Ports(SpaceTest):
         self.assertEqual(lines[0].split(), ["DEVICE", "KIND", "NAME"])
         self.assertEqual([line.split()[:2] for line in lines[1:]], [list(each) for each in links])
 
+    def test_what_sys_shows_of_another_network_is_no_matter(self):
+        self.here.connect("eth7", self.there, "eth0")
+        other = self.root / "sys/class"  # as where it was mounted in a network with a wireless device of that name
+        for folder in ("net/eth7/phy80211", "net/wlan0/phy80211", "ieee80211/phy0"):
+            (other / folder).mkdir(parents=True)
+        self.assertEqual(self.asked("ports"),
+                         {"ports": [{"device": "eth7", "kind": "Ethernet", "name": "Ethernet (eth7)"}]})
+
     def test_every_port_gets_a_service_once(self):
         self.here.connect("eth7", self.there, "eth0")
         expected = {"services": ["Ethernet (eth7)"]}
@@ -324,6 +332,36 @@ class Applying(SpaceTest):
                 self.assertEqual(self.addresses("eth7"), [])
                 self.assertIn(f"<string>{value}</string>" if value else "<string></string>",
                               self.stored.read_text(encoding="utf-8"))
+
+    def state(self):
+        """What an application may change."""
+        return [self.here.shell("ip -4 addr show; ip -4 route show table all"), self.resolver.read_bytes()]
+
+    def test_a_router_that_the_kernel_refuses_leaves_the_working_network_alone(self):
+        # Which it does only when the address through which the router is reached has gone.
+        self.here.shell("ip addr add 192.0.2.9/24 dev eth7; ip route add default via 192.0.2.1; "
+                        "ip route add 198.51.100.0/24 via 192.0.2.2")
+        before = self.state()
+        outside = [*MANUAL[:5], "10.9.0.5", "--subnet", "255.255.255.255", "--router", "192.0.2.1"]
+        self.fails(self.call("apply", *outside, "--dns", "192.0.2.1", "--warning-type", "3"), 1, NOT_CONFIGURED)
+        self.assertEqual(self.state(), before)
+
+    def test_name_servers_that_cannot_be_stored_leave_the_working_network_alone(self):
+        self.here.shell("ip addr add 10.0.0.7/8 dev eth7; ip route add default via 10.0.0.1")
+        before = self.here.shell("ip -4 addr show; ip -4 route show table all")
+        self.resolver.unlink()
+        self.resolver.mkdir()
+        self.fails(self.call("apply", *MANUAL, "--dns", "192.0.2.1", "--warning-type", "3"), 1, NOT_CONFIGURED)
+        self.assertEqual(self.here.shell("ip -4 addr show; ip -4 route show table all"), before)
+
+    def test_another_links_default_route_stays(self):
+        self.here.connect("eth8", self.there, "eth1")
+        self.here.shell("ip addr add 198.51.100.7/24 dev eth8; ip route add default via 198.51.100.1 dev eth8")
+        for _ in range(2):
+            self.succeeds(self.call("apply", *MANUAL, "--warning-type", "3"))
+            self.assertEqual([(each["dev"], each["gateway"], each.get("metric", 0))
+                              for each in self.here.ip("-4 route show default")],
+                             [("eth8", "198.51.100.1", 0), ("eth7", "192.0.2.1", 1)])
 
     def test_warning_type_zero_and_the_other_choices_configure_nothing(self):
         self.succeeds(self.call("apply", *MANUAL, "--warning-type", "0"))

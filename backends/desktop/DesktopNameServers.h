@@ -1,0 +1,26 @@
+// systemd-resolved's name servers, where the module for them is there.
+
+#pragma once
+
+#include "backends/desktop/DesktopModule.h"
+#include "backends/desktop/ResolvedModule.h"
+
+#include <string>
+#include <vector>
+
+namespace welcomer::desktop {
+
+class DesktopNameServers final : public local::NameServerService {
+  public:
+    //  folder  where the modules are; empty: where they are looked for anyway
+    explicit DesktopNameServers(const std::string& folder = "") : _module({}, folder) {}
+
+    // Loads the module when it is first needed. Without it, the name servers are another program's.
+    std::int32_t setServers(const std::string& device, const std::vector<std::string>& servers,
+                            std::string& detail) override;
+
+  private:
+    DesktopModule<ResolvedModule> _module;
+};
+
+} // namespace welcomer::desktop

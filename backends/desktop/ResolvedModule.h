@@ -1,0 +1,15 @@
+// systemd-resolved as the one who is told of name servers, as a module.
+
+#pragma once
+
+#include "backends/local/network/NameServerService.h"
+
+namespace welcomer::desktop {
+
+struct ResolvedModule {
+    static constexpr char kName[] = "resolved";
+    using Interface = local::NameServerService;
+    struct Arguments {};
+};
+
+} // namespace welcomer::desktop
