@@ -1,7 +1,6 @@
 #include "network/NCUtils.h"
 
 #include "log/PCLogManager.h"
-#include "platform/Platform.h"
 
 #include <algorithm>
 
@@ -81,7 +80,7 @@ NCUtils::createOrGetProtocolForService(const std::string& type, platform::Networ
     if (service->addProtocolType(type)) {
         return service->copyProtocol(type);
     }
-    const long error = platform::current().networkConfigStore.lastErrorCode();
+    const long error = service->lastErrorCode();
     WL_LOG_AS(kCreateFunction, "Error %ld from NCNetworkServiceAddProtocolType", error);
     return nullptr;
 }

@@ -93,11 +93,11 @@ PropertyList::Array onlyElement(const std::string& value) {
     return {PropertyList(value)};
 }
 
-// The store's last error, as log lines show it.
+// The last error of a connection to the store, as log lines show it.
 struct StoreError {
-    StoreError()
-        : code(platform::current().networkConfigStore.lastErrorCode()),
-          text(platform::current().networkConfigStore.errorText(code)) {}
+    explicit StoreError(const platform::NetworkConfigHandle& handle)
+        : code(handle.lastErrorCode()),
+          text(handle.lastErrorText()) {}
 
     const std::int32_t code;
     const std::string text;
@@ -110,7 +110,7 @@ struct StoreError {
 //  result  whether nothing stopped it
 bool storeEstablished(platform::NetworkConfigConnection& preferences, const char* function) {
     if (!preferences.commitChanges()) {
-        const StoreError error;
+        const StoreError error(preferences);
         WL_LOG_AS(function, "NCPreferencesCommitChanges failed error code %ld error %s", error.number(),
                   error.characters());
         preferences.synchronize();
@@ -119,7 +119,7 @@ bool storeEstablished(platform::NetworkConfigConnection& preferences, const char
         }
     }
     if (!preferences.applyChanges()) {
-        const StoreError error;
+        const StoreError error(preferences);
         WL_LOG_AS(function, "NCPreferencesApplyChanges failed error code %ld error %s", error.number(),
                   error.characters());
         if (error.code != 0) {
@@ -278,7 +278,7 @@ std::shared_ptr<platform::NetworkConfigConnection> NetworkingManager::systemPref
     if (set->establishDefaultConfiguration()) {
         storeEstablished(*_prefs, kPreferencesFunction);
     } else {
-        const StoreError error; // also when nothing went wrong
+        const StoreError error(*set); // also when nothing went wrong
         WL_LOG_AS(kPreferencesFunction, "NCNetworkSetEstablishDefaultConfiguration returned %ld error %s",
                   error.number(), error.characters());
     }
@@ -508,7 +508,7 @@ void NetworkingManager::_configureService(platform::NetworkService& service) {
         _setManualDHCPIP4(configuration);
     }
     if (!protocol->setConfiguration(configuration)) {
-        const StoreError error;
+        const StoreError error(*protocol);
         WL_LOG_AS(kServiceFunction,
                   "NetworkingManager: NCNetworkProtocolSetConfiguration failed error code %ld error %s",
                   error.number(), error.characters());
@@ -560,7 +560,7 @@ void NetworkingManager::_setManualDNSDns(platform::NetworkService& service, cons
     }
     configuration.insert_or_assign(platform::kNetworkServerAddresses, std::move(kept));
     if (!protocol->setConfiguration(configuration)) {
-        const StoreError error;
+        const StoreError error(*protocol);
         WL_LOG_AS(kDNSFunction, "Error %ld from NCNetworkProtocolSetConfiguration", error.number());
     }
 }
@@ -568,7 +568,7 @@ void NetworkingManager::_setManualDNSDns(platform::NetworkService& service, cons
 bool NetworkingManager::commitPrefs() {
     const auto preferences = systemPreferences();
     if (!preferences->commitChanges()) {
-        const StoreError error;
+        const StoreError error(*preferences);
         WL_LOG_AS(kCommitFunction,
                   "NetworkingManager: NCPreferencesCommitChanges failed error code %ld error %s",
                   error.number(), error.characters());
@@ -576,7 +576,7 @@ bool NetworkingManager::commitPrefs() {
         return error.code == 0; // a failure without a code counts as success, on purpose
     }
     if (!preferences->applyChanges()) {
-        const StoreError error;
+        const StoreError error(*preferences);
         WL_LOG_AS(kCommitFunction,
                   "NetworkingManager: NCPreferencesApplyChanges failed error code %ld error %s",
                   error.number(), error.characters());

@@ -86,26 +86,34 @@ class NetworkInterface {
     virtual NetworkInterface* underlyingInterface() const = 0;
 };
 
+// A connection to the store, and whatever was got through it. One thread at a time for each connection with
+// its handles.
+class NetworkConfigHandle {
+  public:
+    virtual ~NetworkConfigHandle() = default;
+
+    // The code of the last operation on the connection or on any of its handles, 0 when that succeeded, and
+    // its text for people, which also names what it was about where the store knows.
+    virtual std::int32_t lastErrorCode() const = 0;
+    virtual std::string lastErrorText() const = 0;
+};
+
 // One protocol of a service. Changes are seen through the same connection at once, by others once they are
 // committed.
-class NetworkProtocol {
+class NetworkProtocol : public NetworkConfigHandle {
   public:
-    virtual ~NetworkProtocol() = default;
-
     virtual std::optional<std::string> type() = 0;
 
     // A copy, or none when the protocol has no configuration.
     virtual std::optional<PropertyList::Dictionary> configuration() = 0;
 
-    // Replaces the configuration, whatever it holds: it is checked when it is applied.
+    // Replaces the configuration, whatever it holds: it is checked when it is committed.
     //  result  false: the last error says why
     virtual bool setConfiguration(const PropertyList::Dictionary& configuration) = 0;
 };
 
-class NetworkService {
+class NetworkService : public NetworkConfigHandle {
   public:
-    virtual ~NetworkService() = default;
-
     // The user-visible name.
     virtual std::optional<std::string> name() = 0;
 
@@ -129,11 +137,10 @@ class NetworkService {
     virtual std::optional<std::vector<std::shared_ptr<NetworkProtocol>>> copyProtocols() = 0;
 };
 
-class NetworkSet {
+class NetworkSet : public NetworkConfigHandle {
   public:
-    virtual ~NetworkSet() = default;
-
-    // The services in the set's order, none when they cannot be listed.
+    // The services in the set's order, none when they cannot be listed. One whose device is a port of a
+    // bridge or a bond by now is passed over: the bridge or bond has a service of its own.
     virtual std::optional<std::vector<std::shared_ptr<NetworkService>>> copyServices() = 0;
 
     // Adds a service with default protocols for every piece of network hardware that has none in this set.
@@ -142,16 +149,14 @@ class NetworkSet {
 };
 
 // A connection sees what was stored when it was opened or last synchronised, with its own changes. Its
-// handles keep it alive. One thread at a time.
-class NetworkConfigConnection {
+// handles keep it alive.
+class NetworkConfigConnection : public NetworkConfigHandle {
   public:
-    virtual ~NetworkConfigConnection() = default;
-
     // The set in use, or null when the machine has none yet.
     virtual std::shared_ptr<NetworkSet> copyCurrentSet() = 0;
 
     // Stores the changes made through this connection, all or nothing; takes the rights that the platform
-    // demands.
+    // demands. A configuration that could not be applied is refused, and nothing is stored then.
     //  result  false: the last error says why
     virtual bool commitChanges() = 0;
 
@@ -175,12 +180,6 @@ class NetworkConfigStore {
     // All interfaces of the machine but the loopback, in the platform's order; an entry may be null. Any
     // thread; asks the kernel.
     virtual std::vector<std::shared_ptr<NetworkInterface>> copyInterfaces() = 0;
-
-    // The code of this thread's last operation on any of the store's objects, 0 when that succeeded, and a
-    // text for a code; that of the last one's also names what it was about, where the store knows.
-    // Any thread.
-    virtual std::int32_t lastErrorCode() = 0;
-    virtual std::string errorText(std::int32_t code) = 0;
 };
 
 } // namespace welcomer::platform

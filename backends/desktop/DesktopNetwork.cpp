@@ -9,26 +9,14 @@ DesktopNetwork::DesktopNetwork(const Kernel& kernel, const std::string& folder)
       _configModule({&kernel.configStore}, folder),
       _stateModule({&kernel.stateStore, &kernel.hostReachability}, folder) {}
 
-platform::NetworkConfigStore& DesktopNetwork::ConfigStore::_chosen() {
-    platform::NetworkConfigStore* const store = _network._configModule.service();
-    return store ? *store : _network._kernel.configStore;
-}
-
 std::shared_ptr<platform::NetworkConfigConnection>
 DesktopNetwork::ConfigStore::open(const std::string& name) {
-    return _chosen().open(name);
+    platform::NetworkConfigStore* const store = _network._configModule.service();
+    return (store ? *store : _network._kernel.configStore).open(name);
 }
 
 std::vector<std::shared_ptr<platform::NetworkInterface>> DesktopNetwork::ConfigStore::copyInterfaces() {
     return _network._kernel.configStore.copyInterfaces(); // the same either way
-}
-
-std::int32_t DesktopNetwork::ConfigStore::lastErrorCode() {
-    return _chosen().lastErrorCode();
-}
-
-std::string DesktopNetwork::ConfigStore::errorText(std::int32_t code) {
-    return _chosen().errorText(code);
 }
 
 std::unique_ptr<platform::NetworkStateConnection>

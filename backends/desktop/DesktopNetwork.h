@@ -37,11 +37,8 @@ class DesktopNetwork {
         explicit ConfigStore(DesktopNetwork& network) : _network(network) {}
         std::shared_ptr<platform::NetworkConfigConnection> open(const std::string& name) override;
         std::vector<std::shared_ptr<platform::NetworkInterface>> copyInterfaces() override;
-        std::int32_t lastErrorCode() override;
-        std::string errorText(std::int32_t code) override;
 
       private:
-        platform::NetworkConfigStore& _chosen();
         DesktopNetwork& _network;
     };
 

@@ -3,6 +3,7 @@
 #include "backends/local/network/LocalHostReachability.h"
 #include "backends/local/network/LocalNetworkConfigStore.h"
 #include "backends/local/network/LocalNetworkStateStore.h"
+#include "tests/support/NetworkNamespace.h"
 #ifdef WELCOMER_DESKTOP_NETWORK
 #include "backends/desktop/DesktopNetwork.h"
 #include "tests/support/MountNamespace.h"
@@ -25,6 +26,10 @@ class KernelBackend final : public NetworkBackend {
     platform::NetworkStateStore& stateStore() override { return _stateStore; }
     platform::HostReachability& reachability() override { return _reachability; }
     void waitForDevice(const std::string&) override {}
+    void addBridge(const std::string& bridge, const std::string& port) override {
+        shell("ip link add " + bridge + " type bridge && ip link set " + bridge +
+              " up && ip addr flush dev " + port + " && ip link set " + port + " master " + bridge);
+    }
 
   private:
     local::LocalNetworkConfigStore _configStore;
@@ -50,6 +55,14 @@ class NetworkManagerBackend final : public NetworkBackend {
     platform::NetworkStateStore& stateStore() override { return _network.stateStore(); }
     platform::HostReachability& reachability() override { return _network.hostReachability(); }
     void waitForDevice(const std::string& device) override { waitForManaged(device); }
+    void addBridge(const std::string& bridge, const std::string& port) override {
+        shell("nmcli connection add type bridge con-name " + bridge + " ifname " + bridge +
+              " autoconnect no stp no ipv4.method disabled ipv6.method disabled && nmcli connection add type "
+              "ethernet con-name " +
+              bridge + "-port autoconnect no ifname " + port + " master " + bridge);
+        shell("nmcli connection up " + bridge + "-port"); // and the bridge with it
+        waitFor("ip link show master " + bridge + " | grep -q " + port);
+    }
 
   private:
     KernelBackend _kernel;

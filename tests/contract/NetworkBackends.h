@@ -24,6 +24,9 @@ class NetworkBackend {
 
     // Returns once the backend has noticed a device that has just been made.
     virtual void waitForDevice(const std::string& device) = 0;
+
+    // Makes a bridge that takes a device over, the way the backend's users do.
+    virtual void addBridge(const std::string& bridge, const std::string& port) = 0;
 };
 
 // Makes a backend on a root folder, in this process's own network namespace; may take over its mounts.

@@ -27,10 +27,23 @@ class Interface final : public platform::NetworkInterface {
     std::unique_ptr<Interface> _underlying;
 };
 
-class Protocol final : public platform::NetworkProtocol {
+// What every handle of the store has.
+template <class Base>
+class Handle : public Base {
+  public:
+    explicit Handle(FakeNetworkConfigStore& store) : _store(store) {}
+
+    std::int32_t lastErrorCode() const override { return _store.lastError; }
+    std::string lastErrorText() const override { return "text of " + std::to_string(_store.lastError); }
+
+  protected:
+    FakeNetworkConfigStore& _store;
+};
+
+class Protocol final : public Handle<platform::NetworkProtocol> {
   public:
     Protocol(FakeNetworkConfigStore& store, std::size_t service, std::size_t index)
-        : _store(store),
+        : Handle(store),
           _service(service),
           _index(index) {}
 
@@ -49,14 +62,13 @@ class Protocol final : public platform::NetworkProtocol {
   private:
     FakeProtocol& _values() { return _store.services.at(_service).protocols.at(_index); }
 
-    FakeNetworkConfigStore& _store;
     const std::size_t _service;
     const std::size_t _index;
 };
 
-class Service final : public platform::NetworkService {
+class Service final : public Handle<platform::NetworkService> {
   public:
-    Service(FakeNetworkConfigStore& store, std::size_t index) : _store(store), _index(index) {
+    Service(FakeNetworkConfigStore& store, std::size_t index) : Handle(store), _index(index) {
         const FakeInterfaceChain& chain = _values().chain;
         if (!chain.empty()) {
             _interface = std::make_unique<Interface>(chain, 0);
@@ -109,14 +121,13 @@ class Service final : public platform::NetworkService {
         return std::make_shared<Protocol>(_store, _index, index);
     }
 
-    FakeNetworkConfigStore& _store;
     const std::size_t _index;
     std::unique_ptr<Interface> _interface;
 };
 
-class Set final : public platform::NetworkSet {
+class Set final : public Handle<platform::NetworkSet> {
   public:
-    explicit Set(FakeNetworkConfigStore& store) : _store(store) {}
+    using Handle::Handle;
 
     std::optional<std::vector<std::shared_ptr<platform::NetworkService>>> copyServices() override {
         if (_store.cannotListServices) {
@@ -137,14 +148,11 @@ class Set final : public platform::NetworkSet {
         std::ranges::move(std::exchange(_store.newHardware, {}), std::back_inserter(_store.services));
         return true;
     }
-
-  private:
-    FakeNetworkConfigStore& _store;
 };
 
-class Connection final : public platform::NetworkConfigConnection {
+class Connection final : public Handle<platform::NetworkConfigConnection> {
   public:
-    explicit Connection(FakeNetworkConfigStore& store) : _store(store) {}
+    using Handle::Handle;
     ~Connection() override { _store.record("close"); }
 
     std::shared_ptr<platform::NetworkSet> copyCurrentSet() override {
@@ -169,9 +177,6 @@ class Connection final : public platform::NetworkConfigConnection {
             _store.services = _store.stored;
         }
     }
-
-  private:
-    FakeNetworkConfigStore& _store;
 };
 
 } // namespace

@@ -56,8 +56,6 @@ class FakeNetworkConfigStore final : public platform::NetworkConfigStore {
 
     std::shared_ptr<platform::NetworkConfigConnection> open(const std::string& name) override;
     std::vector<std::shared_ptr<platform::NetworkInterface>> copyInterfaces() override;
-    std::int32_t lastErrorCode() override { return lastError; }
-    std::string errorText(std::int32_t code) override { return "text of " + std::to_string(code); }
 
     // Each by its chain; an empty one is listed as null.
     std::vector<FakeInterfaceChain> interfaces;

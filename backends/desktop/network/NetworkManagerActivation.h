@@ -2,14 +2,16 @@
 
 #pragma once
 
-#include "backends/desktop/network/NetworkManagerServices.h"
+#include "backends/desktop/network/NetworkManagerClient.h"
+#include "backends/network/StoredConfiguration.h"
 
 namespace welcomer::desktop {
 
-// Has a service's device use its profile, and waits for the result: at most 90 seconds for each of two
-// attempts.
-//  result  0 or a NetworkConfigStatus
-// One thread at a time for each client.
-std::int32_t activateService(NetworkManagerClient& client, const ServiceRecord& service);
+// Has a service's device use its profile, and waits until it does: with addresses of the service's own until
+// it has them, else until it has begun to ask the network and has none of another configuration any more.
+// Whether the network answers is for others to find out. At most 90 seconds for each of two attempts. One
+// thread at a time for each client.
+network::Outcome activateService(NetworkManagerClient& client, const network::StoredService& service,
+                                 const network::IPv4Configuration& configuration);
 
 } // namespace welcomer::desktop

@@ -24,8 +24,6 @@ class NetworkManagerConfigStore final : public platform::NetworkConfigStore {
 
     std::shared_ptr<platform::NetworkConfigConnection> open(const std::string& name) override;
     std::vector<std::shared_ptr<platform::NetworkInterface>> copyInterfaces() override;
-    std::int32_t lastErrorCode() override;
-    std::string errorText(std::int32_t code) override;
 
   private:
     platform::NetworkConfigStore& _kernel;

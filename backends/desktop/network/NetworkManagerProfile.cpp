@@ -12,6 +12,8 @@ namespace welcomer::desktop {
 namespace {
 
 using Dictionary = PropertyList::Dictionary;
+using network::IPv4Configuration;
+using Method = IPv4Configuration::Method;
 using platform::kNetworkConfigSuccess;
 
 constexpr std::size_t kPieceSize = 8192; // the most that one value of the user data holds
@@ -38,11 +40,11 @@ NMSettingUser* userSettingOf(NMConnection* profile) {
     return settingOf<NMSettingUser>(profile, NM_TYPE_SETTING_USER, nm_setting_user_new);
 }
 
-const char* methodName(IPv4Plan::Method method) {
+const char* methodName(Method method) {
     switch (method) {
-    case IPv4Plan::Method::Manual:
+    case Method::Manual:
         return NM_SETTING_IP4_CONFIG_METHOD_MANUAL;
-    case IPv4Plan::Method::LinkLocal:
+    case Method::LinkLocal:
         return NM_SETTING_IP4_CONFIG_METHOD_LINK_LOCAL;
     default:
         return NM_SETTING_IP4_CONFIG_METHOD_AUTO;
@@ -81,7 +83,7 @@ std::size_t cutBefore(std::string_view text, std::size_t position) {
     return position;
 }
 
-std::int32_t keepProtocols(NMConnection* profile, const Protocols& protocols) {
+std::int32_t keepProtocols(NMConnection* profile, const network::Protocols& protocols) {
     Dictionary content;
     for (const auto& [type, configuration] : protocols) {
         content[type] = configuration ? Dictionary{{"Configuration", *configuration}} : Dictionary();
@@ -130,54 +132,64 @@ void writeIPv6For(NMConnection* profile, bool isInform) {
     }
 }
 
-void writeIPv4(NMConnection* profile, const IPv4Plan& plan) {
-    if (plan.method == IPv4Plan::Method::None) {
+void writeIPv4(NMConnection* profile, const IPv4Configuration& configuration) {
+    if (configuration.method == Method::Unset) {
         return;
     }
     NMSettingIPConfig* const setting = ipv4SettingOf(profile);
     nm_setting_ip_config_clear_addresses(setting);
-    for (const auto& [text, length] : plan.addresses) {
-        NMIPAddress* const address = nm_ip_address_new(AF_INET, text.c_str(), length, nullptr);
+    if (configuration.hasAddress()) {
+        NMIPAddress* const address =
+            nm_ip_address_new(AF_INET, network::formatIPv4(configuration.address).c_str(),
+                              static_cast<guint>(configuration.prefixLength.value_or(0)), nullptr);
         nm_setting_ip_config_add_address(setting, address);
         nm_ip_address_unref(address);
     }
-    const bool isInform = plan.method == IPv4Plan::Method::Automatic && !plan.addresses.empty();
-    g_object_set(setting, NM_SETTING_IP_CONFIG_METHOD, methodName(plan.method), NM_SETTING_IP_CONFIG_GATEWAY,
-                 plan.router.empty() ? nullptr : plan.router.c_str(), NM_SETTING_IP4_CONFIG_DHCP_CLIENT_ID,
-                 plan.clientID.empty() ? nullptr : plan.clientID.c_str(), nullptr);
+    const std::string router = configuration.router ? network::formatIPv4(*configuration.router) : "";
+    const std::string& clientID = configuration.clientID;
+    g_object_set(setting, NM_SETTING_IP_CONFIG_METHOD, methodName(configuration.method),
+                 NM_SETTING_IP_CONFIG_GATEWAY, router.empty() ? nullptr : router.c_str(),
+                 NM_SETTING_IP4_CONFIG_DHCP_CLIENT_ID, clientID.empty() ? nullptr : clientID.c_str(),
+                 nullptr);
+    const bool isInform = configuration.method == Method::Inform;
     if (isInform) {
         g_object_set(setting, NM_SETTING_IP_CONFIG_MAY_FAIL, TRUE, nullptr);
     }
     writeIPv6For(profile, isInform);
 }
 
-void writeServers(NMSettingIPConfig* setting, const std::vector<std::string>& servers) {
+// The servers of one family take the place of the network's own.
+void writeServers(NMSettingIPConfig* setting, const std::vector<std::string>& servers, bool areIPv6) {
     nm_setting_ip_config_clear_dns(setting);
     for (const std::string& server : servers) {
-        nm_setting_ip_config_add_dns(setting, server.c_str());
+        if ((server.find(':') != std::string::npos) == areIPv6) {
+            nm_setting_ip_config_add_dns(setting, server.c_str());
+        }
     }
-    // Those that are asked for take the place of the network's own.
     g_object_set(setting, NM_SETTING_IP_CONFIG_IGNORE_AUTO_DNS, TRUE, nullptr);
 }
 
 } // namespace
 
-std::int32_t writeProtocols(NMConnection* profile, const Protocols& protocols) {
-    IPv4Plan ipv4Plan;
-    DNSPlan dnsPlan;
-    if (planAll(protocols, ipv4Plan, dnsPlan) == kNetworkConfigSuccess) {
-        writeIPv4(profile, ipv4Plan);
-        if (!dnsPlan.isEmpty()) {
-            writeServers(ipv4SettingOf(profile), dnsPlan.ipv4Servers);
-            writeServers(ipv6SettingOf(profile), dnsPlan.ipv6Servers);
-        }
+std::int32_t writeProtocols(NMConnection* profile, const network::StoredService& service,
+                            const IPv4Configuration& configuration) {
+    const std::vector<std::string>& servers = configuration.servers;
+    if (std::ranges::any_of(servers, [](const auto& each) { return each.find('%') != std::string::npos; })) {
+        return platform::kNetworkConfigInvalid; // a profile's servers have no zone
+    }
+    if (service.changedTypes.contains(platform::kNetworkProtocolIPv4)) {
+        writeIPv4(profile, configuration);
+    }
+    if (!servers.empty()) {
+        writeServers(ipv4SettingOf(profile), servers, false);
+        writeServers(ipv6SettingOf(profile), servers, true);
     }
     NMSettingIPConfig* const setting = ipv4SettingOf(profile);
     if (orEmpty(nm_setting_ip_config_get_method(setting)) == NM_SETTING_IP4_CONFIG_METHOD_LINK_LOCAL) {
         nm_setting_ip_config_clear_dns(setting); // which a profile for the link alone must not have
         nm_setting_ip_config_clear_dns_searches(setting);
     }
-    return keepProtocols(profile, protocols);
+    return keepProtocols(profile, service.protocols);
 }
 
 NMConnection* newWiredProfile(const std::string& device, const std::string& name, const std::string& uuid) {

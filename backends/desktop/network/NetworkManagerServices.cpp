@@ -1,10 +1,10 @@
 #include "backends/desktop/network/NetworkManagerServices.h"
 
 #include "backends/desktop/network/NetworkManagerDevices.h"
+#include "backends/desktop/network/NetworkManagerProfile.h"
 
 #include <algorithm>
 #include <array>
-#include <iterator>
 #include <set>
 #include <string_view>
 #include <tuple>
@@ -14,11 +14,41 @@ namespace welcomer::desktop {
 
 namespace {
 
-using platform::kNetworkConfigSuccess;
+using network::ChangedService;
+using network::Outcome;
+using network::StoredService;
+using Interfaces = std::vector<std::shared_ptr<platform::NetworkInterface>>;
 
 constexpr guint32 kToDisk = 1; // the same bit for adding and for updating
 
 // Reading
+
+// An interface of a device that the machine does not have now.
+class AbsentInterface final : public platform::NetworkInterface {
+  public:
+    AbsentInterface(std::string type, std::optional<std::string> device)
+        : _type(std::move(type)),
+          _device(std::move(device)) {}
+
+    std::optional<std::string> type() const override { return _type; }
+    std::optional<std::string> deviceName() const override { return _device; }
+    std::optional<std::string> displayName() const override {
+        return _device ? _type + " (" + *_device + ")" : _type;
+    }
+    platform::NetworkInterface* underlyingInterface() const override { return nullptr; }
+
+  private:
+    const std::string _type;
+    const std::optional<std::string> _device;
+};
+
+// The interface of a device, or null.
+std::shared_ptr<platform::NetworkInterface> interfaceOf(const Interfaces& interfaces,
+                                                        const std::optional<std::string>& device) {
+    const auto found = std::ranges::find_if(
+        interfaces, [&](const auto& each) { return each && device && each->deviceName() == device; });
+    return found == interfaces.end() ? nullptr : *found;
+}
 
 // The types of interfaces by the type of profile.
 constexpr std::array<std::pair<std::string_view, const char*>, 7> kTypes = {
@@ -47,8 +77,12 @@ bool isService(NMRemoteConnection* remote) {
 struct Devices {
     explicit Devices(NMClient* client) : managed(elements<NMDevice>(nm_client_get_devices(client))) {
         for (NMDevice* const device : managed) {
+            const NMDeviceType type = nm_device_get_device_type(device);
             for (auto* const port : elements<NMDevice>(nm_device_get_ports(device))) {
                 ports.insert(port);
+                if (type == NM_DEVICE_TYPE_BRIDGE || type == NM_DEVICE_TYPE_BOND) {
+                    takenOver.insert(orEmpty(nm_device_get_iface(port)));
+                }
             }
         }
         std::erase_if(managed, [&](NMDevice* device) {
@@ -63,6 +97,7 @@ struct Devices {
 
     std::vector<NMDevice*> managed;
     std::set<NMDevice*> ports;
+    std::set<std::string> takenOver;          // the names of those that are ports of a bridge or a bond
     std::map<std::string, NMDevice*> running; // by the ID of the profile
 };
 
@@ -96,30 +131,26 @@ auto rankOf(const Devices& devices, NMRemoteConnection* remote) {
                       orEmpty(nm_setting_connection_get_uuid(setting)));
 }
 
-ServiceRecord recordOf(const Devices& devices, NMRemoteConnection* remote) {
-    NMConnection* const profile = NM_CONNECTION(remote);
-    ServiceRecord record;
-    record.uuid = orEmpty(nm_connection_get_uuid(profile));
-    record.name = orEmpty(nm_connection_get_id(profile));
-    record.path = orEmpty(nm_connection_get_path(profile));
-    record.device = deviceOf(devices, profile);
-    record.type = interfaceType(orEmpty(nm_connection_get_connection_type(profile)));
+StoredService storedService(const Devices& devices, NMConnection* profile, const Interfaces& interfaces) {
+    StoredService service;
+    service.id = orEmpty(nm_connection_get_uuid(profile));
+    service.name = orEmpty(nm_connection_get_id(profile));
+    service.device = deviceOf(devices, profile);
+    service.interface = interfaceOf(interfaces, service.device);
+    if (!service.interface) {
+        service.interface = std::make_shared<AbsentInterface>(
+            interfaceType(orEmpty(nm_connection_get_connection_type(profile))), service.device);
+    }
     const VariantPointer settings(
         g_variant_ref_sink(nm_connection_to_dbus(profile, NM_CONNECTION_SERIALIZE_NO_SECRETS)));
-    record.protocols = readProtocols(settings.get());
-    return record;
+    service.protocols = readProtocols(settings.get());
+    return service;
 }
 
 bool isWired(NMDevice* device) {
     const NMDeviceType type = nm_device_get_device_type(device);
     return type == NM_DEVICE_TYPE_ETHERNET || type == NM_DEVICE_TYPE_VETH;
 }
-
-// What a profile of a device's own asks for.
-const Protocols kNewProtocols = {
-    {platform::kNetworkProtocolIPv4,
-     PropertyList::Dictionary{{platform::kNetworkConfigMethod, platform::kNetworkMethodDHCP}}},
-    {platform::kNetworkProtocolDNS, std::nullopt}};
 
 // The ID of a device's own profile. It comes from the device's name, so that two who make a profile for a
 // device at the same time make one.
@@ -137,22 +168,29 @@ std::string uuidOf(const std::string& device) {
     return uuid.substr(0, kLength);
 }
 
-ServiceRecord newRecord(const std::string& device, const std::map<std::string, std::string>& names) {
-    const auto name = names.find(device);
-    ServiceRecord record;
-    record.uuid = uuidOf(device);
-    record.name = name == names.end() ? device : name->second;
-    record.device = device;
-    record.type = platform::kNetworkEthernet;
-    record.protocols = kNewProtocols;
-    return record;
+StoredService newService(NMClient* client, const std::string& device, const Interfaces& interfaces) {
+    StoredService service;
+    service.id = uuidOf(device);
+    if (nm_client_get_connection_by_uuid(client, service.id.c_str())) {
+        const TextPointer another(nm_utils_uuid_generate()); // it has been given another device
+        service.id = another.get();
+    }
+    service.device = device;
+    service.interface = interfaceOf(interfaces, device);
+    if (!service.interface) {
+        service.interface = std::make_shared<AbsentInterface>(platform::kNetworkEthernet, device);
+    }
+    service.name = service.interface->displayName();
+    service.protocols = network::defaultProtocols();
+    service.isStored = false;
+    return service;
 }
 
 // Storing
 
 // A profile on its way to NetworkManager.
 struct Draft {
-    ServiceRecord* record = nullptr;
+    std::string path;      // empty for a new one, until it is stored
     VariantPointer before; // what is stored now; null for a new one
     VariantPointer after;
 };
@@ -166,141 +204,135 @@ NetworkManagerReply update(const NetworkManagerBus& bus, const std::string& path
                     g_variant_new("(@a{sa{sv}}u@a{sv})", settings, kToDisk, noArguments()));
 }
 
-// The profile with an ID; empty when there is none.
-std::string profilePath(const NetworkManagerBus& bus, const std::string& uuid) {
-    const NetworkManagerReply found = bus.call(NM_DBUS_PATH_SETTINGS, NM_DBUS_INTERFACE_SETTINGS,
-                                               "GetConnectionByUuid", g_variant_new("(s)", uuid.c_str()));
-    const char* path = "";
-    if (found) {
-        g_variant_get_child(found.value.get(), 0, "&o", &path);
+// Reads the profile of a service anew, or makes one for a service that has none yet; null with what failed.
+ObjectPointer<NMConnection> takeProfile(const NetworkManagerBus& bus, const StoredService& service,
+                                        Draft& draft, Outcome& outcome) {
+    outcome = findProfile(bus, service.id, draft.path); // others may have stored it, or deleted it
+    if (!outcome) {
+        return nullptr;
     }
-    return path;
+    if (draft.path.empty() && !service.isStored) {
+        return ObjectPointer<NMConnection>(
+            newWiredProfile(service.device.value_or(""), service.name.value_or(""), service.id));
+    }
+    if (draft.path.empty()) {
+        outcome.status = platform::kNetworkConfigNotFound;
+        return nullptr;
+    }
+    const NetworkManagerReply stored =
+        bus.call(draft.path.c_str(), NM_DBUS_INTERFACE_SETTINGS_CONNECTION, "GetSettings", nullptr);
+    if (!stored) {
+        outcome.status = stored.status(platform::kNetworkConfigReadFailed);
+        return nullptr;
+    }
+    draft.before.reset(g_variant_get_child_value(stored.value.get(), 0));
+    ObjectPointer<NMConnection> profile(nm_simple_connection_new_from_dbus(draft.before.get(), nullptr));
+    outcome.status = profile ? platform::kNetworkConfigSuccess : platform::kNetworkConfigReadFailed;
+    return profile;
 }
 
-std::int32_t prepare(const NetworkManagerBus& bus, ServiceRecord& record, Draft& draft) {
-    draft.record = &record;
-    ObjectPointer<NMConnection> profile;
-    if (record.path.empty()) {
-        record.path = profilePath(bus, record.uuid); // somebody may have stored it since
-    }
-    if (record.path.empty()) {
-        profile.reset(newWiredProfile(record.device.value_or(""), record.name, record.uuid));
-    } else {
-        const NetworkManagerReply stored =
-            bus.call(record.path.c_str(), NM_DBUS_INTERFACE_SETTINGS_CONNECTION, "GetSettings", nullptr);
-        if (!stored) {
-            return stored.status(platform::kNetworkConfigReadFailed);
-        }
-        draft.before.reset(g_variant_get_child_value(stored.value.get(), 0));
-        profile.reset(nm_simple_connection_new_from_dbus(draft.before.get(), nullptr));
-    }
+Outcome prepare(const NetworkManagerBus& bus, ChangedService& changed, Draft& draft) {
+    StoredService& service = changed.service;
+    Outcome outcome;
+    const ObjectPointer<NMConnection> profile = takeProfile(bus, service, draft, outcome);
     if (!profile) {
-        return platform::kNetworkConfigReadFailed;
+        return outcome;
     }
-    Protocols protocols = draft.before ? readProtocols(draft.before.get()) : kNewProtocols;
-    for (const auto& [type, configuration] : record.changedProtocols) {
-        protocols[type] = configuration;
+    outcome = service.rebase(draft.before ? readProtocols(draft.before.get()) : network::defaultProtocols(),
+                             changed.configuration);
+    if (outcome && !service.changedTypes.empty()) {
+        outcome.status = writeProtocols(profile.get(), service, changed.configuration);
     }
-    if (!record.changedProtocols.empty()) {
-        const std::int32_t status = writeProtocols(profile.get(), protocols);
-        if (status != kNetworkConfigSuccess) {
-            return status;
-        }
+    if (!outcome) {
+        return outcome;
     }
-    if (record.enabled) {
+    if (service.isEnabled) {
         g_object_set(nm_connection_get_setting_connection(profile.get()), NM_SETTING_CONNECTION_AUTOCONNECT,
-                     *record.enabled ? TRUE : FALSE, nullptr);
+                     *service.isEnabled ? TRUE : FALSE, nullptr);
     }
     if (nm_connection_normalize(profile.get(), nullptr, nullptr, nullptr) == FALSE) {
-        return platform::kNetworkConfigInvalid;
+        return {platform::kNetworkConfigInvalid};
     }
     draft.after.reset(g_variant_ref_sink(nm_connection_to_dbus(profile.get(), NM_CONNECTION_SERIALIZE_ALL)));
-    return kNetworkConfigSuccess;
+    return {};
 }
 
-std::int32_t store(const NetworkManagerBus& bus, const Draft& draft) {
-    ServiceRecord& record = *draft.record;
-    if (draft.before) {
-        const NetworkManagerReply reply = update(bus, record.path, draft.after.get());
-        return reply ? kNetworkConfigSuccess : reply.status(platform::kNetworkConfigWriteFailed);
-    }
+Outcome store(const NetworkManagerBus& bus, Draft& draft) {
     const NetworkManagerReply reply =
-        bus.call(NM_DBUS_PATH_SETTINGS, NM_DBUS_INTERFACE_SETTINGS, "AddConnection2",
-                 g_variant_new("(@a{sa{sv}}u@a{sv})", draft.after.get(), kToDisk, noArguments()));
+        draft.before
+            ? update(bus, draft.path, draft.after.get())
+            : bus.call(NM_DBUS_PATH_SETTINGS, NM_DBUS_INTERFACE_SETTINGS, "AddConnection2",
+                       g_variant_new("(@a{sa{sv}}u@a{sv})", draft.after.get(), kToDisk, noArguments()));
     if (!reply) {
-        return reply.status(platform::kNetworkConfigWriteFailed);
+        return {reply.status(platform::kNetworkConfigWriteFailed)};
     }
-    const char* path = nullptr;
-    g_variant_get_child(reply.value.get(), 0, "&o", &path);
-    record.path = path;
-    return kNetworkConfigSuccess;
+    if (!draft.before) {
+        const char* path = nullptr;
+        g_variant_get_child(reply.value.get(), 0, "&o", &path);
+        draft.path = path;
+    }
+    return {};
 }
 
 void putBack(const NetworkManagerBus& bus, const Draft& draft) {
-    ServiceRecord& record = *draft.record;
-    if (draft.before) {
-        static_cast<void>(update(bus, record.path, draft.before.get()));
-    } else {
-        static_cast<void>(
-            bus.call(record.path.c_str(), NM_DBUS_INTERFACE_SETTINGS_CONNECTION, "Delete", nullptr));
-        record.path.clear();
-    }
+    static_cast<void>(draft.before ? update(bus, draft.path, draft.before.get())
+                                   : bus.call(draft.path.c_str(), NM_DBUS_INTERFACE_SETTINGS_CONNECTION,
+                                              "Delete", nullptr));
 }
 
 } // namespace
 
-void ServiceRecord::forgetChanges() {
-    changedProtocols.clear();
-    enabled.reset();
-    isEstablished = false;
-}
-
-std::vector<ServiceRecord> readServices(NetworkManagerClient& client,
-                                        const std::map<std::string, std::string>& names) {
+std::vector<StoredService> readServices(NetworkManagerClient& client, const Interfaces& interfaces) {
     const Devices devices(client.get());
     auto profiles = elements<NMRemoteConnection>(nm_client_get_connections(client.get()));
     std::erase_if(profiles, [](NMRemoteConnection* each) { return !isService(each); });
     std::ranges::sort(profiles, {}, [&](NMRemoteConnection* each) { return rankOf(devices, each); });
-    std::vector<ServiceRecord> services;
-    std::ranges::transform(profiles, std::back_inserter(services),
-                           [&](NMRemoteConnection* each) { return recordOf(devices, each); });
+    std::vector<StoredService> services;
+    for (NMRemoteConnection* const each : profiles) {
+        StoredService service = storedService(devices, NM_CONNECTION(each), interfaces);
+        if (!service.device || !devices.takenOver.contains(*service.device)) {
+            services.push_back(std::move(service));
+        }
+    }
     for (NMDevice* const device : devices.managed) {
         const bool isFitted = std::ranges::any_of(profiles, [&](NMRemoteConnection* each) {
             return nm_device_connection_compatible(device, NM_CONNECTION(each), nullptr) != FALSE;
         });
         if (isWired(device) && !devices.ports.contains(device) && !isFitted) {
-            ServiceRecord record = newRecord(nm_device_get_iface(device), names);
-            if (nm_client_get_connection_by_uuid(client.get(), record.uuid.c_str())) {
-                const TextPointer another(nm_utils_uuid_generate()); // it has been given another device
-                record.uuid = another.get();
-            }
-            services.push_back(std::move(record));
+            services.push_back(newService(client.get(), nm_device_get_iface(device), interfaces));
         }
     }
     return services;
 }
 
-std::int32_t storeServices(NetworkManagerClient& client, std::vector<ServiceRecord>& services) {
+Outcome findProfile(const NetworkManagerBus& bus, const std::string& uuid, std::string& path) {
+    const NetworkManagerReply found = bus.call(NM_DBUS_PATH_SETTINGS, NM_DBUS_INTERFACE_SETTINGS,
+                                               "GetConnectionByUuid", g_variant_new("(s)", uuid.c_str()));
+    path.clear();
+    if (found) {
+        const char* text = "";
+        g_variant_get_child(found.value.get(), 0, "&o", &text);
+        path = text;
+    } else if (found.errorName != NM_DBUS_INTERFACE_SETTINGS ".InvalidConnection") {
+        return {found.status(platform::kNetworkConfigReadFailed)};
+    }
+    return {};
+}
+
+Outcome storeServices(const NetworkManagerBus& bus, std::vector<ChangedService>& changed) {
     std::vector<Draft> drafts;
-    for (ServiceRecord& record : services) {
-        if (record.isChanged()) {
-            const std::int32_t status = prepare(client.bus(), record, drafts.emplace_back());
-            if (status != kNetworkConfigSuccess) {
-                return status;
-            }
+    for (ChangedService& each : changed) {
+        if (Outcome outcome = prepare(bus, each, drafts.emplace_back()); !outcome) {
+            return outcome;
         }
     }
     for (auto draft = drafts.begin(); draft != drafts.end(); ++draft) {
-        const std::int32_t status = store(client.bus(), *draft);
-        if (status != kNetworkConfigSuccess) {
-            std::for_each(drafts.begin(), draft, [&](const Draft& each) { putBack(client.bus(), each); });
-            return status;
+        if (Outcome outcome = store(bus, *draft); !outcome) {
+            std::for_each(drafts.begin(), draft, [&](const Draft& each) { putBack(bus, each); });
+            return outcome;
         }
     }
-    for (const Draft& draft : drafts) {
-        draft.record->forgetChanges();
-    }
-    return kNetworkConfigSuccess;
+    return {};
 }
 
 } // namespace welcomer::desktop

@@ -1,13 +1,9 @@
 #include "backends/desktop/network/NetworkManagerSettings.h"
 
 #include "backends/desktop/glib/Pointers.h"
-#include "platform/NetworkConfigStore.h"
 #include "propertylist/XMLPropertyListReader.h"
 
 #include <algorithm>
-#include <arpa/inet.h>
-#include <array>
-#include <bit>
 #include <string_view>
 
 namespace welcomer::desktop {
@@ -16,89 +12,11 @@ namespace {
 
 using Dictionary = PropertyList::Dictionary;
 using Array = PropertyList::Array;
-using platform::kNetworkConfigInvalid;
-using platform::kNetworkConfigSuccess;
+using network::IPv4Configuration;
+using network::readIPv4Configuration;
+using Method = IPv4Configuration::Method;
 
-constexpr unsigned kAddressBits = 32;
-
-// Texts as addresses
-
-bool isIPv4(const std::string& text) {
-    in_addr address = {};
-    return ::inet_pton(AF_INET, text.c_str(), &address) == 1 && text.find('\0') == std::string::npos;
-}
-
-bool isIPv6(const std::string& text) {
-    in6_addr address = {};
-    return ::inet_pton(AF_INET6, text.c_str(), &address) == 1 && text.find('\0') == std::string::npos;
-}
-
-// The length of the prefix that a mask stands for; none for what is no mask.
-std::optional<unsigned> prefixLength(const std::string& mask) {
-    in_addr address = {};
-    if (!isIPv4(mask) || ::inet_pton(AF_INET, mask.c_str(), &address) != 1) {
-        return std::nullopt;
-    }
-    const std::uint32_t bits = ntohl(address.s_addr);
-    const auto length = static_cast<unsigned>(std::countl_one(bits));
-    const bool isMask = length > 0 && length == static_cast<unsigned>(std::popcount(bits));
-    return isMask ? std::optional(length) : std::nullopt;
-}
-
-// Values of a configuration
-
-const PropertyList* valueIn(const Dictionary& values, const char* key) {
-    const auto found = values.find(key);
-    return found == values.end() ? nullptr : &found->second;
-}
-
-const std::string* textIn(const Dictionary& values, const char* key) {
-    const PropertyList* value = valueIn(values, key);
-    return value ? value->string() : nullptr;
-}
-
-const Array& listIn(const Dictionary& values, const char* key) {
-    static const Array kNone;
-    const PropertyList* value = valueIn(values, key);
-    return value && value->array() ? *value->array() : kNone;
-}
-
-std::string textOf(const PropertyList& value) {
-    return value.string() ? *value.string() : std::string();
-}
-
-// The addresses with their masks.
-//  masksAreOptional  whether an address without a mask stands for itself alone
-std::int32_t planAddresses(const Dictionary& configuration, bool masksAreOptional, IPv4Plan& plan) {
-    const Array& addresses = listIn(configuration, platform::kNetworkAddresses);
-    const Array& masks = listIn(configuration, platform::kNetworkSubnetMasks);
-    for (std::size_t index = 0; index < addresses.size(); ++index) {
-        const std::string address = textOf(addresses[index]);
-        const bool hasMask = index < masks.size();
-        const auto length = hasMask            ? prefixLength(textOf(masks[index]))
-                            : masksAreOptional ? std::optional(kAddressBits)
-                                               : std::nullopt;
-        if (!isIPv4(address) || address == "0.0.0.0" || !length) {
-            return kNetworkConfigInvalid;
-        }
-        plan.addresses.emplace_back(address, *length);
-    }
-    return addresses.empty() ? kNetworkConfigInvalid : kNetworkConfigSuccess;
-}
-
-std::int32_t planManual(const Dictionary& configuration, IPv4Plan& plan) {
-    plan.method = IPv4Plan::Method::Manual;
-    const PropertyList* router = valueIn(configuration, platform::kNetworkRouter);
-    if (router && (!router->string() || !router->string()->empty())) {
-        plan.router = textOf(*router);
-        if (!isIPv4(plan.router) || plan.router == "0.0.0.0") {
-            return kNetworkConfigInvalid;
-        }
-    }
-    return planAddresses(configuration, false, plan);
-}
-
-// Settings of a profile
+constexpr char kMethodLinkLocal[] = "link-local";
 
 VariantPointer valueOf(GVariant* settings, const char* setting, const char* name, const GVariantType* type) {
     const VariantPointer group(g_variant_lookup_value(settings, setting, G_VARIANT_TYPE_VARDICT));
@@ -110,37 +28,68 @@ std::string textOf(GVariant* settings, const char* setting, const char* name) {
     return value ? g_variant_get_string(value.get(), nullptr) : "";
 }
 
-IPv4Plan::Method methodOf(const std::string& method) {
-    if (method == "manual") {
-        return IPv4Plan::Method::Manual;
+// An IPv4 configuration in the one form that it has when it is read from a profile's setting.
+Dictionary settingForm(Method method, Array addresses, Array masks, const std::string& router,
+                       const std::string& clientID) {
+    Dictionary form;
+    if (method == Method::LinkLocal) {
+        form.emplace(platform::kNetworkConfigMethod, platform::kNetworkMethodLinkLocal);
+        return form;
     }
-    if (method == "auto" || method.empty()) {
-        return IPv4Plan::Method::Automatic;
+    const bool isManual = method == Method::Manual;
+    const bool hasAddresses = isManual || method == Method::Inform;
+    form.emplace(platform::kNetworkConfigMethod, isManual       ? platform::kNetworkMethodManual
+                                                 : hasAddresses ? platform::kNetworkMethodInform
+                                                                : platform::kNetworkMethodDHCP);
+    if (hasAddresses) {
+        form.emplace(platform::kNetworkAddresses, std::move(addresses));
+        form.emplace(platform::kNetworkSubnetMasks, std::move(masks));
     }
-    return method == "link-local" ? IPv4Plan::Method::LinkLocal : IPv4Plan::Method::Other;
+    if (hasAddresses && !router.empty()) {
+        form.emplace(platform::kNetworkRouter, router);
+    }
+    if (!isManual && !clientID.empty()) {
+        form.emplace(platform::kNetworkDHCPClientID, clientID);
+    }
+    return form;
 }
 
-// What of a profile's IPv4 setting a configuration could have asked for.
-IPv4Plan ipv4PlanOf(GVariant* settings) {
-    IPv4Plan plan;
-    plan.method = methodOf(textOf(settings, "ipv4", "method"));
-    plan.router = textOf(settings, "ipv4", "gateway");
-    plan.clientID = textOf(settings, "ipv4", "dhcp-client-id");
+Dictionary settingForm(const IPv4Configuration& configuration) {
+    return settingForm(configuration.method, {network::formatIPv4(configuration.address)},
+                       {maskText(static_cast<unsigned>(configuration.prefixLength.value_or(0)))},
+                       configuration.router ? network::formatIPv4(*configuration.router) : "",
+                       configuration.clientID);
+}
+
+// What a profile's IPv4 setting says; empty for a method that has no name here.
+Dictionary ipv4Of(GVariant* settings) {
+    Array addresses;
+    Array masks;
     const VariantPointer list = valueOf(settings, "ipv4", "address-data", G_VARIANT_TYPE("aa{sv}"));
     for (gsize index = 0; list && index < g_variant_n_children(list.get()); ++index) {
         const VariantPointer each(g_variant_get_child_value(list.get(), index));
         const char* address = "";
-        guint32 prefix = 0;
+        guint32 prefixLength = 0;
         g_variant_lookup(each.get(), "address", "&s", &address);
-        g_variant_lookup(each.get(), "prefix", "u", &prefix);
-        plan.addresses.emplace_back(address, prefix);
+        g_variant_lookup(each.get(), "prefix", "u", &prefixLength);
+        addresses.emplace_back(address);
+        masks.emplace_back(maskText(prefixLength));
     }
-    return plan;
+    const std::string name = textOf(settings, "ipv4", "method");
+    Method method = addresses.empty() ? Method::DHCP : Method::Inform;
+    if (name == "manual") {
+        method = Method::Manual;
+    } else if (name == kMethodLinkLocal) {
+        method = Method::LinkLocal;
+    } else if (name != "auto" && !name.empty()) {
+        return {};
+    }
+    return settingForm(method, std::move(addresses), std::move(masks), textOf(settings, "ipv4", "gateway"),
+                       textOf(settings, "ipv4", "dhcp-client-id"));
 }
 
 // The servers of one family. They may carry names for the encryption, behind a number sign.
-std::vector<std::string> serversOf(GVariant* settings, const char* setting) {
-    std::vector<std::string> servers;
+void addServers(GVariant* settings, const char* setting, Array& servers) {
     const VariantPointer list = valueOf(settings, setting, "dns-data", G_VARIANT_TYPE_STRING_ARRAY);
     for (gsize index = 0; list && index < g_variant_n_children(list.get()); ++index) {
         const char* server = "";
@@ -148,56 +97,25 @@ std::vector<std::string> serversOf(GVariant* settings, const char* setting) {
         const std::string_view text = server;
         servers.emplace_back(text.substr(0, text.find('#')));
     }
+}
+
+Array serversOf(GVariant* settings) {
+    Array servers;
+    addServers(settings, "ipv4", servers);
+    addServers(settings, "ipv6", servers);
     return servers;
 }
 
-DNSPlan dnsPlanOf(GVariant* settings) {
-    return {serversOf(settings, "ipv4"), serversOf(settings, "ipv6")};
+// Name servers in the order that they have when they are read from a profile's settings.
+Array settingForm(std::vector<std::string> servers) {
+    std::ranges::stable_partition(
+        servers, [](const std::string& each) { return each.find(':') == std::string::npos; });
+    return {servers.begin(), servers.end()};
 }
 
-// The configuration that a plan comes from.
-Dictionary configurationOf(const IPv4Plan& plan) {
-    using Method = IPv4Plan::Method;
-    Dictionary configuration;
-    Array addresses;
-    Array masks;
-    for (const auto& [address, length] : plan.addresses) {
-        addresses.emplace_back(address);
-        masks.emplace_back(maskText(length));
-    }
-    const bool isInform = plan.method == Method::Automatic && !addresses.empty();
-    if (plan.method == Method::Manual) {
-        configuration.emplace(platform::kNetworkConfigMethod, platform::kNetworkMethodManual);
-        if (!plan.router.empty()) {
-            configuration.emplace(platform::kNetworkRouter, plan.router);
-        }
-    } else if (plan.method == Method::Automatic) {
-        configuration.emplace(platform::kNetworkConfigMethod,
-                              isInform ? platform::kNetworkMethodInform : platform::kNetworkMethodDHCP);
-        if (!plan.clientID.empty()) {
-            configuration.emplace(platform::kNetworkDHCPClientID, plan.clientID);
-        }
-    } else if (plan.method == Method::LinkLocal) {
-        configuration.emplace(platform::kNetworkConfigMethod, platform::kNetworkMethodLinkLocal);
-    }
-    if (plan.method == Method::Manual || isInform) {
-        configuration.emplace(platform::kNetworkAddresses, std::move(addresses));
-        configuration.emplace(platform::kNetworkSubnetMasks, std::move(masks));
-    }
-    return configuration;
-}
-
-Array serverList(const DNSPlan& plan) {
-    Array servers(plan.ipv4Servers.begin(), plan.ipv4Servers.end());
-    servers.insert(servers.end(), plan.ipv6Servers.begin(), plan.ipv6Servers.end());
-    return servers;
-}
-
-std::optional<Dictionary> configurationOf(const DNSPlan& plan) {
-    if (plan.isEmpty()) {
-        return std::nullopt;
-    }
-    return Dictionary{{platform::kNetworkServerAddresses, serverList(plan)}};
+std::optional<Dictionary> dnsWith(const Array& servers) {
+    return servers.empty() ? std::nullopt
+                           : std::optional(Dictionary{{platform::kNetworkServerAddresses, servers}});
 }
 
 // The user data
@@ -221,12 +139,12 @@ std::string keptText(GVariant* settings) {
     return text;
 }
 
-std::optional<Protocols> keptProtocols(GVariant* settings) {
+std::optional<network::Protocols> keptProtocols(GVariant* settings) {
     const PropertyListReadResult read = readXMLPropertyList(keptText(settings));
     if (!read || !read.value->isDictionary()) {
         return std::nullopt;
     }
-    Protocols protocols;
+    network::Protocols protocols;
     for (const auto& [type, entry] : *read.value->dictionary()) {
         const PropertyList* configuration = entry.find("Configuration");
         protocols.emplace(type, configuration && configuration->isDictionary()
@@ -236,102 +154,48 @@ std::optional<Protocols> keptProtocols(GVariant* settings) {
     return protocols;
 }
 
+// Replaces what is kept of a protocol where the settings say something else by now.
+void updateIPv4(std::optional<Dictionary>& kept, const Dictionary& now) {
+    const auto reading = readIPv4Configuration(kept, std::nullopt);
+    const bool isOther =
+        reading.configuration.method != Method::Unset && settingForm(reading.configuration) != now;
+    if (!reading || isOther) {
+        kept = now;
+    }
+}
+
+void updateDNS(std::optional<Dictionary>& kept, const Array& now) {
+    const auto reading = readIPv4Configuration(std::nullopt, kept);
+    const std::vector<std::string>& servers = reading.configuration.servers;
+    if (!kept || !reading) {
+        kept = dnsWith(now);
+    } else if (!servers.empty() && settingForm(servers) != now) {
+        kept->erase(platform::kNetworkServerAddresses);
+        kept->merge(dnsWith(now).value_or(Dictionary()));
+    }
+}
+
 } // namespace
 
 std::string maskText(unsigned prefixLength) {
-    const std::uint32_t bits =
-        prefixLength == 0 ? 0 : ~std::uint32_t{0} << (kAddressBits - std::min(prefixLength, kAddressBits));
-    const in_addr address = {htonl(bits)};
-    std::array<char, INET_ADDRSTRLEN> text = {};
-    ::inet_ntop(AF_INET, &address, text.data(), text.size());
-    return text.data();
+    constexpr unsigned kAddressBits = 32;
+    return network::formatIPv4(network::maskOf(static_cast<int>(std::min(prefixLength, kAddressBits))));
 }
 
-std::int32_t planIPv4(const Dictionary& configuration, IPv4Plan& plan) {
-    const PropertyList* method = valueIn(configuration, platform::kNetworkConfigMethod);
-    IPv4Plan read;
-    std::int32_t status = kNetworkConfigSuccess;
-    const std::string name = method ? textOf(*method) : "";
-    if (!method) {
-        read.method = IPv4Plan::Method::None;
-    } else if (name == platform::kNetworkMethodManual) {
-        status = planManual(configuration, read);
-    } else if (name == platform::kNetworkMethodInform) {
-        read.method = IPv4Plan::Method::Automatic;
-        status = planAddresses(configuration, true, read);
-    } else if (name == platform::kNetworkMethodDHCP) {
-        read.method = IPv4Plan::Method::Automatic;
-        const std::string* clientID = textIn(configuration, platform::kNetworkDHCPClientID);
-        read.clientID = clientID ? *clientID : "";
-    } else if (name == platform::kNetworkMethodBootP) {
-        read.method = IPv4Plan::Method::Automatic;
-    } else if (name == platform::kNetworkMethodLinkLocal) {
-        read.method = IPv4Plan::Method::LinkLocal;
-    } else {
-        status = platform::kNetworkConfigUnknownMethod;
-    }
-    if (status == kNetworkConfigSuccess) {
-        plan = std::move(read);
-    }
-    return status;
-}
-
-std::int32_t planDNS(const Dictionary& configuration, DNSPlan& plan) {
-    DNSPlan read;
-    for (const PropertyList& each : listIn(configuration, platform::kNetworkServerAddresses)) {
-        std::string server = textOf(each);
-        server.erase(server.find_last_not_of(' ') + 1);
-        if (isIPv4(server)) {
-            read.ipv4Servers.push_back(std::move(server));
-        } else if (isIPv6(server)) {
-            read.ipv6Servers.push_back(std::move(server));
-        } else {
-            return kNetworkConfigInvalid;
-        }
-    }
-    plan = std::move(read);
-    return kNetworkConfigSuccess;
-}
-
-std::int32_t planAll(const Protocols& protocols, IPv4Plan& ipv4Plan, DNSPlan& dnsPlan) {
-    const auto ipv4 = protocols.find(platform::kNetworkProtocolIPv4);
-    const auto dns = protocols.find(platform::kNetworkProtocolDNS);
-    std::int32_t status = kNetworkConfigSuccess;
-    if (ipv4 != protocols.end() && ipv4->second) {
-        status = planIPv4(*ipv4->second, ipv4Plan);
-    }
-    if (status == kNetworkConfigSuccess && dns != protocols.end() && dns->second) {
-        status = planDNS(*dns->second, dnsPlan);
-    }
-    return status;
-}
-
-Protocols readProtocols(GVariant* settings) {
-    const IPv4Plan ipv4Now = ipv4PlanOf(settings);
-    const DNSPlan dnsNow = dnsPlanOf(settings);
-    std::optional<Protocols> kept = keptProtocols(settings);
+network::Protocols readProtocols(GVariant* settings) {
+    const Dictionary ipv4Now = ipv4Of(settings);
+    const Array serversNow = serversOf(settings);
+    std::optional<network::Protocols> kept = keptProtocols(settings);
     if (!kept) {
-        return {{platform::kNetworkProtocolIPv4, configurationOf(ipv4Now)},
-                {platform::kNetworkProtocolDNS, configurationOf(dnsNow)}};
+        return {{platform::kNetworkProtocolIPv4, ipv4Now},
+                {platform::kNetworkProtocolDNS, dnsWith(serversNow)}};
     }
-    IPv4Plan ipv4Plan;
-    DNSPlan dnsPlan;
-    if (planAll(*kept, ipv4Plan, dnsPlan) != kNetworkConfigSuccess) {
-        return *std::move(kept); // it never reached the profile's settings
+    if (const auto ipv4 = kept->find(platform::kNetworkProtocolIPv4); ipv4 != kept->end()) {
+        updateIPv4(ipv4->second, ipv4Now);
     }
-    if (ipv4Plan.method != IPv4Plan::Method::None && ipv4Plan != ipv4Now) {
-        (*kept)[platform::kNetworkProtocolIPv4] = configurationOf(ipv4Now);
-    }
-    const bool hasServers = ipv4Now.method != IPv4Plan::Method::LinkLocal; // or has had to lose them
-    if (const auto dns = kept->find(platform::kNetworkProtocolDNS); dns != kept->end() && hasServers) {
-        if (!dns->second) {
-            dns->second = configurationOf(dnsNow);
-        } else if (!dnsPlan.isEmpty() && dnsPlan != dnsNow) {
-            dns->second->erase(platform::kNetworkServerAddresses);
-            if (!dnsNow.isEmpty()) {
-                dns->second->emplace(platform::kNetworkServerAddresses, serverList(dnsNow));
-            }
-        }
+    const bool mayHaveServers = textOf(settings, "ipv4", "method") != kMethodLinkLocal; // it had to lose them
+    if (const auto dns = kept->find(platform::kNetworkProtocolDNS); dns != kept->end() && mayHaveServers) {
+        updateDNS(dns->second, serversNow);
     }
     return *std::move(kept);
 }

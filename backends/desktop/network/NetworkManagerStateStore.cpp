@@ -217,7 +217,7 @@ class Connection final : public platform::NetworkStateConnection {
             return std::nullopt;
         }
         const VariantPointer settings(g_variant_get_child_value(stored.value.get(), 0));
-        const Protocols protocols = readProtocols(settings.get());
+        const network::Protocols protocols = readProtocols(settings.get());
         const auto protocol =
             protocols.find(key.entity == NetworkEntity::IPv4 ? platform::kNetworkProtocolIPv4
                                                              : platform::kNetworkProtocolDNS);

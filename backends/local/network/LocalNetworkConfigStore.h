@@ -26,8 +26,6 @@ class LocalNetworkConfigStore final : public platform::NetworkConfigStore {
 
     std::shared_ptr<platform::NetworkConfigConnection> open(const std::string& name) override;
     std::vector<std::shared_ptr<platform::NetworkInterface>> copyInterfaces() override;
-    std::int32_t lastErrorCode() override;
-    std::string errorText(std::int32_t code) override;
 
   private:
     const posix::RootFolder _root;

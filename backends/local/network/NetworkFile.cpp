@@ -47,40 +47,13 @@ const PropertyList* serviceIn(const Dictionary& content, const std::string& serv
     return services ? services->find(serviceID) : nullptr;
 }
 
-Dictionary* changedService(Dictionary& content, const std::string& serviceID) {
-    return serviceIn(content, serviceID) ? &dictionaryIn(dictionaryIn(content, kServices), serviceID)
-                                         : nullptr;
-}
-
 std::string currentSet(const Dictionary& content) {
     const PropertyList* name = valueIn(content, kCurrentSet);
     return name && name->string() ? *name->string() : kAutomaticSet;
 }
 
-// Adds a service of a device that has none to the set in use.
-void addService(Dictionary& content, const networkfile::NewService& service) {
-    std::string serviceID = service.device;
-    for (int number = 2; serviceIn(content, serviceID); ++number) {
-        serviceID = service.device + "-" + std::to_string(number);
-    }
-    dictionaryIn(content, kServices)[serviceID] = Dictionary{
-        {kName, service.name},
-        {kDevice, service.device},
-        {kEnabled, true},
-        {kProtocols, Dictionary{{platform::kNetworkProtocolDNS, Dictionary()},
-                                {platform::kNetworkProtocolIPv4,
-                                 Dictionary{{kConfiguration, Dictionary{{platform::kNetworkConfigMethod,
-                                                                         platform::kNetworkMethodDHCP}}}}}}},
-    };
-    const std::string setID = currentSet(content);
-    content[kCurrentSet] = setID;
-    Dictionary& set = dictionaryIn(dictionaryIn(content, kSets), setID);
-    set.try_emplace(kName, setID);
-    PropertyList& list = set[kServices];
-    if (!list.isArray()) {
-        list = PropertyList::Array();
-    }
-    list.array()->emplace_back(serviceID);
+Dictionary& serviceToChange(Dictionary& content, const std::string& serviceID) {
+    return dictionaryIn(dictionaryIn(content, kServices), serviceID);
 }
 
 } // namespace
@@ -124,17 +97,6 @@ std::optional<std::string> serviceOfDevice(const Dictionary& content, const std:
     return std::nullopt;
 }
 
-std::vector<std::string> protocolTypes(const Dictionary& content, const std::string& serviceID) {
-    std::vector<std::string> types;
-    const PropertyList* protocols = serviceValue(content, serviceID, kProtocols);
-    if (protocols && protocols->dictionary()) {
-        for (const auto& [type, protocol] : *protocols->dictionary()) {
-            types.push_back(type);
-        }
-    }
-    return types;
-}
-
 std::optional<Dictionary> configuration(const Dictionary& content, const std::string& serviceID,
                                         const std::string& type) {
     const PropertyList* protocols = serviceValue(content, serviceID, kProtocols);
@@ -154,31 +116,56 @@ std::set<std::string> devices(const Dictionary& content) {
     return found;
 }
 
-void addServices(Dictionary& content, const std::vector<NewService>& added) {
-    std::set<std::string> known = devices(content);
-    for (const NewService& service : added) {
-        if (known.insert(service.device).second) { // otherwise somebody else was first
-            addService(content, service);
+network::Protocols protocols(const Dictionary& content, const std::string& serviceID) {
+    network::Protocols found;
+    const PropertyList* all = serviceValue(content, serviceID, kProtocols);
+    if (all && all->dictionary()) {
+        for (const auto& [type, protocol] : *all->dictionary()) {
+            found.emplace(type, configuration(content, serviceID, type));
         }
     }
+    return found;
+}
+
+bool hasService(const Dictionary& content, const std::string& serviceID) {
+    return serviceIn(content, serviceID) != nullptr;
+}
+
+std::string newServiceID(const Dictionary& content, const std::string& device) {
+    std::string serviceID = device;
+    for (int number = 2; hasService(content, serviceID); ++number) {
+        serviceID = device + "-" + std::to_string(number);
+    }
+    return serviceID;
+}
+
+std::string addService(Dictionary& content, const std::string& device, const std::string& name) {
+    const std::string serviceID = newServiceID(content, device);
+    serviceToChange(content, serviceID) = {{kName, name}, {kDevice, device}, {kEnabled, true}};
+    setProtocols(content, serviceID, network::defaultProtocols());
+    const std::string setID = currentSet(content);
+    content[kCurrentSet] = setID;
+    Dictionary& set = dictionaryIn(dictionaryIn(content, kSets), setID);
+    set.try_emplace(kName, setID);
+    PropertyList& list = set[kServices];
+    if (!list.isArray()) {
+        list = PropertyList::Array();
+    }
+    list.array()->emplace_back(serviceID);
+    return serviceID;
 }
 
 void setEnabled(Dictionary& content, const std::string& serviceID, bool enabled) {
-    if (Dictionary* service = changedService(content, serviceID)) {
-        (*service)[kEnabled] = enabled;
-    }
+    serviceToChange(content, serviceID)[kEnabled] = enabled;
 }
 
-void addProtocol(Dictionary& content, const std::string& serviceID, const std::string& type) {
-    if (Dictionary* service = changedService(content, serviceID)) {
-        dictionaryIn(dictionaryIn(*service, kProtocols), type);
-    }
-}
-
-void setConfiguration(Dictionary& content, const std::string& serviceID, const std::string& type,
-                      const Dictionary& configuration) {
-    if (Dictionary* service = changedService(content, serviceID)) {
-        dictionaryIn(dictionaryIn(*service, kProtocols), type)[kConfiguration] = configuration;
+void setProtocols(Dictionary& content, const std::string& serviceID, const network::Protocols& protocols) {
+    Dictionary& all = dictionaryIn(serviceToChange(content, serviceID), kProtocols);
+    for (const auto& [type, configuration] : protocols) {
+        Dictionary& protocol = dictionaryIn(all, type);
+        if (configuration) {
+            protocol[kConfiguration] = *configuration;
+        }
     }
 }
 
@@ -188,37 +175,34 @@ Dictionary NetworkFile::read() const {
     return readDictionaryFile(_root, platform::joinPath(kFolder, kFileName)).values;
 }
 
-std::int32_t NetworkFile::change(const std::vector<std::function<void(Dictionary&)>>& changes,
-                                 Dictionary& content, platform::Error& error) const {
+network::Outcome NetworkFile::change(const std::function<network::Outcome(Dictionary&)>& edit) const {
     posix::makeDirectories(_root, kFolder, kFolderMode);
     LockedDictionaryFolder folder(_root, kFolder, posix::machineLockPath(posix::kMachineFilesLock),
                                   kFolderMode, kFileMode);
+    const auto failed = [&folder] {
+        const bool isHeld = folder.error().number == ETIMEDOUT;
+        return network::Outcome{isHeld ? platform::kNetworkConfigInUse : platform::kNetworkConfigWriteFailed,
+                                folder.error().message};
+    };
     if (!folder) {
-        error = folder.error();
-        return error.number == ETIMEDOUT ? platform::kNetworkConfigInUse
-                                         : platform::kNetworkConfigWriteFailed;
+        return failed();
     }
     const std::string path = platform::joinPath(kFolder, kFileName);
     DictionaryFileContent onDisk = readDictionaryFile(_root, path);
     if (onDisk.state == DictionaryFileContent::State::Unreadable) {
-        error = {0, "cannot read " + _root.shown(path) + ": " + onDisk.reason};
-        return platform::kNetworkConfigReadFailed;
-    }
-    if (onDisk.state == DictionaryFileContent::State::Damaged &&
-        folder.setAside(kFileName, onDisk.bytes).empty()) {
-        error = folder.error();
-        return platform::kNetworkConfigWriteFailed;
+        return {platform::kNetworkConfigReadFailed,
+                "cannot read " + _root.shown(path) + ": " + onDisk.reason};
     }
     Dictionary changed = onDisk.values;
-    for (const auto& change : changes) {
-        change(changed);
+    if (network::Outcome outcome = edit(changed); !outcome) {
+        return outcome;
     }
-    if (changed != onDisk.values && !folder.write(kFileName, changed)) {
-        error = folder.error();
-        return platform::kNetworkConfigWriteFailed;
+    const bool isDamaged = onDisk.state == DictionaryFileContent::State::Damaged;
+    const bool isSafe = !isDamaged || !folder.setAside(kFileName, onDisk.bytes).empty();
+    if (!isSafe || (changed != onDisk.values && !folder.write(kFileName, changed))) {
+        return failed();
     }
-    content = std::move(changed);
-    return platform::kNetworkConfigSuccess;
+    return {};
 }
 
 } // namespace welcomer::local

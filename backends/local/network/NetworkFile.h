@@ -2,15 +2,15 @@
 
 #pragma once
 
+#include "backends/network/StoredConfiguration.h"
 #include "backends/posix/RootFolder.h"
-#include "platform/Error.h"
 #include "propertylist/PropertyList.h"
 
-#include <cstdint>
 #include <functional>
 #include <optional>
 #include <set>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace welcomer::local {
@@ -28,12 +28,6 @@ namespace welcomer::local {
 // What is missing or of a wrong type counts as empty. These functions work on the content alone. Any thread.
 namespace networkfile {
 
-// A service that is to be added.
-struct NewService {
-    std::string device;
-    std::string name;
-};
-
 // The services of the set in use, in order; none when the file names a set that it does not have.
 std::optional<std::vector<std::string>> services(const PropertyList::Dictionary& content);
 
@@ -50,20 +44,26 @@ std::optional<std::string> serviceOfDevice(const PropertyList::Dictionary& conte
 // The devices that have a service in the set in use.
 std::set<std::string> devices(const PropertyList::Dictionary& content);
 
-// The types of a service's protocols.
-std::vector<std::string> protocolTypes(const PropertyList::Dictionary& content, const std::string& serviceID);
-
 // A protocol's configuration, or none.
 std::optional<PropertyList::Dictionary> configuration(const PropertyList::Dictionary& content,
                                                       const std::string& serviceID, const std::string& type);
 
-// Changes. Those of a service that is not there change nothing.
-// A device that has a service keeps it.
-void addServices(PropertyList::Dictionary& content, const std::vector<NewService>& added);
+// All of a service's protocols.
+network::Protocols protocols(const PropertyList::Dictionary& content, const std::string& serviceID);
+
+bool hasService(const PropertyList::Dictionary& content, const std::string& serviceID);
+
+// The ID that a service of a device would be given.
+std::string newServiceID(const PropertyList::Dictionary& content, const std::string& device);
+
+// Adds a service of a device that has none to the set in use, enabled, with default protocols.
+//  result  its ID
+std::string addService(PropertyList::Dictionary& content, const std::string& device, const std::string& name);
+
+// Changes of a service that is there.
 void setEnabled(PropertyList::Dictionary& content, const std::string& serviceID, bool enabled);
-void addProtocol(PropertyList::Dictionary& content, const std::string& serviceID, const std::string& type);
-void setConfiguration(PropertyList::Dictionary& content, const std::string& serviceID,
-                      const std::string& type, const PropertyList::Dictionary& configuration);
+void setProtocols(PropertyList::Dictionary& content, const std::string& serviceID,
+                  const network::Protocols& protocols);
 
 } // namespace networkfile
 
@@ -77,12 +77,10 @@ class NetworkFile {
     // Everything in the file; empty when there is nothing that can be read.
     PropertyList::Dictionary read() const;
 
-    // Makes changes to what is on disk.
-    //  content  receives what the file holds now, on success
-    //  error    receives what failed, with the path and the reason, otherwise
-    //  result   0 or a NetworkConfigStatus
-    std::int32_t change(const std::vector<std::function<void(PropertyList::Dictionary&)>>& changes,
-                        PropertyList::Dictionary& content, platform::Error& error) const;
+    // Changes what is on disk.
+    //  edit    makes the change; what it refuses is not written
+    //  result  where nothing was refused, also what could not be done, with the path and the reason
+    network::Outcome change(const std::function<network::Outcome(PropertyList::Dictionary&)>& edit) const;
 
   private:
     const posix::RootFolder _root;

@@ -108,10 +108,22 @@ class NetworkManagerTest : public testing::Test {
         if (!dns.empty()) {
             EXPECT_TRUE(service->copyProtocol("DNS")->setConfiguration(dns));
         }
-        EXPECT_TRUE(connection->commitChanges()) << store.errorText(store.lastErrorCode());
+        EXPECT_TRUE(connection->commitChanges()) << connection->lastErrorText();
         const bool isApplied = connection->applyChanges();
-        EXPECT_EQ(isApplied, store.lastErrorCode() == 0);
-        return store.lastErrorCode();
+        EXPECT_EQ(isApplied, connection->lastErrorCode() == 0);
+        errorText = connection->lastErrorText();
+        return connection->lastErrorCode();
+    }
+    // The same, where committing must be refused.
+    std::int32_t refusal(const std::string& device, const Dictionary& ipv4, const Dictionary& dns = {}) {
+        const auto connection = store.open("a test");
+        const auto service = serviceOf(*connection, device);
+        EXPECT_TRUE(service->copyProtocol("IPv4")->setConfiguration(ipv4));
+        if (!dns.empty()) {
+            EXPECT_TRUE(service->copyProtocol("DNS")->setConfiguration(dns));
+        }
+        EXPECT_FALSE(connection->commitChanges());
+        return connection->lastErrorCode();
     }
     static Dictionary manual(const std::string& address, const std::string& router = "") {
         return {{"ConfigMethod", "Manual"},
@@ -135,6 +147,7 @@ class NetworkManagerTest : public testing::Test {
     platform::HostReachability& reachability = network.hostReachability();
     std::optional<NeighbourNetwork> neighbour;
     std::optional<NetworkManagerDaemon> daemon;
+    std::string errorText; // of the last configuration
 };
 
 // Profiles
@@ -148,7 +161,7 @@ TEST_F(NetworkManagerTest, EstablishingMakesProfilesForNewDevicesWhichAreUsedAtO
     EXPECT_TRUE(set->establishDefaultConfiguration());
     EXPECT_TRUE(connection->commitChanges());
     EXPECT_FALSE(set->establishDefaultConfiguration());
-    EXPECT_EQ(store.lastErrorCode(), 0);
+    EXPECT_EQ(connection->lastErrorCode(), 0);
     EXPECT_FALSE(store.open("a test")->copyCurrentSet()->establishDefaultConfiguration());
     const auto service = serviceOf(*connection, "eth7");
     EXPECT_EQ(service->name(), "Ethernet (eth7)");
@@ -167,7 +180,7 @@ TEST_F(NetworkManagerTest, ADeviceThatAProfileFitsOrThatIsNotManagedGetsNoneOfIt
     shell("nmcli connection add type ethernet con-name Any ifname '*' autoconnect no");
     const auto connection = store.open("a test");
     EXPECT_FALSE(connection->copyCurrentSet()->establishDefaultConfiguration());
-    EXPECT_EQ(store.lastErrorCode(), 0);
+    EXPECT_EQ(connection->lastErrorCode(), 0);
     EXPECT_EQ(connection->copyCurrentSet()->copyServices()->size(), 1U);
 }
 
@@ -247,7 +260,7 @@ TEST_F(NetworkManagerTest, WhatIsTooMuchForAProfileIsAWriteErrorAndNoneOfTheServ
         ->copyProtocol("IPv4")
         ->setConfiguration({{"Much", std::string(3'000'000, 'x')}});
     EXPECT_FALSE(connection->commitChanges());
-    EXPECT_EQ(store.lastErrorCode(), platform::kNetworkConfigWriteFailed);
+    EXPECT_EQ(connection->lastErrorCode(), platform::kNetworkConfigWriteFailed);
     EXPECT_EQ(profiles(), "");
 }
 
@@ -264,7 +277,7 @@ TEST_F(NetworkManagerTest, WhereOneProfileCannotBeWrittenThoseBeforeItArePutBack
     // A folder in a file's place cannot be replaced.
     shell("cd /run/profiles && rm eth8.nmconnection && mkdir -p eth8.nmconnection/full");
     EXPECT_FALSE(connection->commitChanges());
-    EXPECT_EQ(store.lastErrorCode(), platform::kNetworkConfigWriteFailed);
+    EXPECT_EQ(connection->lastErrorCode(), platform::kNetworkConfigWriteFailed);
     EXPECT_EQ(profile("eth7", "ipv4.addresses"), "192.0.2.9/24");
     shell("rm -r /run/profiles/eth8.nmconnection");
     EXPECT_TRUE(connection->commitChanges()); // what was refused can be tried again
@@ -314,22 +327,51 @@ TEST_F(NetworkManagerTest, ServersReachTheProfileByFamilyAndTakeThePlaceOfTheNet
               (Dictionary{{"ServerAddresses", Array{"192.0.2.53  ", "2001:db8::53", "192.0.2.54"}}}));
 }
 
-TEST_F(NetworkManagerTest, WhatMakesNoSenseIsKeptButNeitherReachesTheProfileNorTheDevice) {
+TEST_F(NetworkManagerTest, WhatMakesNoSenseIsRefusedAndNeitherReachesTheProfileNorTheDevice) {
     addCable("eth7");
     EXPECT_EQ(configure("eth7", manual("192.0.2.7")), 0);
     const std::string id = idOf("eth7");
-    Dictionary router = manual("192.0.2.9");
-    router["Router"] = "no router";
-    for (const Dictionary& bad :
-         std::vector<Dictionary>{manual("no address"), router, {{"ConfigMethod", "Manual"}}}) {
-        EXPECT_EQ(configure("eth7", bad), platform::kNetworkConfigInvalid);
-        EXPECT_EQ(ipv4("eth7"), bad);
+    for (const Dictionary& bad : std::vector<Dictionary>{
+             manual("no address"), manual("192.0.2.9", "no router"), {{"ConfigMethod", "Manual"}}}) {
+        EXPECT_EQ(refusal("eth7", bad), platform::kNetworkConfigInvalid);
+        EXPECT_EQ(ipv4("eth7"), manual("192.0.2.7"));
         EXPECT_EQ(profile(id, "ipv4.method,ipv4.addresses"), "manual\n192.0.2.7/24");
     }
-    EXPECT_EQ(configure("eth7", {{"ConfigMethod", "Telepathy"}}), platform::kNetworkConfigUnknownMethod);
-    EXPECT_EQ(configure("eth7", manual("192.0.2.9"), {{"ServerAddresses", Array{"fe80::1%eth7"}}}),
+    EXPECT_EQ(refusal("eth7", {{"ConfigMethod", "Telepathy"}}), platform::kNetworkConfigUnknownMethod);
+    EXPECT_EQ(refusal("eth7", manual("192.0.2.9"), {{"ServerAddresses", Array{"fe80::1%eth7"}}}),
               platform::kNetworkConfigInvalid);
+    EXPECT_EQ(ipv4("eth7"), manual("192.0.2.7"));
     EXPECT_EQ(addresses("eth7"), "192.0.2.7/24");
+}
+
+TEST_F(NetworkManagerTest, WhatIsKeptAndMakesNoSenseIsReadAsTheProfileHasIt) {
+    addCable("eth7");
+    shell("nmcli connection add type ethernet con-name One ifname eth7 autoconnect no ipv4.method manual "
+          "ipv4.addresses 192.0.2.9/24 ipv4.dns 192.0.2.53");
+    shell("printf '%s\\n' '[user]' 'com.corvid.welcomer.protocols.000=<plist><dict>"
+          "<key>IPv4</key><dict><key>Configuration</key><dict><key>ConfigMethod</key><string>Manual</string>"
+          "</dict></dict><key>DNS</key><dict><key>Configuration</key><dict><key>ServerAddresses</key><array>"
+          "<string>nonsense</string></array></dict></dict></dict></plist>' >> /run/profiles/One.nmconnection "
+          "&& nmcli "
+          "connection reload");
+    EXPECT_EQ(ipv4("eth7"), (Dictionary{{"ConfigMethod", "Manual"},
+                                        {"Addresses", Array{"192.0.2.9"}},
+                                        {"SubnetMasks", Array{"255.255.255.0"}}}));
+    EXPECT_EQ(serviceOf(*store.open("a test"), "eth7")->copyProtocol("DNS")->configuration(),
+              (Dictionary{{"ServerAddresses", Array{"192.0.2.53"}}}));
+}
+
+TEST_F(NetworkManagerTest, AddressesThatOthersGaveStayWhereOnlyTheServersChange) {
+    addCable("eth7");
+    shell("nmcli connection add type ethernet con-name One ifname eth7 autoconnect no ipv4.method manual "
+          "ipv4.addresses 192.0.2.8/24,192.0.2.9/25");
+    const auto connection = store.open("a test");
+    serviceOf(*connection, "eth7")
+        ->copyProtocol("DNS")
+        ->setConfiguration({{"ServerAddresses", Array{"192.0.2.53"}}});
+    EXPECT_TRUE(connection->commitChanges());
+    EXPECT_EQ(profile("One", "ipv4.addresses,ipv4.dns"), "192.0.2.8/24, 192.0.2.9/25\n192.0.2.53");
+    EXPECT_EQ(ipv4("eth7").at("Addresses"), PropertyList(Array{"192.0.2.8", "192.0.2.9"}));
 }
 
 TEST_F(NetworkManagerTest, AProfileThatIsGoneIsAnError) {
@@ -339,7 +381,7 @@ TEST_F(NetworkManagerTest, AProfileThatIsGoneIsAnError) {
     serviceOf(*connection, "eth7")->copyProtocol("IPv4")->setConfiguration(manual("192.0.2.8"));
     shell("nmcli connection delete " + idOf("eth7"));
     EXPECT_FALSE(connection->commitChanges());
-    EXPECT_EQ(store.lastErrorCode(), platform::kNetworkConfigNotFound);
+    EXPECT_EQ(connection->lastErrorCode(), platform::kNetworkConfigNotFound);
 }
 
 // Applying
@@ -372,21 +414,39 @@ TEST_F(NetworkManagerTest, ADeviceThatRunsAnotherProfileOrNoneActivatesIt) {
     EXPECT_EQ(profile("One", "GENERAL.STATE"), "activated");
 }
 
-TEST_F(NetworkManagerTest, DHCPIsWaitedFor) {
+TEST_F(NetworkManagerTest, DHCPTakesTheAddressThatTheNetworkGivesAndTheOldOneIsGoneAtOnce) {
     addCable("eth7");
     serveAddresses("eth7");
+    const std::string hasLease = "ip -4 addr show dev eth7 | grep -q 192.0.2.5";
     EXPECT_EQ(configure("eth7", {{"ConfigMethod", "DHCP"}}), 0);
-    EXPECT_EQ(addresses("eth7").substr(0, 9), "192.0.2.5");
+    waitFor(hasLease);
     EXPECT_EQ(configure("eth7", manual("192.0.2.7")), 0);
     EXPECT_EQ(addresses("eth7"), "192.0.2.7/24");
     EXPECT_EQ(configure("eth7", {{"ConfigMethod", "DHCP"}}), 0);
-    EXPECT_EQ(addresses("eth7").substr(0, 9), "192.0.2.5");
+    EXPECT_EQ(addresses("eth7").find("192.0.2.7"), std::string::npos);
+    waitFor(hasLease);
+}
+
+TEST_F(NetworkManagerTest, DHCPWithoutAnAnswerIsNoFailureAndTheOldAddressIsGone) {
+    addCable("eth7");
+    for (const char* method : {"DHCP", "BOOTP"}) {
+        EXPECT_EQ(configure("eth7", manual("192.0.2.7", "192.0.2.1")), 0);
+        EXPECT_EQ(addresses("eth7"), "192.0.2.7/24");
+        EXPECT_EQ(configure("eth7", {{"ConfigMethod", method}}), 0) << method; // a profile that it runs
+        EXPECT_EQ(addresses("eth7"), "") << method;
+        EXPECT_EQ(shell("ip -4 route show default"), "") << method;
+        EXPECT_EQ(configure("eth7", {{"ConfigMethod", method}}), 0) << method; // and is still asking with
+        shell("nmcli device disconnect eth7 && ip addr add 192.0.2.7/24 dev eth7 && ip link set eth7 up");
+        EXPECT_EQ(configure("eth7", {{"ConfigMethod", method}}), 0) << method; // from another one
+        EXPECT_EQ(addresses("eth7"), "") << method;
+        EXPECT_EQ(ipv4("eth7").at("ConfigMethod"), PropertyList(method));
+    }
 }
 
 TEST_F(NetworkManagerTest, DHCPWithoutACableIsRefusedAndTheProfileStays) {
     addCable("eth7", false);
     EXPECT_EQ(configure("eth7", {{"ConfigMethod", "DHCP"}}), platform::kNetworkConfigNotActivated);
-    EXPECT_EQ(store.errorText(store.lastErrorCode()), "the network did not come up with this configuration");
+    EXPECT_EQ(errorText, "the network did not come up with this configuration");
     EXPECT_EQ(profile(idOf("eth7"), "ipv4.method"), "auto");
 }
 
@@ -400,7 +460,7 @@ TEST_F(NetworkManagerTest, ManualDHCPKeepsItsAddressThoughNoServerAnswers) {
     EXPECT_EQ(configure("eth7", inform), 0);
     EXPECT_EQ(addresses("eth7"), "192.0.2.8/24");
     EXPECT_EQ(profile(id, "ipv4.method,ipv4.addresses,ipv4.gateway,ipv4.may-fail,ipv6.method,ipv6.may-fail"),
-              "auto\n192.0.2.8/24\n\nyes\nlink-local\nyes");
+              "auto\n192.0.2.8/24\n192.0.2.1\nyes\nlink-local\nyes");
     EXPECT_EQ(ipv4("eth7"), inform);
     shell("nmcli connection down " + id);
     EXPECT_EQ(configure("eth7", inform), 0); // the same from an inactive device
@@ -414,7 +474,7 @@ TEST_F(NetworkManagerTest, ManualDHCPTakesBothAddressesWhereAServerAnswers) {
     serveAddresses("eth7");
     EXPECT_EQ(configure("eth7", {{"ConfigMethod", "INFORM"}, {"Addresses", Array{"192.0.2.7"}}}), 0);
     waitFor("ip -4 addr show dev eth7 | grep -q 192.0.2.5");
-    EXPECT_NE(addresses("eth7").find("192.0.2.7/32"), std::string::npos);
+    EXPECT_NE(addresses("eth7").find("192.0.2.7/24"), std::string::npos);
 }
 
 TEST_F(NetworkManagerTest, TheLinkLocalMethodHasTheMachinePickAnAddress) {
@@ -438,28 +498,27 @@ TEST_F(NetworkManagerTest, TheEndOfNetworkManagerOrTheBusIsAnErrorAndNoMore) {
     EXPECT_FALSE(connection->applyChanges());
     service->copyProtocol("IPv4")->setConfiguration(manual("192.0.2.9"));
     EXPECT_FALSE(connection->commitChanges());
-    EXPECT_NE(store.lastErrorCode(), 0);
+    EXPECT_NE(connection->lastErrorCode(), 0);
     daemon->stopBus();
     EXPECT_FALSE(connection->commitChanges());
-    EXPECT_NE(store.lastErrorCode(), 0);
+    EXPECT_NE(connection->lastErrorCode(), 0);
     connection->synchronize();
     EXPECT_NE(store.open("a test")->copyCurrentSet(), nullptr); // the kernel's
 }
 
 TEST_F(NetworkManagerTest, TheEndOfNetworkManagerEndsTheWait) {
-    addCable("eth7"); // where no DHCP server answers
-    shell("nmcli connection add type ethernet con-name One ifname eth7 autoconnect no ipv4.dhcp-timeout "
-          "infinity "
-          "ipv4.method auto ipv4.may-fail no ipv6.method disabled");
+    addCable("eth7"); // where no IPv6 router answers
+    shell("nmcli connection add type ethernet con-name One ifname eth7 autoconnect no ipv4.method auto "
+          "ipv6.method auto ipv6.may-fail no ipv6.ra-timeout infinity");
     const auto connection = store.open("a test");
-    serviceOf(*connection, "eth7")->copyProtocol("IPv4")->setConfiguration({{"ConfigMethod", "DHCP"}});
+    serviceOf(*connection, "eth7")->copyProtocol("IPv4")->setConfiguration(manual("192.0.2.7"));
     EXPECT_TRUE(connection->commitChanges());
     std::thread ending([&] {
         waitFor("nmcli -g GENERAL.STATE connection show One | grep -q activating");
         daemon->stop();
     });
     EXPECT_FALSE(connection->applyChanges());
-    EXPECT_EQ(store.lastErrorCode(), platform::kNetworkConfigNotActivated);
+    EXPECT_EQ(connection->lastErrorCode(), platform::kNetworkConfigNotActivated);
     ending.join();
 }
 
@@ -486,8 +545,8 @@ TEST_F(NetworkManagerTest, AnOrdinaryUserReadsEverythingAndIsRefusedToChangeAnyt
         }
         const auto connection = store.open("a test");
         serviceOf(*connection, "eth7")->copyProtocol("IPv4")->setConfiguration(manual("192.0.2.8"));
-        const bool isRefused =
-            !connection->commitChanges() && store.lastErrorCode() == platform::kNetworkConfigAccessDenied;
+        const bool isRefused = !connection->commitChanges() &&
+                               connection->lastErrorCode() == platform::kNetworkConfigAccessDenied;
         return isRefused ? 0 : 3;
     });
     EXPECT_EQ(status, 0);
@@ -553,7 +612,7 @@ TEST_F(NetworkManagerTest, WithoutNetworkManagerTheKernelServes) {
         const bool isEstablished = connection->copyCurrentSet()->establishDefaultConfiguration();
         EXPECT_EQ(serviceOf(*connection, "eth7")->serviceID(), "eth7");
         EXPECT_FALSE(serviceOf(*connection, "eth7")->addProtocolType("IPv4"));
-        EXPECT_EQ(store.lastErrorCode(), platform::kNetworkConfigAlreadyThere);
+        EXPECT_EQ(connection->lastErrorCode(), platform::kNetworkConfigAlreadyThere);
         EXPECT_EQ(globalIPv4(), (Dictionary{{"PrimaryService", "eth7"}, {"Router", "192.0.2.1"}}));
         EXPECT_EQ(reachability.createTarget("192.0.2.1")->flags(), platform::kHostReachable);
         return isEstablished;
@@ -626,7 +685,7 @@ TEST_F(NetworkManagerTest, TheToolAppliesAndShowsWhatTheUserChose) {
     EXPECT_EQ(addresses("eth7"), "192.0.2.8/24"); // the mask of before
     serveAddresses("eth7");
     shell(tool + "apply --choice lan --method DHCP --warning-type 3");
-    EXPECT_EQ(addresses("eth7").substr(0, 9), "192.0.2.5");
+    waitFor("ip -4 addr show dev eth7 | grep -q 192.0.2.5");
     EXPECT_NE(shell(tool + "show").find("Method:          DHCP\n"), std::string::npos);
 }
 
