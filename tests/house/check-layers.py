@@ -38,8 +38,8 @@ TESTS = {"tests"}
 # The only files, besides tests and the backends themselves, that may choose a backend, and what is offered to them.
 PROGRAMS = re.compile(r"^(agent/main\.cpp|tools/[^/]+/main\.cpp)$")
 OFFERED = re.compile(r"^backends/(Backends|UnexpectedEnd|simulated/.+)\.h$")
-# The one base on the kernel, which tools may use too.
-BASE = re.compile(r"^backends/posix/[^/]+\.h$")
+# What of the backends tools may use, too: the one base on the kernel, and addresses as text.
+BASE = re.compile(r"^backends/(posix/[^/]+|network/IPv4Text)\.h$")
 
 SOURCES = {".h", ".hpp", ".c", ".cpp"}
 INCLUDE = re.compile(r'^\s*#\s*include\s*([<"])([^>"]+)[>"]')

@@ -61,6 +61,13 @@ class CheckLayers(unittest.TestCase):
         self.assert_one({**base, "agent/C.cpp": '#include "backends/posix/A.h"\n'}, "chooses a backend")
         self.assert_one({**base, "tools/one/C.cpp": '#include "backends/local/B.h"\n'}, "chooses a backend")
 
+    def test_tools_read_addresses_as_the_backends_do_and_nobody_else_reaches_there(self):
+        text = {"backends/network/IPv4Text.h": "", "backends/network/StoredConfiguration.h": ""}
+        self.assertEqual(self.findings({**text, "tools/one/C.cpp": '#include "backends/network/IPv4Text.h"\n'}), [])
+        self.assert_one({**text, "agent/C.cpp": '#include "backends/network/IPv4Text.h"\n'}, "chooses a backend")
+        self.assert_one({**text, "tools/one/C.cpp": '#include "backends/network/StoredConfiguration.h"\n'},
+                        "chooses a backend")
+
     def test_only_a_program_chooses_simulated_time(self):
         time = {"backends/simulated/VirtualTime.h": ""}
         use = '#include "backends/simulated/VirtualTime.h"\n'

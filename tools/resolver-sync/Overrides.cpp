@@ -1,9 +1,9 @@
 #include "tools/resolver-sync/Overrides.h"
 
+#include "backends/network/IPv4Text.h"
 #include "platform/Platform.h"
 
 #include <algorithm>
-#include <arpa/inet.h>
 #include <charconv>
 #include <optional>
 
@@ -21,10 +21,9 @@ std::string_view takeWord(std::string_view& text) {
     return word;
 }
 
-bool isAddress(const std::string& text) {
-    unsigned char buffer[sizeof(in6_addr)];
-    return ::inet_pton(AF_INET, text.c_str(), buffer) == 1 ||
-           ::inet_pton(AF_INET6, text.c_str(), buffer) == 1;
+// An address that no zone follows, which the resolvers have no place for.
+bool isNameserver(const std::string& text) {
+    return network::isAddress(text) && text.find('%') == std::string::npos;
 }
 
 std::optional<std::uint16_t> portNumber(std::string_view text) {
@@ -88,7 +87,7 @@ OverrideFile readOverride(std::string_view name, std::string_view text) {
     }
     file.domain = *normal;
     for (const std::string& address : addresses) {
-        if (!isAddress(address)) {
+        if (!isNameserver(address)) {
             return refused("\"" + address + "\" is no address");
         }
         file.nameservers.push_back({address, port});

@@ -275,6 +275,15 @@ class Cable(SpaceTest):
         self.assertEqual(self.addresses("eth7"), [])
         self.assertEqual(self.addresses("br0"), [("192.0.2.7", 24)])
 
+    def test_a_stored_service_whose_device_became_a_port_makes_way_for_the_bridge(self):
+        self.here.connect("eth7", self.there, "eth0")
+        self.succeeds(self.call("apply", *MANUAL, "--warning-type", "3"))
+        self.here.shell("ip addr flush dev eth7; ip link add br0 type bridge; ip link set eth7 master br0; "
+                        "ip link set br0 up")
+        self.succeeds(self.call("apply", *MANUAL, "--warning-type", "3"))
+        self.assertEqual(self.addresses("eth7"), [])
+        self.assertEqual(self.addresses("br0"), [("192.0.2.7", 24)])
+
 
 class Applying(SpaceTest):
     def setUp(self):
@@ -313,25 +322,38 @@ class Applying(SpaceTest):
         self.assertEqual(self.addresses("eth7"), [("192.0.2.7", 24)])
         self.assertEqual(self.default_routes(), [])
 
-    def test_manual_dhcp_needs_a_mask_in_the_configuration(self):
-        inform = ["apply", "--choice", "lan", "--method", "Manual DHCP", "--ip", "192.0.2.8", "--warning-type", "3"]
-        self.fails(self.call(*inform), 1, NOT_CONFIGURED)
-        self.assertEqual(self.addresses("eth7"), [])
-        self.succeeds(self.call("apply", *MANUAL, "--warning-type", "3"))
-        self.succeeds(self.call(*inform))
-        self.assertEqual(self.addresses("eth7"), [("192.0.2.8", 24)])
+    INFORM = ["apply", "--choice", "lan", "--method", "Manual DHCP", "--ip", "192.0.2.8", "--warning-type", "3"]
+
+    def test_manual_dhcp_takes_the_mask_and_the_router_that_are_there(self):
+        self.succeeds(self.call("apply", *MANUAL[:-3], "255.255.255.128", "--router", "192.0.2.1", "--warning-type", "3"))
+        self.succeeds(self.call(*self.INFORM))
+        self.assertEqual(self.addresses("eth7"), [("192.0.2.8", 25)])
         self.assertEqual(self.default_routes(), [("192.0.2.1", "eth7")])
 
-    def test_what_makes_no_sense_is_stored_and_refused(self):
-        for option, value in (("--ip", "no address"), ("--ip", ""), ("--subnet", "255.0.255.0"), ("--router", "192.0.2"),
+    def test_manual_dhcp_without_a_mask_has_the_network_of_its_class(self):
+        self.succeeds(self.call(*self.INFORM))
+        self.assertEqual(self.addresses("eth7"), [("192.0.2.8", 24)])
+        self.assertEqual(self.default_routes(), [])
+
+    def test_what_makes_no_sense_is_refused_and_not_stored(self):
+        for option, value in (("--ip", "no address"), ("--ip", ""), ("--ip", "192.0.2.255"), ("--ip", "127.0.0.7"),
+                              ("--ip", "224.0.0.7"), ("--subnet", "255.0.255.0"), ("--router", "192.0.2"),
                               ("--router", "10.9.9.9"), ("--dns", "no server")):
             with self.subTest(option=option, value=value):
                 arguments = [*MANUAL, "--dns", "192.0.2.1"]
                 arguments[arguments.index(option) + 1] = value
-                self.fails(self.call("apply", *arguments, "--warning-type", "3"), 1, NOT_CONFIGURED)
+                before = self.stored.read_bytes() if self.stored.exists() else None
+                result = self.call("--verbose", "apply", *arguments, "--warning-type", "3")
+                self.assertEqual((result.returncode, result.stdout), (1, ""), result)
+                self.assertRegex(result.stderr, "NCPreferencesCommitChanges failed error code 7 error .*makes no sense")
+                self.assertIn(NOT_CONFIGURED, result.stderr)
                 self.assertEqual(self.addresses("eth7"), [])
-                self.assertIn(f"<string>{value}</string>" if value else "<string></string>",
-                              self.stored.read_text(encoding="utf-8"))
+                after = self.stored.read_bytes()
+                self.assertEqual(after, before or after)
+                protocols = plistlib.loads(after)["Services"]["eth7"]["Protocols"]
+                self.assertEqual(protocols, {"IPv4": {"Configuration": {"ConfigMethod": "DHCP"}}, "DNS": {}})
+        self.succeeds(self.call("apply", *MANUAL, "--warning-type", "3"))
+        self.assertEqual(self.addresses("eth7"), [("192.0.2.7", 24)])
 
     def state(self):
         """What an application may change."""

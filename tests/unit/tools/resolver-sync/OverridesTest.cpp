@@ -39,6 +39,8 @@ TEST(ResolverOverride, ThatNamesNoNameserverIsRefused) {
 TEST(ResolverOverride, WhatIsNoAddressIsRefused) {
     EXPECT_EQ(readOverride("a.example", "nameserver one\n").error, "\"one\" is no address");
     EXPECT_EQ(readOverride("a.example", "nameserver\n").error, "\"\" is no address");
+    EXPECT_EQ(readOverride("a.example", "nameserver fe80::1%eth0\n").error, "\"fe80::1%eth0\" is no address");
+    EXPECT_EQ(readOverride("a.example", "nameserver fe80::1\n").error, "");
     EXPECT_EQ(readOverride("a.example", "nameserver 192.0.2.1\nnameserver 1.2.3\n").error,
               "\"1.2.3\" is no address");
 }
