@@ -1,6 +1,7 @@
 #include "backends/UnexpectedEnd.h"
 
 #include "backends/posix/AlternateStack.h"
+#include "propertylist/Characters.h"
 
 #include <array>
 #include <atomic>
@@ -84,8 +85,7 @@ class Line {
     }
 
     void _appendEscaped(unsigned char byte) {
-        constexpr std::string_view hexadecimal = "0123456789abcdef";
-        const std::array<char, 4> escape{'\\', 'x', hexadecimal[byte >> 4], hexadecimal[byte & 15]};
+        const std::array<char, 4> escape{'\\', 'x', kHexDigits[byte >> 4], kHexDigits[byte & 15]};
         _append({escape.data(), escape.size()});
     }
 

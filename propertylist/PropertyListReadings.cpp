@@ -1,6 +1,7 @@
 #include "propertylist/PropertyListReadings.h"
 
-#include <algorithm>
+#include "propertylist/Characters.h"
+
 #include <charconv>
 #include <cmath>
 #include <limits>
@@ -39,12 +40,6 @@ std::optional<std::int64_t> truncated(std::optional<double> real) {
     return *real <= static_cast<double>(kLowest) ? kLowest : static_cast<std::int64_t>(*real);
 }
 
-bool equalsInAnyCase(std::string_view text, std::string_view lower) {
-    return std::ranges::equal(text, lower, [](char left, char right) {
-        return (left >= 'A' && left <= 'Z' ? left - 'A' + 'a' : left) == right;
-    });
-}
-
 } // namespace
 
 bool booleanReading(const std::optional<PropertyList>& value) {
@@ -53,7 +48,7 @@ bool booleanReading(const std::optional<PropertyList>& value) {
     }
     std::optional<double> real = value->real();
     if (const std::string* text = value->string()) {
-        if (equalsInAnyCase(*text, "yes") || equalsInAnyCase(*text, "true")) {
+        if (equalsIgnoringCase(*text, "yes") || equalsIgnoringCase(*text, "true")) {
             return true;
         }
         real = realIn(*text);

@@ -1,6 +1,7 @@
 #include "propertylist/RealText.h"
 
-#include <algorithm>
+#include "propertylist/Characters.h"
+
 #include <array>
 #include <bit>
 #include <charconv>
@@ -13,11 +14,6 @@ namespace welcomer {
 namespace {
 
 constexpr std::string_view kNotANumberWithBits = "nan(0x";
-
-bool equalsIgnoringCase(std::string_view text, std::string_view lowerCase) {
-    return std::equal(text.begin(), text.end(), lowerCase.begin(), lowerCase.end(),
-                      [](char c, char lower) { return (c >= 'A' && c <= 'Z' ? c - 'A' + 'a' : c) == lower; });
-}
 
 std::optional<double> parseNotANumberWithBits(std::string_view text) {
     text.remove_prefix(kNotANumberWithBits.size());

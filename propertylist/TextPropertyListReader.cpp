@@ -1,5 +1,6 @@
 #include "propertylist/TextPropertyListReader.h"
 
+#include "propertylist/Characters.h"
 #include "propertylist/PropertyListReadError.h"
 #include "propertylist/UTF8.h"
 
@@ -14,9 +15,7 @@ constexpr bool isWhiteSpace(char character) {
 }
 
 constexpr bool isWordCharacter(char character) {
-    return (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
-           (character >= '0' && character <= '9') ||
-           std::string_view("_$/:.-").find(character) != std::string_view::npos;
+    return isLetterOrDigit(character) || std::string_view("_$/:.-").find(character) != std::string_view::npos;
 }
 
 // The value of a hexadecimal digit, or 16 when the character is none.
@@ -24,7 +23,7 @@ constexpr unsigned hexadecimalDigit(char character) {
     if (character >= '0' && character <= '9') {
         return static_cast<unsigned>(character - '0');
     }
-    const char lower = static_cast<char>(character | 0x20);
+    const char lower = toLower(character);
     return lower >= 'a' && lower <= 'f' ? static_cast<unsigned>(lower - 'a' + 10) : 16;
 }
 

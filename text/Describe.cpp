@@ -1,6 +1,7 @@
 #include "text/Describe.h"
 
 #include "propertylist/CalendarDate.h"
+#include "propertylist/Characters.h"
 #include "text/OneLine.h"
 
 #include <array>
@@ -21,13 +22,10 @@ std::string toDecimal(Number value) {
 }
 
 std::string describeData(const PropertyList::Data& data) {
-    static constexpr std::string_view digits = "0123456789abcdef";
     std::string text = "<";
     text.reserve(data.bytes.size() * 2 + 2);
     for (const char c : data.bytes) {
-        const auto byte = static_cast<unsigned char>(c);
-        text += digits[byte >> 4];
-        text += digits[byte & 15];
+        appendHex(text, static_cast<unsigned char>(c));
     }
     return text += '>';
 }

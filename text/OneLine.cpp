@@ -1,5 +1,7 @@
 #include "text/OneLine.h"
 
+#include "propertylist/Characters.h"
+
 namespace welcomer::text {
 
 namespace {
@@ -25,7 +27,6 @@ std::size_t lengthOfFirst(std::string_view text) {
 }
 
 void appendEscaped(std::string& line, unsigned char control) {
-    constexpr char digits[] = "0123456789abcdef";
     switch (control) {
     case '\n':
         line += "\\n";
@@ -34,7 +35,8 @@ void appendEscaped(std::string& line, unsigned char control) {
         line += "\\t";
         break;
     default:
-        line += {'\\', 'x', digits[control >> 4], digits[control & 15]};
+        line += "\\x";
+        appendHex(line, control);
     }
 }
 

@@ -1,5 +1,7 @@
 #include "tools/launch-agents/UserManagerStarter.h"
 
+#include "propertylist/Characters.h"
+
 #include <chrono>
 #include <system_error>
 #include <systemd/sd-bus.h>
@@ -36,9 +38,8 @@ class CallError {
 };
 
 bool isPlainInUnitName(char character) {
-    return (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
-           (character >= '0' && character <= '9') || character == '.' || character == '_' ||
-           character == '-' || character == ':';
+    return isLetterOrDigit(character) || character == '.' || character == '_' || character == '-' ||
+           character == ':';
 }
 
 // One property whose value is a text.
@@ -89,14 +90,13 @@ int appendUnit(sd_bus_message* message, const LaunchAgent& agent) {
 } // namespace
 
 std::string unitName(std::string_view label) {
-    static constexpr char kDigits[] = "0123456789abcdef";
     std::string name = "welcomer-agent-";
     for (const char character : label) {
         if (isPlainInUnitName(character)) {
             name += character;
         } else {
-            const auto byte = static_cast<unsigned char>(character);
-            name += {'\\', 'x', kDigits[byte >> 4], kDigits[byte & 15]};
+            name += "\\x";
+            appendHex(name, static_cast<unsigned char>(character));
         }
     }
     return name + ".service";
