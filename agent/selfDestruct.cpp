@@ -4,7 +4,6 @@
 #include "log/PCLogManager.h"
 #include "platform/Path.h"
 #include "platform/Platform.h"
-#include "text/Format.h"
 
 #include <vector>
 
@@ -31,8 +30,7 @@ std::string userLibraryDirectory() {
 platform::Outcome removeLaunchAgentFile(const std::string& label) {
     try {
         const std::string folder = platform::joinPath(userLibraryDirectory(), kLaunchAgentsFolder);
-        return platform::current().fileSystem.remove(
-            platform::joinPath(folder, text::format("%@.plist", label)));
+        return platform::current().fileSystem.remove(platform::joinPath(folder, launchAgentFileName(label)));
     } catch (const platform::Exception& exception) { // the user has no home
         return platform::Outcome::failure({0, exception.what()});
     }

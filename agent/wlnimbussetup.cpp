@@ -1,6 +1,7 @@
 #include "agent/wlnimbussetup.h"
 
 #include "agent/selfDestruct.h"
+#include "agent/wlnimbussetup_RemainingDelegateSetup.h"
 #include "agent/wlnimbussetup_RemainingSkylarkSetup.h"
 #include "handoff/LaunchAgentFile.h"
 #include "handoff/ReplayItem.h"
@@ -49,7 +50,7 @@ void linger() {
     runLoop->run(120s);
 }
 
-void finishSetup(const std::string& label, const DelegatePluginSource& plugins) {
+void finishSetup(const std::string& label) {
     attempt([&] { selfDestruct(label); });
     const std::shared_ptr<platform::WorkGroup> group = platform::current().dispatchQueues.createGroup();
     PropertyList replayObject;
@@ -60,7 +61,7 @@ void finishSetup(const std::string& label, const DelegatePluginSource& plugins) 
     // Before any use of its contents, so that a crash never replays it twice.
     attempt([] { WLDeleteNimbusReplayKeychainItem(); });
     attempt([&] { wlnimbussetup_RemainingSkylarkSetup(accountName, group); });
-    attempt([&] { wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, group, plugins); });
+    attempt([&] { wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, group); });
     replayObject = PropertyList(); // may be large, and each plug-in's job holds what it needs of it
     attempt([&] { waitFor(*group); });
     attempt(linger);
@@ -68,9 +69,9 @@ void finishSetup(const std::string& label, const DelegatePluginSource& plugins) 
 
 } // namespace
 
-int wlnimbussetup(int argc, const char* const* argv, const DelegatePluginSource& plugins) {
+int wlnimbussetup(int argc, const char* const* argv) {
     try {
-        attempt([&] { finishSetup(argc >= 2 ? argv[1] : kLaunchAgentLabel, plugins); });
+        attempt([&] { finishSetup(argc >= 2 ? argv[1] : kLaunchAgentLabel); });
         WL_LOG("exiting");
     } catch (...) {
         // What cannot even be logged does not change how the agent ends.

@@ -2,19 +2,15 @@
 
 #pragma once
 
-#include "agent/wlnimbussetup_RemainingDelegateSetup.h"
-
 namespace welcomer {
 
 // Runs the agent on the installed platform, as the logged-in user: removes its launch-agent file, reads and
 // deletes the replay item, carries out the setup stages, waits for their work and lingers for two minutes.
 // Without a readable replay item it ends at once. Nothing throws out of it.
 //  argc, argv  as main has them; the first argument is the launch agent's label, further ones are ignored
-//  plugins     where the second stage's plug-ins come from
 //  result      the exit status, always 0
 // Main thread. Plug-in threads may still be running when this returns: the process is to be left at once
 // (agent/leaveProcess.h).
-int wlnimbussetup(int argc, const char* const* argv,
-                  const DelegatePluginSource& plugins = WLNimbusDelegatePlugins);
+int wlnimbussetup(int argc, const char* const* argv);
 
 } // namespace welcomer

@@ -6,6 +6,8 @@
 #include "platform/Platform.h"
 #include "plugins/DelegateIdentifiers.h"
 #include "plugins/PluginText.h"
+#include "plugins/WLNimbusDelegatePlugins.h"
+#include "propertylist/Lookup.h"
 #include "text/Format.h"
 
 #include <exception>
@@ -25,31 +27,15 @@ struct DelegateWork {
     PropertyList response;
 };
 
-// None when there is no such array. What is no string in it is left out.
-Aliases aliasesFromReplayObject(const PropertyList& replayObject, const char* key) {
-    const PropertyList* entry = replayObject.find(key);
-    const PropertyList::Array* array = entry ? entry->array() : nullptr;
-    if (!array) {
-        return std::nullopt;
-    }
-    std::vector<std::string> aliases;
-    for (const PropertyList& element : *array) {
-        if (const std::string* alias = element.string()) {
-            aliases.push_back(*alias);
-        }
-    }
-    return aliases;
-}
-
 long count(const Aliases& aliases) {
     return aliases ? static_cast<long>(aliases->size()) : 0;
 }
 
 const PropertyList* findResponse(const PropertyList& replayObject,
                                  const std::optional<std::string>& identifier) {
-    const PropertyList* responses = replayObject.find(kReplayResponsesKey);
-    const PropertyList* delegates = responses ? responses->find(kReplayDelegatesKey) : nullptr;
-    return delegates && identifier ? delegates->find(*identifier) : nullptr;
+    const PropertyList* delegates =
+        valueIn(valueIn(replayObject, kReplayResponsesKey), platform::kDelegatesKey);
+    return identifier ? valueIn(delegates, *identifier) : nullptr;
 }
 
 void queueMessaging(const std::shared_ptr<DelegateCompletion>& completion, DelegateWork delegate,
@@ -69,15 +55,14 @@ void queueOther(const std::shared_ptr<DelegateCompletion>& completion, DelegateW
 
 void wlnimbussetup_RemainingDelegateSetup(const PropertyList& replayObject,
                                           [[maybe_unused]] const std::optional<std::string>& text,
-                                          const std::shared_ptr<platform::WorkGroup>& group,
-                                          const DelegatePluginSource& plugins) {
-    const Aliases vidlinkAliases = aliasesFromReplayObject(replayObject, kReplayVidlinkAliasesKey);
-    const Aliases chatterAliases = aliasesFromReplayObject(replayObject, kReplayChatterAliasesKey);
+                                          const std::shared_ptr<platform::WorkGroup>& group) {
+    const Aliases vidlinkAliases = textsIn(replayObject, kReplayVidlinkAliasesKey);
+    const Aliases chatterAliases = textsIn(replayObject, kReplayChatterAliasesKey);
     WL_LOG("Vidlink: %ld aliases", count(vidlinkAliases));
     WL_LOG("Chatter: %ld aliases", count(chatterAliases));
 
     std::map<std::string, DelegateWork> work;
-    for (const auto& plugin : plugins()) {
+    for (const auto& plugin : WLNimbusDelegatePlugins()) {
         std::optional<std::string> identifier;
         try {
             identifier = plugin->delegateIdentifier();

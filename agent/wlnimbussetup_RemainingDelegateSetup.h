@@ -3,7 +3,6 @@
 #pragma once
 
 #include "platform/DispatchQueue.h"
-#include "plugins/DelegatePluginSource.h"
 #include "propertylist/PropertyList.h"
 
 #include <memory>
@@ -20,11 +19,9 @@ namespace welcomer {
 //  text          never read
 //  group         entered once for each plug-in before this returns, and left once when the plug-in calls its
 //                handler or its call raises, whichever comes first
-//  plugins       where the plug-ins come from
 // Main thread; returns after queueing.
 void wlnimbussetup_RemainingDelegateSetup(const PropertyList& replayObject,
                                           const std::optional<std::string>& text,
-                                          const std::shared_ptr<platform::WorkGroup>& group,
-                                          const DelegatePluginSource& plugins = WLNimbusDelegatePlugins);
+                                          const std::shared_ptr<platform::WorkGroup>& group);
 
 } // namespace welcomer

@@ -6,6 +6,7 @@
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
 #include "plugins/WLNimbusDelegatesRequest.h"
+#include "propertylist/Lookup.h"
 #include "propertylist/PropertyListReadings.h"
 
 #include <chrono>
@@ -18,11 +19,9 @@ using namespace std::chrono_literals;
 
 constexpr std::chrono::nanoseconds kRunLoopSlice = 100ms;
 
-constexpr const char* kValidateOperation = "validate";
-constexpr const char* kSignInOperation = "sign-in";
-constexpr const char* kCompleteSignInOperation = "complete-sign-in";
-
-constexpr const char* kStatusKey = "status";
+constexpr char kValidateOperation[] = "validate";
+constexpr char kSignInOperation[] = "sign-in";
+constexpr char kCompleteSignInOperation[] = "complete-sign-in";
 
 // The notifications that end an operation.
 struct EndingNotifications {
@@ -42,23 +41,15 @@ std::optional<EndingNotifications> endingNotifications(const std::string& operat
     return std::nullopt;
 }
 
-std::optional<PropertyList> entry(const PropertyList::Dictionary& dictionary, const char* key) {
-    const auto found = dictionary.find(key);
-    return found == dictionary.end() ? std::nullopt : std::optional(found->second);
-}
-
 // The request with more entries among its delegates.
 PropertyList::Dictionary addToDelegates(PropertyList::Dictionary request,
                                         const PropertyList::Dictionary& additions) {
-    const auto found = request.find(kRequestDelegatesKey);
-    PropertyList::Dictionary delegates;
-    if (found != request.end() && found->second.isDictionary()) {
-        delegates = *found->second.dictionary();
-    }
+    PropertyList::Dictionary delegates =
+        copyOf(dictionaryIn(request, platform::kDelegatesKey)).value_or(PropertyList::Dictionary());
     for (const auto& [key, value] : additions) {
         delegates.insert_or_assign(key, value);
     }
-    request.insert_or_assign(kRequestDelegatesKey, std::move(delegates));
+    request.insert_or_assign(platform::kDelegatesKey, std::move(delegates));
     return request;
 }
 
@@ -170,7 +161,7 @@ void NimbusTesselDelegate::_validateNotOK(const platform::Notification& notifica
 void NimbusTesselDelegate::_processAuthenticateResponse() {
     if (_succeeded) {
         // A status that is there and is no number is none that says success.
-        const std::optional<PropertyList> status = entry(_userInfo, kStatusKey);
+        const PropertyList* const status = valueIn(_userInfo, platform::kStatusKey);
         if (!status || integerIn(*status) == 0) {
             _delegatesResponseDict = _userInfo;
         } else {
@@ -179,20 +170,20 @@ void NimbusTesselDelegate::_processAuthenticateResponse() {
         return;
     }
     _delegatesResponseDict = _userInfo;
-    const std::optional<PropertyList> accountError = entry(_userInfo, platform::kSKPropertyAccountError);
+    const PropertyList* const accountError = valueIn(_userInfo, platform::kSKPropertyAccountError);
     if (!accountError) {
         WL_LOG("Nimbus: No accountError for validate failure");
         return;
     }
     const std::optional<std::int64_t> code = integerIn(*accountError);
     if (!code) {
-        WL_LOG("Nimbus: accountError '%@' for validate failure is no number", accountError);
+        WL_LOG("Nimbus: accountError '%@' for validate failure is no number", *accountError);
         return;
     }
     switch (*code) {
     case platform::kSKAccountErrorTermsOfService:
     case platform::kSKAccountErrorRepair:
-        if (entry(_userInfo, platform::kSKPropertyAccountErrorInfo)) {
+        if (_userInfo.contains(platform::kSKPropertyAccountErrorInfo)) {
             WL_LOG("Nimbus: Account needs TOS/Repair");
             _needsRepair = true;
         } else {

@@ -2,6 +2,8 @@
 
 #include "platform/AccountService.h"
 
+#include <iterator>
+
 namespace welcomer {
 
 std::vector<std::string> WLNimbusSyncServiceIDs() {
@@ -11,10 +13,7 @@ std::vector<std::string> WLNimbusSyncServiceIDs() {
 }
 
 std::vector<std::string> WLNimbusAllSetupServiceIDs() {
-    std::vector<std::string> identifiers = WLNimbusSyncServiceIDs();
-    identifiers.insert(identifiers.end(), {platform::kSKServiceIDLOC, platform::kSKServiceIDMail,
-                                           platform::kSKServiceIDNotes, platform::kSKServiceMobileDocuments});
-    return identifiers;
+    return {std::begin(platform::kSKServiceIDs), std::end(platform::kSKServiceIDs)};
 }
 
 std::vector<std::string> WLNimbusPostLoginServiceIDs() {

@@ -2,10 +2,11 @@
 
 #include "cloud/WLNimbusServiceCatalogue.h"
 #include "log/PCLogManager.h"
+#include "platform/Duration.h"
 #include "platform/Platform.h"
+#include "propertylist/Lookup.h"
+#include "text/Contains.h"
 
-#include <algorithm>
-#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <optional>
@@ -17,13 +18,10 @@ namespace {
 
 using CloudService = std::shared_ptr<platform::CloudService>;
 
-constexpr const char* kDebugPostLoginDelayDefault = "WLDebugPostLoginDelay";
+constexpr char kDebugPostLoginDelayDefault[] = "WLDebugPostLoginDelay";
 constexpr double kPostLoginDelaySeconds = 3.0;
-constexpr double kNanosecondsPerSecond = 1e9;
 
-bool contains(const std::vector<std::string>& identifiers, const std::string& identifier) {
-    return std::find(identifiers.begin(), identifiers.end(), identifier) != identifiers.end();
-}
+using text::contains;
 
 void enable(platform::CloudService& service, const std::shared_ptr<platform::Window>& window) {
     if (window) {
@@ -39,15 +37,31 @@ double postLoginDelaySeconds() {
     return seconds > 0 ? static_cast<double>(seconds) : kPostLoginDelaySeconds;
 }
 
-// Truncated to whole nanoseconds; what is beyond their range is the end of it.
-std::chrono::nanoseconds nanoseconds(double seconds) {
-    using Count = std::chrono::nanoseconds::rep;
-    const double count = seconds * kNanosecondsPerSecond;
-    if (count >= static_cast<double>(std::chrono::nanoseconds::max().count())) {
-        return std::chrono::nanoseconds::max();
-    }
-    return std::chrono::nanoseconds(static_cast<Count>(count));
-}
+// A service that is spoken of by a name of its own.
+struct NamedService {
+    const char* identifier;
+    const char* optedOut;
+    const char* missing;
+    const char* disabled;
+    const char* enabling = nullptr; // none for mail, whose line has its address
+};
+
+constexpr NamedService kLocator{platform::kSKServiceIDLOC, "User opted out of Nimbus Locator",
+                                "No Nimbus Locator service available to enable",
+                                "Nimbus Locator cannot be enabled on this machine for this user.",
+                                "Enabling Nimbus Locator"};
+constexpr NamedService kMail{platform::kSKServiceIDMail, "User opted out of Nimbus Mail",
+                             "No Nimbus Mail service available to enable",
+                             "Nimbus Mail cannot be enabled on this machine for this user."};
+constexpr NamedService kNotes{platform::kSKServiceIDNotes, "User opted out of Nimbus Notes",
+                              "No Nimbus Notes service available to enable",
+                              "Nimbus Notes cannot be enabled on this machine for this user.",
+                              "Enabling Nimbus Notes"};
+constexpr NamedService kDocuments{platform::kSKServiceMobileDocuments,
+                                  "User opted out of Nimbus Documents & Data",
+                                  "No Nimbus Documents & Data service available to enable",
+                                  "Nimbus Documents & Data cannot be enabled on this machine for this user.",
+                                  "Enabling Nimbus Documents & Data"};
 
 // One pass over an account's services in one phase.
 class ServicePass {
@@ -63,10 +77,10 @@ class ServicePass {
         for (const std::string& identifier : WLNimbusSyncServiceIDs()) {
             _setUpSyncService(identifier);
         }
-        _setUpLocator();
+        _setUp(kLocator);
         const std::optional<PropertyList> mailAddress = _setUpMail();
         _setUpNotes(mailAddress);
-        _setUpDocuments();
+        _setUp(kDocuments);
     }
 
   private:
@@ -103,49 +117,54 @@ class ServicePass {
         if (_postLogin && contains(WLNimbusDelayedServiceIDs(), identifier)) {
             const double delay = postLoginDelaySeconds();
             WL_LOG("Enabling '%@' after a %0.2f second delay", identifier, delay);
-            platform::current().dispatchQueues.global().asyncAfter(nanoseconds(delay), std::move(task));
+            platform::current().dispatchQueues.global().asyncAfter(platform::nanosecondsOf(delay),
+                                                                   std::move(task));
         } else {
             task();
         }
     }
 
-    void _setUpLocator() {
-        if (!_isSelected(platform::kSKServiceIDLOC)) {
-            WL_LOG("User opted out of Nimbus Locator");
-            return;
+    // Logs it when the user does not want the service, or it does not belong to this phase.
+    bool _isWanted(const NamedService& named) const {
+        if (!_isSelected(named.identifier)) {
+            WL_LOG("%@", named.optedOut);
+            return false;
         }
-        if (!_belongsToThisPhase(platform::kSKServiceIDLOC)) {
-            return;
+        return _belongsToThisPhase(named.identifier);
+    }
+
+    void _setUp(const NamedService& named) {
+        if (_isWanted(named)) {
+            _enableIfPossible(named);
         }
-        const CloudService service = _account.serviceForID(platform::kSKServiceIDLOC);
+    }
+
+    void _enableIfPossible(const NamedService& named) {
+        const CloudService service = _account.serviceForID(named.identifier);
         if (!service) {
-            WL_LOG("No Nimbus Locator service available to enable");
+            WL_LOG("%@", named.missing);
         } else if (!service->canBeEnabled()) {
-            WL_LOG("Nimbus Locator cannot be enabled on this machine for this user.");
+            WL_LOG("%@", named.disabled);
         } else {
-            WL_LOG("Enabling Nimbus Locator");
+            WL_LOG("%@", named.enabling);
             enable(*service, _window);
         }
     }
 
     // Gives the mail service's address whenever it was read, also when mail is not enabled then.
     std::optional<PropertyList> _setUpMail() {
-        if (!_isSelected(platform::kSKServiceIDMail)) {
-            WL_LOG("User opted out of Nimbus Mail");
+        if (!_isWanted(kMail)) {
             return std::nullopt;
         }
-        if (!_belongsToThisPhase(platform::kSKServiceIDMail)) {
-            return std::nullopt;
-        }
-        const CloudService service = _account.serviceForID(platform::kSKServiceIDMail);
+        const CloudService service = _account.serviceForID(kMail.identifier);
         if (!service) {
-            WL_LOG("No Nimbus Mail service available to enable");
+            WL_LOG("%@", kMail.missing);
             return std::nullopt;
         }
         std::optional<PropertyList> address = service->propertyValue(platform::kSKPropertyMailEmailAddress);
         const std::string* addressText = address ? address->string() : nullptr;
         if (!service->canBeEnabled()) {
-            WL_LOG("Nimbus Mail cannot be enabled on this machine for this user.");
+            WL_LOG("%@", kMail.disabled);
         } else if (addressText && !addressText->empty()) {
             WL_LOG("Enabling Nimbus Mail: %@", *addressText);
             enable(*service, _window);
@@ -157,45 +176,14 @@ class ServicePass {
 
     // The mail address counts as soon as there is one, also when it is empty.
     void _setUpNotes(const std::optional<PropertyList>& mailAddress) {
-        if (!_isSelected(platform::kSKServiceIDNotes)) {
-            WL_LOG("User opted out of Nimbus Notes");
-            return;
-        }
-        if (!_belongsToThisPhase(platform::kSKServiceIDNotes)) {
+        if (!_isWanted(kNotes)) {
             return;
         }
         if (!mailAddress) {
             WL_LOG("Cannot enable Nimbus notes without associated email address");
             return;
         }
-        const CloudService service = _account.serviceForID(platform::kSKServiceIDNotes);
-        if (!service) {
-            WL_LOG("No Nimbus Notes service available to enable");
-        } else if (!service->canBeEnabled()) {
-            WL_LOG("Nimbus Notes cannot be enabled on this machine for this user.");
-        } else {
-            WL_LOG("Enabling Nimbus Notes");
-            enable(*service, _window);
-        }
-    }
-
-    void _setUpDocuments() {
-        if (!_isSelected(platform::kSKServiceMobileDocuments)) {
-            WL_LOG("User opted out of Nimbus Documents & Data");
-            return;
-        }
-        if (!_belongsToThisPhase(platform::kSKServiceMobileDocuments)) {
-            return;
-        }
-        const CloudService service = _account.serviceForID(platform::kSKServiceMobileDocuments);
-        if (!service) {
-            WL_LOG("No Nimbus Documents & Data service available to enable");
-        } else if (!service->canBeEnabled()) {
-            WL_LOG("Nimbus Documents & Data cannot be enabled on this machine for this user.");
-        } else {
-            WL_LOG("Enabling Nimbus Documents & Data");
-            enable(*service, _window);
-        }
+        _enableIfPossible(kNotes);
     }
 
     platform::CloudAccount& _account;
@@ -222,10 +210,9 @@ bool WLNimbusSetupWithDictionary2(const PropertyList::Dictionary& setupDictionar
                                   bool accountAndKeyValueStoreOnly, bool postLogin,
                                   const std::shared_ptr<platform::Window>& window,
                                   [[maybe_unused]] platform::Error* errorOut) {
-    const auto identifier = setupDictionary.find(platform::kSKPropertyAccountID);
     const std::shared_ptr<platform::CloudAccount> account =
         platform::current().accountService.sharedManager().accountForID(
-            identifier == setupDictionary.end() ? std::nullopt : std::optional(identifier->second), true);
+            copyOf(valueIn(setupDictionary, platform::kSKPropertyAccountID)), true);
     if (!account) {
         WL_LOG("Failed to retrieve SK_Account");
         return false;

@@ -1,6 +1,7 @@
 #include "cloud/WLSetupProbes.h"
 
 #include "log/PCLogManager.h"
+#include "platform/Path.h"
 #include "platform/Platform.h"
 #include "propertylist/PropertyListReadings.h"
 
@@ -11,12 +12,11 @@ namespace welcomer {
 
 namespace {
 
-constexpr const char* kScreensaverDomain = "com.corvid.screensaver";
-constexpr const char* kAskForPasswordKey = "askForPassword";
-constexpr const char* kLogDelegateResponsesDefault = "WLLogDelegateResponses";
-constexpr const char* kInternalMarker = "/CorvidInternal";
-constexpr const char* kTransitionTool = "/usr/libexec/transition";
-constexpr const char* kHardwareWarrantyMarker = "/var/db/.ShowHardwareWarranty";
+constexpr char kScreensaverDomain[] = "com.corvid.screensaver";
+constexpr char kAskForPasswordKey[] = "askForPassword";
+constexpr char kLogDelegateResponsesDefault[] = "WLLogDelegateResponses";
+constexpr char kTransitionTool[] = "/usr/libexec/transition";
+constexpr char kHardwareWarrantyMarker[] = "/var/db/.ShowHardwareWarranty";
 
 std::optional<bool> screenLockOverride;
 bool hardwareWarrantyMarkerSeen = false;
@@ -40,7 +40,7 @@ bool WLShouldLogDelegateResponses() {
     if (platform.preferenceStore.booleanDefault(kLogDelegateResponsesDefault)) {
         return true;
     }
-    static_cast<void>(platform.fileSystem.exists(kInternalMarker)); // looked at, never heeded
+    static_cast<void>(platform.fileSystem.exists(platform::kInternalMarker)); // looked at, never heeded
     return true;
 }
 

@@ -12,15 +12,14 @@ namespace welcomer {
 
 // The item's look-up key. Its label is the user's cloud account name, its data the replay object as an XML
 // property list.
-inline constexpr const char* kReplayItemService = "Welcomer Nimbus Replay Data";
-inline constexpr const char* kReplayItemAccount = "Welcomer";
+inline constexpr char kReplayItemService[] = "Welcomer Nimbus Replay Data";
+inline constexpr char kReplayItemAccount[] = "Welcomer";
 
-// What the agent reads from the replay object: under the first key a dictionary whose entry under the second
-// maps delegate identifiers to their responses, and two arrays of strings.
-inline constexpr const char* kReplayResponsesKey = "delegatesResponseDict";
-inline constexpr const char* kReplayDelegatesKey = "delegates";
-inline constexpr const char* kReplayVidlinkAliasesKey = "vlAliases";
-inline constexpr const char* kReplayChatterAliasesKey = "imAliases";
+// What the agent reads from the replay object: under the first key the server's response, with those of the
+// delegates under platform::kDelegatesKey, and two arrays of strings.
+inline constexpr char kReplayResponsesKey[] = "delegatesResponseDict";
+inline constexpr char kReplayVidlinkAliasesKey[] = "vlAliases";
+inline constexpr char kReplayChatterAliasesKey[] = "imAliases";
 
 // Reads the replay item.
 //  replayObject  where to put the replay object, or null: then nothing is deserialised. Any property-list

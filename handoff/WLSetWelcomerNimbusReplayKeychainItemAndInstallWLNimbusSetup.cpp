@@ -3,7 +3,6 @@
 #include "handoff/LaunchAgentFile.h"
 #include "handoff/ReplayItem.h"
 #include "log/PCLogManager.h"
-#include "platform/Path.h"
 #include "platform/Platform.h"
 #include "propertylist/PropertyListWriter.h"
 
@@ -50,20 +49,20 @@ bool storeReplayItem(const std::string& accountName, const PropertyList& replayO
     return true;
 }
 
-// The folder of the launch agents; throws where the user has no home.
-std::string launchAgentsFolder() {
+// The user's home; throws where there is none. The platform makes the library folder in a new home, which is
+// asked for its effect: here only the folder in it is made.
+std::string homeWithLibrary() {
     platform::ProcessIdentity& identity = platform::current().processIdentity;
-    // Asked for its effect: the platform makes the library folder where a home has none yet. Here only the
-    // folder in it is made.
     identity.userLibraryDirectories();
-    return platform::joinPath(platform::joinPath(identity.homeDirectory(), "Library"), kLaunchAgentsFolder);
+    return identity.homeDirectory();
 }
 
 bool installLaunchAgent(platform::ResourceBundle& bundle) {
     const platform::Platform& platform = platform::current();
     const std::optional<std::string> resource =
         bundle.pathForResource(kLaunchAgentLabel, kLaunchAgentFileType);
-    const std::string folder = launchAgentsFolder();
+    const std::string home = homeWithLibrary();
+    const std::string folder = launchAgentsFolder(home);
     if (!platform.fileSystem.exists(folder)) {
         const platform::Outcome created = platform.fileSystem.createDirectory(folder, 0755);
         if (!created && created.error.number != EEXIST) {
@@ -72,10 +71,8 @@ bool installLaunchAgent(platform::ResourceBundle& bundle) {
         }
     }
     const platform::Outcome installed =
-        resource
-            ? platform.fileSystem.copy(*resource, platform::joinPath(folder, std::string(kLaunchAgentLabel) +
-                                                                                 '.' + kLaunchAgentFileType))
-            : platform::Outcome::failure({ENOENT, "the bundle has no launch-agent file"});
+        resource ? platform.fileSystem.copy(*resource, launchAgentPath(home))
+                 : platform::Outcome::failure({ENOENT, "the bundle has no launch-agent file"});
     if (!installed) {
         WL_LOG("failed to install com.corvid.welcomer.nimbussetup: %@", installed.error);
         return false;

@@ -18,8 +18,8 @@ struct CloudUser {
     std::string password;
     std::optional<std::string> mailAddress; // of the mail service in an account that is made for the user
 
-    // What the server answers to the right password: an integer "status", 0 for success, and under
-    // "delegates" a dictionary from delegate identifier to response, with the aliases on offer.
+    // What the server answers to the right password (platform/AccountService.h): a status, and the delegates'
+    // responses with the aliases on offer.
     PropertyList::Dictionary response;
 };
 

@@ -25,14 +25,25 @@ inline constexpr char kSKServiceIDMail[] = "com.corvid.nimbus.service.mail";
 inline constexpr char kSKServiceIDLOC[] = "com.corvid.nimbus.service.locator";
 inline constexpr char kSKServiceMobileDocuments[] = "com.corvid.nimbus.service.documents";
 
+// All of them, in the order in which setup enables them.
+inline constexpr const char* kSKServiceIDs[] = {
+    kSKServiceIDContacts,  kSKServiceIDCalendars,    kSKServiceIDBookMarks, kSKServiceIDMediaStream,
+    kSKServiceIDReminders, kSKServiceIDAccountSync,  kSKServiceIDLOC,       kSKServiceIDMail,
+    kSKServiceIDNotes,     kSKServiceMobileDocuments};
+
 // Property keys of accounts, services and notifications.
 inline constexpr char kSKPropertyAccountID[] = "com.corvid.nimbus.property.accountID";
 inline constexpr char kSKPropertyMailEmailAddress[] = "com.corvid.nimbus.property.mailEmailAddress";
 inline constexpr char kSKPropertyAccountError[] = "com.corvid.nimbus.property.accountError";
 inline constexpr char kSKPropertyAccountErrorInfo[] = "com.corvid.nimbus.property.accountErrorInfo";
 
+// The entries of a request and of its response that this system reads: what is asked of each delegate and
+// what each was answered, a dictionary from delegate identifier; and an integer, 0 for success.
+inline constexpr char kDelegatesKey[] = "delegates";
+inline constexpr char kStatusKey[] = "status";
+
 // The notifications that end an authentication and a sign-in. A completed one carries the server's response,
-// among it an integer "status"; a failed one the account error (an integer under kSKPropertyAccountError)
+// among it its status; a failed one the account error (an integer under kSKPropertyAccountError)
 // and, where there is more to say, its info.
 inline constexpr char kSKNotificationAuthenticationCompleted[] =
     "com.corvid.nimbus.notification.authenticationCompleted";
@@ -107,7 +118,7 @@ class AccountManager {
     // Starts to check a user's password with the server and returns. The answer comes as exactly one
     // authentication-completed or authentication-failed notification on the default centre, on the run loop
     // of the thread that called; a port is attached to that loop until then. There is no time limit.
-    //  delegateRequest  what is asked of each delegate, a dictionary under "delegates"
+    //  delegateRequest  what is asked of each delegate, under kDelegatesKey
     // Any thread that runs its run loop.
     virtual void authenticate(const std::string& username, const std::string& password,
                               const PropertyList::Dictionary& delegateRequest) = 0;

@@ -12,8 +12,8 @@
 namespace welcomer {
 
 // Where the plug-ins are, and what the names of their entries end in (compared case-sensitively).
-inline constexpr const char* kPluginDirectory = "/System/Library/CoreServices/FirstRunPlugins";
-inline constexpr const char* kPluginExtension = "ncdplugin";
+inline constexpr char kPluginDirectory[] = "/System/Library/CoreServices/FirstRunPlugins";
+inline constexpr char kPluginExtension[] = "ncdplugin";
 
 using DelegatePluginArray = std::vector<std::shared_ptr<WLFirstRunDelegateConfiguration>>;
 

@@ -1,10 +1,12 @@
 #include "plugins/WLNimbusDelegatesRequest.h"
 
 #include "log/PCLogManager.h"
+#include "platform/AccountService.h"
 #include "plugins/DelegateIdentifiers.h"
 #include "plugins/PluginText.h"
+#include "plugins/WLNimbusDelegatePlugins.h"
+#include "text/Contains.h"
 
-#include <algorithm>
 #include <stdexcept>
 #include <utility>
 
@@ -12,17 +14,15 @@ namespace welcomer {
 
 namespace {
 
-constexpr const char* kUnknownIdentifier = "(unknown)";
+constexpr char kUnknownIdentifier[] = "(unknown)";
 
-bool contains(const std::vector<std::string>& identifiers, const std::string& identifier) {
-    return std::find(identifiers.begin(), identifiers.end(), identifier) != identifiers.end();
-}
+using text::contains;
 
 // Asks the plug-ins that `isWanted` accepts, given their identifier, for their requests.
 template <class IsWanted>
-PropertyList::Dictionary requestsOfPlugins(const DelegatePluginSource& plugins, const IsWanted& isWanted) {
+PropertyList::Dictionary requestsOfPlugins(const IsWanted& isWanted) {
     PropertyList::Dictionary requests;
-    for (const auto& plugin : plugins()) {
+    for (const auto& plugin : WLNimbusDelegatePlugins()) {
         std::optional<std::string> identifier;
         try {
             identifier = plugin->delegateIdentifier();
@@ -48,18 +48,16 @@ PropertyList::Dictionary requestsOfPlugins(const DelegatePluginSource& plugins, 
 }
 
 PropertyList::Dictionary delegatesRequest(PropertyList::Dictionary requests) {
-    return {{kRequestDelegatesKey, std::move(requests)}};
+    return {{platform::kDelegatesKey, std::move(requests)}};
 }
 
 } // namespace
 
 PropertyList::Dictionary WLNimbusDelegatesRequest(const PropertyList::Dictionary& additionalDelegates,
-                                                  const std::vector<std::string>& omittedDelegates,
-                                                  const DelegatePluginSource& plugins) {
-    PropertyList::Dictionary requests =
-        requestsOfPlugins(plugins, [&](const std::optional<std::string>& identifier) {
-            return !identifier || !contains(omittedDelegates, *identifier);
-        });
+                                                  const std::vector<std::string>& omittedDelegates) {
+    PropertyList::Dictionary requests = requestsOfPlugins([&](const std::optional<std::string>& identifier) {
+        return !identifier || !contains(omittedDelegates, *identifier);
+    });
     if (!contains(omittedDelegates, kSkylarkIdentifier)) {
         requests.insert_or_assign(kSkylarkIdentifier, PropertyList::Dictionary{});
     }
@@ -69,21 +67,18 @@ PropertyList::Dictionary WLNimbusDelegatesRequest(const PropertyList::Dictionary
     return delegatesRequest(std::move(requests));
 }
 
-PropertyList::Dictionary
-WLNimbusCreateOrLoginDelegatesRequestForMessagingAliases(const DelegatePluginSource& plugins) {
-    PropertyList::Dictionary requests =
-        requestsOfPlugins(plugins, [](const std::optional<std::string>& identifier) {
-            return identifier == kVidlinkIdentifier || identifier == kChatterIdentifier;
-        });
+PropertyList::Dictionary WLNimbusCreateOrLoginDelegatesRequestForMessagingAliases() {
+    PropertyList::Dictionary requests = requestsOfPlugins([](const std::optional<std::string>& identifier) {
+        return identifier == kVidlinkIdentifier || identifier == kChatterIdentifier;
+    });
     requests.insert_or_assign(kSkylarkIdentifier, PropertyList::Dictionary{});
     return delegatesRequest(std::move(requests));
 }
 
 std::optional<std::vector<std::string>>
 WLNimbusGetMessagingAliasesFromDelegateResponse(const std::string& delegateIdentifier,
-                                                const PropertyList& response,
-                                                const DelegatePluginSource& plugins) {
-    for (const auto& plugin : plugins()) {
+                                                const PropertyList& response) {
+    for (const auto& plugin : WLNimbusDelegatePlugins()) {
         try {
             if (plugin->delegateIdentifier() == delegateIdentifier) {
                 return plugin->messagingAliasesFromResponse(response);
@@ -97,9 +92,9 @@ WLNimbusGetMessagingAliasesFromDelegateResponse(const std::string& delegateIdent
     return std::nullopt;
 }
 
-std::vector<std::string> WLNimbusAllDelegateIdentifiers(const DelegatePluginSource& plugins) {
+std::vector<std::string> WLNimbusAllDelegateIdentifiers() {
     std::vector<std::string> identifiers{kSkylarkIdentifier};
-    for (const auto& plugin : plugins()) {
+    for (const auto& plugin : WLNimbusDelegatePlugins()) {
         try {
             std::optional<std::string> identifier = plugin->delegateIdentifier();
             if (identifier && !identifier->empty()) {

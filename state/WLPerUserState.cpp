@@ -2,6 +2,7 @@
 
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
+#include "propertylist/Lookup.h"
 #include "propertylist/PropertyListReadings.h"
 
 #include <cstddef>
@@ -62,14 +63,14 @@ std::unique_ptr<WLPerUserState>
 WLPerUserState::initWithDictionaryRepresentation(const PropertyList::Dictionary& dictionary) {
     auto state = std::make_unique<WLPerUserState>();
     for (const Entry& entry : _entries()) {
-        const auto found = dictionary.find(entry.key);
-        if (!entry.isTakenFromDictionary || found == dictionary.end()) {
+        const PropertyList* const found = valueIn(dictionary, entry.key);
+        if (!entry.isTakenFromDictionary || !found) {
             continue;
         }
         if (entry.text) {
-            state->_setText(entry.text, found->second);
+            state->_setText(entry.text, *found);
         } else {
-            (*state.*entry.flag).set(booleanReading(found->second));
+            (*state.*entry.flag).set(booleanReading(*found));
         }
     }
     return state;

@@ -3,6 +3,7 @@
 #include "backends/posix/FileContent.h"
 #include "backends/posix/SystemError.h"
 #include "platform/Path.h"
+#include "propertylist/Lookup.h"
 #include "propertylist/PropertyListReader.h"
 
 #include <cerrno>
@@ -39,8 +40,7 @@ std::optional<std::string> libraryOf(const posix::RootFolder& root, const std::s
         reason = infoPath + ": " + info.error;
         return std::nullopt;
     }
-    const PropertyList* executable = info.value->find("Executable");
-    const std::string* name = executable ? executable->string() : nullptr;
+    const std::string* const name = textIn(*info.value, "Executable");
     if (!name || name->empty()) {
         reason = infoPath + ": no Executable";
         return std::nullopt;

@@ -4,6 +4,7 @@
 #include "agent/wlnimbussetup_RemainingDelegateSetup.h"
 #include "backends/Backends.h"
 #include "platform/Platform.h"
+#include "tests/fakes/PluginRegistry.h"
 
 #include <benchmark/benchmark.h>
 #include <chrono>
@@ -57,10 +58,10 @@ void completeDelegates(benchmark::State& state) {
     PropertyList::Dictionary replay;
     replay.emplace("delegatesResponseDict", std::move(response));
     const PropertyList replayObject(std::move(replay));
+    fakes::fillPluginRegistry(std::move(plugins));
     for (auto _ : state) {
         const auto group = platform::current().dispatchQueues.createGroup();
-        wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, group,
-                                             [&]() -> const DelegatePluginArray& { return plugins; });
+        wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, group);
         if (!group->wait(std::chrono::minutes(1))) {
             state.SkipWithError("the delegates were not completed");
         }

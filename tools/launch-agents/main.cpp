@@ -3,6 +3,7 @@
 //   --help, --version
 
 #include "backends/Backends.h"
+#include "handoff/LaunchAgentFile.h"
 #include "log/PCLogManager.h"
 #include "text/ProgramOptions.h"
 #include "tools/launch-agents/ChildStarter.h"
@@ -22,7 +23,7 @@ int startAgents(platform::ProcessIdentity& user, const std::string& runtimeFolde
                 const launch::LoginStamp& stamp) {
     try {
         const std::string home = user.homeDirectory();
-        launch::startLaunchAgents(home + "/Library/LaunchAgents", user.effectiveUserID(), stamp,
+        launch::startLaunchAgents(launchAgentsFolder(home), user.effectiveUserID(), stamp,
                                   [&]() -> std::unique_ptr<launch::AgentStarter> {
                                       if (auto manager = launch::UserManagerStarter::connect(runtimeFolder)) {
                                           return manager;

@@ -1,6 +1,7 @@
 #include "backends/local/accounts/AccountFile.h"
 
 #include "platform/Path.h"
+#include "propertylist/Lookup.h"
 
 namespace welcomer::local {
 
@@ -16,9 +17,8 @@ constexpr char kFileName[] = "Accounts.plist";
 std::vector<std::string> AccountFile::names() {
     return ask([](const PropertyList::Dictionary& content) {
         std::vector<std::string> names;
-        const auto accounts = content.find(kAccountsKey);
-        if (accounts != content.end() && accounts->second.isDictionary()) {
-            for (const auto& [name, account] : *accounts->second.dictionary()) {
+        if (const PropertyList::Dictionary* accounts = dictionaryIn(content, kAccountsKey)) {
+            for (const auto& [name, account] : *accounts) {
                 if (account.isDictionary()) {
                     names.push_back(name);
                 }

@@ -1,9 +1,9 @@
 #include "backends/local/accounts/LocalAccountService.h"
 
+#include "platform/Duration.h"
+#include "propertylist/Lookup.h"
 #include "propertylist/PropertyListReadings.h"
 
-#include <chrono>
-#include <cstdint>
 #include <type_traits>
 #include <utility>
 
@@ -18,14 +18,7 @@ constexpr char kCanBeEnabledKey[] = "CanBeEnabled";
 constexpr char kEnabledKey[] = "Enabled";
 constexpr char kPropertiesKey[] = "Properties";
 
-// The dictionary under a key, or null. As const as its parent, like the ones below.
-template <typename Parent>
-auto findDictionary(Parent& parent, const std::string& key) -> decltype(parent.begin()->second.dictionary()) {
-    const auto found = parent.find(key);
-    return found == parent.end() ? nullptr : found->second.dictionary();
-}
-
-// The same, made where it is missing or something else.
+// The dictionary under a key, made where it is missing or something else.
 PropertyList::Dictionary& makeDictionary(PropertyList::Dictionary& parent, const std::string& key) {
     PropertyList& value = parent[key];
     if (!value.isDictionary()) {
@@ -36,29 +29,18 @@ PropertyList::Dictionary& makeDictionary(PropertyList::Dictionary& parent, const
 
 template <typename Content>
 Content* findAccount(Content& content, const std::string& name) {
-    Content* accounts = findDictionary(content, kAccountsKey);
-    return accounts ? findDictionary(*accounts, name) : nullptr;
+    return dictionaryIn(dictionaryIn(content, kAccountsKey), name);
 }
 
 template <typename Content>
 Content* findService(Content& content, const std::string& name, const std::string& identifier) {
-    Content* account = findAccount(content, name);
-    Content* services = account ? findDictionary(*account, kServicesKey) : nullptr;
-    return services ? findDictionary(*services, identifier) : nullptr;
+    return dictionaryIn(dictionaryIn(findAccount(content, name), kServicesKey), identifier);
 }
 
 // What is there and reads as no boolean is false.
 bool flag(const PropertyList::Dictionary& dictionary, const char* key, bool ifMissing) {
-    const auto found = dictionary.find(key);
-    return found == dictionary.end() ? ifMissing : booleanReading(found->second);
-}
-
-std::chrono::nanoseconds nanoseconds(double seconds) {
-    constexpr double kNanosecondsPerSecond = 1e9;
-    const double count = seconds * kNanosecondsPerSecond;
-    return count < static_cast<double>(std::chrono::nanoseconds::max().count())
-               ? std::chrono::nanoseconds(static_cast<std::int64_t>(count))
-               : std::chrono::nanoseconds::max();
+    const PropertyList* const found = valueIn(dictionary, key);
+    return found ? booleanReading(*found) : ifMissing;
 }
 
 } // namespace
@@ -101,9 +83,7 @@ class LocalAccountService::Service final : public platform::CloudService {
 
     std::optional<PropertyList> propertyValue(const std::string& key) override {
         return _ask([&](const PropertyList::Dictionary* service) {
-            const auto* properties = service ? findDictionary(*service, kPropertiesKey) : nullptr;
-            return properties && properties->contains(key) ? std::optional(properties->at(key))
-                                                           : std::nullopt;
+            return copyOf(valueIn(dictionaryIn(service, kPropertiesKey), key));
         });
     }
 
@@ -211,8 +191,7 @@ LocalAccountService::LocalAccountService(const posix::RootFolder& root, platform
 
 std::shared_ptr<platform::CloudAccount> LocalAccountService::loggedInAccount() {
     const auto name = _accounts->file.ask([](const PropertyList::Dictionary& content) {
-        const auto found = content.find(kLoggedInAccountKey);
-        const std::string* text = found == content.end() ? nullptr : found->second.string();
+        const std::string* const text = textIn(content, kLoggedInAccountKey);
         return text && findAccount(content, *text) ? std::optional(*text) : std::nullopt;
     });
     return name ? std::make_shared<Account>(_accounts, *name) : nullptr;
@@ -275,7 +254,7 @@ void LocalAccountService::_start(const std::shared_ptr<Operation>& operation) {
     queue.async([&queue, operation, deliver, sender = static_cast<const void*>(this)] {
         const NimbusAnswer answer =
             operation->accounts->directory.answer(operation->username, operation->password);
-        queue.asyncAfter(nanoseconds(answer.delaySeconds), [operation, deliver, sender, answer] {
+        queue.asyncAfter(platform::nanosecondsOf(answer.delaySeconds), [operation, deliver, sender, answer] {
             platform::Notification notification = operation->notification(answer);
             notification.sender = sender;
             operation->runLoop->perform([deliver, notification] { deliver(notification); });

@@ -4,6 +4,7 @@
 #include "backends/local/accounts/PasswordHash.h"
 #include "backends/posix/Directory.h"
 #include "platform/AccountService.h"
+#include "propertylist/Lookup.h"
 #include "propertylist/PropertyListReadings.h"
 
 #include <algorithm>
@@ -24,7 +25,6 @@ constexpr char kDelaySecondsKey[] = "DelaySeconds";
 constexpr char kMailAddressKey[] = "MailAddress";
 constexpr char kServicesKey[] = "Services";
 constexpr char kPropertiesKey[] = "Properties";
-constexpr char kStatusKey[] = "status";
 
 constexpr mode_t kFolderMode = 0755; // the folder is not for the directory alone
 
@@ -37,8 +37,8 @@ NimbusAnswer accountError(std::int64_t error) {
 }
 
 bool isRightPassword(const PropertyList& user, const std::string& password) {
-    const PropertyList* hash = user.find(kPasswordKey);
-    return hash && hash->isString() && passwordMatches(password, *hash->string());
+    const std::string* const hash = textIn(user, kPasswordKey);
+    return hash && passwordMatches(password, *hash);
 }
 
 double delaySeconds(const PropertyList& user) {
@@ -67,7 +67,7 @@ NimbusAnswer answerOf(const std::string& username, const PropertyList& user) {
     if (response) {
         answer.contents = *response->dictionary();
     } else if (answer.isCompleted) {
-        answer.contents = {{kStatusKey, 0}};
+        answer.contents = {{platform::kStatusKey, 0}};
     }
     answer.contents.insert_or_assign(platform::kSKPropertyAccountID, username);
     if (const PropertyList* error = user.find(kAccountErrorKey)) {
@@ -81,22 +81,18 @@ NimbusAnswer answerOf(const std::string& username, const PropertyList& user) {
 
 PropertyList::Dictionary everyService() {
     PropertyList::Dictionary services;
-    for (const char* identifier :
-         {platform::kSKServiceIDContacts, platform::kSKServiceIDCalendars, platform::kSKServiceIDBookMarks,
-          platform::kSKServiceIDMediaStream, platform::kSKServiceIDReminders,
-          platform::kSKServiceIDAccountSync, platform::kSKServiceIDLOC, platform::kSKServiceIDMail,
-          platform::kSKServiceIDNotes, platform::kSKServiceMobileDocuments}) {
+    for (const char* identifier : platform::kSKServiceIDs) {
         services.emplace(identifier, PropertyList::Dictionary{});
     }
     return services;
 }
 
 void setMailAddress(PropertyList::Dictionary& services, const PropertyList& address) {
-    const auto mail = services.find(platform::kSKServiceIDMail);
-    if (mail == services.end() || !mail->second.isDictionary()) {
+    PropertyList::Dictionary* const mail = dictionaryIn(services, platform::kSKServiceIDMail);
+    if (!mail) {
         return;
     }
-    PropertyList& properties = (*mail->second.dictionary())[kPropertiesKey];
+    PropertyList& properties = (*mail)[kPropertiesKey];
     if (PropertyList::Dictionary* values = properties.dictionary()) {
         values->emplace(platform::kSKPropertyMailEmailAddress, address); // one that is there already stays
     }
@@ -109,25 +105,22 @@ NimbusAnswer NimbusDirectory::answer(const std::string& username, const std::str
     if (!users) {
         return accountError(platform::kSKAccountErrorServerUnavailable);
     }
-    const auto user = users->find(username);
-    if (user == users->end()) {
+    const PropertyList* const user = valueIn(*users, username);
+    if (!user) {
         return accountError(platform::kSKAccountErrorUnknownUser);
     }
-    if (!isRightPassword(user->second, password)) {
+    if (!isRightPassword(*user, password)) {
         return accountError(platform::kSKAccountErrorWrongPassword);
     }
-    return answerOf(username, user->second);
+    return answerOf(username, *user);
 }
 
 PropertyList::Dictionary NimbusDirectory::servicesOfNewAccount(const std::string& username) const {
     const std::optional<PropertyList::Dictionary> users = _users();
-    const auto user = users ? users->find(username) : PropertyList::Dictionary::const_iterator{};
-    if (!users || user == users->end()) {
-        return everyService();
-    }
-    const PropertyList* own = user->second.find(kServicesKey);
-    PropertyList::Dictionary services = own && own->isDictionary() ? *own->dictionary() : everyService();
-    if (const PropertyList* address = user->second.find(kMailAddressKey)) {
+    const PropertyList* const user = users ? valueIn(*users, username) : nullptr;
+    const PropertyList::Dictionary* const own = dictionaryIn(user, kServicesKey);
+    PropertyList::Dictionary services = own ? *own : everyService();
+    if (const PropertyList* address = valueIn(user, kMailAddressKey)) {
         setMailAddress(services, *address);
     }
     return services;
@@ -136,13 +129,12 @@ PropertyList::Dictionary NimbusDirectory::servicesOfNewAccount(const std::string
 std::optional<std::vector<std::string>> NimbusDirectory::userNames() const {
     const DictionaryFileContent file = readDictionaryFile(_root, kNimbusDirectoryPath);
     std::vector<std::string> names;
-    const auto users = file.values.find(kUsersKey);
-    const bool isAbsent = users == file.values.end();
-    if (file.state != DictionaryFileContent::State::Whole || (!isAbsent && !users->second.isDictionary())) {
+    const PropertyList* const users = valueIn(file.values, kUsersKey);
+    if (file.state != DictionaryFileContent::State::Whole || (users && !users->isDictionary())) {
         return std::nullopt;
     }
-    if (!isAbsent) {
-        for (const auto& [name, user] : *users->second.dictionary()) {
+    if (users) {
+        for (const auto& [name, user] : *users->dictionary()) {
             names.push_back(name);
         }
     }
@@ -185,11 +177,7 @@ platform::Outcome NimbusDirectory::writeUser(const platform::CloudUser& user, If
 
 std::optional<PropertyList::Dictionary> NimbusDirectory::_users() const {
     const DictionaryFileContent file = readDictionaryFile(_root, kNimbusDirectoryPath);
-    const auto users = file.values.find(kUsersKey);
-    if (users == file.values.end() || !users->second.isDictionary()) {
-        return std::nullopt;
-    }
-    return *users->second.dictionary();
+    return copyOf(dictionaryIn(file.values, kUsersKey));
 }
 
 } // namespace welcomer::local

@@ -1,6 +1,7 @@
 #include "backends/local/preferences/LocalPreferenceStore.h"
 
 #include "platform/Path.h"
+#include "propertylist/Lookup.h"
 #include "propertylist/UnwritableValue.h"
 
 #include <algorithm>
@@ -41,10 +42,7 @@ std::optional<PropertyList> LocalPreferenceStore::copyValue(const std::string& k
     if (!used.isLoaded) {
         _load(domain, used);
     }
-    if (const auto found = used.onDisk.values.find(key); found != used.onDisk.values.end()) {
-        return found->second;
-    }
-    return std::nullopt;
+    return copyOf(valueIn(used.onDisk.values, key));
 }
 
 std::vector<std::optional<PropertyList>> LocalPreferenceStore::copyValues(std::span<const std::string> keys,

@@ -7,9 +7,11 @@
 #include "handoff/LaunchAgentFile.h"
 #include "handoff/ReplayItem.h"
 #include "handoff/WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup.h"
+#include "plugins/WLFirstRunDelegateConfiguration.h"
 #include "propertylist/PropertyListReader.h"
 #include "propertylist/PropertyListWriter.h"
 #include "tests/contract/TemporaryRoot.h"
+#include "tests/fakes/PluginRegistry.h"
 
 #include <array>
 #include <cerrno>
@@ -111,7 +113,7 @@ class Home {
             PropertyList::Dictionary{
                 {kReplayResponsesKey,
                  PropertyList::Dictionary{
-                     {kReplayDelegatesKey, PropertyList::Dictionary{{kIdentifier, "response"}}}}}},
+                     {platform::kDelegatesKey, PropertyList::Dictionary{{kIdentifier, "response"}}}}}},
             *bundle);
     }
 
@@ -120,9 +122,9 @@ class Home {
     // Runs the agent in this process.
     int runAgent(const platform::Platform& platform) const {
         const platform::ScopedPlatform installed(platform);
-        const DelegatePluginArray plugins{std::make_shared<ActingDelegate>(root.locate("/acts"))};
+        fakes::fillPluginRegistry({std::make_shared<ActingDelegate>(root.locate("/acts"))});
         const std::array<const char*, 2> arguments{"wlnimbussetup", nullptr};
-        return wlnimbussetup(1, arguments.data(), [&]() -> const DelegatePluginArray& { return plugins; });
+        return wlnimbussetup(1, arguments.data());
     }
 
     // A login, from its start to its end, on simulated time.

@@ -3,10 +3,10 @@
 #include "log/PCLogManager.h"
 #include "propertylist/PropertyListWriter.h"
 #include "tests/fakes/FakePlatform.h"
+#include "tests/fakes/PluginRegistry.h"
 #include "tests/unit/agent/TestDelegate.h"
 
 #include <algorithm>
-#include <array>
 #include <gtest/gtest.h>
 #include <new>
 #include <stdexcept>
@@ -30,6 +30,9 @@ const std::string kKey = "Welcomer Nimbus Replay Data, Welcomer";
 constexpr Wait kGroupWait{Wait::Kind::Group, 100ms};
 constexpr Wait kSlice{Wait::Kind::Run, 1s};
 constexpr Wait kLinger{Wait::Kind::Run, 120s};
+
+// The first time that the plug-ins are asked for.
+const std::string kPluginScan = "FileSystem.list /System/Library/CoreServices/FirstRunPlugins";
 
 class WlnimbussetupTest : public testing::Test {
   protected:
@@ -59,16 +62,14 @@ class WlnimbussetupTest : public testing::Test {
     TestDelegate& add(const std::string& identifier) {
         auto plugin = std::make_shared<TestDelegate>(identifier);
         plugins.push_back(plugin);
+        fakes::fillPluginRegistry(plugins);
         return *plugin;
     }
 
     int run(std::vector<const char*> arguments = {"wlnimbussetup"}) {
         const int count = static_cast<int>(arguments.size());
         arguments.push_back(nullptr);
-        return wlnimbussetup(count, arguments.data(), [this]() -> const DelegatePluginArray& {
-            fake.recorder.record("plugins");
-            return plugins;
-        });
+        return wlnimbussetup(count, arguments.data());
     }
 
     bool exists(const std::string& name) const {
@@ -88,7 +89,7 @@ TEST_F(WlnimbussetupTest, WithoutAReplayItemItRemovesItsLaunchAgentFileAndEndsAt
     EXPECT_EQ(fake.virtualTime.waits(), Waits{});
     EXPECT_EQ(fake.virtualTime.now(), 0ns);
     EXPECT_EQ(fake.recorder.callsTo("CredentialStore."), Lines{"CredentialStore.findItem " + kKey});
-    EXPECT_EQ(fake.recorder.callsTo("plugins"), Lines{});
+    EXPECT_EQ(fake.recorder.callsTo(kPluginScan), Lines{});
 }
 
 TEST_F(WlnimbussetupTest, EveryStepInItsOrder) {
@@ -104,7 +105,7 @@ TEST_F(WlnimbussetupTest, EveryStepInItsOrder) {
                "SystemLog.write 115, Enabling post-login services for account anna",
                "AccountManager.accountForID anna, yes", "SystemLog.write 115, Failed to retrieve SK_Account",
                "SystemLog.write 115, Vidlink: 1 aliases", "SystemLog.write 115, Chatter: 0 aliases",
-               "plugins", "SystemLog.write 115, delaying exit by two minutes",
+               kPluginScan, "SystemLog.write 115, delaying exit by two minutes",
                "SystemLog.write 115, exiting"}));
 }
 
@@ -122,8 +123,8 @@ TEST_F(WlnimbussetupTest, TheFirstStageGetsTheItemsAccountNameAndRunsBeforeThePl
         return std::find(calls.begin(), calls.end(), call) - calls.begin();
     };
     EXPECT_LT(at("CredentialStore.deleteItem " + kKey), at("SystemLog.write 115, Killing onlineaccounts"));
-    EXPECT_LT(at("AccountManager.accountForID anna, yes"), at("plugins"));
-    EXPECT_LT(at("plugins"), std::ssize(calls));
+    EXPECT_LT(at("AccountManager.accountForID anna, yes"), at(kPluginScan));
+    EXPECT_LT(at(kPluginScan), std::ssize(calls));
 }
 
 TEST_F(WlnimbussetupTest, WhatGetsOutOfTheFirstStageIsLoggedAndTheSecondStageFollows) {
@@ -241,7 +242,7 @@ TEST_F(WlnimbussetupTest, UnreadableDataEndsItAtOnceAndTheItemStays) {
         EXPECT_EQ(fake.credentialStore.items()[0].data, data);
     }
     EXPECT_EQ(fake.virtualTime.waits(), Waits{});
-    EXPECT_EQ(fake.recorder.callsTo("plugins"), Lines{});
+    EXPECT_EQ(fake.recorder.callsTo(kPluginScan), Lines{});
 }
 
 TEST_F(WlnimbussetupTest, AnUnreadableAccountNameEndsItAtOnceAndTheItemStays) {
@@ -356,10 +357,11 @@ TEST_F(WlnimbussetupTest, PluginsThatRaiseEverywhereDoNotChangeTheExitStatus) {
 
 TEST_F(WlnimbussetupTest, WhatGetsOutOfAStepIsLoggedAndTheNextStepsFollow) {
     putResponses({});
-    const std::array<const char*, 2> arguments{"wlnimbussetup", nullptr};
-    EXPECT_EQ(wlnimbussetup(1, arguments.data(),
-                            []() -> const DelegatePluginArray& { throw std::runtime_error("no memory"); }),
-              0);
+    fake.fileSystem.addFile("/System/Library/CoreServices/FirstRunPlugins/a.ncdplugin", "");
+    fake.pluginBundle.onLoad = [] {
+        throw std::runtime_error("no memory");
+    };
+    EXPECT_EQ(run(), 0);
     EXPECT_EQ(fake.systemLog.lines(),
               (Lines{"Self destructing...", "Killing onlineaccounts",
                      "Enabling post-login services for account anna", "Failed to retrieve SK_Account",

@@ -2,6 +2,7 @@
 
 #include "log/PCLogManager.h"
 #include "tests/fakes/FakePlatform.h"
+#include "tests/fakes/PluginRegistry.h"
 #include "tests/unit/agent/TestDelegate.h"
 
 #include <algorithm>
@@ -24,6 +25,7 @@ class RemainingDelegateSetupTest : public testing::Test {
     TestDelegate& add(const std::string& identifier) {
         auto plugin = std::make_shared<TestDelegate>(identifier);
         plugins.push_back(plugin);
+        fakes::fillPluginRegistry(plugins);
         return *plugin;
     }
 
@@ -33,8 +35,7 @@ class RemainingDelegateSetupTest : public testing::Test {
     }
 
     void setUp(const PropertyList& replayObject) {
-        wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, group,
-                                             [this]() -> const DelegatePluginArray& { return plugins; });
+        wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, group);
     }
 
     // Sets up with the responses and the other entries.
@@ -58,18 +59,21 @@ class RemainingDelegateSetupTest : public testing::Test {
 };
 
 TEST_F(RemainingDelegateSetupTest, AliasesAreCountedBeforeThePluginsAreAskedFor) {
+    const std::string folder = "/System/Library/CoreServices/FirstRunPlugins";
+    fake.fileSystem.addFile(folder + "/broken.ncdplugin", "");
+    fake.pluginBundle.addBroken(folder + "/broken.ncdplugin", "no library");
     int asked = 0;
-    wlnimbussetup_RemainingDelegateSetup(
-        PropertyList::Dictionary{{"vlAliases", PropertyList::Array{"a", "b"}},
-                                 {"imAliases", PropertyList::Array{"c"}}},
-        std::nullopt, group, [&]() -> const DelegatePluginArray& {
-            ++asked;
-            EXPECT_EQ(fake.systemLog.lines().size(), 2U);
-            EXPECT_EQ(fake.virtualTime.queueNames(), Lines{});
-            return plugins;
-        });
+    fake.pluginBundle.onLoad = [&] {
+        ++asked;
+        EXPECT_EQ(fake.systemLog.lines(), (Lines{"Vidlink: 2 aliases", "Chatter: 1 aliases"}));
+        EXPECT_EQ(fake.virtualTime.queueNames(), Lines{});
+    };
+    setUp(PropertyList::Dictionary{{"vlAliases", PropertyList::Array{"a", "b"}},
+                                   {"imAliases", PropertyList::Array{"c"}}});
     EXPECT_EQ(asked, 1);
-    EXPECT_EQ(fake.systemLog.lines(), (Lines{"Vidlink: 2 aliases", "Chatter: 1 aliases"}));
+    EXPECT_EQ(fake.systemLog.lines(),
+              (Lines{"Vidlink: 2 aliases", "Chatter: 1 aliases",
+                     "Nimbus Plugins: Failed to get principal class for broken.ncdplugin"}));
 }
 
 TEST_F(RemainingDelegateSetupTest, AbsentAliasesCountAsZeroAndArePassedOnAsNone) {
@@ -351,9 +355,8 @@ TEST_F(RemainingDelegateSetupTest, ALoneMessagingDelegateIsOnTheSharedQueueToo) 
         const PropertyList replayObject(PropertyList::Dictionary{
             {"delegatesResponseDict",
              PropertyList::Dictionary{{"delegates", PropertyList::Dictionary{{identifier, "response"}}}}}});
-        plugins = {std::make_shared<TestDelegate>(identifier)};
-        wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, ownGroup,
-                                             [this]() -> const DelegatePluginArray& { return plugins; });
+        fakes::fillPluginRegistry({std::make_shared<TestDelegate>(identifier)});
+        wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, ownGroup);
         EXPECT_TRUE(ownGroup->wait(1h));
         EXPECT_EQ(own.virtualTime.queueNames(), Lines{kSharedQueue});
     }

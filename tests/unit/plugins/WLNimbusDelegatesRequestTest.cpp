@@ -5,6 +5,7 @@
 #include "propertylist/PropertyListReader.h"
 #include "propertylist/PropertyListWriter.h"
 #include "tests/fakes/FakePlatform.h"
+#include "tests/fakes/PluginRegistry.h"
 #include "tests/unit/plugins/InProcessPlugin.h"
 
 #include <functional>
@@ -56,6 +57,7 @@ class WLNimbusDelegatesRequestTest : public testing::Test {
     RequestingPlugin& add(const Identifier& identifier) {
         auto plugin = std::make_shared<RequestingPlugin>(identifier);
         _plugins.push_back(plugin);
+        fakes::fillPluginRegistry(_plugins);
         return *plugin;
     }
 
@@ -68,10 +70,10 @@ class WLNimbusDelegatesRequestTest : public testing::Test {
     }
 
     Dictionary request(const Dictionary& additions = {}, const Strings& omissions = {}) {
-        return delegates(WLNimbusDelegatesRequest(additions, omissions, source));
+        return delegates(WLNimbusDelegatesRequest(additions, omissions));
     }
     Dictionary messagingRequest() {
-        return delegates(WLNimbusCreateOrLoginDelegatesRequestForMessagingAliases(source));
+        return delegates(WLNimbusCreateOrLoginDelegatesRequestForMessagingAliases());
     }
 
     Strings lines() const { return fake.systemLog.lines(); }
@@ -82,9 +84,6 @@ class WLNimbusDelegatesRequestTest : public testing::Test {
 
     fakes::FakePlatform fake;
     const platform::ScopedPlatform installed{fake.platform()};
-    const DelegatePluginSource source = [this]() -> const DelegatePluginArray& {
-        return _plugins;
-    };
 
   private:
     DelegatePluginArray _plugins;
@@ -123,11 +122,8 @@ TEST_F(WLNimbusDelegatesRequestTest, ARequestOfTheGreatestDepthCanBeWrittenAndRe
     deepest.request = [](wl_error_slot*) {
         return nestedRequest(WL_VALUE_DEPTH_LIMIT);
     };
-    const DelegatePluginArray plugins{AbiDelegatePlugin::create(*deepest.exportAs<0>(), "Deep.ncdplugin")};
-    const DelegatePluginSource onlyDeepest = [&]() -> const DelegatePluginArray& {
-        return plugins;
-    };
-    const PropertyList whole = WLNimbusDelegatesRequest({}, {}, onlyDeepest);
+    fakes::fillPluginRegistry({AbiDelegatePlugin::create(*deepest.exportAs<0>(), "Deep.ncdplugin")});
+    const PropertyList whole = WLNimbusDelegatesRequest({}, {});
     EXPECT_TRUE(delegates(*whole.dictionary()).contains("com.corvid.deep"));
     std::string error;
     const std::optional<std::string> written = writeXMLPropertyList(whole, &error);
@@ -169,7 +165,7 @@ TEST_F(WLNimbusDelegatesRequestTest, AnIdentifierIsOneLineOfTheLogWhateverIsInIt
         throw std::runtime_error("no aliases");
     };
     request();
-    WLNimbusGetMessagingAliasesFromDelegateResponse("b\nforged", Dictionary(), source);
+    WLNimbusGetMessagingAliasesFromDelegateResponse("b\nforged", Dictionary());
     EXPECT_EQ(lines(),
               (Strings{R"(Nimbus Plugins: Delegate a\nforged omits itself from Nimbus setup)",
                        R"(Nimbus Plugins: Exception querying 'b\nforged' for setup request: no request)",
@@ -269,7 +265,7 @@ TEST_F(WLNimbusDelegatesRequestTest, AnAdditionIsSentForAnOmittedPluginToo) {
 TEST_F(WLNimbusDelegatesRequestTest, EverythingCanBeOmitted) {
     add("a");
     add("b");
-    EXPECT_EQ(request({}, WLNimbusAllDelegateIdentifiers(source)), none);
+    EXPECT_EQ(request({}, WLNimbusAllDelegateIdentifiers()), none);
     EXPECT_EQ(lines(), Strings{});
 }
 
@@ -333,7 +329,7 @@ TEST_F(WLNimbusDelegatesRequestTest, ForMessagingAliasesADelegateThatOmitsItself
 class MessagingAliasesTest : public WLNimbusDelegatesRequestTest {
   protected:
     std::optional<Strings> aliases(const std::string& identifier, const PropertyList& response = "response") {
-        return WLNimbusGetMessagingAliasesFromDelegateResponse(identifier, response, source);
+        return WLNimbusGetMessagingAliasesFromDelegateResponse(identifier, response);
     }
 };
 
@@ -390,7 +386,7 @@ using DelegateIdentifiersTest = WLNimbusDelegatesRequestTest;
 TEST_F(DelegateIdentifiersTest, AllBeginWithTheFormerOnlineServiceAndKeepTheRegistrysOrder) {
     add("z");
     add("a");
-    EXPECT_EQ(WLNimbusAllDelegateIdentifiers(source), (Strings{kSkylark, "z", "a"}));
+    EXPECT_EQ(WLNimbusAllDelegateIdentifiers(), (Strings{kSkylark, "z", "a"}));
 }
 
 TEST_F(DelegateIdentifiersTest, EmptyOnesAndThoseThatRaiseAreLeftOutSilently) {
@@ -400,7 +396,7 @@ TEST_F(DelegateIdentifiersTest, EmptyOnesAndThoseThatRaiseAreLeftOutSilently) {
         throw 42;
     };
     add("a");
-    EXPECT_EQ(WLNimbusAllDelegateIdentifiers(source), (Strings{kSkylark, "a"}));
+    EXPECT_EQ(WLNimbusAllDelegateIdentifiers(), (Strings{kSkylark, "a"}));
     EXPECT_EQ(lines(), Strings{});
 }
 

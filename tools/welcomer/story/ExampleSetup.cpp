@@ -29,9 +29,9 @@ platform::CloudUser exampleUser() {
             password.str(),
             kExampleAccount,
             {{"status", 0},
-             {kReplayDelegatesKey, PropertyList::Dictionary{{kVidlinkIdentifier, vidlink},
-                                                            {kChatterIdentifier, chatter},
-                                                            {kStorefrontIdentifier, response(1.0)}}}}};
+             {platform::kDelegatesKey, PropertyList::Dictionary{{kVidlinkIdentifier, vidlink},
+                                                                {kChatterIdentifier, chatter},
+                                                                {kStorefrontIdentifier, response(1.0)}}}}};
 }
 
 ChildLife setupLife(const std::string& password) {

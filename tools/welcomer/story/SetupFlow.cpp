@@ -186,7 +186,7 @@ SignInFailure SetupFlow::_signInFailure() const {
 }
 
 const PropertyList* SetupFlow::_response(const std::string& delegate) const {
-    const PropertyList* responses = find(*_delegate->delegatesResponseDict(), kReplayDelegatesKey);
+    const PropertyList* responses = find(*_delegate->delegatesResponseDict(), platform::kDelegatesKey);
     return responses ? responses->find(delegate) : nullptr;
 }
 
