@@ -24,8 +24,9 @@ using Lock = std::unique_lock<std::mutex>;
 constexpr nanoseconds never = nanoseconds::max();
 
 nanoseconds later(nanoseconds moment, nanoseconds duration) {
-    if (duration <= nanoseconds::zero())
+    if (duration <= nanoseconds::zero()) {
         return moment;
+    }
     return duration < never - moment ? moment + duration : never;
 }
 
@@ -74,9 +75,10 @@ struct VirtualTime::Core {
 
     // One wait of the calling thread, until `deadline` or until `isOver` (called with the mutex held) is
     // true.
+    //  isSleep  whether nothing but time ends it
     //  loop    whose performed blocks run meanwhile, or null
     //  result  the last answer of isOver
-    bool wait(Lock& lock, Wait::Kind kind, nanoseconds deadline, const Destination* loop,
+    bool wait(Lock& lock, bool isSleep, nanoseconds deadline, const Destination* loop,
               const std::function<bool()>& isOver);
 
     // Runs what is due and was posted before the call, as long as isOver is false.
@@ -103,15 +105,14 @@ struct VirtualTime::Core {
     int busyThreads = 0;                        // in a block, and not in a wait inside it
     std::int64_t outstanding = 0;               // the sum of all groups' counts
     std::map<std::uint64_t, std::shared_ptr<Loop>> loops;
-    std::vector<Wait> waits;
-    std::vector<std::string> queueNames;
 };
 
 void VirtualTime::Core::post(const std::shared_ptr<Destination>& destination, nanoseconds delay,
                              std::function<void()> block) {
     const std::lock_guard lock(mutex);
-    if (isClosed)
+    if (isClosed) {
         return;
+    }
     items.emplace(Place{later(now, delay), nextSequence++}, Item{destination, std::move(block)});
     changed.notify_all();
 }
@@ -138,8 +139,9 @@ void VirtualTime::Core::run(Lock& lock, Item item) {
     item.block = nullptr; // without the mutex: what the block holds may be handles of this object
     lock.lock();
     --busyThreads;
-    if (--blocksOnStack[thread] == 0)
+    if (--blocksOnStack[thread] == 0) {
         blocksOnStack.erase(thread);
+    }
     item.destination->running = false;
     changed.notify_all();
 }
@@ -149,8 +151,9 @@ bool VirtualTime::Core::runDue(Lock& lock, const Destination* loop, const std::f
     bool ranPerformedBlock = false;
     while (!isOver()) {
         const auto next = firstRunnable(loop);
-        if (next == items.end() || next->first.due > now || next->first.sequence >= end)
+        if (next == items.end() || next->first.due > now || next->first.sequence >= end) {
             break;
+        }
         Item item = std::move(next->second);
         items.erase(next);
         ranPerformedBlock |= item.destination->thread.has_value();
@@ -159,7 +162,7 @@ bool VirtualTime::Core::runDue(Lock& lock, const Destination* loop, const std::f
     return ranPerformedBlock;
 }
 
-bool VirtualTime::Core::wait(Lock& lock, Wait::Kind kind, nanoseconds deadline, const Destination* loop,
+bool VirtualTime::Core::wait(Lock& lock, bool isSleep, nanoseconds deadline, const Destination* loop,
                              const std::function<bool()>& isOver) {
     const std::uint64_t thread = threadNumber();
     const bool isInBlock = blocksOnStack.contains(thread);
@@ -170,23 +173,28 @@ bool VirtualTime::Core::wait(Lock& lock, Wait::Kind kind, nanoseconds deadline, 
     while (!isClosed) {
         // A run loop without a source still runs everything that is due.
         ranPerformedBlock |= loop ? runDue(lock, loop, [] { return false; }) : runDue(lock, loop, isOver);
-        if (isOver() || now >= deadline)
+        if (isOver() || now >= deadline) {
             break;
+        }
         const auto next = firstRunnable(loop);
-        if (next != items.end() && next->first.due <= now)
+        if (next != items.end() && next->first.due <= now) {
             continue;
+        }
 
         const bool standsStill =
-            outstandingWork == OutstandingWork::OnRealThreads && kind != Wait::Kind::Sleep && outstanding > 0;
+            outstandingWork == OutstandingWork::OnRealThreads && !isSleep && outstanding > 0;
         // The caller has something new to look at, and no deadline will come to give it the turn.
-        if (standsStill && (loop ? ranPerformedBlock : hasPerformedBlocks(thread)))
+        if (standsStill && (loop ? ranPerformedBlock : hasPerformedBlocks(thread))) {
             break;
+        }
         const bool othersAreBehind = busyThreads > 0 || (!deadlines.empty() && *deadlines.begin() <= now);
         nanoseconds target = deadline;
-        if (!deadlines.empty())
+        if (!deadlines.empty()) {
             target = std::min(target, *deadlines.begin());
-        if (next != items.end())
+        }
+        if (next != items.end()) {
             target = std::min(target, next->first.due);
+        }
         if (standsStill || othersAreBehind || target == never) {
             const auto ownDeadline = deadlines.insert(deadline);
             changed.wait(lock);
@@ -201,8 +209,6 @@ bool VirtualTime::Core::wait(Lock& lock, Wait::Kind kind, nanoseconds deadline, 
     changed.notify_all();
     return isOver();
 }
-
-// --------------------------------------------------------------------------------------------------------
 
 class VirtualTime::Port final : public platform::RunLoopPort {
   public:
@@ -235,8 +241,7 @@ class VirtualTime::Loop final : public platform::RunLoop {
 
     void run(nanoseconds duration) override {
         Lock lock(_core->mutex);
-        _core->waits.push_back({Wait::Kind::Run, duration});
-        _core->wait(lock, Wait::Kind::Run, later(_core->now, duration), _destination.get(), [this] {
+        _core->wait(lock, false, later(_core->now, duration), _destination.get(), [this] {
             return _destination->ports == 0 && !_core->hasPerformedBlocks(*_destination->thread);
         });
     }
@@ -294,8 +299,9 @@ class VirtualTime::Group final : public platform::WorkGroup {
 
     void leave() override {
         const std::lock_guard lock(_core->mutex);
-        if (_count == 0)
+        if (_count == 0) {
             return;
+        }
         --_count;
         --_core->outstanding;
         _core->changed.notify_all();
@@ -303,17 +309,13 @@ class VirtualTime::Group final : public platform::WorkGroup {
 
     bool wait(nanoseconds timeOut) override {
         Lock lock(_core->mutex);
-        _core->waits.push_back({Wait::Kind::Group, timeOut});
-        return _core->wait(lock, Wait::Kind::Group, later(_core->now, timeOut), nullptr,
-                           [this] { return _count == 0; });
+        return _core->wait(lock, false, later(_core->now, timeOut), nullptr, [this] { return _count == 0; });
     }
 
   private:
     const std::shared_ptr<Core> _core;
     std::int64_t _count = 0;
 };
-
-// --------------------------------------------------------------------------------------------------------
 
 VirtualTime::VirtualTime(OutstandingWork outstandingWork)
     : _core(std::make_shared<Core>(outstandingWork)),
@@ -338,21 +340,19 @@ nanoseconds VirtualTime::now() {
 
 void VirtualTime::sleep(nanoseconds duration) {
     Lock lock(_core->mutex);
-    _core->waits.push_back({Wait::Kind::Sleep, duration});
-    _core->wait(lock, Wait::Kind::Sleep, later(_core->now, duration), nullptr, [] { return false; });
+    _core->wait(lock, true, later(_core->now, duration), nullptr, [] { return false; });
 }
 
 std::shared_ptr<platform::RunLoop> VirtualTime::current() {
     const std::lock_guard lock(_core->mutex);
     std::shared_ptr<Loop>& loop = _core->loops[threadNumber()];
-    if (!loop)
+    if (!loop) {
         loop = std::make_shared<Loop>(_core);
+    }
     return loop;
 }
 
-std::shared_ptr<platform::DispatchQueue> VirtualTime::createSerial(const std::string& name) {
-    const std::lock_guard lock(_core->mutex);
-    _core->queueNames.push_back(name);
+std::shared_ptr<platform::DispatchQueue> VirtualTime::createSerial(const std::string& /*name*/) {
     return std::make_shared<Queue>(_core, true);
 }
 
@@ -362,26 +362,6 @@ platform::DispatchQueue& VirtualTime::global() {
 
 std::shared_ptr<platform::WorkGroup> VirtualTime::createGroup() {
     return std::make_shared<Group>(_core);
-}
-
-void VirtualTime::settle() {
-    Lock lock(_core->mutex);
-    const auto isOver = [this] {
-        const auto next = _core->firstRunnable(nullptr);
-        return next == _core->items.end() || next->first.due > _core->now;
-    };
-    while (!_core->wait(lock, Wait::Kind::Sleep, _core->now, nullptr, isOver)) {
-    }
-}
-
-std::vector<VirtualTime::Wait> VirtualTime::waits() const {
-    const std::lock_guard lock(_core->mutex);
-    return _core->waits;
-}
-
-std::vector<std::string> VirtualTime::queueNames() const {
-    const std::lock_guard lock(_core->mutex);
-    return _core->queueNames;
 }
 
 } // namespace welcomer::simulated

@@ -9,7 +9,6 @@
 #include <chrono>
 #include <memory>
 #include <string>
-#include <vector>
 
 namespace welcomer::simulated {
 
@@ -32,27 +31,19 @@ namespace welcomer::simulated {
 // largest durations) with nothing due really waits, for another thread to post something.
 //
 // Handles may outlive the object; what is posted to them is then dropped, and every wait ends at once.
-class VirtualTime final : public platform::Clock, public platform::RunLoops, public platform::DispatchQueues {
+class VirtualTime : public platform::Clock, public platform::RunLoops, public platform::DispatchQueues {
   public:
     // What a wait does when nothing is due although some group is not empty.
     enum class OutstandingWork {
         // Time advances: nothing but what is scheduled on this object can leave a group. For tests.
         Simulated,
         // Time stands still while any group is not empty, because real threads are doing the work:
-        // WorkGroup::wait
-        // and RunLoop::run really wait, without polling, until the group is left or something is posted.
+        // WorkGroup::wait and RunLoop::run really wait, without polling, until the group is left or something
+        // is posted.
         // So that nobody waits for a deadline that does not come, WorkGroup::wait times out at once when a
         // block was performed on its thread's run loop, and RunLoop::run ends once it has run such a block.
         // Clock::sleep advances as always: a job of a group can sleep.
         OnRealThreads,
-    };
-
-    // One call that waited, as it was asked for.
-    struct Wait {
-        enum class Kind { Sleep, Run, Group };
-        Kind kind;
-        std::chrono::nanoseconds duration;
-        friend bool operator==(const Wait&, const Wait&) = default;
     };
 
     explicit VirtualTime(OutstandingWork outstandingWork = OutstandingWork::Simulated);
@@ -71,16 +62,6 @@ class VirtualTime final : public platform::Clock, public platform::RunLoops, pub
     std::shared_ptr<platform::DispatchQueue> createSerial(const std::string& name) override;
     platform::DispatchQueue& global() override;
     std::shared_ptr<platform::WorkGroup> createGroup() override;
-
-    // Runs the queues' blocks that are due, without advancing time. Any thread.
-    void settle();
-
-    // Every wait so far, in the order of the calls. To have something happen at a given time, post it to
-    // global() with a delay. Any thread.
-    std::vector<Wait> waits() const;
-
-    // The names of the serial queues created so far, in the order of their creation. Any thread.
-    std::vector<std::string> queueNames() const;
 
   private:
     struct Core;

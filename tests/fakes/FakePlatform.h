@@ -2,7 +2,6 @@
 
 #pragma once
 
-#include "backends/simulated/VirtualTime.h"
 #include "platform/Platform.h"
 #include "tests/fakes/CallRecorder.h"
 #include "tests/fakes/FakeAccountService.h"
@@ -20,6 +19,7 @@
 #include "tests/fakes/FakeResourceBundles.h"
 #include "tests/fakes/FakeSystemLog.h"
 #include "tests/fakes/FakeSystemVersionInfo.h"
+#include "tests/fakes/RecordedTime.h"
 
 #include <type_traits>
 
@@ -52,7 +52,7 @@ class FakePlatform {
     FakePreferenceStore preferenceStore{recorder};
     FakeSystemVersionInfo systemVersionInfo{recorder};
     FakeHostReachability hostReachability{recorder};
-    simulated::VirtualTime virtualTime; // the clock, the run loops and the queues
+    RecordedTime virtualTime; // the clock, the run loops and the queues
     FakeNotificationCenter notificationCenter;
     FakeAccountService accountService{recorder, notificationCenter, virtualTime, virtualTime};
     FakeProcessLauncher processLauncher{recorder};

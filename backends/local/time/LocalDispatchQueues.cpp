@@ -89,8 +89,9 @@ class LocalDispatchQueues::Pool : public std::enable_shared_from_this<Pool> {
 
 void LocalDispatchQueues::Pool::post(const std::shared_ptr<SerialBlocks>& serial, Block block) {
     Lock lock(_mutex);
-    if (_isClosed)
+    if (_isClosed) {
         return;
+    }
     _makeReady({serial, std::move(block)});
     _startWorkerOrRunHere(lock);
 }
@@ -102,11 +103,13 @@ void LocalDispatchQueues::Pool::postAfter(std::chrono::nanoseconds delay,
         return;
     }
     Lock lock(_mutex);
-    if (_isClosed)
+    if (_isClosed) {
         return;
+    }
     const auto added = _delayed.emplace(momentAfter(delay), Work{serial, std::move(block)});
-    if (added == _delayed.begin())
+    if (added == _delayed.begin()) {
         _timekeeperIsNeeded.notify_one();
+    }
     _startWorkerOrRunHere(lock);
 }
 
@@ -116,17 +119,20 @@ void LocalDispatchQueues::Pool::_makeReady(Work work) {
         return;
     }
     work.serial->waiting.push_back(std::move(work.block));
-    if (std::exchange(work.serial->isScheduled, true))
+    if (std::exchange(work.serial->isScheduled, true)) {
         return;
+    }
     _ready.push_back({std::move(work.serial), nullptr});
 }
 
 void LocalDispatchQueues::Pool::_makeDueReady() {
-    if (_delayed.empty())
+    if (_delayed.empty()) {
         return;
+    }
     const auto notDue = _delayed.upper_bound(steady_clock::now());
-    for (auto due = _delayed.begin(); due != notDue; due = _delayed.erase(due))
+    for (auto due = _delayed.begin(); due != notDue; due = _delayed.erase(due)) {
         _makeReady(std::move(due->second));
+    }
 }
 
 bool LocalDispatchQueues::Pool::_mustKeepTime() const {
@@ -134,8 +140,9 @@ bool LocalDispatchQueues::Pool::_mustKeepTime() const {
 }
 
 void LocalDispatchQueues::Pool::_startWorker(Lock& lock) {
-    if (_isClosed || _isStarting || (_ready.empty() && !_mustKeepTime()))
+    if (_isClosed || _isStarting || (_ready.empty() && !_mustKeepTime())) {
         return;
+    }
     _isStarting = true;
     ++_workers;
     lock.unlock();
@@ -145,8 +152,9 @@ void LocalDispatchQueues::Pool::_startWorker(Lock& lock) {
         pool->_work(workersLock, true);
     });
     lock.lock();
-    if (started)
+    if (started) {
         return;
+    }
     _isStarting = false;
     --_workers;
     _workersAreGone.notify_all();
@@ -155,8 +163,9 @@ void LocalDispatchQueues::Pool::_startWorker(Lock& lock) {
 
 void LocalDispatchQueues::Pool::_startWorkerOrRunHere(Lock& lock) {
     _startWorker(lock);
-    if (_workers > 0 || _ready.empty() || _isClosed)
+    if (_workers > 0 || _ready.empty() || _isClosed) {
         return;
+    }
     ++_workers;
     _work(lock, false);
 }
@@ -191,11 +200,12 @@ void LocalDispatchQueues::Pool::_runNext(Lock& lock) {
     call(work.block);
     work.block = nullptr; // without the mutex: it may hold a queue, or post when it is released
     lock.lock();
-    if (!work.serial)
+    if (!work.serial) {
         return;
-    if (work.serial->waiting.empty())
+    }
+    if (work.serial->waiting.empty()) {
         work.serial->isScheduled = false;
-    else
+    } else
         _ready.push_back(std::move(work));
 }
 
@@ -210,8 +220,9 @@ void LocalDispatchQueues::Pool::close() {
     ready.swap(_ready);
     delayed.swap(_delayed);
     for (const Work& work : ready) {
-        if (work.serial)
+        if (work.serial) {
             serialBlocks.push_back(std::exchange(work.serial->waiting, {}));
+        }
     }
     lock.unlock(); // what the blocks hold is released without the mutex
 }

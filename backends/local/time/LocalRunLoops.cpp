@@ -62,10 +62,12 @@ void LocalRunLoop::run(std::chrono::nanoseconds duration) {
         const auto hasNews = [this] {
             return !_pending.empty() || _ports == 0;
         };
-        if (_pending.empty() && _ports == 0)
+        if (_pending.empty() && _ports == 0) {
             return;
-        if (steady_clock::now() >= deadline || !_changed.wait_until(lock, deadline, hasNews))
+        }
+        if (steady_clock::now() >= deadline || !_changed.wait_until(lock, deadline, hasNews)) {
             return;
+        }
     }
 }
 
@@ -86,8 +88,9 @@ void LocalRunLoop::_runPendingBlocks(std::unique_lock<std::mutex>& lock) {
 
 void LocalRunLoop::perform(std::function<void()> block) {
     const std::lock_guard lock(_mutex);
-    if (_isClosed)
+    if (_isClosed) {
         return;
+    }
     _pending.push_back(std::move(block));
     _changed.notify_one();
 }
@@ -103,8 +106,9 @@ void LocalRunLoop::addPort() {
 
 void LocalRunLoop::removePort() {
     const std::lock_guard lock(_mutex);
-    if (--_ports == 0)
+    if (--_ports == 0) {
         _changed.notify_one();
+    }
 }
 
 void LocalRunLoop::close() {

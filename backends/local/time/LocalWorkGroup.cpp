@@ -11,8 +11,9 @@ void LocalWorkGroup::enter() {
 
 void LocalWorkGroup::leave() {
     const std::lock_guard lock(_mutex);
-    if (_count > 0 && --_count == 0)
+    if (_count > 0 && --_count == 0) {
         _emptied.notify_all();
+    }
 }
 
 bool LocalWorkGroup::wait(std::chrono::nanoseconds timeOut) {

@@ -19,7 +19,7 @@ namespace {
 
 using namespace std::chrono_literals;
 using Lines = std::vector<std::string>;
-using Wait = simulated::VirtualTime::Wait;
+using Wait = fakes::RecordedTime::Wait;
 using Waits = std::vector<Wait>;
 using Operation = fakes::FakeCredentialStore::Operation;
 

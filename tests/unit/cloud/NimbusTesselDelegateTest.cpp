@@ -20,7 +20,7 @@ using namespace std::chrono_literals;
 using Strings = std::vector<std::string>;
 using Dictionary = PropertyList::Dictionary;
 using Answer = fakes::FakeAccountService::Answer;
-using Wait = simulated::VirtualTime::Wait;
+using Wait = fakes::RecordedTime::Wait;
 
 const Dictionary kEmptyRequest{{"delegates", Dictionary{{"com.corvid.skylark", Dictionary{}}}}};
 

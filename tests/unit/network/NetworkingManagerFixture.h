@@ -79,8 +79,8 @@ class NetworkingManagerTest : public testing::Test {
 
     std::size_t sleeps() const {
         return static_cast<std::size_t>(std::ranges::count(
-            fake.virtualTime.waits(), simulated::VirtualTime::Wait{simulated::VirtualTime::Wait::Kind::Sleep,
-                                                                   std::chrono::seconds(1)}));
+            fake.virtualTime.waits(),
+            fakes::RecordedTime::Wait{fakes::RecordedTime::Wait::Kind::Sleep, std::chrono::seconds(1)}));
     }
 
     fakes::FakePlatform fake;

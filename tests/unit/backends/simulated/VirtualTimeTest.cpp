@@ -1,4 +1,4 @@
-#include "backends/simulated/VirtualTime.h"
+#include "tests/fakes/RecordedTime.h"
 
 #include <gtest/gtest.h>
 
@@ -14,7 +14,7 @@ namespace welcomer::simulated {
 namespace {
 
 using namespace std::chrono_literals;
-using Wait = VirtualTime::Wait;
+using Wait = fakes::RecordedTime::Wait;
 using Names = std::vector<std::string>;
 
 class VirtualTimeTest : public testing::Test {
@@ -25,7 +25,7 @@ class VirtualTimeTest : public testing::Test {
         };
     }
 
-    VirtualTime time;
+    fakes::RecordedTime time;
     Names names;
 };
 
@@ -215,13 +215,11 @@ TEST_F(VirtualTimeTest, TimeStandsStillWhileAnotherThreadRunsABlock) {
     EXPECT_EQ(time.now(), 1s);
 }
 
-// --------------------------------------------------------------------------------------------------------
-
 class VirtualTimeWithRealThreadsTest : public VirtualTimeTest {
   protected:
     VirtualTimeWithRealThreadsTest() { group->enter(); }
 
-    VirtualTime real{VirtualTime::OutstandingWork::OnRealThreads};
+    fakes::RecordedTime real{VirtualTime::OutstandingWork::OnRealThreads};
     const std::shared_ptr<platform::WorkGroup> group = real.createGroup();
 };
 
