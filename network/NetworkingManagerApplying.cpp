@@ -1,10 +1,10 @@
+// What the user wants, stored and applied.
+
 #include "network/NetworkingManager.h"
 
-#include "generated/WelcomerConfiguration.h"
 #include "log/PCLogManager.h"
 #include "network/NCUtils.h"
 #include "network/WLPortScanner.h"
-#include "platform/NetworkStateStore.h"
 #include "platform/Platform.h"
 #include "propertylist/UTF8.h"
 
@@ -15,71 +15,28 @@
 #include <limits>
 #include <string_view>
 #include <utility>
+#include <vector>
 
 namespace welcomer {
 
 namespace {
 
-using platform::NetworkDomain;
-using platform::NetworkEntity;
-using platform::NetworkStateKey;
 using Text = NetworkingManager::Text;
 using TextList = NetworkingManager::TextList;
 using Dictionary = PropertyList::Dictionary;
 
-constexpr char kStateClientName[] = "Welcomer";
-constexpr char kLinkClientName[] = "FirstRun"; // another name than above
 constexpr char kPreferencesName[] = "com.corvid.FirstRun";
 constexpr char kDebugDefault[] = "WLNetworkingManagerDebug";
-constexpr char kInternalMarker[] = "/CorvidInternal";
-constexpr char kLinkLocalPrefix[] = "169.254.";
 constexpr char kNoAddress[] = "0.0.0.0";
 constexpr int kMaximumRetries = 60;
 constexpr std::chrono::seconds kOneSecond{1};
-constexpr std::ptrdiff_t kNodesWanted = 3;
-
-constexpr char kReadDefaultsFunction[] = "-[NetworkingManager _readDefaultConfiguration]";
 constexpr char kPreferencesFunction[] = "-[NetworkingManager systemPreferences]";
-constexpr char kDynamicFunction[] = "-[NetworkingManager hasUsableDynamicEthernetConfiguration]";
-constexpr char kDirectoryFunction[] = "-[NetworkingManager dirServiceNodesExist]";
 constexpr char kApplyFunction[] = "-[NetworkingManager applySettings:]";
 constexpr char kManualFunction[] = "-[NetworkingManager configureManual]";
 constexpr char kServiceFunction[] = "-[NetworkingManager configureService:]";
 constexpr char kDNSFunction[] = "-[NetworkingManager _setManualDNS:dns:]";
 constexpr char kCommitFunction[] = "-[NetworkingManager commitPrefs]";
 constexpr char kRegisterFunction[] = "-[NetworkingManager registerNewNetworkServices]";
-
-Text textOf(const PropertyList* value) {
-    const std::string* text = value ? value->string() : nullptr;
-    return text ? Text(*text) : std::nullopt;
-}
-
-Text textOf(const Dictionary& values, const char* key) {
-    const auto found = values.find(key);
-    return found == values.end() ? std::nullopt : textOf(&found->second);
-}
-
-// The texts of a list; what else is in it is left out.
-TextList listOf(const Dictionary& values, const char* key) {
-    const auto found = values.find(key);
-    const PropertyList::Array* array = found == values.end() ? nullptr : found->second.array();
-    if (!array) {
-        return std::nullopt;
-    }
-    std::vector<std::string> list;
-    for (const PropertyList& each : *array) {
-        if (const std::string* text = each.string()) {
-            list.push_back(*text);
-        }
-    }
-    return list;
-}
-
-Text firstOf(const Dictionary& values, const char* key) {
-    const auto found = values.find(key);
-    const PropertyList::Array* array = found == values.end() ? nullptr : found->second.array();
-    return array && !array->empty() ? textOf(&array->front()) : std::nullopt;
-}
 
 // A value that a configuration cannot go without.
 const std::string& required(const Text& value, const char* name) {
@@ -130,28 +87,9 @@ bool storeEstablished(platform::NetworkConfigConnection& preferences, const char
     return true;
 }
 
-bool isDeviceLinkActive(const std::string& device) {
-    const auto store = platform::current().networkStateStore.open(kLinkClientName);
-    const auto link =
-        store
-            ? store->copyValue(NetworkStateKey::interface(NetworkDomain::State, device, NetworkEntity::Link))
-            : std::nullopt;
-    if (!link) {
-        return false;
-    }
-    const auto active = link->find(platform::kNetworkActive);
-    return active != link->end() && active->second.boolean().value_or(false);
-}
-
 Dictionary errorDictionary(const char* titleKey, const char* bodyKey) {
     const auto bundle = platform::current().resourceBundles.openMainBundle();
     return {{"title", bundle->localizedString(titleKey, "")}, {"body", bundle->localizedString(bodyKey, "")}};
-}
-
-std::vector<std::string> authenticationSubnodeNames() {
-    const auto node =
-        platform::current().directoryService.openNode(platform::kDirectoryAuthenticationSearchNode);
-    return node ? node->subnodeNames() : std::vector<std::string>();
 }
 
 std::string_view withoutLeadingSpaces(std::string_view text) {
@@ -159,99 +97,6 @@ std::string_view withoutLeadingSpaces(std::string_view text) {
 }
 
 } // namespace
-
-NetworkingManager::NetworkingManager() {
-    _readDefaultConfiguration();
-}
-
-// Reading
-
-void NetworkingManager::_readDefaultConfiguration() {
-    auto store = platform::current().networkStateStore.open(kStateClientName);
-    if (!store) {
-        WL_LOG_AS(kReadDefaultsFunction, "NetworkingManager: error connecting to dynamic store");
-        return;
-    }
-    TextList dns;
-    Text domain;
-    if (const auto global =
-            store->copyValue(NetworkStateKey::global(NetworkDomain::State, NetworkEntity::DNS))) {
-        dns = listOf(*global, platform::kNetworkServerAddresses);
-        domain = textOf(*global, platform::kNetworkDomainName);
-    }
-    Text router;
-    Text method;
-    Text address;
-    Text mask;
-    if (const auto global =
-            store->copyValue(NetworkStateKey::global(NetworkDomain::State, NetworkEntity::IPv4))) {
-        router = textOf(*global, platform::kNetworkRouter);
-        if (const Text primary = textOf(*global, platform::kNetworkPrimaryService)) {
-            if (const auto setup = store->copyValue(
-                    NetworkStateKey::service(NetworkDomain::Setup, *primary, NetworkEntity::IPv4))) {
-                method = textOf(*setup, platform::kNetworkConfigMethod);
-            }
-            if (const auto state = store->copyValue(
-                    NetworkStateKey::service(NetworkDomain::State, *primary, NetworkEntity::IPv4))) {
-                address = firstOf(*state, platform::kNetworkAddresses);
-                mask = firstOf(*state, platform::kNetworkSubnetMasks);
-            }
-        }
-    }
-    store.reset();
-    if (address && !address->empty() && !address->starts_with(kLinkLocalPrefix)) {
-        _defaultConfigurationMethod.set(method);
-        _defaultIPAddress.set(address);
-        _defaultSubnetMask.set(mask);
-        _defaultRouter.set(router);
-        _defaultDNS.set(dns);
-        _defaultSearchDomains.set(domain ? std::vector{*domain} : std::vector<std::string>());
-    }
-    WL_LOG_AS(kReadDefaultsFunction, "--- WLCopyNetworkConfig ---");
-    WL_LOG_AS(kReadDefaultsFunction, "IP: %@", address);
-    WL_LOG_AS(kReadDefaultsFunction, "Mask: %@", mask);
-    WL_LOG_AS(kReadDefaultsFunction, "Router: %@", router);
-    if (dns) {
-        WL_LOG_AS(kReadDefaultsFunction, "DNS: %@", dns->empty() ? std::nullopt : Text(dns->front()));
-    }
-    WL_LOG_AS(kReadDefaultsFunction, "Domain: %@", domain);
-    WL_LOG_AS(kReadDefaultsFunction, "Config Method: %@", method);
-}
-
-Text NetworkingManager::_currentDHCPAddress() {
-    const auto store = platform::current().networkStateStore.open(kStateClientName);
-    if (!store) {
-        return std::nullopt;
-    }
-    const auto global = store->copyValue(NetworkStateKey::global(NetworkDomain::State, NetworkEntity::IPv4));
-    const Text primary = global ? textOf(*global, platform::kNetworkPrimaryService) : std::nullopt;
-    if (!primary) {
-        return std::nullopt;
-    }
-    // Read and dropped: the method does not matter.
-    static_cast<void>(
-        store->copyValue(NetworkStateKey::service(NetworkDomain::Setup, *primary, NetworkEntity::IPv4)));
-    const auto state =
-        store->copyValue(NetworkStateKey::service(NetworkDomain::State, *primary, NetworkEntity::IPv4));
-    Text address = state ? firstOf(*state, platform::kNetworkAddresses) : std::nullopt;
-    return address && address->empty() ? std::nullopt : address;
-}
-
-Text NetworkingManager::defaultIP4ConfigurationMethod() {
-    const auto set = _currentSet();
-    const auto service = NCUtils::serviceInSetWithHardwareKey(set.get(), _hardwareKey());
-    const auto protocol = service ? service->copyProtocol(platform::kNetworkProtocolIPv4) : nullptr;
-    const auto configuration = protocol ? protocol->configuration() : std::nullopt;
-    return configuration ? textOf(*configuration, platform::kNetworkConfigMethod) : std::nullopt;
-}
-
-Text NetworkingManager::_hardwareKey() const {
-    if (userSaidConfigureLAN()) {
-        return platform::kNetworkEthernet;
-    }
-    static_cast<void>(userSaidConfigureWiFi()); // every other choice is wireless all the same
-    return platform::kNetworkWireless;
-}
 
 std::shared_ptr<platform::NetworkConfigConnection> NetworkingManager::systemPreferences() {
     if (_prefs) {
@@ -288,93 +133,6 @@ std::shared_ptr<platform::NetworkConfigConnection> NetworkingManager::systemPref
 std::shared_ptr<platform::NetworkSet> NetworkingManager::_currentSet() {
     return systemPreferences()->copyCurrentSet();
 }
-
-// Probing
-
-bool NetworkingManager::internetIsReachable() {
-    const std::optional<std::uint32_t> flags =
-        platform::current()
-            .hostReachability.createTarget(std::string(configuration::kPublicWebHost))
-            ->flags();
-    constexpr std::uint32_t kMask = platform::kHostReachable | platform::kHostConnectionRequired;
-    return flags && (*flags & kMask) == platform::kHostReachable;
-}
-
-bool NetworkingManager::isOnCorvidInternalNetwork() {
-    const Text address = _currentDHCPAddress();
-    return address && address->starts_with(configuration::kInternalAddressPrefix) &&
-           platform::current().fileSystem.exists(kInternalMarker);
-}
-
-std::optional<NetworkingManager::Services> NetworkingManager::servicesWithEthernetPluggedIn() {
-    const auto set = _currentSet();
-    std::optional<Services> services =
-        NCUtils::servicesInSetWithHardwareKey(set.get(), platform::kNetworkEthernet);
-    if (services) {
-        std::erase_if(*services, [](const auto& service) {
-            const platform::NetworkInterface* interface =
-                NCUtils::interfaceInServiceWithType(service.get(), platform::kNetworkEthernet);
-            const Text device = interface ? interface->deviceName() : std::nullopt;
-            return !device || !isDeviceLinkActive(*device);
-        });
-    }
-    return services;
-}
-
-bool NetworkingManager::isEthernetCablePluggedIn() {
-    const std::optional<Services> services = servicesWithEthernetPluggedIn();
-    return services && !services->empty();
-}
-
-bool NetworkingManager::hasUsableDynamicEthernetConfiguration() {
-    const auto set = _currentSet();
-    const auto service = NCUtils::serviceInSetWithHardwareKey(set.get(), platform::kNetworkEthernet);
-    const auto protocol = service ? service->copyProtocol(platform::kNetworkProtocolIPv4) : nullptr;
-    const auto configuration = protocol ? protocol->configuration() : std::nullopt;
-    const Text method = configuration ? textOf(*configuration, platform::kNetworkConfigMethod) : std::nullopt;
-    if (!method) {
-        return false;
-    }
-    WL_LOG_AS(kDynamicFunction, "NetworkingManager: hasUsableDynamicEthernetConfiguration: (configMethod %@)",
-              *method);
-    if (*method != platform::kNetworkMethodBootP && *method != platform::kNetworkMethodDHCP &&
-        *method != platform::kNetworkMethodLinkLocal) {
-        return false;
-    }
-    if (_currentDHCPAddress()) {
-        return false;
-    }
-    const bool isReachable = internetIsReachable();
-    if (isReachable) {
-        WL_LOG_AS(kDynamicFunction, "hasUsableDynamicEthernetConfiguration: reg. host reachable.");
-    } else {
-        WL_LOG_AS(kDynamicFunction, "hasUsableDynamicEthernetConfiguration: reg. host *NOT* reachable.");
-    }
-    return isReachable;
-}
-
-bool NetworkingManager::dirServiceNodesExist() {
-    platform::DirectoryService& directory = platform::current().directoryService;
-    const std::vector<std::string> searchPath = authenticationSubnodeNames();
-    WL_LOG_AS(kDirectoryFunction, "NetworkingManager: DirService: search paths: %@", searchPath);
-    if (std::ranges::all_of(searchPath, [&](const auto& name) { return directory.isLocalNodeName(name); })) {
-        return false;
-    }
-    const auto node = directory.openNode(platform::kDirectoryAuthenticationSearchNode);
-    const std::vector<std::string> names = node ? node->subnodeNames() : std::vector<std::string>();
-    if (std::ssize(names) < kNodesWanted) {
-        return false;
-    }
-    const std::vector<std::string> unreachable = node->unreachableSubnodeNames();
-    WL_LOG_AS(kDirectoryFunction, "NetworkingManager: DirService: subnodeNames %@", names);
-    WL_LOG_AS(kDirectoryFunction, "NetworkingManager: DirService: unreachableSubnodeNames %@", unreachable);
-    const std::ptrdiff_t reachable = std::ranges::count_if(
-        names, [&](const auto& name) { return std::ranges::count(unreachable, name) == 0; });
-    WL_LOG_AS(kDirectoryFunction, "NetworkingManager: DirService: reachableNodes %ld", reachable);
-    return reachable >= kNodesWanted;
-}
-
-// Applying
 
 bool NetworkingManager::applySettings(PropertyList::Dictionary* error) {
     const std::uint64_t warningType = _internetConnectionWarningType;
