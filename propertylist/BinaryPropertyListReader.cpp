@@ -32,13 +32,13 @@ class BinaryPropertyListReader {
           _contentLeft(bytes.size() * kContentPerByte + kSharedContent) {}
 
     PropertyList readDocument() {
-        readTrailer();
+        _readTrailer();
         _isOpen.assign(_objectCount, false);
-        return readObject(_topObject, _trailerOffset);
+        return _readObject(_topObject, _trailerOffset);
     }
 
   private:
-    [[noreturn]] static void fail(std::size_t offset, const std::string& what) {
+    [[noreturn]] static void _fail(std::size_t offset, const std::string& what) {
         throw PropertyListReadError(what, offset);
     }
 
@@ -51,12 +51,12 @@ class BinaryPropertyListReader {
         return value;
     }
 
-    void readTrailer() {
+    void _readTrailer() {
         if (!_bytes.starts_with("bplist00")) {
-            fail(0, "not version 00 of the binary format");
+            _fail(0, "not version 00 of the binary format");
         }
         if (_bytes.size() < kHeaderSize + kTrailerSize) {
-            fail(_bytes.size(), "the data is too short for a binary property list");
+            _fail(_bytes.size(), "the data is too short for a binary property list");
         }
         _trailerOffset = _bytes.size() - kTrailerSize;
         _offsetSize = number(_trailerOffset + 6, 1);
@@ -65,22 +65,22 @@ class BinaryPropertyListReader {
         const std::uint64_t topObject = number(_trailerOffset + 16, 8);
         const std::uint64_t tableOffset = number(_trailerOffset + 24, 8);
         if (_offsetSize < 1 || _offsetSize > 8) {
-            fail(_trailerOffset + 6, "offsets of " + std::to_string(_offsetSize) + " bytes");
+            _fail(_trailerOffset + 6, "offsets of " + std::to_string(_offsetSize) + " bytes");
         }
         if (_referenceSize < 1 || _referenceSize > 8) {
-            fail(_trailerOffset + 7, "references of " + std::to_string(_referenceSize) + " bytes");
+            _fail(_trailerOffset + 7, "references of " + std::to_string(_referenceSize) + " bytes");
         }
         if (tableOffset < kHeaderSize || tableOffset > _trailerOffset) {
-            fail(_trailerOffset + 24, "the offset table lies outside the data");
+            _fail(_trailerOffset + 24, "the offset table lies outside the data");
         }
         _tableOffset = static_cast<std::size_t>(tableOffset);
         const std::size_t tableSize = _trailerOffset - _tableOffset;
         if (tableSize % _offsetSize != 0 || objectCount != tableSize / _offsetSize) {
-            fail(_trailerOffset + 8, "the offset table does not end where the trailer begins");
+            _fail(_trailerOffset + 8, "the offset table does not end where the trailer begins");
         }
         _objectCount = static_cast<std::size_t>(objectCount);
         if (topObject >= _objectCount) {
-            fail(_trailerOffset + 16, "there is no object " + std::to_string(topObject));
+            _fail(_trailerOffset + 16, "there is no object " + std::to_string(topObject));
         }
         _topObject = static_cast<std::size_t>(topObject);
     }
@@ -94,11 +94,11 @@ class BinaryPropertyListReader {
     };
 
     // The object with an index, which is below the object count.
-    Object findObject(std::size_t index) const {
+    Object _findObject(std::size_t index) const {
         const std::size_t entry = _tableOffset + index * _offsetSize;
         const std::uint64_t offset = number(entry, _offsetSize);
         if (offset < kHeaderSize || offset >= _tableOffset) {
-            fail(entry, "object " + std::to_string(index) + " lies outside the data");
+            _fail(entry, "object " + std::to_string(index) + " lies outside the data");
         }
         const unsigned marker = static_cast<unsigned char>(_bytes[static_cast<std::size_t>(offset)]);
         return {static_cast<std::size_t>(offset), marker >> 4, marker & 15,
@@ -106,87 +106,87 @@ class BinaryPropertyListReader {
     }
 
     // Makes sure that `count` items of `size` bytes each lie between `offset` and the offset table.
-    void requireContent(const Object& object, std::uint64_t count, std::size_t size) const {
+    void _requireContent(const Object& object, std::uint64_t count, std::size_t size) const {
         if (count > (_tableOffset - object.content) / size) {
-            fail(object.offset, "the object reaches beyond the objects' end");
+            _fail(object.offset, "the object reaches beyond the objects' end");
         }
     }
 
     // The number of items of an object; moves the content behind a count that stands apart.
-    std::size_t readCount(Object& object) const {
+    std::size_t _readCount(Object& object) const {
         std::uint64_t count = object.info;
         if (count == 15) {
-            requireContent(object, 1, 1);
+            _requireContent(object, 1, 1);
             const unsigned marker = static_cast<unsigned char>(_bytes[object.content]);
             const std::size_t size = std::size_t{1} << (marker & 15);
             if (marker >> 4 != 1 || size > 8) {
-                fail(object.content, "malformed count");
+                _fail(object.content, "malformed count");
             }
             ++object.content;
-            requireContent(object, size, 1);
+            _requireContent(object, size, 1);
             count = number(object.content, size);
             object.content += size;
         }
-        requireContent(object, count, 1);
+        _requireContent(object, count, 1);
         return static_cast<std::size_t>(count);
     }
 
-    void spend(std::uint64_t& left, std::uint64_t amount, const Object& object) const {
+    void _spend(std::uint64_t& left, std::uint64_t amount, const Object& object) const {
         if (amount > left) {
-            fail(object.offset, "shared objects make more than the input accounts for");
+            _fail(object.offset, "shared objects make more than the input accounts for");
         }
         left -= amount;
     }
 
     // The index that the reference at `offset` holds.
-    std::size_t readReference(std::size_t offset) const {
+    std::size_t _readReference(std::size_t offset) const {
         const std::uint64_t index = number(offset, _referenceSize);
         if (index >= _objectCount) {
-            fail(offset, "there is no object " + std::to_string(index));
+            _fail(offset, "there is no object " + std::to_string(index));
         }
         return static_cast<std::size_t>(index);
     }
 
     // Reads an object; the reference to it stands at `referenceOffset`.
-    PropertyList readObject(std::size_t index, std::size_t referenceOffset) {
-        Object object = findObject(index);
+    PropertyList _readObject(std::size_t index, std::size_t referenceOffset) {
+        Object object = _findObject(index);
         switch (object.kind) {
         case 0x0:
-            return readSingleton(object);
+            return _readSingleton(object);
         case 0x1:
-            return readInteger(object);
+            return _readInteger(object);
         case 0x2:
-            return readReal(object);
+            return _readReal(object);
         case 0x3:
-            return readDate(object);
+            return _readDate(object);
         case 0x4:
-            return readData(object);
+            return _readData(object);
         case 0x5:
         case 0x6:
-            return readString(object);
+            return _readString(object);
         case 0x8:
-            fail(object.offset, "a UID is no property-list value");
+            _fail(object.offset, "a UID is no property-list value");
         case 0xA:
         case 0xD:
-            return readContainer(object, index, referenceOffset);
+            return _readContainer(object, index, referenceOffset);
         default:
-            fail(object.offset, "unknown kind of object");
+            _fail(object.offset, "unknown kind of object");
         }
     }
 
-    static PropertyList readSingleton(const Object& object) {
+    static PropertyList _readSingleton(const Object& object) {
         if (object.info == 8 || object.info == 9) {
             return object.info == 9;
         }
-        fail(object.offset, object.info == 0 ? "null is no property-list value" : "unknown kind of object");
+        _fail(object.offset, object.info == 0 ? "null is no property-list value" : "unknown kind of object");
     }
 
-    PropertyList readInteger(const Object& object) const {
+    PropertyList _readInteger(const Object& object) const {
         if (object.info > 4) {
-            fail(object.offset, "malformed integer");
+            _fail(object.offset, "malformed integer");
         }
         const std::size_t size = std::size_t{1} << object.info;
-        requireContent(object, size, 1);
+        _requireContent(object, size, 1);
         // Shorter integers are unsigned; those of 8 and 16 bytes are signed.
         if (size < 8) {
             return number(object.content, size);
@@ -202,60 +202,60 @@ class BinaryPropertyListReader {
         if (high == ~std::uint64_t{0} && low >> 63 == 1) {
             return static_cast<std::int64_t>(low);
         }
-        fail(object.offset, "the integer does not fit 64 bits");
+        _fail(object.offset, "the integer does not fit 64 bits");
     }
 
-    PropertyList readReal(const Object& object) const {
+    PropertyList _readReal(const Object& object) const {
         if (object.info == 2) {
-            requireContent(object, 4, 1);
+            _requireContent(object, 4, 1);
             return std::bit_cast<float>(static_cast<std::uint32_t>(number(object.content, 4)));
         }
         if (object.info != 3) {
-            fail(object.offset, "malformed real");
+            _fail(object.offset, "malformed real");
         }
-        requireContent(object, 8, 1);
+        _requireContent(object, 8, 1);
         return std::bit_cast<double>(number(object.content, 8));
     }
 
-    PropertyList readDate(const Object& object) const {
+    PropertyList _readDate(const Object& object) const {
         if (object.info != 3) {
-            fail(object.offset, "malformed date");
+            _fail(object.offset, "malformed date");
         }
-        requireContent(object, 8, 1);
+        _requireContent(object, 8, 1);
         const auto secondsSince2001 = std::bit_cast<double>(number(object.content, 8));
         if (!std::isfinite(secondsSince2001)) {
-            fail(object.offset, "the date is not finite");
+            _fail(object.offset, "the date is not finite");
         }
         return PropertyList::Date{secondsSince2001 + kSecondsFrom1970To2001};
     }
 
-    PropertyList readData(Object& object) {
-        const std::size_t count = readCount(object);
-        spend(_contentLeft, count, object);
+    PropertyList _readData(Object& object) {
+        const std::size_t count = _readCount(object);
+        _spend(_contentLeft, count, object);
         return PropertyList::Data{std::string(_bytes.substr(object.content, count))};
     }
 
     // Reads an ASCII or a UTF-16 string.
-    std::string readString(Object& object) {
-        const std::size_t count = readCount(object);
+    std::string _readString(Object& object) {
+        const std::size_t count = _readCount(object);
         if (object.kind == 0x6) {
-            return readUTF16(object, count);
+            return _readUTF16(object, count);
         }
-        spend(_contentLeft, count, object);
+        _spend(_contentLeft, count, object);
         const std::string_view text = _bytes.substr(object.content, count);
         const auto isASCII = [](char character) {
             return static_cast<unsigned char>(character) < 0x80;
         };
         if (const auto other = std::find_if_not(text.begin(), text.end(), isASCII); other != text.end()) {
-            fail(object.content + static_cast<std::size_t>(other - text.begin()),
-                 "an ASCII string holds other bytes");
+            _fail(object.content + static_cast<std::size_t>(other - text.begin()),
+                  "an ASCII string holds other bytes");
         }
         return std::string(text);
     }
 
-    std::string readUTF16(const Object& object, std::size_t count) {
-        requireContent(object, count, 2);
-        spend(_contentLeft, std::uint64_t{count} * 3, object);
+    std::string _readUTF16(const Object& object, std::size_t count) {
+        _requireContent(object, count, 2);
+        _spend(_contentLeft, std::uint64_t{count} * 3, object);
         std::string text;
         text.reserve(count);
         for (std::size_t index = 0; index < count; ++index) {
@@ -269,56 +269,56 @@ class BinaryPropertyListReader {
                 }
             }
             if (isHighSurrogate(character) || isLowSurrogate(character)) {
-                fail(offset, "half a surrogate pair");
+                _fail(offset, "half a surrogate pair");
             }
             appendUTF8(text, character);
         }
         return text;
     }
 
-    PropertyList readContainer(Object& object, std::size_t index, std::size_t referenceOffset) {
+    PropertyList _readContainer(Object& object, std::size_t index, std::size_t referenceOffset) {
         if (_isOpen[index]) {
-            fail(referenceOffset, "an object contains itself");
+            _fail(referenceOffset, "an object contains itself");
         }
         if (_depth == kPropertyListMaximumDepth) {
-            fail(object.offset, "nested more than " + std::to_string(kPropertyListMaximumDepth) + " deep");
+            _fail(object.offset, "nested more than " + std::to_string(kPropertyListMaximumDepth) + " deep");
         }
-        const std::size_t count = readCount(object);
+        const std::size_t count = _readCount(object);
         _isOpen[index] = true;
         ++_depth;
-        PropertyList value = object.kind == 0xA ? readArray(object, count) : readDictionary(object, count);
+        PropertyList value = object.kind == 0xA ? _readArray(object, count) : _readDictionary(object, count);
         --_depth;
         _isOpen[index] = false;
         return value;
     }
 
-    PropertyList readArray(const Object& object, std::size_t count) {
-        requireContent(object, count, _referenceSize);
-        spend(_valuesLeft, count, object);
+    PropertyList _readArray(const Object& object, std::size_t count) {
+        _requireContent(object, count, _referenceSize);
+        _spend(_valuesLeft, count, object);
         PropertyList::Array array;
         array.reserve(count);
         for (std::size_t element = 0; element < count; ++element) {
             const std::size_t reference = object.content + element * _referenceSize;
-            array.push_back(readObject(readReference(reference), reference));
+            array.push_back(_readObject(_readReference(reference), reference));
         }
         return PropertyList(std::move(array));
     }
 
     // References to all keys come first, then those to the values in the same order.
-    PropertyList readDictionary(const Object& object, std::size_t count) {
-        requireContent(object, count, 2 * _referenceSize);
-        spend(_valuesLeft, std::uint64_t{count} * 2, object);
+    PropertyList _readDictionary(const Object& object, std::size_t count) {
+        _requireContent(object, count, 2 * _referenceSize);
+        _spend(_valuesLeft, std::uint64_t{count} * 2, object);
         PropertyList::Dictionary dictionary;
         for (std::size_t entry = 0; entry < count; ++entry) {
             const std::size_t keyReference = object.content + entry * _referenceSize;
             const std::size_t valueReference = keyReference + count * _referenceSize;
-            Object key = findObject(readReference(keyReference));
+            Object key = _findObject(_readReference(keyReference));
             if (key.kind != 0x5 && key.kind != 0x6) {
-                fail(keyReference, "a key is no string");
+                _fail(keyReference, "a key is no string");
             }
-            std::string name = readString(key);
+            std::string name = _readString(key);
             dictionary.insert_or_assign(dictionary.end(), std::move(name),
-                                        readObject(readReference(valueReference), valueReference));
+                                        _readObject(_readReference(valueReference), valueReference));
         }
         return PropertyList(std::move(dictionary));
     }

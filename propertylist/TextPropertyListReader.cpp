@@ -33,38 +33,38 @@ class TextPropertyListReader {
 
     PropertyList readDocument() {
         if (const std::size_t offset = findInvalidUTF8(_bytes); offset != std::string_view::npos) {
-            fail(offset, "invalid UTF-8");
+            _fail(offset, "invalid UTF-8");
         }
-        skip("\xEF\xBB\xBF");
-        skipIgnorable();
-        if (isAtEnd()) {
-            fail(_offset, "there is no value");
+        _skip("\xEF\xBB\xBF");
+        _skipIgnorable();
+        if (_isAtEnd()) {
+            _fail(_offset, "there is no value");
         }
         const std::size_t start = _offset;
-        PropertyList value = readValue();
-        skipIgnorable();
-        if (value.isString() && isNext("=")) {
+        PropertyList value = _readValue();
+        _skipIgnorable();
+        if (value.isString() && _isNext("=")) {
             _offset = start;
             ++_depth;
-            return readEntries("");
+            return _readEntries("");
         }
-        if (!isAtEnd()) {
-            fail(_offset, "unexpected content after the top-level value");
+        if (!_isAtEnd()) {
+            _fail(_offset, "unexpected content after the top-level value");
         }
         return value;
     }
 
   private:
-    [[noreturn]] static void fail(std::size_t offset, const std::string& what) {
+    [[noreturn]] static void _fail(std::size_t offset, const std::string& what) {
         throw PropertyListReadError(what, offset);
     }
 
-    bool isAtEnd() const { return _offset == _bytes.size(); }
-    char current() const { return _bytes[_offset]; }
-    bool isNext(std::string_view text) const { return _bytes.substr(_offset).starts_with(text); }
+    bool _isAtEnd() const { return _offset == _bytes.size(); }
+    char _current() const { return _bytes[_offset]; }
+    bool _isNext(std::string_view text) const { return _bytes.substr(_offset).starts_with(text); }
 
-    bool skip(std::string_view text) {
-        const bool found = isNext(text);
+    bool _skip(std::string_view text) {
+        const bool found = _isNext(text);
         if (found) {
             _offset += text.size();
         }
@@ -72,17 +72,17 @@ class TextPropertyListReader {
     }
 
     // Passes over white space and comments.
-    void skipIgnorable() {
-        while (!isAtEnd()) {
+    void _skipIgnorable() {
+        while (!_isAtEnd()) {
             const std::size_t start = _offset;
-            if (isWhiteSpace(current())) {
+            if (isWhiteSpace(_current())) {
                 ++_offset;
-            } else if (skip("//")) {
+            } else if (_skip("//")) {
                 _offset = std::min(_bytes.find_first_of("\r\n", _offset), _bytes.size());
-            } else if (skip("/*")) {
+            } else if (_skip("/*")) {
                 const std::size_t end = _bytes.find("*/", _offset);
                 if (end == std::string_view::npos) {
-                    fail(start, "unterminated comment");
+                    _fail(start, "unterminated comment");
                 }
                 _offset = end + 2;
             } else {
@@ -91,70 +91,70 @@ class TextPropertyListReader {
         }
     }
 
-    void expect(std::string_view text) {
-        skipIgnorable();
-        if (!skip(text)) {
-            fail(_offset, "expected \"" + std::string(text) + "\", found " + describeNext());
+    void _expect(std::string_view text) {
+        _skipIgnorable();
+        if (!_skip(text)) {
+            _fail(_offset, "expected \"" + std::string(text) + "\", found " + _describeNext());
         }
     }
 
-    std::string describeNext() const {
-        return isAtEnd() ? "the end" : "\"" + excerpt(_bytes.substr(_offset, 1)) + "\"";
+    std::string _describeNext() const {
+        return _isAtEnd() ? "the end" : "\"" + excerpt(_bytes.substr(_offset, 1)) + "\"";
     }
 
-    void enter() {
+    void _enter() {
         if (++_depth > kPropertyListMaximumDepth) {
-            fail(_offset, "nested more than " + std::to_string(kPropertyListMaximumDepth) + " deep");
+            _fail(_offset, "nested more than " + std::to_string(kPropertyListMaximumDepth) + " deep");
         }
     }
 
     // Reads the value at the next place that is not to be ignored.
-    PropertyList readValue() {
-        skipIgnorable();
-        if (isNext("{")) {
-            enter();
+    PropertyList _readValue() {
+        _skipIgnorable();
+        if (_isNext("{")) {
+            _enter();
             ++_offset;
-            return readEntries("}");
+            return _readEntries("}");
         }
-        if (isNext("(")) {
-            return readArray();
+        if (_isNext("(")) {
+            return _readArray();
         }
-        if (isNext("<")) {
-            return readData();
+        if (_isNext("<")) {
+            return _readData();
         }
-        return readString();
+        return _readString();
     }
 
     // Reads the entries of a dictionary through its `end`, or to the end of the document if that is empty.
-    PropertyList readEntries(std::string_view end) {
+    PropertyList _readEntries(std::string_view end) {
         PropertyList::Dictionary dictionary;
         for (;;) {
-            skipIgnorable();
-            if (end.empty() ? isAtEnd() : skip(end)) {
+            _skipIgnorable();
+            if (end.empty() ? _isAtEnd() : _skip(end)) {
                 --_depth;
                 return PropertyList(std::move(dictionary));
             }
-            std::string key = readString();
-            expect("=");
-            PropertyList value = readValue();
-            expect(";");
+            std::string key = _readString();
+            _expect("=");
+            PropertyList value = _readValue();
+            _expect(";");
             dictionary.insert_or_assign(std::move(key), std::move(value));
         }
     }
 
-    PropertyList readArray() {
-        enter();
+    PropertyList _readArray() {
+        _enter();
         ++_offset;
         PropertyList::Array array;
         for (;;) {
-            skipIgnorable();
-            if (skip(")")) {
+            _skipIgnorable();
+            if (_skip(")")) {
                 break;
             }
-            array.push_back(readValue());
-            skipIgnorable();
-            if (!skip(",")) {
-                expect(")");
+            array.push_back(_readValue());
+            _skipIgnorable();
+            if (!_skip(",")) {
+                _expect(")");
                 break;
             }
         }
@@ -162,24 +162,24 @@ class TextPropertyListReader {
         return PropertyList(std::move(array));
     }
 
-    PropertyList readData() {
+    PropertyList _readData() {
         const std::size_t start = _offset++;
         PropertyList::Data data;
         unsigned high = 16; // the first digit of a byte, 16 before it
-        for (; !isAtEnd(); ++_offset) {
-            if (isWhiteSpace(current())) {
+        for (; !_isAtEnd(); ++_offset) {
+            if (isWhiteSpace(_current())) {
                 continue;
             }
-            if (current() == '>') {
+            if (_current() == '>') {
                 if (high != 16) {
-                    fail(_offset, "data ends within a byte");
+                    _fail(_offset, "data ends within a byte");
                 }
                 ++_offset;
                 return PropertyList(std::move(data));
             }
-            const unsigned digit = hexadecimalDigit(current());
+            const unsigned digit = hexadecimalDigit(_current());
             if (digit == 16) {
-                fail(_offset, "expected a hexadecimal digit, found " + describeNext());
+                _fail(_offset, "expected a hexadecimal digit, found " + _describeNext());
             }
             if (high == 16) {
                 high = digit;
@@ -188,26 +188,26 @@ class TextPropertyListReader {
                 high = 16;
             }
         }
-        fail(start, "unterminated data");
+        _fail(start, "unterminated data");
     }
 
     // A quoted string or a word.
-    std::string readString() {
-        if (isNext("\"") || isNext("'")) {
-            return readQuotedString();
+    std::string _readString() {
+        if (_isNext("\"") || _isNext("'")) {
+            return _readQuotedString();
         }
         const std::size_t start = _offset;
         // Slashes belong to the word, so that addresses need no quotes; an asterisk cannot.
-        while (!isAtEnd() && isWordCharacter(current()) && !isNext("/*")) {
+        while (!_isAtEnd() && isWordCharacter(_current()) && !_isNext("/*")) {
             ++_offset;
         }
         if (_offset == start) {
-            fail(start, "expected a value, found " + describeNext());
+            _fail(start, "expected a value, found " + _describeNext());
         }
         return std::string(_bytes.substr(start, _offset - start));
     }
 
-    std::string readQuotedString() {
+    std::string _readQuotedString() {
         const std::size_t start = _offset;
         const char quote = _bytes[_offset++];
         const char endings[] = {quote, '\\'};
@@ -215,23 +215,23 @@ class TextPropertyListReader {
         for (;;) {
             const std::size_t end = _bytes.find_first_of({endings, 2}, _offset);
             if (end == std::string_view::npos) {
-                fail(start, "unterminated string");
+                _fail(start, "unterminated string");
             }
             text += _bytes.substr(_offset, end - _offset);
             _offset = end + 1;
             if (_bytes[end] == quote) {
                 return text;
             }
-            if (isAtEnd()) {
-                fail(start, "unterminated string");
+            if (_isAtEnd()) {
+                _fail(start, "unterminated string");
             }
-            readEscape(text, end);
+            _readEscape(text, end);
         }
     }
 
     // Reads what follows a backslash, which stands at `start`.
-    void readEscape(std::string& text, std::size_t start) {
-        const char character = current();
+    void _readEscape(std::string& text, std::size_t start) {
+        const char character = _current();
         if (character >= '0' && character <= '7') {
             appendUTF8(text, readDigits(3, 8, start));
             return;
@@ -272,11 +272,11 @@ class TextPropertyListReader {
     char32_t readDigits(int most, unsigned base, std::size_t start) {
         char32_t value = 0;
         int count = 0;
-        for (; count < most && !isAtEnd() && hexadecimalDigit(current()) < base; ++count, ++_offset) {
-            value = value * base + hexadecimalDigit(current());
+        for (; count < most && !_isAtEnd() && hexadecimalDigit(_current()) < base; ++count, ++_offset) {
+            value = value * base + hexadecimalDigit(_current());
         }
         if (count == 0) {
-            fail(start, "an escape without digits");
+            _fail(start, "an escape without digits");
         }
         return value;
     }
@@ -284,14 +284,14 @@ class TextPropertyListReader {
     // Reads the unit of a \U escape and, when it is the first half of a pair, the escape after it.
     char32_t readUTF16(std::size_t start) {
         const char32_t unit = readDigits(4, 16, start);
-        if (isHighSurrogate(unit) && skip("\\U")) {
+        if (isHighSurrogate(unit) && _skip("\\U")) {
             const char32_t low = readDigits(4, 16, start);
             if (isLowSurrogate(low)) {
                 return joinSurrogates(unit, low);
             }
         }
         if (isHighSurrogate(unit) || isLowSurrogate(unit)) {
-            fail(start, "half a surrogate pair");
+            _fail(start, "half a surrogate pair");
         }
         return unit;
     }

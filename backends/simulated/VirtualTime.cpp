@@ -21,13 +21,13 @@ using std::chrono::nanoseconds;
 using Lock = std::unique_lock<std::mutex>;
 
 // A moment that no clock reaches.
-constexpr nanoseconds never = nanoseconds::max();
+constexpr nanoseconds kNever = nanoseconds::max();
 
 nanoseconds later(nanoseconds moment, nanoseconds duration) {
     if (duration <= nanoseconds::zero()) {
         return moment;
     }
-    return duration < never - moment ? moment + duration : never;
+    return duration < kNever - moment ? moment + duration : kNever;
 }
 
 // Thread identifiers are used again once a thread has ended; these numbers are not.
@@ -195,7 +195,7 @@ bool VirtualTime::Core::wait(Lock& lock, bool isSleep, nanoseconds deadline, con
         if (next != items.end()) {
             target = std::min(target, next->first.due);
         }
-        if (standsStill || othersAreBehind || target == never) {
+        if (standsStill || othersAreBehind || target == kNever) {
             const auto ownDeadline = deadlines.insert(deadline);
             changed.wait(lock);
             deadlines.erase(ownDeadline);

@@ -1,4 +1,5 @@
 // A setup application in small: it reads a property list and lists the delegate plug-ins below a root folder.
+//   --without-platform   forgets to build the platform first
 
 #include "backends/Backends.h"
 #include "plugins/WLNimbusDelegatePlugins.h"
@@ -6,8 +7,12 @@
 #include "text/Describe.h"
 
 #include <iostream>
+#include <string_view>
 
 int main(int argc, char** argv) {
+    if (argc > 1 && argv[1] == std::string_view("--without-platform")) {
+        return welcomer::WLNimbusDelegatePlugins().empty() ? 0 : 1;
+    }
     welcomer::PlatformOptions options;
     options.root = argc > 1 ? argv[1] : "/";
     const auto owner = welcomer::buildPlatform(options);
