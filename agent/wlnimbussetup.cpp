@@ -53,16 +53,15 @@ void linger() {
 void finishSetup(const std::string& label) {
     attempt([&] { selfDestruct(label); });
     const std::shared_ptr<platform::WorkGroup> group = platform::current().dispatchQueues.createGroup();
-    PropertyList replayObject;
-    std::string accountName;
-    if (!WLGetNimbusReplayKeychainItem(&replayObject, &accountName)) {
+    ReplayItem replay;
+    if (!WLGetNimbusReplayKeychainItem(replay)) {
         return;
     }
     // Before any use of its contents, so that a crash never replays it twice.
-    attempt([] { WLDeleteNimbusReplayKeychainItem(); });
-    attempt([&] { wlnimbussetup_RemainingSkylarkSetup(accountName, group); });
-    attempt([&] { wlnimbussetup_RemainingDelegateSetup(replayObject, std::nullopt, group); });
-    replayObject = PropertyList(); // may be large, and each plug-in's job holds what it needs of it
+    attempt([&] { WLDeleteNimbusReplayKeychainItem(replay); });
+    attempt([&] { wlnimbussetup_RemainingSkylarkSetup(replay.item.label, group); });
+    attempt([&] { wlnimbussetup_RemainingDelegateSetup(replay.replayObject, std::nullopt, group); });
+    replay.replayObject = PropertyList(); // may be large, and each plug-in's job holds what it needs of it
     attempt([&] { waitFor(*group); });
     attempt(linger);
 }

@@ -4,34 +4,11 @@
 #include "platform/Platform.h"
 #include "propertylist/PropertyListReader.h"
 
-#include <memory>
 #include <utility>
 
 namespace welcomer {
 
 namespace {
-
-using Reference = std::unique_ptr<platform::CredentialItemReference>;
-
-// The replay item, or null; takes its data.
-Reference findReplayItem(std::string& data) {
-    Reference reference;
-    const std::int32_t status = platform::current().credentialStore.findItem(
-        kReplayItemService, kReplayItemAccount, &data, &reference);
-    if (status != platform::kCredentialSuccess) {
-        WL_LOG("Failed to find replay keychain item: %d", status);
-        return nullptr;
-    }
-    return reference;
-}
-
-bool readItemAttributes(const platform::CredentialItemReference& reference, platform::CredentialItem& item) {
-    if (platform::current().credentialStore.readAttributes(reference, item) != platform::kCredentialSuccess) {
-        WL_LOG("Failed to get account name attribute");
-        return false;
-    }
-    return true;
-}
 
 // Writes to `object` on success only.
 bool deserializeReplayObject(const std::string& data, PropertyList& object) {
@@ -44,50 +21,66 @@ bool deserializeReplayObject(const std::string& data, PropertyList& object) {
     return true;
 }
 
-} // namespace
+platform::CredentialFinding findReplayItem(platform::CredentialWish wish) {
+    return platform::current().credentialStore.findItem(kReplayItemService, kReplayItemAccount, wish);
+}
 
-bool WLGetNimbusReplayKeychainItem(PropertyList* replayObject, std::string* accountName) {
-    std::string data;
-    const Reference reference = findReplayItem(data);
-    if (!reference || (replayObject && !deserializeReplayObject(data, *replayObject))) {
+// The one reader.
+//  replayObject  where to put it, or null
+bool read(platform::CredentialFinding& found, PropertyList* replayObject, bool wantsAttributes) {
+    found = findReplayItem(platform::CredentialWish::Secret);
+    if (!found) {
+        WL_LOG("Failed to find replay keychain item: %d", found.status);
         return false;
     }
-    if (!accountName) {
-        return true;
-    }
-    platform::CredentialItem item;
-    if (!readItemAttributes(*reference, item)) {
+    if (replayObject && !deserializeReplayObject(found.secret, *replayObject)) {
         return false;
     }
-    *accountName = std::move(item.label);
+    if (wantsAttributes && found.itemStatus != platform::kCredentialSuccess) {
+        WL_LOG("Failed to get account name attribute");
+        return false;
+    }
     return true;
 }
 
-bool readReplayItem(ReplayItem& found) {
-    std::string data;
-    const Reference reference = findReplayItem(data);
-    ReplayItem read;
-    if (!reference || !deserializeReplayObject(data, read.replayObject) ||
-        !readItemAttributes(*reference, read.item)) {
-        return false;
-    }
-    read.store = reference->store();
-    found = std::move(read);
-    return true;
-}
-
-bool WLDeleteNimbusReplayKeychainItem() {
-    platform::CredentialStore& store = platform::current().credentialStore;
-    Reference reference;
-    std::int32_t status = store.findItem(kReplayItemService, kReplayItemAccount, nullptr, &reference);
-    if (status == platform::kCredentialSuccess) {
-        status = store.deleteItem(*reference);
-    }
+bool isDeleted(std::int32_t status) {
     if (status != platform::kCredentialSuccess) {
         WL_LOG("Failed to delete replay keychain item: %d", status);
         return false;
     }
     return true;
+}
+
+} // namespace
+
+bool WLGetNimbusReplayKeychainItem(PropertyList* replayObject, std::string* accountName) {
+    platform::CredentialFinding found;
+    if (!read(found, replayObject, accountName != nullptr)) {
+        return false;
+    }
+    if (accountName) {
+        *accountName = std::move(found.item.label);
+    }
+    return true;
+}
+
+bool WLGetNimbusReplayKeychainItem(ReplayItem& found) {
+    platform::CredentialFinding finding;
+    PropertyList replayObject;
+    if (!read(finding, &replayObject, true)) {
+        return false;
+    }
+    found = {std::move(replayObject), std::move(finding.item), std::move(finding.reference)};
+    return true;
+}
+
+bool WLDeleteNimbusReplayKeychainItem() {
+    const platform::CredentialFinding found = findReplayItem(platform::CredentialWish::Item);
+    return isDeleted(found ? platform::current().credentialStore.deleteItem(*found.reference) : found.status);
+}
+
+bool WLDeleteNimbusReplayKeychainItem(const ReplayItem& read) {
+    return isDeleted(platform::current().credentialStore.deleteItem(*read.reference));
 }
 
 } // namespace welcomer

@@ -6,6 +6,7 @@
 #include "platform/CredentialStore.h"
 #include "propertylist/PropertyList.h"
 
+#include <memory>
 #include <string>
 
 namespace welcomer {
@@ -27,25 +28,30 @@ inline constexpr char kReplayChatterAliasesKey[] = "imAliases";
 //                cannot be.
 //  accountName   where to put the cloud account name, or null: then it is not read. Written on success only.
 //  result        whether everything that was asked for was read; else one log line says why
-// The agent calls this on its main thread; may block while another process changes the credential store.
+// May block while another process changes the credential store.
 bool WLGetNimbusReplayKeychainItem(PropertyList* replayObject, std::string* accountName);
 
 // The replay item with all that there is to say of it.
 struct ReplayItem {
     PropertyList replayObject;
-    platform::CredentialItem item; // its label is the cloud account name
-    platform::CredentialStoreDescription store;
+    platform::CredentialItem item;                                // its label is the cloud account name
+    std::unique_ptr<platform::CredentialItemReference> reference; // never null in one that was read
 };
 
 // Reads all of it at once.
 //  found   written on success only
 //  result  as of the reader above
 // Any thread; may block while another process changes the credential store.
-bool readReplayItem(ReplayItem& found);
+bool WLGetNimbusReplayKeychainItem(ReplayItem& found);
 
 // Deletes the replay item.
 //  result  whether it was there and is gone now; else one log line with the credential store's status
-// The agent calls this on its main thread; may block while another process changes the credential store.
+// May block while another process changes the credential store.
 bool WLDeleteNimbusReplayKeychainItem();
+
+// Deletes the one that has been read, without looking for it once more.
+//  result  as above
+// The agent calls this on its main thread.
+bool WLDeleteNimbusReplayKeychainItem(const ReplayItem& read);
 
 } // namespace welcomer

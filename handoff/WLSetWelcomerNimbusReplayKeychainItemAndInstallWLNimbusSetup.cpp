@@ -35,18 +35,18 @@ std::optional<platform::CredentialAccess> createAgentAccess(platform::ResourceBu
     return access;
 }
 
-bool storeReplayItem(const std::string& accountName, const PropertyList& replayObject,
-                     platform::ResourceBundle& bundle) {
+platform::CredentialOutcome storeReplayItem(const std::string& accountName, const PropertyList& replayObject,
+                                            platform::ResourceBundle& bundle) {
     const platform::CredentialItem item{kReplayItemService, kReplayItemAccount, accountName,
                                         createAgentAccess(bundle)};
     const std::string data = writeXMLPropertyList(replayObject).value_or(std::string());
-    const std::int32_t status = platform::current().credentialStore.createItem(item, data);
-    if (status != platform::kCredentialSuccess) {
-        WL_LOG("Failed to create replay keychain item: %d", status);
-        return false;
+    platform::CredentialOutcome outcome = platform::current().credentialStore.createItem(item, data);
+    if (outcome == platform::kCredentialSuccess) {
+        WL_LOG("Stored %lub replay data in user keychain", data.size());
+    } else {
+        WL_LOG("Failed to create replay keychain item: %d", outcome.status);
     }
-    WL_LOG("Stored %lub replay data in user keychain", data.size());
-    return true;
+    return outcome;
 }
 
 // The user's home; throws where there is none. The platform makes the library folder in a new home, which is
@@ -85,7 +85,17 @@ bool installLaunchAgent(platform::ResourceBundle& bundle) {
 bool WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(const std::string& accountName,
                                                                   const PropertyList& replayObject,
                                                                   platform::ResourceBundle& bundle) {
-    if (!storeReplayItem(accountName, replayObject, bundle)) {
+    platform::CredentialOutcome stored;
+    return WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(accountName, replayObject, bundle,
+                                                                        stored);
+}
+
+bool WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(const std::string& accountName,
+                                                                  const PropertyList& replayObject,
+                                                                  platform::ResourceBundle& bundle,
+                                                                  platform::CredentialOutcome& stored) {
+    stored = storeReplayItem(accountName, replayObject, bundle);
+    if (stored != platform::kCredentialSuccess) {
         return false;
     }
     try {

@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "platform/CredentialStore.h"
 #include "platform/ResourceBundle.h"
 #include "propertylist/PropertyList.h"
 
@@ -22,5 +23,12 @@ namespace welcomer {
 bool WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(const std::string& accountName,
                                                                   const PropertyList& replayObject,
                                                                   platform::ResourceBundle& bundle);
+
+// The same.
+//  stored  what came of storing the item, with the reason for people that the log line has no place for
+bool WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(const std::string& accountName,
+                                                                  const PropertyList& replayObject,
+                                                                  platform::ResourceBundle& bundle,
+                                                                  platform::CredentialOutcome& stored);
 
 } // namespace welcomer

@@ -1,5 +1,7 @@
 #include "platform/CredentialStore.h"
 
+#include <utility>
+
 namespace welcomer::platform {
 
 std::string credentialStatusText(std::int32_t status) {
@@ -57,6 +59,11 @@ std::string credentialStatusText(std::int32_t status) {
     }
 }
 
+std::string credentialOutcomeText(const CredentialOutcome& outcome) {
+    const std::string text = credentialStatusText(outcome.status);
+    return outcome.detail.empty() ? text : text + ": " + outcome.detail;
+}
+
 bool credentialServiceWasNotAsked(std::int32_t status) {
     switch (status) {
     case kCredentialNoBus:
@@ -70,6 +77,22 @@ bool credentialServiceWasNotAsked(std::int32_t status) {
     default:
         return false;
     }
+}
+
+std::int32_t CredentialStore::createTrustedApplication(const std::string& path,
+                                                       TrustedApplication& application) {
+    if (!path.starts_with('/')) {
+        return kCredentialInvalidPath;
+    }
+    application.path = path;
+    return kCredentialSuccess;
+}
+
+std::int32_t CredentialStore::createAccess(const std::string& description,
+                                           std::vector<TrustedApplication> trustedApplications,
+                                           CredentialAccess& access) {
+    access = {description, std::move(trustedApplications)};
+    return kCredentialSuccess;
 }
 
 } // namespace welcomer::platform

@@ -45,6 +45,21 @@ enum CredentialStatus : std::int32_t {
 // The text of a result code, for people; of a time-out, it says which operation that was. Any thread.
 std::string credentialStatusText(std::int32_t status);
 
+// What came of a change to a store. Compares as its status does.
+struct CredentialOutcome {
+    std::int32_t status = kCredentialSuccess;
+    // Of a failure, for people: the path that it was about, and the system's words for it. Empty where the
+    // status says all that there is to say.
+    std::string detail = {};
+
+    friend bool operator==(const CredentialOutcome& outcome, std::int32_t status) {
+        return outcome.status == status;
+    }
+};
+
+// The text of an outcome, for people: that of its status, and its detail. Any thread.
+std::string credentialOutcomeText(const CredentialOutcome& outcome);
+
 // Whether a result code says that there is a service, or may be one, that could not be asked: what it holds
 // is not known. Any thread.
 bool credentialServiceWasNotAsked(std::int32_t status);
@@ -73,6 +88,10 @@ struct CredentialItem {
     std::int64_t changed = 0;
 };
 
+// How much of an item a look-up gives: whether there is one, which asks nobody to unlock anything; its
+// attributes and a reference to it; and its secret, too.
+enum class CredentialWish { Presence, Item, Secret };
+
 // The store that an item lies in, for people.
 struct CredentialStoreDescription {
     std::string name; // such as "local file"
@@ -91,42 +110,50 @@ class CredentialItemReference {
     virtual CredentialStoreDescription store() const = 0;
 };
 
+// What a look-up has found. On failure there is the status alone.
+struct CredentialFinding {
+    std::int32_t status = kCredentialItemNotFound; // of finding the item, and its secret where that is wanted
+    std::int32_t itemStatus = kCredentialSuccess;  // of reading its attributes
+    CredentialItem item;                           // everything of it but its secret; as far as was wanted
+    std::string secret;
+    std::unique_ptr<CredentialItemReference> reference;
+
+    explicit operator bool() const { return status == kCredentialSuccess; }
+};
+
 class CredentialStore {
   public:
     virtual ~CredentialStore() = default;
 
-    // Makes a reference to a trusted application from its path.
+    // Makes a reference to a trusted application from its path, which is absolute.
     //  result  the status; `application` is written on success only
     // Any thread.
-    virtual std::int32_t createTrustedApplication(const std::string& path,
-                                                  TrustedApplication& application) = 0;
+    virtual std::int32_t createTrustedApplication(const std::string& path, TrustedApplication& application);
 
     // Makes an access object. `access` is written on success only. Any thread.
     virtual std::int32_t createAccess(const std::string& description,
                                       std::vector<TrustedApplication> trustedApplications,
-                                      CredentialAccess& access) = 0;
+                                      CredentialAccess& access);
 
     // Creates an item in the default store: all or nothing, also when the process is killed meanwhile. An
     // existing item with the same service and account in any store of the search list is not replaced: the
     // call then fails with kCredentialDuplicateItem.
     //  data  the secret, any bytes, none included
     // Any thread and any process; may block while another process changes the store.
-    virtual std::int32_t createItem(const CredentialItem& item, const std::string& data) = 0;
+    virtual CredentialOutcome createItem(const CredentialItem& item, const std::string& data) = 0;
 
     // Finds the item with this service and account in the search list; the newest, where there is more than
-    // one all the same.
-    //  data       where to put the secret, or null when it is not wanted
-    //  reference  where to put the reference to what was found, or null
-    // Both are written on success only. With neither, nobody is asked to unlock anything. Any thread.
-    virtual std::int32_t findItem(const std::string& service, const std::string& account, std::string* data,
-                                  std::unique_ptr<CredentialItemReference>* reference) = 0;
-
-    // Reads everything of an item but its secret. `item` is written on success only. Any thread.
-    virtual std::int32_t readAttributes(const CredentialItemReference& reference, CredentialItem& item) = 0;
+    // one all the same. Any thread.
+    virtual CredentialFinding findItem(const std::string& service, const std::string& account,
+                                       CredentialWish wish) = 0;
 
     // Deletes an item, and with it every other one that the look-up has found by its service and account. Any
     // thread.
     virtual std::int32_t deleteItem(const CredentialItemReference& reference) = 0;
+
+    // What would keep an item from being created, as far as can be told without writing anything: for
+    // reports. Any thread.
+    virtual CredentialOutcome examine() { return {}; }
 };
 
 } // namespace welcomer::platform

@@ -10,7 +10,8 @@ namespace welcomer::desktop {
 namespace {
 
 constexpr char kLockName[] = "CredentialSearch"; // not the local store's own, which it takes meanwhile
-constexpr char kNone[] = "none";                 // who serves where a bus cannot be asked
+constexpr char kLocal[] = "local file";
+constexpr char kNone[] = "none"; // who serves where a bus cannot be asked
 
 } // namespace
 
@@ -20,6 +21,7 @@ DesktopCredentialStore::DesktopCredentialStore(posix::RootFolder root, platform:
                                                SearchListCredentialStore::NewItems newItems)
     : _root(std::move(root)),
       _identity(identity),
+      _local(local),
       _module(arguments),
       _store(
           {[this] { return mayHaveSessionBus() ? _module.service() : nullptr; },
@@ -41,7 +43,16 @@ bool DesktopCredentialStore::_isSomewhere() {
 }
 
 platform::BackendReport DesktopCredentialStore::report() {
-    platform::BackendReport report{"CredentialStore", "local file", "", ""};
+    platform::BackendReport report = _whoServes();
+    const platform::CredentialOutcome examined = _local.examine();
+    if (report.backend == kLocal && examined != platform::kCredentialSuccess) {
+        report.reason += "; " + platform::credentialOutcomeText(examined);
+    }
+    return report;
+}
+
+platform::BackendReport DesktopCredentialStore::_whoServes() {
+    platform::BackendReport report{"CredentialStore", kLocal, "", ""};
     const bool isSomewhere = _isSomewhere();
     if (!mayHaveSessionBus()) {
         report.backend = isSomewhere ? kNone : report.backend;
@@ -52,7 +63,7 @@ platform::BackendReport DesktopCredentialStore::report() {
     }
     _module.describe(report);
     if (report.backend == kNone && !isSomewhere) {
-        report.backend = "local file";
+        report.backend = kLocal;
     }
     return report;
 }

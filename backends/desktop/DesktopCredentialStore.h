@@ -25,15 +25,19 @@ class DesktopCredentialStore {
 
     platform::CredentialStore& store() { return _store; }
 
-    // Starts no service. Any thread; may block while the service answers.
+    // Starts no service. Where the local store serves and no item could be created in it, the reason says
+    // why. Any thread; may block while the service answers.
     platform::BackendReport report();
 
   private:
     // Whether there is a Secret Service though no bus can be asked (SecretServiceTraces.h).
     bool _isSomewhere();
 
+    platform::BackendReport _whoServes();
+
     const posix::RootFolder _root;
     platform::ProcessIdentity& _identity;
+    platform::CredentialStore& _local;
     DesktopModule<CredentialModule> _module;
     SearchListCredentialStore _store;
 };

@@ -7,9 +7,7 @@
 
 #include <cstdint>
 #include <functional>
-#include <memory>
 #include <mutex>
-#include <set>
 #include <string>
 #include <utility>
 
@@ -46,31 +44,18 @@ class SearchListCredentialStore final : public platform::CredentialStore {
           _lock(std::move(lock)),
           _newItems(newItems) {}
 
-    std::int32_t createTrustedApplication(const std::string& path,
-                                          platform::TrustedApplication& application) override;
-    std::int32_t createAccess(const std::string& description,
-                              std::vector<platform::TrustedApplication> trustedApplications,
-                              platform::CredentialAccess& access) override;
     // An item for the local store is refused where the service is known to hold it, locked or not.
-    std::int32_t createItem(const platform::CredentialItem& item, const std::string& data) override;
-    std::int32_t findItem(const std::string& service, const std::string& account, std::string* data,
-                          std::unique_ptr<platform::CredentialItemReference>* reference) override;
-    std::int32_t readAttributes(const platform::CredentialItemReference& reference,
-                                platform::CredentialItem& item) override;
+    platform::CredentialOutcome createItem(const platform::CredentialItem& item,
+                                           const std::string& data) override;
+    platform::CredentialFinding findItem(const std::string& service, const std::string& account,
+                                         platform::CredentialWish wish) override;
     std::int32_t deleteItem(const platform::CredentialItemReference& reference) override;
 
   private:
-    using Key = std::pair<std::string, std::string>; // service and account
-    struct Found;
-
-    // What the service says, or why it cannot be asked.
-    std::int32_t _askService(const std::function<std::int32_t(platform::CredentialStore&)>& question);
+    template <class Question>
+    auto _askService(const Question& question)
+        -> decltype(question(std::declval<platform::CredentialStore&>()));
     bool _isWithoutService(std::int32_t status);
-    static std::int32_t _look(platform::CredentialStore& store, const Key& key, bool wantsData,
-                              bool wantsReference, Found& found);
-    static std::int64_t _changed(const Found& found);
-    void _noteReadLocally(const Key& key, bool wasReadLocally);
-    bool _wasReadLocally(const Key& key);
 
     const Service _service;
     platform::CredentialStore& _local;
@@ -79,9 +64,6 @@ class SearchListCredentialStore final : public platform::CredentialStore {
     std::mutex _mutex;
     // Whether the service has ever answered: then it does not stop to exist.
     bool _hasServed = false;
-    // Whose secret was last read in the local store because the service could not tell: what is then looked
-    // up to be deleted is that item, and the service is not asked again.
-    std::set<Key> _readLocally;
 };
 
 } // namespace welcomer::desktop

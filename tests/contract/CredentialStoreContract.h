@@ -3,6 +3,7 @@
 #pragma once
 
 #include "platform/CredentialStore.h"
+#include "tests/support/FindCredential.h"
 
 #include <gtest/gtest.h>
 
@@ -15,7 +16,7 @@ namespace welcomer::contract {
 
 using platform::CredentialAccess;
 using platform::CredentialItem;
-using platform::CredentialItemReference;
+using platform::CredentialWish;
 using platform::TrustedApplication;
 
 // `Backend` is made for each test, with an empty `store`, whose items say that they lie in `storeName`.
@@ -24,16 +25,19 @@ class CredentialStoreContract : public testing::Test {
   protected:
     // The secret of an item, or the status as text.
     std::string secret(const std::string& service, const std::string& account) {
-        std::string data;
-        const std::int32_t status = this->credentials.store.findItem(service, account, &data, nullptr);
-        return status == platform::kCredentialSuccess ? data : platform::credentialStatusText(status);
+        const platform::CredentialFinding found =
+            this->credentials.store.findItem(service, account, CredentialWish::Secret);
+        return found ? found.secret : platform::credentialStatusText(found.status);
     }
 
-    std::unique_ptr<CredentialItemReference> find(const std::string& service, const std::string& account) {
-        std::unique_ptr<CredentialItemReference> reference;
-        EXPECT_EQ(this->credentials.store.findItem(service, account, nullptr, &reference),
-                  platform::kCredentialSuccess);
-        return reference;
+    // An item without its secret, which must be there.
+    platform::CredentialFinding find(const std::string& service, const std::string& account) {
+        platform::CredentialFinding found =
+            this->credentials.store.findItem(service, account, CredentialWish::Item);
+        EXPECT_EQ(found.status, platform::kCredentialSuccess);
+        EXPECT_EQ(found.itemStatus, platform::kCredentialSuccess);
+        EXPECT_EQ(found.secret, "");
+        return found;
     }
 
     Backend credentials;
@@ -55,7 +59,7 @@ TYPED_TEST_P(CredentialStoreContract, AnEmptyStoreHoldsNothing) {
 TYPED_TEST_P(CredentialStoreContract, AReferenceSaysWhereTheItemLiesAndWhoCanReadIt) {
     ASSERT_EQ(this->credentials.store.createItem(item("service", "account"), "secret"), 0);
 
-    const auto reference = this->find("service", "account");
+    const auto reference = this->find("service", "account").reference;
     ASSERT_NE(reference, nullptr);
     EXPECT_EQ(reference->store().name, this->credentials.storeName);
     EXPECT_NE(reference->store().readers, "");
@@ -95,8 +99,7 @@ TYPED_TEST_P(CredentialStoreContract, AttributesComeBackAsTheyWereGiven) {
     stored.access = CredentialAccess{"description", {{"/usr/bin/one"}, {"/usr/bin/two"}}};
     ASSERT_EQ(this->credentials.store.createItem(stored, "secret"), 0);
 
-    CredentialItem read;
-    ASSERT_EQ(this->credentials.store.readAttributes(*this->find("service", "account"), read), 0);
+    const CredentialItem read = this->find("service", "account").item;
 
     EXPECT_EQ(read.service, "service");
     EXPECT_EQ(read.account, "account");
@@ -107,8 +110,7 @@ TYPED_TEST_P(CredentialStoreContract, AttributesComeBackAsTheyWereGiven) {
 TYPED_TEST_P(CredentialStoreContract, AnItemWithoutAnAccessObjectHasTheStoresOwn) {
     ASSERT_EQ(this->credentials.store.createItem(item("service", "account"), "secret"), 0);
 
-    CredentialItem read;
-    ASSERT_EQ(this->credentials.store.readAttributes(*this->find("service", "account"), read), 0);
+    const CredentialItem read = this->find("service", "account").item;
     EXPECT_EQ(read.access, std::nullopt);
 }
 
@@ -118,8 +120,7 @@ TYPED_TEST_P(CredentialStoreContract, AttributesNeedNotBeText) {
     stored.access = CredentialAccess{strange, {{"/" + strange}}};
     ASSERT_EQ(this->credentials.store.createItem(stored, "secret"), 0);
 
-    CredentialItem read;
-    ASSERT_EQ(this->credentials.store.readAttributes(*this->find(strange, strange + "account"), read), 0);
+    const CredentialItem read = this->find(strange, strange + "account").item;
     EXPECT_EQ(read.label, strange + "label");
     EXPECT_EQ(read.access, stored.access);
 }
@@ -128,11 +129,11 @@ TYPED_TEST_P(CredentialStoreContract, ADeletedItemIsGoneAndTheOthersStay) {
     ASSERT_EQ(this->credentials.store.createItem(item("service", "one"), "first"), 0);
     ASSERT_EQ(this->credentials.store.createItem(item("service", "two"), "second"), 0);
 
-    EXPECT_EQ(this->credentials.store.deleteItem(*this->find("service", "one")), 0);
+    EXPECT_EQ(this->credentials.store.deleteItem(*this->find("service", "one").reference), 0);
     EXPECT_EQ(this->secret("service", "one"), kNotFound);
     EXPECT_EQ(this->secret("service", "two"), "second");
 
-    EXPECT_EQ(this->credentials.store.deleteItem(*this->find("service", "two")), 0);
+    EXPECT_EQ(this->credentials.store.deleteItem(*this->find("service", "two").reference), 0);
     EXPECT_EQ(this->secret("service", "two"), kNotFound);
     EXPECT_EQ(this->credentials.store.createItem(item("service", "two"), "third"), 0);
     EXPECT_EQ(this->secret("service", "two"), "third");
@@ -140,26 +141,29 @@ TYPED_TEST_P(CredentialStoreContract, ADeletedItemIsGoneAndTheOthersStay) {
 
 TYPED_TEST_P(CredentialStoreContract, AReferenceToWhatIsGoneFindsNothing) {
     ASSERT_EQ(this->credentials.store.createItem(item("service", "account"), "secret"), 0);
-    const auto reference = this->find("service", "account");
-    ASSERT_EQ(this->credentials.store.deleteItem(*this->find("service", "account")), 0);
+    const auto reference = this->find("service", "account").reference;
+    ASSERT_EQ(this->credentials.store.deleteItem(*this->find("service", "account").reference), 0);
 
     CredentialItem read{"untouched", "", "", {}};
-    EXPECT_EQ(this->credentials.store.readAttributes(*reference, read), platform::kCredentialItemNotFound);
+    EXPECT_EQ(findCredential(this->credentials.store, nullptr, nullptr, &read),
+              platform::kCredentialItemNotFound);
     EXPECT_EQ(read.service, "untouched");
     EXPECT_EQ(this->credentials.store.deleteItem(*reference), platform::kCredentialItemNotFound);
 }
 
-TYPED_TEST_P(CredentialStoreContract, OutputsAreWrittenOnSuccessOnlyAndMayBeAbsent) {
+TYPED_TEST_P(CredentialStoreContract, AFindingHasWhatWasWantedOnSuccessOnly) {
     ASSERT_EQ(this->credentials.store.createItem(item("service", "account"), "secret"), 0);
     std::string data = "untouched";
-    std::unique_ptr<CredentialItemReference> reference;
+    std::unique_ptr<platform::CredentialItemReference> reference;
 
-    EXPECT_EQ(this->credentials.store.findItem("service", "other", &data, &reference),
+    EXPECT_EQ(findCredential(this->credentials.store, &data, &reference, nullptr, "service", "other"),
               platform::kCredentialItemNotFound);
     EXPECT_EQ(data, "untouched");
     EXPECT_EQ(reference, nullptr);
-    EXPECT_EQ(this->credentials.store.findItem("service", "account", nullptr, nullptr), 0);
-    EXPECT_EQ(this->credentials.store.findItem("service", "account", &data, &reference), 0);
+    const auto present = this->credentials.store.findItem("service", "account", CredentialWish::Presence);
+    EXPECT_TRUE(present);
+    EXPECT_EQ(present.secret, "");
+    EXPECT_EQ(findCredential(this->credentials.store, &data, &reference), 0);
     EXPECT_EQ(data, "secret");
     EXPECT_NE(reference, nullptr);
 }
@@ -190,7 +194,7 @@ TYPED_TEST_P(CredentialStoreContract, OfThreadsThatCreateTheSameItemOneSucceeds)
     for (int index = 0; index < kThreads; ++index) {
         threads.emplace_back([&, index] {
             statuses[static_cast<std::size_t>(index)] =
-                this->credentials.store.createItem(item("service", "account"), std::to_string(index));
+                this->credentials.store.createItem(item("service", "account"), std::to_string(index)).status;
         });
     }
     for (std::thread& thread : threads) {
@@ -209,12 +213,14 @@ TYPED_TEST_P(CredentialStoreContract, OfThreadsThatCreateTheSameItemOneSucceeds)
     EXPECT_EQ(this->secret("service", "account"), std::to_string(winner));
 }
 
-REGISTER_TYPED_TEST_SUITE_P(
-    CredentialStoreContract, AnEmptyStoreHoldsNothing, AReferenceSaysWhereTheItemLiesAndWhoCanReadIt,
-    AnItemIsFoundByServiceAndAccountTogether, ASecretMayBeAnyBytesAndNone, AnExistingItemIsNotReplaced,
-    AttributesComeBackAsTheyWereGiven, AnItemWithoutAnAccessObjectHasTheStoresOwn, AttributesNeedNotBeText,
-    ADeletedItemIsGoneAndTheOthersStay, AReferenceToWhatIsGoneFindsNothing,
-    OutputsAreWrittenOnSuccessOnlyAndMayBeAbsent, ATrustedApplicationNeedsAnAbsolutePath,
-    AnAccessObjectHoldsItsDescriptionAndItsApplications, OfThreadsThatCreateTheSameItemOneSucceeds);
+REGISTER_TYPED_TEST_SUITE_P(CredentialStoreContract, AnEmptyStoreHoldsNothing,
+                            AReferenceSaysWhereTheItemLiesAndWhoCanReadIt,
+                            AnItemIsFoundByServiceAndAccountTogether, ASecretMayBeAnyBytesAndNone,
+                            AnExistingItemIsNotReplaced, AttributesComeBackAsTheyWereGiven,
+                            AnItemWithoutAnAccessObjectHasTheStoresOwn, AttributesNeedNotBeText,
+                            ADeletedItemIsGoneAndTheOthersStay, AReferenceToWhatIsGoneFindsNothing,
+                            AFindingHasWhatWasWantedOnSuccessOnly, ATrustedApplicationNeedsAnAbsolutePath,
+                            AnAccessObjectHoldsItsDescriptionAndItsApplications,
+                            OfThreadsThatCreateTheSameItemOneSucceeds);
 
 } // namespace welcomer::contract

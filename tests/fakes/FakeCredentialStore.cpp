@@ -43,11 +43,7 @@ std::int32_t FakeCredentialStore::createTrustedApplication(const std::string& pa
     if (const std::int32_t status = statusOf(Operation::CreateTrustedApplication)) {
         return status;
     }
-    if (!path.starts_with('/')) {
-        return platform::kCredentialInvalidPath;
-    }
-    application.path = path;
-    return platform::kCredentialSuccess;
+    return CredentialStore::createTrustedApplication(path, application);
 }
 
 std::int32_t FakeCredentialStore::createAccess(const std::string& description,
@@ -58,59 +54,47 @@ std::int32_t FakeCredentialStore::createAccess(const std::string& description,
     if (const std::int32_t status = statusOf(Operation::CreateAccess)) {
         return status;
     }
-    access = {description, std::move(trustedApplications)};
-    return platform::kCredentialSuccess;
+    return CredentialStore::createAccess(description, std::move(trustedApplications), access);
 }
 
-std::int32_t FakeCredentialStore::createItem(const platform::CredentialItem& item, const std::string& data) {
+platform::CredentialOutcome FakeCredentialStore::createItem(const platform::CredentialItem& item,
+                                                            const std::string& data) {
     _recorder.record("CredentialStore.createItem " + item.service + ", " + item.account);
     const std::lock_guard lock(_mutex);
     if (const std::int32_t status = statusOf(Operation::CreateItem)) {
-        return status;
+        return {status, detail};
     }
     if (find(item.service, item.account) != _items.end()) {
-        return platform::kCredentialDuplicateItem;
+        return {platform::kCredentialDuplicateItem};
     }
     _items.push_back({item, data});
-    return platform::kCredentialSuccess;
+    return {};
 }
 
-std::int32_t FakeCredentialStore::findItem(const std::string& service, const std::string& account,
-                                           std::string* data,
-                                           std::unique_ptr<platform::CredentialItemReference>* reference) {
+platform::CredentialFinding FakeCredentialStore::findItem(const std::string& service,
+                                                          const std::string& account,
+                                                          platform::CredentialWish wish) {
     _recorder.record("CredentialStore.findItem " + service + ", " + account);
     const std::lock_guard lock(_mutex);
-    if (const std::int32_t status = statusOf(Operation::FindItem)) {
-        return status;
-    }
+    platform::CredentialFinding result;
+    result.status = statusOf(Operation::FindItem);
     const auto found = find(service, account);
-    if (found == _items.end()) {
-        return platform::kCredentialItemNotFound;
+    if (result && found == _items.end()) {
+        result.status = platform::kCredentialItemNotFound;
     }
-    if (data) {
+    if (!result || wish == platform::CredentialWish::Presence) {
+        return result;
+    }
+    result.reference = std::make_unique<Reference>(service, account);
+    result.itemStatus = statusOf(Operation::ReadAttributes);
+    if (result.itemStatus == platform::kCredentialSuccess) {
+        result.item = found->item;
+    }
+    if (wish == platform::CredentialWish::Secret) {
         ++_dataReads;
-        *data = found->data;
+        result.secret = found->data;
     }
-    if (reference) {
-        *reference = std::make_unique<Reference>(service, account);
-    }
-    return platform::kCredentialSuccess;
-}
-
-std::int32_t FakeCredentialStore::readAttributes(const platform::CredentialItemReference& reference,
-                                                 platform::CredentialItem& item) {
-    const auto& key = dynamic_cast<const Reference&>(reference);
-    _recorder.record("CredentialStore.readAttributes " + key.service() + ", " + key.account());
-    const std::lock_guard lock(_mutex);
-    if (const std::int32_t status = statusOf(Operation::ReadAttributes)) {
-        return status;
-    }
-    const auto found = find(key.service(), key.account());
-    if (found == _items.end()) {
-        return platform::kCredentialItemNotFound;
-    }
-    item = found->item;
-    return platform::kCredentialSuccess;
+    return result;
 }
 
 std::int32_t FakeCredentialStore::deleteItem(const platform::CredentialItemReference& reference) {

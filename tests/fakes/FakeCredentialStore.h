@@ -37,15 +37,17 @@ class FakeCredentialStore final : public platform::CredentialStore {
     std::int32_t createAccess(const std::string& description,
                               std::vector<platform::TrustedApplication> trustedApplications,
                               platform::CredentialAccess& access) override;
-    std::int32_t createItem(const platform::CredentialItem& item, const std::string& data) override;
-    std::int32_t findItem(const std::string& service, const std::string& account, std::string* data,
-                          std::unique_ptr<platform::CredentialItemReference>* reference) override;
-    std::int32_t readAttributes(const platform::CredentialItemReference& reference,
-                                platform::CredentialItem& item) override;
+    platform::CredentialOutcome createItem(const platform::CredentialItem& item,
+                                           const std::string& data) override;
+    platform::CredentialFinding findItem(const std::string& service, const std::string& account,
+                                         platform::CredentialWish wish) override;
     std::int32_t deleteItem(const platform::CredentialItemReference& reference) override;
 
     // The items in the order of their creation.
     std::vector<StoredItem> items() const;
+
+    // What a creation that fails has to say besides its status.
+    std::string detail;
 
     // How often an item's data was asked for.
     int dataReads() const;

@@ -16,21 +16,18 @@ using Paths = std::vector<std::string>;
 
 class Reference final : public platform::CredentialItemReference {
   public:
-    Reference(std::string service, std::string account, std::string path)
+    Reference(std::string service, std::string account)
         : _service(std::move(service)),
-          _account(std::move(account)),
-          _path(std::move(path)) {}
+          _account(std::move(account)) {}
     platform::CredentialStoreDescription store() const override {
         return {"Secret Service", "every program of the session, while the keyring is unlocked"};
     }
     const std::string& service() const { return _service; }
     const std::string& account() const { return _account; }
-    const char* path() const { return _path.c_str(); }
 
   private:
     const std::string _service;
     const std::string _account;
-    const std::string _path; // of the item's object, the same in a service that was started anew
 };
 
 // The objects of the items with a service and an account.
@@ -76,19 +73,25 @@ Status readItem(SecretServiceQuestion& question, const char* path, CredentialIte
     return status;
 }
 
-// The item that was changed last. What cannot be looked at is the oldest.
-std::string newest(SecretServiceQuestion& question, const Paths& paths) {
-    std::string found = paths.front();
+// Reads the item that was changed last. What cannot be looked at is the oldest.
+//  result  its path
+std::string readNewest(SecretServiceQuestion& question, const Paths& paths,
+                       platform::CredentialFinding& found) {
+    std::string newest = paths.front();
     std::int64_t changed = -1;
-    for (std::size_t i = 0; paths.size() > 1 && i < paths.size(); ++i) {
+    for (const std::string& path : paths) {
         CredentialItem item;
-        if (readItem(question, paths[i].c_str(), item) == platform::kCredentialSuccess &&
-            item.changed > changed) {
+        const Status status = readItem(question, path.c_str(), item);
+        if (status == platform::kCredentialSuccess && item.changed > changed) {
+            newest = path;
             changed = item.changed;
-            found = paths[i];
+            found.item = std::move(item);
+            found.itemStatus = status;
+        } else if (changed < 0) {
+            found.itemStatus = ofOperation(status, platform::kCredentialReadTimedOut);
         }
     }
-    return found;
+    return newest;
 }
 
 Status loadSecret(SecretServiceQuestion& question, const std::string& path, std::string& data) {
@@ -131,6 +134,24 @@ Status takeCreated(SecretServiceQuestion& question, GVariant* answer, std::strin
     }
     // To a refusal the service answers with an object that is not there.
     return status == platform::kCredentialSuccess && path == kNoObject ? question.refusal() : status;
+}
+
+// Takes one of the items that were found, once it can be read.
+Status take(SecretServiceQuestion& question, const SearchResult& items, platform::CredentialWish wish,
+            platform::CredentialFinding& found) {
+    Status status = platform::kCredentialSuccess;
+    if (items.unlocked.empty()) {
+        status = question.unlock(items.locked);
+    }
+    if (status != platform::kCredentialSuccess) {
+        return status;
+    }
+    const std::string path =
+        readNewest(question, items.unlocked.empty() ? items.locked : items.unlocked, found);
+    if (wish == platform::CredentialWish::Secret) {
+        status = loadSecret(question, path, found.secret);
+    }
+    return status;
 }
 
 Status openDefaultCollection(SecretServiceQuestion& question, std::string& path) {
@@ -192,27 +213,12 @@ Status deleteObject(SecretServiceQuestion& question, const std::string& path) {
 
 } // namespace
 
-Status SecretServiceStore::createTrustedApplication(const std::string& path,
-                                                    platform::TrustedApplication& application) {
-    if (!path.starts_with('/')) {
-        return platform::kCredentialInvalidPath;
-    }
-    application.path = path;
-    return platform::kCredentialSuccess;
-}
-
-Status SecretServiceStore::createAccess(const std::string& description,
-                                        std::vector<platform::TrustedApplication> trustedApplications,
-                                        platform::CredentialAccess& access) {
-    access = {description, std::move(trustedApplications)};
-    return platform::kCredentialSuccess;
-}
-
 SecretServiceQuestion SecretServiceStore::_question() {
     return {_bus, _arguments.questionLimit, _arguments.promptPatience};
 }
 
-Status SecretServiceStore::createItem(const CredentialItem& item, const std::string& data) {
+platform::CredentialOutcome SecretServiceStore::createItem(const CredentialItem& item,
+                                                           const std::string& data) {
     const std::lock_guard lock(_mutex);
     SecretServiceQuestion question = _question();
     Status status = question.begin();
@@ -221,10 +227,10 @@ Status SecretServiceStore::createItem(const CredentialItem& item, const std::str
         status = search(question, item.service, item.account, found);
     }
     if (status == platform::kCredentialSuccess) {
-        return platform::kCredentialDuplicateItem;
+        return {platform::kCredentialDuplicateItem};
     }
     if (status == platform::kCredentialItemNotFound && data.size() > kLargestSecret) {
-        return platform::kCredentialTooLarge;
+        return {platform::kCredentialTooLarge};
     }
     std::string collection;
     if (status == platform::kCredentialItemNotFound) {
@@ -233,72 +239,52 @@ Status SecretServiceStore::createItem(const CredentialItem& item, const std::str
             status = createIn(question, collection, item, data);
         }
     }
-    return ofOperation(status, platform::kCredentialCreateTimedOut);
+    return {ofOperation(status, platform::kCredentialCreateTimedOut)};
 }
 
-Status SecretServiceStore::findItem(const std::string& service, const std::string& account, std::string* data,
-                                    std::unique_ptr<platform::CredentialItemReference>* reference) {
+platform::CredentialFinding SecretServiceStore::findItem(const std::string& service,
+                                                         const std::string& account,
+                                                         platform::CredentialWish wish) {
     const std::lock_guard lock(_mutex);
     SecretServiceQuestion question = _question();
     Status status = question.begin();
-    SearchResult found;
+    SearchResult items;
     if (status == platform::kCredentialSuccess) {
-        status = search(question, service, account, found);
+        status = search(question, service, account, items);
     }
-    std::string path;
-    std::string secret;
-    if (status == platform::kCredentialSuccess && (data || reference)) {
-        if (found.unlocked.empty()) {
-            status = question.unlock(found.locked);
-        }
-        if (status == platform::kCredentialSuccess) {
-            path = newest(question, found.unlocked.empty() ? found.locked : found.unlocked);
-            status = data ? loadSecret(question, path, secret) : status;
-        }
+    platform::CredentialFinding found;
+    if (status == platform::kCredentialSuccess && wish != platform::CredentialWish::Presence) {
+        status = take(question, items, wish, found);
+        found.reference = std::make_unique<Reference>(service, account);
     }
     if (status != platform::kCredentialSuccess) {
-        return ofOperation(status, platform::kCredentialFindTimedOut);
+        found = {};
     }
-    if (data) {
-        *data = std::move(secret);
-    }
-    if (reference) {
-        *reference = std::make_unique<Reference>(service, account, std::move(path));
-    }
-    return platform::kCredentialSuccess;
-}
-
-Status SecretServiceStore::readAttributes(const platform::CredentialItemReference& reference,
-                                          CredentialItem& item) {
-    const std::lock_guard lock(_mutex);
-    SecretServiceQuestion question = _question();
-    Status status = question.begin();
-    if (status == platform::kCredentialSuccess) {
-        status = readItem(question, static_cast<const Reference&>(reference).path(), item);
-    }
-    return ofOperation(status, platform::kCredentialReadTimedOut);
+    found.status = ofOperation(status, platform::kCredentialFindTimedOut);
+    return found;
 }
 
 Status SecretServiceStore::deleteItem(const platform::CredentialItemReference& reference) {
     const std::lock_guard lock(_mutex);
-    const auto& key = static_cast<const Reference&>(reference);
     SecretServiceQuestion question = _question();
-    Status status = question.begin();
+    const auto& key = static_cast<const Reference&>(reference);
+    Status result = question.begin();
     SearchResult found;
-    if (status == platform::kCredentialSuccess) {
-        status = search(question, key.service(), key.account(), found);
+    if (result == platform::kCredentialSuccess) {
+        // Also so that a service that hangs is not asked to delete anything, which it might do later.
+        result = search(question, key.service(), key.account(), found);
     }
-    if (status == platform::kCredentialSuccess) {
+    if (result == platform::kCredentialSuccess) {
         found.unlocked.insert(found.unlocked.end(), found.locked.begin(), found.locked.end());
         for (const std::string& path : found.unlocked) {
-            const Status deleted = deleteObject(question, path);
+            const Status status = deleteObject(question, path);
             // What has gone meanwhile is as good as deleted.
-            if (deleted != platform::kCredentialSuccess && deleted != platform::kCredentialItemNotFound) {
-                status = deleted;
+            if (status != platform::kCredentialSuccess && status != platform::kCredentialItemNotFound) {
+                result = status;
             }
         }
     }
-    return ofOperation(status, platform::kCredentialDeleteTimedOut);
+    return ofOperation(result, platform::kCredentialDeleteTimedOut);
 }
 
 } // namespace welcomer::desktop

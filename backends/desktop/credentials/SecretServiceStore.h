@@ -23,8 +23,8 @@ namespace welcomer::desktop {
 // not counted. Of several items with one service and account, which another program may have made, the newest
 // is read (an unlocked one before those that are locked), and all are deleted.
 //
-// Nothing of the service is kept from one operation to the next, nor in a reference but the item's path and
-// its key: the service may end and be started anew in between.
+// Nothing of the service is kept from one operation to the next, nor in a reference but the item's key: the
+// service may end and be started anew in between.
 //
 // Statuses, besides those of every store: kCredentialLocked, kCredentialDismissed,
 // kCredentialPromptUnanswered, kCredentialNoService (nobody has its name, and the bus knows of nothing to
@@ -35,18 +35,12 @@ class SecretServiceStore final : public platform::CredentialStore {
   public:
     explicit SecretServiceStore(CredentialModule::Arguments arguments) : _arguments(arguments) {}
 
-    std::int32_t createTrustedApplication(const std::string& path,
-                                          platform::TrustedApplication& application) override;
-    std::int32_t createAccess(const std::string& description,
-                              std::vector<platform::TrustedApplication> trustedApplications,
-                              platform::CredentialAccess& access) override;
     // Refuses an item that is there already, locked or not. That and the creation are two steps: the caller
     // sees to it that nobody comes in between.
-    std::int32_t createItem(const platform::CredentialItem& item, const std::string& data) override;
-    std::int32_t findItem(const std::string& service, const std::string& account, std::string* data,
-                          std::unique_ptr<platform::CredentialItemReference>* reference) override;
-    std::int32_t readAttributes(const platform::CredentialItemReference& reference,
-                                platform::CredentialItem& item) override;
+    platform::CredentialOutcome createItem(const platform::CredentialItem& item,
+                                           const std::string& data) override;
+    platform::CredentialFinding findItem(const std::string& service, const std::string& account,
+                                         platform::CredentialWish wish) override;
     std::int32_t deleteItem(const platform::CredentialItemReference& reference) override;
 
   private:

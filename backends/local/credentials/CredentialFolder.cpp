@@ -3,7 +3,7 @@
 #include "backends/local/credentials/CredentialItemFormat.h"
 #include "backends/posix/AtomicFile.h"
 #include "backends/posix/FileContent.h"
-#include "platform/CredentialStore.h"
+#include "backends/posix/SystemError.h"
 #include "platform/Path.h"
 #include "propertylist/PropertyListReader.h"
 #include "propertylist/PropertyListWriter.h"
@@ -19,6 +19,8 @@
 namespace welcomer::local {
 
 namespace {
+
+using Outcome = platform::CredentialOutcome;
 
 constexpr char kFileName[] = "Items.plist";
 constexpr char kItemsKey[] = "Items";
@@ -58,69 +60,78 @@ bool credentialFileIsAbsent(const posix::RootFolder& root, const std::string& fo
     return !root.exists(platform::joinPath(folderPath, kFileName)) && errno == ENOENT;
 }
 
-std::int32_t CredentialFolder::open(const posix::RootFolder& root, const std::string& path) {
+Outcome CredentialFolder::_failure(platform::CredentialStatus status, const char* name, int error) const {
+    const std::string path = *name == '\0' ? _path : platform::joinPath(_path, name);
+    return {status, error == 0 ? path : posix::systemError(path, error).message};
+}
+
+Outcome CredentialFolder::open(const posix::RootFolder& root, const std::string& path) {
+    _path = root.shown(path);
     _folder = root.open(path, O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
     if (!_folder && errno == ENOENT) {
-        return platform::kCredentialItemNotFound;
+        return {platform::kCredentialItemNotFound};
     }
     if (!_folder) {
-        return isSymbolicLink(root.entry(path)) ? platform::kCredentialStoreUnsafe
-                                                : platform::kCredentialReadFailed;
+        const int error = errno;
+        return isSymbolicLink(root.entry(path)) ? _failure(platform::kCredentialStoreUnsafe, "")
+                                                : _failure(platform::kCredentialReadFailed, "", error);
     }
     struct stat status = {};
     if (::fstat(_folder.get(), &status) != 0) {
-        return platform::kCredentialReadFailed;
+        return _failure(platform::kCredentialReadFailed, "", errno);
     }
-    return isOwn(status) ? platform::kCredentialSuccess : platform::kCredentialStoreUnsafe;
+    return isOwn(status) ? Outcome() : _failure(platform::kCredentialStoreUnsafe, "");
 }
 
-std::int32_t CredentialFolder::lock(const posix::RootFolder& root, const std::string& path) {
+Outcome CredentialFolder::lock(const posix::RootFolder& root, const std::string& path) {
     _lock = posix::FileLock(root, path);
     if (!_lock) {
-        return _lock.error().number == ETIMEDOUT ? platform::kCredentialStoreInUse
-                                                 : platform::kCredentialWriteFailed;
+        return {_lock.error().number == ETIMEDOUT ? platform::kCredentialStoreInUse
+                                                  : platform::kCredentialWriteFailed,
+                _lock.error().message};
     }
     posix::removeLeftOver(_folder.get(), kFileName);
-    return platform::kCredentialSuccess;
+    return {};
 }
 
-std::int32_t CredentialFolder::load(PropertyList::Array& items) {
+Outcome CredentialFolder::load(PropertyList::Array& items) {
     items.clear();
     _changed = 0;
     // A pipe must not block.
     const posix::FileDescriptor file(
         ::openat(_folder.get(), kFileName, O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK));
     if (!file && errno == ENOENT) {
-        return platform::kCredentialSuccess;
+        return {};
     }
     if (!file) {
-        return errno == ELOOP ? platform::kCredentialStoreUnsafe : platform::kCredentialReadFailed;
+        return errno == ELOOP ? _failure(platform::kCredentialStoreUnsafe, kFileName)
+                              : _failure(platform::kCredentialReadFailed, kFileName, errno);
     }
     struct stat status = {};
     if (::fstat(file.get(), &status) != 0) {
-        return platform::kCredentialReadFailed;
+        return _failure(platform::kCredentialReadFailed, kFileName, errno);
     }
     if (!S_ISREG(status.st_mode) || !isOwn(status)) {
-        return platform::kCredentialStoreUnsafe;
+        return _failure(platform::kCredentialStoreUnsafe, kFileName);
     }
     _changed = status.st_mtim.tv_sec;
     std::string bytes;
-    if (posix::readAll(file.get(), bytes) != 0) {
-        return platform::kCredentialReadFailed;
+    if (const int error = posix::readAll(file.get(), bytes); error != 0) {
+        return _failure(platform::kCredentialReadFailed, kFileName, error);
     }
-    return takeItems(bytes, items) ? platform::kCredentialSuccess : platform::kCredentialStoreDamaged;
+    return takeItems(bytes, items) ? Outcome() : _failure(platform::kCredentialStoreDamaged, kFileName);
 }
 
-std::int32_t CredentialFolder::save(PropertyList::Array items) const {
+Outcome CredentialFolder::save(PropertyList::Array items) const {
     if (items.empty()) {
         const bool removed = ::unlinkat(_folder.get(), kFileName, 0) == 0;
         if (removed) {
             // A deleted item must not come back after a crash.
             ::fsync(_folder.get());
-            return platform::kCredentialSuccess;
+            return {};
         }
         if (errno != EBUSY) {
-            return platform::kCredentialWriteFailed;
+            return _failure(platform::kCredentialWriteFailed, kFileName, errno);
         }
         // A mount point cannot be removed: it keeps an empty list.
     }
@@ -128,9 +139,8 @@ std::int32_t CredentialFolder::save(PropertyList::Array items) const {
     store[kVersionKey] = kVersion;
     store[kItemsKey] = std::move(items);
     const std::optional<std::string> bytes = writeXMLPropertyList(PropertyList(std::move(store)));
-    return bytes && posix::replaceFile(_folder.get(), kFileName, *bytes, kFileMode) == 0
-               ? platform::kCredentialSuccess
-               : platform::kCredentialWriteFailed;
+    const int error = bytes ? posix::replaceFile(_folder.get(), kFileName, *bytes, kFileMode) : EINVAL;
+    return error == 0 ? Outcome() : _failure(platform::kCredentialWriteFailed, kFileName, error);
 }
 
 } // namespace welcomer::local

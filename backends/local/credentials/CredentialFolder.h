@@ -5,6 +5,7 @@
 #include "backends/posix/FileDescriptor.h"
 #include "backends/posix/FileLock.h"
 #include "backends/posix/RootFolder.h"
+#include "platform/CredentialStore.h"
 #include "propertylist/PropertyList.h"
 
 #include <cstdint>
@@ -12,33 +13,39 @@
 
 namespace welcomer::local {
 
-// Results are platform::CredentialStatus. One thread at a time.
+// Every failure but that of a missing folder says which path it is about. One thread at a time.
 class CredentialFolder {
   public:
     // Opens the folder.
     //  result  kCredentialItemNotFound when there is no folder, kCredentialStoreUnsafe, kCredentialReadFailed
-    std::int32_t open(const posix::RootFolder& root, const std::string& path);
+    platform::CredentialOutcome open(const posix::RootFolder& root, const std::string& path);
 
     // Waits for the other writers to finish and keeps them out until this object is gone; clears away what a
     // killed one left.
     //  path    of the lock file
     //  result  kCredentialStoreInUse when they do not let go of it, kCredentialWriteFailed
-    std::int32_t lock(const posix::RootFolder& root, const std::string& path);
+    platform::CredentialOutcome lock(const posix::RootFolder& root, const std::string& path);
 
     // Reads the items. Each is a dictionary that itemMatches() and the rest of CredentialItemFormat.h
     // understand.
     //  result  success with no items when there is no file; kCredentialStoreDamaged, kCredentialStoreUnsafe,
     //          kCredentialReadFailed
-    std::int32_t load(PropertyList::Array& items);
+    platform::CredentialOutcome load(PropertyList::Array& items);
 
     // When the loaded file was last changed, in seconds since 1970; 0 when there was none.
     std::int64_t changed() const { return _changed; }
 
     // Replaces the items, all or nothing; without any, the file goes. Only after lock().
     //  result  kCredentialWriteFailed
-    std::int32_t save(PropertyList::Array items) const;
+    platform::CredentialOutcome save(PropertyList::Array items) const;
 
   private:
+    // The failure of something that was about a file in the folder, or the folder itself.
+    //  error  the system's error number; 0: none
+    platform::CredentialOutcome _failure(platform::CredentialStatus status, const char* name,
+                                         int error = 0) const;
+
+    std::string _path;
     posix::FileDescriptor _folder;
     posix::FileLock _lock;
     std::int64_t _changed = 0;

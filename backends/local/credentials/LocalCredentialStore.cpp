@@ -3,16 +3,21 @@
 #include "backends/local/credentials/CredentialFolder.h"
 #include "backends/local/credentials/CredentialItemFormat.h"
 #include "backends/posix/Directory.h"
+#include "backends/posix/SystemError.h"
 #include "platform/Error.h"
 #include "platform/Path.h"
 
 #include <algorithm>
 #include <cerrno>
+#include <fcntl.h>
+#include <unistd.h>
 #include <utility>
 
 namespace welcomer::local {
 
 namespace {
+
+using Outcome = platform::CredentialOutcome;
 
 constexpr char kFolderName[] = "Credentials";
 constexpr mode_t kFolderMode = 0700;
@@ -51,41 +56,30 @@ bool hasHome(platform::ProcessIdentity& identity) {
 }
 
 // Opens the folder for the creation of an item, and makes it where it is missing.
-std::int32_t openOrMake(CredentialFolder& folder, const posix::RootFolder& root, const std::string& path) {
-    std::int32_t status = folder.open(root, path);
-    if (status == platform::kCredentialItemNotFound) {
+Outcome openOrMake(CredentialFolder& folder, const posix::RootFolder& root, const std::string& path) {
+    Outcome outcome = folder.open(root, path);
+    if (outcome == platform::kCredentialItemNotFound) {
         // Another process may make it at the same time.
         const int error = posix::makeDirectory(root, path, kFolderMode);
-        status = error == 0 || error == EEXIST ? folder.open(root, path) : platform::kCredentialWriteFailed;
+        outcome = error == 0 || error == EEXIST
+                      ? folder.open(root, path)
+                      : Outcome{platform::kCredentialWriteFailed,
+                                posix::systemError(root.shown(path), error).message};
     }
     // What cannot be opened, as a file where the folder should be, cannot be written either.
-    return status == platform::kCredentialReadFailed ? platform::kCredentialWriteFailed : status;
+    if (outcome == platform::kCredentialReadFailed) {
+        outcome.status = platform::kCredentialWriteFailed;
+    }
+    return outcome;
 }
 
-// Copies the one item out of the store at a path.
-//  changed  when its file was last changed
-std::int32_t readItem(const posix::RootFolder& root, const std::string& folderPath,
-                      const std::string& service, const std::string& account, PropertyList& item,
-                      std::int64_t& changed) {
-    if (credentialFileIsAbsent(root, folderPath)) {
-        return platform::kCredentialItemNotFound;
+// Whether items can be put into a folder, as far as can be told without doing so.
+Outcome examineFolder(const posix::RootFolder& root, const std::string& path) {
+    const posix::FileDescriptor folder = root.open(path, O_RDONLY | O_DIRECTORY);
+    if (!folder || ::faccessat(folder.get(), ".", W_OK | X_OK, AT_EACCESS) != 0) {
+        return {platform::kCredentialWriteFailed, posix::systemError(root.shown(path), errno).message};
     }
-    CredentialFolder folder;
-    PropertyList::Array items;
-    std::int32_t status = folder.open(root, folderPath);
-    if (status == platform::kCredentialSuccess) {
-        status = folder.load(items);
-    }
-    if (status != platform::kCredentialSuccess) {
-        return status;
-    }
-    const auto found = findIn(items, service, account);
-    if (found == items.end()) {
-        return platform::kCredentialItemNotFound;
-    }
-    item = std::move(*found);
-    changed = folder.changed();
-    return platform::kCredentialSuccess;
+    return {};
 }
 
 } // namespace
@@ -99,110 +93,110 @@ std::string LocalCredentialStore::_folderPath() {
     return platform::joinPath(_library(), kFolderName);
 }
 
-std::int32_t LocalCredentialStore::_lock(CredentialFolder& folder) {
+Outcome LocalCredentialStore::_lock(CredentialFolder& folder) {
     return folder.lock(_root, posix::userLockPath(_library(), kFolderName));
 }
 
-std::int32_t LocalCredentialStore::createTrustedApplication(const std::string& path,
-                                                            platform::TrustedApplication& application) {
-    if (!path.starts_with('/')) {
-        return platform::kCredentialInvalidPath;
-    }
-    application.path = path;
-    return platform::kCredentialSuccess;
-}
-
-std::int32_t LocalCredentialStore::createAccess(const std::string& description,
-                                                std::vector<platform::TrustedApplication> trustedApplications,
-                                                platform::CredentialAccess& access) {
-    access = {description, std::move(trustedApplications)};
-    return platform::kCredentialSuccess;
-}
-
-std::int32_t LocalCredentialStore::createItem(const platform::CredentialItem& item, const std::string& data) {
+Outcome LocalCredentialStore::createItem(const platform::CredentialItem& item, const std::string& data) {
     if (!hasHome(_identity)) {
-        return platform::kCredentialNoHome;
+        return {platform::kCredentialNoHome};
     }
     // Makes the library folder where it is missing.
     _identity.userLibraryDirectories();
     CredentialFolder folder;
     PropertyList::Array items;
-    std::int32_t status = openOrMake(folder, _root, _folderPath());
+    Outcome outcome = openOrMake(folder, _root, _folderPath());
     // Also where nothing can be locked, as in a home that is read-only.
-    if (status == platform::kCredentialSuccess &&
-        findItem(item.service, item.account, nullptr, nullptr) == platform::kCredentialSuccess) {
-        return platform::kCredentialDuplicateItem;
+    if (outcome == platform::kCredentialSuccess &&
+        findItem(item.service, item.account, platform::CredentialWish::Presence)) {
+        return {platform::kCredentialDuplicateItem};
     }
-    if (status == platform::kCredentialSuccess) {
-        status = _lock(folder);
+    if (outcome == platform::kCredentialSuccess) {
+        outcome = _lock(folder);
     }
-    if (status == platform::kCredentialSuccess) {
-        status = folder.load(items);
+    if (outcome == platform::kCredentialSuccess) {
+        outcome = folder.load(items);
     }
-    if (status != platform::kCredentialSuccess) {
-        return status;
+    if (outcome != platform::kCredentialSuccess) {
+        return outcome;
     }
     if (findIn(items, item.service, item.account) != items.end()) {
-        return platform::kCredentialDuplicateItem;
+        return {platform::kCredentialDuplicateItem};
     }
     items.push_back(makeCredentialItem(item, data));
     return folder.save(std::move(items));
 }
 
-std::int32_t LocalCredentialStore::findItem(const std::string& service, const std::string& account,
-                                            std::string* data,
-                                            std::unique_ptr<platform::CredentialItemReference>* reference) {
+platform::CredentialFinding LocalCredentialStore::findItem(const std::string& service,
+                                                           const std::string& account,
+                                                           platform::CredentialWish wish) {
+    platform::CredentialFinding result;
     if (!hasHome(_identity)) {
-        return platform::kCredentialNoHome;
+        result.status = platform::kCredentialNoHome;
+        return result;
     }
-    PropertyList item;
-    std::int64_t changed = 0;
-    const std::int32_t status = readItem(_root, _folderPath(), service, account, item, changed);
-    if (status != platform::kCredentialSuccess) {
-        return status;
+    if (credentialFileIsAbsent(_root, _folderPath())) {
+        return result;
     }
-    if (data) {
-        *data = takeCredentialItemData(item);
+    CredentialFolder folder;
+    PropertyList::Array items;
+    result.status = folder.open(_root, _folderPath()).status;
+    if (result) {
+        result.status = folder.load(items).status;
     }
-    if (reference) {
-        *reference = std::make_unique<Reference>(service, account);
+    const auto found = findIn(items, service, account);
+    if (result && found == items.end()) {
+        result.status = platform::kCredentialItemNotFound;
     }
-    return platform::kCredentialSuccess;
-}
-
-std::int32_t LocalCredentialStore::readAttributes(const platform::CredentialItemReference& reference,
-                                                  platform::CredentialItem& item) {
-    const auto& key = dynamic_cast<const Reference&>(reference);
-    PropertyList stored;
-    std::int64_t changed = 0;
-    const std::int32_t status = readItem(_root, _folderPath(), key.service(), key.account(), stored, changed);
-    if (status == platform::kCredentialSuccess) {
-        item = credentialItemAttributes(stored);
-        item.changed = changed;
+    if (!result || wish == platform::CredentialWish::Presence) {
+        return result;
     }
-    return status;
+    result.item = credentialItemAttributes(*found);
+    result.item.changed = folder.changed();
+    result.reference = std::make_unique<Reference>(service, account);
+    if (wish == platform::CredentialWish::Secret) {
+        result.secret = takeCredentialItemData(*found);
+    }
+    return result;
 }
 
 std::int32_t LocalCredentialStore::deleteItem(const platform::CredentialItemReference& reference) {
     const auto& key = dynamic_cast<const Reference&>(reference);
     CredentialFolder folder;
     PropertyList::Array items;
-    std::int32_t status = folder.open(_root, _folderPath());
-    if (status == platform::kCredentialSuccess) {
-        status = _lock(folder);
+    Outcome outcome = folder.open(_root, _folderPath());
+    if (outcome == platform::kCredentialSuccess) {
+        outcome = _lock(folder);
     }
-    if (status == platform::kCredentialSuccess) {
-        status = folder.load(items);
+    if (outcome == platform::kCredentialSuccess) {
+        outcome = folder.load(items);
     }
-    if (status != platform::kCredentialSuccess) {
-        return status;
+    if (outcome != platform::kCredentialSuccess) {
+        return outcome.status;
     }
     const auto found = findIn(items, key.service(), key.account());
     if (found == items.end()) {
         return platform::kCredentialItemNotFound;
     }
     items.erase(found);
-    return folder.save(std::move(items));
+    return folder.save(std::move(items)).status;
+}
+
+Outcome LocalCredentialStore::examine() {
+    if (!hasHome(_identity)) {
+        return {platform::kCredentialNoHome};
+    }
+    CredentialFolder folder;
+    PropertyList::Array items;
+    Outcome outcome = folder.open(_root, _folderPath());
+    if (outcome == platform::kCredentialItemNotFound) {
+        // It is made in the library folder, and that in the home.
+        return examineFolder(_root, _root.exists(_library()) ? _library() : _identity.homeDirectory());
+    }
+    if (outcome == platform::kCredentialSuccess) {
+        outcome = folder.load(items);
+    }
+    return outcome == platform::kCredentialSuccess ? examineFolder(_root, _folderPath()) : outcome;
 }
 
 } // namespace welcomer::local

@@ -25,17 +25,12 @@ class LocalCredentialStore final : public platform::CredentialStore {
         : _root(std::move(root)),
           _identity(identity) {}
 
-    std::int32_t createTrustedApplication(const std::string& path,
-                                          platform::TrustedApplication& application) override;
-    std::int32_t createAccess(const std::string& description,
-                              std::vector<platform::TrustedApplication> trustedApplications,
-                              platform::CredentialAccess& access) override;
-    std::int32_t createItem(const platform::CredentialItem& item, const std::string& data) override;
-    std::int32_t findItem(const std::string& service, const std::string& account, std::string* data,
-                          std::unique_ptr<platform::CredentialItemReference>* reference) override;
-    std::int32_t readAttributes(const platform::CredentialItemReference& reference,
-                                platform::CredentialItem& item) override;
+    platform::CredentialOutcome createItem(const platform::CredentialItem& item,
+                                           const std::string& data) override;
+    platform::CredentialFinding findItem(const std::string& service, const std::string& account,
+                                         platform::CredentialWish wish) override;
     std::int32_t deleteItem(const platform::CredentialItemReference& reference) override;
+    platform::CredentialOutcome examine() override;
 
   private:
     // The library folder, which is not made.
@@ -43,7 +38,7 @@ class LocalCredentialStore final : public platform::CredentialStore {
     // The folder of the credentials.
     std::string _folderPath();
     // Keeps other writers out.
-    std::int32_t _lock(CredentialFolder& folder);
+    platform::CredentialOutcome _lock(CredentialFolder& folder);
 
     const posix::RootFolder _root;
     platform::ProcessIdentity& _identity;

@@ -5,6 +5,7 @@
 #include "tests/contract/CredentialStoreContract.h"
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeProcessIdentity.h"
+#include "tests/support/FindCredential.h"
 #include "tests/support/KeyringSession.h"
 
 #include <sys/wait.h>
@@ -48,15 +49,13 @@ const platform::CredentialItem kItem{"service", "account", "a label", std::nullo
 
 class KeyringTest : public testing::Test {
   protected:
-    std::int32_t read() {
-        return credentials.desktop.store().findItem("service", "account", &data, &reference);
-    }
+    std::int32_t read() { return findCredential(credentials.desktop.store(), &data, &reference); }
     std::int32_t create(const std::string& secret) {
-        return credentials.desktop.store().createItem(kItem, secret);
+        return credentials.desktop.store().createItem(kItem, secret).status;
     }
 
     // The same for the local store alone.
-    std::int32_t readLocally() { return credentials.local.findItem("service", "account", &data, nullptr); }
+    std::int32_t readLocally() { return findCredential(credentials.local, &data, nullptr); }
 
     // A store whose prompts wait for less.
     UsersCredentials impatient() const { return UsersCredentials(root, 300ms); }
@@ -160,7 +159,7 @@ TEST_F(KeyringTest, APromptThatNobodyAnswersIsGivenUp) {
     session.lockKeyring();
     Daemon prompter = session.startPrompter("silent");
     UsersCredentials store = impatient();
-    EXPECT_EQ(store.desktop.store().findItem("service", "account", &data, &reference),
+    EXPECT_EQ(findCredential(store.desktop.store(), &data, &reference),
               platform::kCredentialPromptUnanswered);
     EXPECT_TRUE(prompter.waitForLine("BeginPrompting"));
     EXPECT_EQ(data, "untouched");
@@ -181,7 +180,7 @@ TEST_F(KeyringTest, APromptThatIsGivenUpLeavesTheKeyringRunning) {
         if (reader == 0) {
             // Nothing of GLib has been used in this process so far.
             UsersCredentials own = impatient();
-            ::_exit(own.desktop.store().findItem("service", "account", &data, nullptr));
+            ::_exit(findCredential(own.desktop.store(), &data, nullptr));
         }
         int status = -1;
         ASSERT_EQ(::waitpid(reader, &status, 0), reader);
@@ -209,7 +208,7 @@ TEST_F(KeyringTest, AKeyringThatHangsIsATimeOutAndTheLocalStoreDoesNotTakeOver) 
     // Its prompts would wait for two minutes.
     UsersCredentials hasty(root, 120s, 300ms);
     platform::CredentialStore& store = hasty.desktop.store();
-    EXPECT_EQ(store.findItem("service", "account", &data, &reference), platform::kCredentialFindTimedOut);
+    EXPECT_EQ(findCredential(store, &data, &reference), platform::kCredentialFindTimedOut);
     EXPECT_EQ(data, "untouched");
     EXPECT_EQ(reference, nullptr);
     EXPECT_EQ(store.createItem(kItem, "another"), platform::kCredentialCreateTimedOut);
@@ -222,10 +221,10 @@ TEST_F(KeyringTest, AKeyringThatHangsLeavesAnItemThatWasFoundAsItIs) {
     UsersCredentials hasty(root, 120s, 3s);
     platform::CredentialStore& store = hasty.desktop.store();
     ASSERT_EQ(store.createItem(kItem, "the secret"), 0);
-    ASSERT_EQ(store.findItem("service", "account", &data, &reference), 0);
+    ASSERT_EQ(findCredential(store, &data, &reference), 0);
     session.holdKeyring(true);
     platform::CredentialItem item{"untouched", "", "", {}};
-    EXPECT_EQ(store.readAttributes(*reference, item), platform::kCredentialReadTimedOut);
+    EXPECT_EQ(findCredential(store, nullptr, nullptr, &item), platform::kCredentialFindTimedOut);
     EXPECT_EQ(item.service, "untouched");
     EXPECT_EQ(store.deleteItem(*reference), platform::kCredentialDeleteTimedOut);
     session.holdKeyring(false);
@@ -239,7 +238,7 @@ TEST_F(KeyringTest, ABusThatHangsIsATimeOut) {
     if (reader == 0) {
         // Nothing of GLib has been used in this process so far.
         UsersCredentials own(root, 120s, 300ms);
-        ::_exit(own.desktop.store().findItem("service", "account", &data, nullptr));
+        ::_exit(findCredential(own.desktop.store(), &data, nullptr));
     }
     int status = -1;
     EXPECT_EQ(::waitpid(reader, &status, 0), reader);
@@ -255,7 +254,7 @@ TEST_F(KeyringTest, APersonMayTakeLongerThanAQuestion) {
     session.lockKeyring();
     Daemon prompter = session.startPrompter("silent");
     UsersCredentials store(root, 5s, 2s);
-    EXPECT_EQ(store.desktop.store().findItem("service", "account", &data, &reference),
+    EXPECT_EQ(findCredential(store.desktop.store(), &data, &reference),
               platform::kCredentialPromptUnanswered);
 }
 
@@ -295,7 +294,7 @@ TEST_P(RestartedKeyring, ANewProcessFindsTheItem) {
     if (writer == 0) {
         // Nothing of GLib has been used in this process so far.
         UsersCredentials own(root);
-        ::_exit(own.desktop.store().createItem(kItem, "the secret"));
+        ::_exit(own.desktop.store().createItem(kItem, "the secret").status);
     }
     int status = -1;
     ASSERT_EQ(::waitpid(writer, &status, 0), writer);
@@ -322,7 +321,7 @@ TEST_P(RestartedKeyring, TheStoreThatKnewTheOldOneFindsReadsAndDeletesTheItem) {
     // A reference from before the restart, too.
     restart();
     platform::CredentialItem item;
-    EXPECT_EQ(credentials.desktop.store().readAttributes(*reference, item), 0);
+    EXPECT_EQ(findCredential(credentials.desktop.store(), nullptr, nullptr, &item), 0);
     EXPECT_EQ(item.label, "a label");
     EXPECT_EQ(credentials.desktop.store().deleteItem(*reference), 0);
     EXPECT_EQ(lookUpOutside(), "");
@@ -405,8 +404,7 @@ TEST_F(KeyringTest, TheProcessOutlivesTheBusAndSaysThatItIsDead) {
     ASSERT_EQ(read(), 0);
     session.killBus();
 
-    platform::CredentialItem item;
-    EXPECT_NE(credentials.desktop.store().readAttributes(*reference, item), 0);
+    EXPECT_NE(findCredential(credentials.desktop.store(), nullptr, nullptr), 0);
     EXPECT_NE(credentials.desktop.store().deleteItem(*reference), 0);
     EXPECT_EQ(read(), platform::kCredentialBusDied);
     EXPECT_EQ(create("the second secret"), platform::kCredentialBusDied);
@@ -422,7 +420,7 @@ TEST_F(KeyringTest, OfTwoProcessesThatCreateAtOnceOneSucceeds) {
             if (writer == 0) {
                 // Nothing of GLib has been used in this process so far.
                 UsersCredentials own(root);
-                ::_exit(own.desktop.store().createItem(kItem, secret));
+                ::_exit(own.desktop.store().createItem(kItem, secret).status);
             }
             writers.push_back(writer);
         }

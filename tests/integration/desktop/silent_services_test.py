@@ -275,6 +275,21 @@ class NoSecretService(SilentServices):
             self.remove_agent()
 
 
+    def test_where_the_local_store_cannot_be_written_the_path_and_the_reason_are_said(self):
+        library = self.machine.home / "Library"
+        for folder, mode in ((library, 0o700), (library / "Locks", 0o700), (library / "Credentials", 0o500)):
+            folder.mkdir(exist_ok=True)
+            os.chown(folder, machine.UID, machine.UID)
+            folder.chmod(mode)
+        path = f"/home/{machine.USER}/Library/Credentials"
+        cannot = "the credential store cannot be written"
+        self.assertIn(f"Failed to create replay keychain item: 6 ({cannot}: {path}/Items.plist: Permission denied)",
+                      self.fails(*self.store(), bus=False))
+        backends = json.loads(self.succeeds("--json", "doctor", bus=False))["backends"]
+        reasons = [entry["reason"] for entry in backends if entry["interface"] == "CredentialStore"]
+        self.assertEqual(reasons, [f"there is no session bus; {cannot}: {path}: Permission denied"])
+
+
 class SecondItems(SilentServices):
     def setUp(self):
         super().setUp()

@@ -8,6 +8,7 @@
 #include "handoff/WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup.h"
 #include "tests/fakes/CallRecorder.h"
 #include "tests/fakes/FakeSystemLog.h"
+#include "tests/support/FindCredential.h"
 #include "tests/support/MountNamespace.h"
 
 #include <array>
@@ -184,10 +185,9 @@ TEST_F(AgentOnDiskTest, TheTrustedApplicationIsTheBundlesAgent) {
     makeHome();
     ASSERT_TRUE(store());
     platform::CredentialStore& credentials = owner->platform().credentialStore;
-    std::unique_ptr<platform::CredentialItemReference> reference;
-    ASSERT_EQ(credentials.findItem(kReplayItemService, kReplayItemAccount, nullptr, &reference), 0);
     platform::CredentialItem item;
-    ASSERT_EQ(credentials.readAttributes(*reference, item), 0);
+    ASSERT_EQ(findCredential(credentials, nullptr, nullptr, &item, kReplayItemService, kReplayItemAccount),
+              0);
     EXPECT_EQ(item.label, "anna");
     EXPECT_EQ(item.access, (platform::CredentialAccess{"Welcomer Nimbus Access",
                                                        {{"/Setup.app/Resources/wlnimbussetup"}}}));
@@ -212,7 +212,8 @@ TEST_F(AgentOnDiskTest, AnItemThatCannotBeReadIsStillThereAfterwards) {
     EXPECT_EQ(runAgent(), 0);
     EXPECT_EQ(log.lines().back(), "exiting");
     std::string data;
-    EXPECT_EQ(credentials.findItem(kReplayItemService, kReplayItemAccount, &data, nullptr), 0);
+    EXPECT_EQ(findCredential(credentials, &data, nullptr, nullptr, kReplayItemService, kReplayItemAccount),
+              0);
     EXPECT_EQ(data, std::string("\xFF\x00garbage", 9));
 }
 

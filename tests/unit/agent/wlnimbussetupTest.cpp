@@ -99,7 +99,6 @@ TEST_F(WlnimbussetupTest, EveryStepInItsOrder) {
         fake.recorder.calls(),
         (Lines{"SystemLog.write 115, Self destructing...", "ProcessIdentity.userLibraryDirectories",
                "FileSystem.remove " + kFile, "CredentialStore.findItem " + kKey,
-               "CredentialStore.readAttributes " + kKey, "CredentialStore.findItem " + kKey,
                "CredentialStore.deleteItem " + kKey, "SystemLog.write 115, Killing onlineaccounts",
                "ProcessLauncher.launchAndWait /usr/bin/killall, -9, com.corvid.onlineaccounts",
                "SystemLog.write 115, Enabling post-login services for account anna",

@@ -51,8 +51,7 @@ TEST_F(ReplayItemTest, TheReaderGivesTheObjectAndTheLabel) {
     EXPECT_TRUE(WLGetNimbusReplayKeychainItem(&replayObject, &accountName));
     EXPECT_EQ(replayObject, object);
     EXPECT_EQ(accountName, "Zo\xC3\xAB");
-    EXPECT_EQ(fake.recorder.calls(),
-              (Lines{"CredentialStore.findItem " + kKey, "CredentialStore.readAttributes " + kKey}));
+    EXPECT_EQ(fake.recorder.calls(), (Lines{"CredentialStore.findItem " + kKey}));
 }
 
 TEST_F(ReplayItemTest, TheReaderDoesNotDeleteTheItem) {
@@ -131,25 +130,25 @@ TEST_F(ReplayItemTest, AllOfTheItemIsReadWithOneLookIntoTheStore) {
     fake.credentialStore.put({kReplayItemService, kReplayItemAccount, "Zo\xC3\xAB", access},
                              *writeXMLPropertyList(object));
     ReplayItem found;
-    EXPECT_TRUE(readReplayItem(found));
+    EXPECT_TRUE(WLGetNimbusReplayKeychainItem(found));
     EXPECT_EQ(found.replayObject, object);
     EXPECT_EQ(found.item.label, "Zo\xC3\xAB");
     EXPECT_EQ(found.item.access, access);
-    EXPECT_NE(found.store.name, "");
-    EXPECT_EQ(fake.recorder.calls(),
-              (Lines{"CredentialStore.findItem " + kKey, "CredentialStore.readAttributes " + kKey}));
+    ASSERT_NE(found.reference, nullptr);
+    EXPECT_NE(found.reference->store().name, "");
+    EXPECT_EQ(fake.recorder.calls(), (Lines{"CredentialStore.findItem " + kKey}));
 }
 
 TEST_F(ReplayItemTest, WhatKeepsTheReaderFromItsWorkKeepsTheOtherOneToo) {
     ReplayItem found;
     found.item.label = "untouched";
-    EXPECT_FALSE(readReplayItem(found));
+    EXPECT_FALSE(WLGetNimbusReplayKeychainItem(found));
     put("no property list at all <<<");
-    EXPECT_FALSE(readReplayItem(found));
+    EXPECT_FALSE(WLGetNimbusReplayKeychainItem(found));
     fake.credentialStore.put({kReplayItemService, kReplayItemAccount, "anna@example.com", std::nullopt},
                              *writeXMLPropertyList(object));
     fake.credentialStore.setStatus(Operation::ReadAttributes, platform::kCredentialReadFailed);
-    EXPECT_FALSE(readReplayItem(found));
+    EXPECT_FALSE(WLGetNimbusReplayKeychainItem(found));
     EXPECT_EQ(found.item.label, "untouched");
     EXPECT_EQ(found.replayObject, PropertyList());
     const Lines lines = fake.systemLog.lines();
@@ -166,7 +165,7 @@ TEST_F(ReplayItemTest, TheLabelIsNotReadBeforeTheObjectIsUnderstood) {
     std::string accountName;
     EXPECT_FALSE(WLGetNimbusReplayKeychainItem(&replayObject, &accountName));
     ReplayItem found;
-    EXPECT_FALSE(readReplayItem(found));
+    EXPECT_FALSE(WLGetNimbusReplayKeychainItem(found));
     EXPECT_EQ(fake.recorder.callsTo("CredentialStore."), Lines(2, "CredentialStore.findItem " + kKey));
     const Lines lines = fake.systemLog.lines();
     ASSERT_EQ(lines.size(), 2U);
@@ -213,6 +212,18 @@ TEST_F(ReplayItemTest, DeletingFindsTheItemWithoutItsDataAndDeletesIt) {
     EXPECT_EQ(fake.recorder.calls(),
               (Lines{"CredentialStore.findItem " + kKey, "CredentialStore.deleteItem " + kKey}));
     EXPECT_EQ(fake.credentialStore.dataReads(), 0);
+}
+
+TEST_F(ReplayItemTest, WhatHasBeenReadIsDeletedWithoutAnotherLook) {
+    put(*writeXMLPropertyList(object));
+    ReplayItem found;
+    ASSERT_TRUE(WLGetNimbusReplayKeychainItem(found));
+    EXPECT_TRUE(WLDeleteNimbusReplayKeychainItem(found));
+    EXPECT_EQ(fake.credentialStore.items().size(), 0U);
+    EXPECT_EQ(fake.recorder.calls(),
+              (Lines{"CredentialStore.findItem " + kKey, "CredentialStore.deleteItem " + kKey}));
+    EXPECT_FALSE(WLDeleteNimbusReplayKeychainItem(found));
+    EXPECT_EQ(fake.systemLog.lines(), (Lines{"Failed to delete replay keychain item: 2"}));
 }
 
 TEST_F(ReplayItemTest, DeletingLogsTheStatusOfFinding) {

@@ -47,10 +47,11 @@ Report store(Session& session, const StoreArguments& arguments) {
                              (session.options.root == "/" ? "" : " below " + session.options.root));
     }
     const auto bundle = platform.resourceBundles.open(bundlePath);
+    platform::CredentialOutcome stored;
     if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(arguments.account, replayObject,
-                                                                      *bundle)) {
+                                                                      *bundle, stored)) {
         throw CommandFailure("cannot store the replay item and install the agent: " +
-                             storingReason(session.log));
+                             storingReason(session.log, stored));
     }
     return Report({{"account", arguments.account}, {"stored", true}},
                   "Stored the replay item for " + arguments.account +
@@ -59,22 +60,23 @@ Report store(Session& session, const StoreArguments& arguments) {
 
 // No store enforces an item's access: each says who can read the item in truth.
 void addAccess(Report& report, const ReplayItem& found) {
-    report.line("Stored in: " + std::string(found.store.name));
+    const platform::CredentialStoreDescription store = found.reference->store();
+    report.line("Stored in: " + std::string(store.name));
     const std::optional<platform::CredentialAccess>& access = found.item.access;
     report.line("Access:    " + (access ? access->description : "the store's default"));
     if (access) {
         for (const platform::TrustedApplication& application : access->trustedApplications) {
             report.line("Trusted:   " + application.path);
         }
-        report.line("           (kept with the item, but the " + std::string(found.store.name) +
+        report.line("           (kept with the item, but the " + std::string(store.name) +
                     " does not enforce it)");
     }
-    report.line("Readers:   " + std::string(found.store.readers));
+    report.line("Readers:   " + std::string(store.readers));
 }
 
 Report show(Session& session) {
     ReplayItem found;
-    if (!readReplayItem(found)) {
+    if (!WLGetNimbusReplayKeychainItem(found)) {
         throw CommandFailure("cannot read the replay item: " + replayReason(session.log));
     }
     const std::string& account = found.item.label;

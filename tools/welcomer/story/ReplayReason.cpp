@@ -1,7 +1,5 @@
 #include "tools/welcomer/story/ReplayReason.h"
 
-#include "platform/CredentialStore.h"
-
 #include <charconv>
 #include <optional>
 
@@ -30,9 +28,11 @@ std::string replayReason(const KeptLog& log) {
     return status ? line + " (" + platform::credentialStatusText(*status) + ")" : line;
 }
 
-std::string storingReason(const KeptLog& log) {
-    const std::optional<std::int32_t> status = statusIn(log.reason());
-    return replayReason(log) + (status ? storingAdvice(*status) : "");
+std::string storingReason(const KeptLog& log, const platform::CredentialOutcome& stored) {
+    if (stored == platform::kCredentialSuccess) {
+        return log.reason();
+    }
+    return log.reason() + " (" + platform::credentialOutcomeText(stored) + ")" + storingAdvice(stored.status);
 }
 
 std::string storingAdvice(std::int32_t status) {

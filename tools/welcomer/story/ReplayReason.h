@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "platform/CredentialStore.h"
 #include "tools/welcomer/cli/KeptLog.h"
 
 #include <cstdint>
@@ -12,9 +13,10 @@ namespace welcomer::tool {
 // The system's last log line. Where it ends in a status of the credential store, the status's text follows.
 std::string replayReason(const KeptLog& log);
 
-// The same for an item that was to be stored: with what else can be done where the keyring could not be
-// asked.
-std::string storingReason(const KeptLog& log);
+// The same for an item that was to be stored and the agent that was to be installed: with the reason that the
+// log line has no place for, and what else can be done where the keyring could not be asked.
+//  stored  what came of storing the item
+std::string storingReason(const KeptLog& log, const platform::CredentialOutcome& stored);
 
 // What else can be done with an item where a status says that the keyring could not be asked; else empty.
 std::string storingAdvice(std::int32_t status);

@@ -80,7 +80,9 @@ void SetupFlow::checkWhoIsLoggedIn(const std::string& account) {
 void SetupFlow::checkNothingIsWaiting(bool storesLocally) {
     const platform::Platform& platform = platform::current();
     const std::int32_t status =
-        platform.credentialStore.findItem(kReplayItemService, kReplayItemAccount, nullptr, nullptr);
+        platform.credentialStore
+            .findItem(kReplayItemService, kReplayItemAccount, platform::CredentialWish::Presence)
+            .status;
     if (status == platform::kCredentialSuccess) {
         throw CommandFailure("a replay item is waiting for the next login already (see welcomer replay)");
     }
@@ -157,9 +159,10 @@ void SetupFlow::complete(const std::vector<std::string>& services, bool justTheA
 }
 
 void SetupFlow::handOver(const ChosenAliases& aliases, platform::ResourceBundle& bundle) {
+    platform::CredentialOutcome stored;
     if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(_account, _replayObject(aliases),
-                                                                      bundle)) {
-        throw CommandFailure("cannot hand over to the next login: " + storingReason(_log));
+                                                                      bundle, stored)) {
+        throw CommandFailure("cannot hand over to the next login: " + storingReason(_log, stored));
     }
     WLCallTesselFinishedSetup();
 }

@@ -1,6 +1,7 @@
 #include "backends/desktop/SearchListCredentialStore.h"
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakeCredentialStore.h"
+#include "tests/support/FindCredential.h"
 
 #include <gtest/gtest.h>
 
@@ -19,12 +20,12 @@ using platform::CredentialItem;
 class SearchListCredentialStoreTest : public testing::Test {
   protected:
     // The status of reading an item.
-    std::int32_t read() { return store.findItem("service", "account", &data, &reference); }
+    std::int32_t read() { return findCredential(store, &data, &reference, &attributes); }
 
-    // The status of looking an item up and deleting it, as the agent does.
+    // The status of looking an item up and deleting it.
     std::int32_t lookUpAndDelete() {
         std::unique_ptr<platform::CredentialItemReference> found;
-        const std::int32_t status = store.findItem("service", "account", nullptr, &found);
+        const std::int32_t status = findCredential(store, nullptr, &found);
         return status == platform::kCredentialSuccess ? store.deleteItem(*found) : status;
     }
 
@@ -53,6 +54,7 @@ class SearchListCredentialStoreTest : public testing::Test {
                                                  SearchListCredentialStore::NewItems::ToTheLocalStore};
     std::string data = "untouched";
     std::unique_ptr<platform::CredentialItemReference> reference;
+    CredentialItem attributes;
 };
 
 // The statuses of a service that is not there, where it is nowhere else either.
@@ -131,8 +133,6 @@ TEST_F(SearchListCredentialStoreTest, WhatTheServiceHasNotIsSearchedInTheLocalSt
     local.put(item, "of the local store");
     EXPECT_EQ(read(), 0);
     EXPECT_EQ(data, "of the local store");
-    CredentialItem attributes;
-    EXPECT_EQ(store.readAttributes(*reference, attributes), 0);
     EXPECT_EQ(attributes.label, "label");
 }
 
@@ -161,8 +161,6 @@ TEST_F(SearchListCredentialStoreTest, OfTwoTheNewestIsReadWithItsAttributes) {
         local.put(itemOf(ofLocal), "of the local store");
         EXPECT_EQ(read(), 0);
         EXPECT_EQ(data, expected);
-        CredentialItem attributes;
-        EXPECT_EQ(store.readAttributes(*reference, attributes), 0);
         EXPECT_EQ(attributes.changed, std::max(ofService, ofLocal));
     }
 }
@@ -208,7 +206,7 @@ TEST_F(SearchListCredentialStoreTest,
     EXPECT_EQ(data, "of the local store");
     service.setStatus(Operation::FindItem, platform::kCredentialSuccess);
 
-    EXPECT_EQ(lookUpAndDelete(), 0);
+    EXPECT_EQ(store.deleteItem(*reference), 0);
     EXPECT_EQ(service.items().size(), 1U);
     EXPECT_TRUE(local.items().empty());
 }

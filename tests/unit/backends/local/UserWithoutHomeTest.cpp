@@ -8,6 +8,7 @@
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeProcessIdentity.h"
 #include "tests/fakes/FakeSystemLog.h"
+#include "tests/support/FindCredential.h"
 
 #include <gtest/gtest.h>
 
@@ -33,7 +34,7 @@ TEST_F(UserWithoutHomeTest, TheCredentialStoreSaysSo) {
     LocalCredentialStore store(rootFolder, identity);
     EXPECT_EQ(store.createItem({"service", "account", "label", std::nullopt}, "secret"),
               platform::kCredentialNoHome);
-    EXPECT_EQ(store.findItem("service", "account", nullptr, nullptr), platform::kCredentialNoHome);
+    EXPECT_EQ(findCredential(store, nullptr, nullptr), platform::kCredentialNoHome);
     EXPECT_EQ(platform::credentialStatusText(platform::kCredentialNoHome), "the user has no home folder");
 }
 

@@ -3,6 +3,7 @@
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeProcessIdentity.h"
+#include "tests/support/FindCredential.h"
 #include "tests/support/MountNamespace.h"
 #include "tests/support/SystemCallFaults.h"
 
@@ -36,18 +37,17 @@ class LocalCredentialStoreTest : public testing::Test {
     LocalCredentialStoreTest() { root.addDirectory(kHome); }
 
     std::int32_t create(const std::string& account, const std::string& data) {
-        return store.createItem({"service", account, "label", std::nullopt}, data);
+        return store.createItem({"service", account, "label", std::nullopt}, data).status;
     }
 
     std::int32_t statusOf(const std::string& account) {
-        return store.findItem("service", account, nullptr, nullptr);
+        return findCredential(store, nullptr, nullptr, nullptr, "service", account);
     }
 
     std::optional<std::string> secret(const std::string& account) {
         std::string data;
-        return store.findItem("service", account, &data, nullptr) == platform::kCredentialSuccess
-                   ? std::optional(data)
-                   : std::nullopt;
+        const std::int32_t status = findCredential(store, &data, nullptr, nullptr, "service", account);
+        return status == platform::kCredentialSuccess ? std::optional(data) : std::nullopt;
     }
 
     // Deletes without the store's find, which a broken store may refuse.
@@ -57,7 +57,7 @@ class LocalCredentialStoreTest : public testing::Test {
         LocalCredentialStore otherStore(posix::RootFolder(other.path()), identity);
         std::unique_ptr<CredentialItemReference> reference;
         EXPECT_EQ(otherStore.createItem({"service", account, "", std::nullopt}, ""), 0);
-        EXPECT_EQ(otherStore.findItem("service", account, nullptr, &reference), 0);
+        EXPECT_EQ(findCredential(otherStore, nullptr, &reference, nullptr, "service", account), 0);
         return store.deleteItem(*reference);
     }
 
@@ -124,6 +124,35 @@ TEST_F(LocalCredentialStoreWithLibraryTest, TheFolderAndTheFileAreTheUsersAloneW
     EXPECT_EQ(modeOf(kFile), 0600U);
 }
 
+TEST_F(LocalCredentialStoreWithLibraryTest, AFailureToCreateSaysWhichPathItWasAbout) {
+    const CredentialItem item{"service", "account", "label", std::nullopt};
+    root.addFile(kFolder, "a file in the folder's place");
+    EXPECT_EQ(store.createItem(item, "secret").detail, root.locate(kFolder) + ": Not a directory");
+    std::filesystem::remove(root.locate(kFolder));
+    root.addFile(kFile, "no property list <<<");
+    std::filesystem::permissions(root.locate(kFolder), std::filesystem::perms::owner_all);
+    std::filesystem::permissions(root.locate(kFile), std::filesystem::perms::owner_read);
+    const platform::CredentialOutcome damaged = store.createItem(item, "secret");
+    EXPECT_EQ(damaged, platform::kCredentialStoreDamaged);
+    EXPECT_EQ(damaged.detail, root.locate(kFile));
+    EXPECT_EQ(platform::credentialOutcomeText(damaged),
+              "the credential store is damaged: " + root.locate(kFile));
+}
+
+TEST_F(LocalCredentialStoreWithLibraryTest, ExaminingSaysWhatWouldKeepAnItemFromBeingCreatedAndMakesNothing) {
+    EXPECT_EQ(store.examine(), platform::kCredentialSuccess);
+    EXPECT_EQ(root.names(kLibrary), Names{});
+    root.addFile(kFile, "no property list <<<");
+    std::filesystem::permissions(root.locate(kFolder), std::filesystem::perms::owner_all);
+    std::filesystem::permissions(root.locate(kFile), std::filesystem::perms::owner_read);
+    EXPECT_EQ(store.examine(), platform::kCredentialStoreDamaged);
+    std::filesystem::remove(root.locate(kFile));
+    EXPECT_EQ(store.examine(), platform::kCredentialSuccess);
+    std::filesystem::permissions(root.locate(kFolder), std::filesystem::perms::all);
+    EXPECT_EQ(store.examine(), platform::kCredentialStoreUnsafe);
+    EXPECT_EQ(store.examine().detail, root.locate(kFolder));
+}
+
 TEST_F(LocalCredentialStoreWithLibraryTest, FindingInAStoreThatDoesNotExistCreatesNothing) {
     EXPECT_EQ(statusOf("account"), platform::kCredentialItemNotFound);
     EXPECT_EQ(deleteItem("account"), platform::kCredentialItemNotFound);
@@ -139,12 +168,12 @@ TEST_F(LocalCredentialStoreWithLibraryTest, FindingInAStoreThatDoesNotExistIsOne
     LocalCredentialStore whole{posix::RootFolder("/"), identity};
     identity.setHomeDirectory(root.locate(kHome));
     SystemCallFaults::count();
-    whole.findItem("service", "account", nullptr, nullptr);
+    findCredential(whole, nullptr, nullptr);
     EXPECT_EQ(SystemCallFaults::stop(), Names{"stat"});
 
     root.addDirectory(kFolder);
     SystemCallFaults::count();
-    whole.findItem("service", "account", nullptr, nullptr);
+    findCredential(whole, nullptr, nullptr);
     EXPECT_EQ(SystemCallFaults::stop(), Names{"stat"});
 }
 
@@ -170,7 +199,7 @@ TEST_F(LocalCredentialStoreWithLibraryTest, DeletingTheLastItemClearsAwayWhatAKi
 TEST_F(LocalCredentialStoreWithLibraryTest, ADeletionIsSyncedToo) {
     ASSERT_EQ(create("one", "first"), 0);
     std::unique_ptr<CredentialItemReference> reference;
-    ASSERT_EQ(store.findItem("service", "one", nullptr, &reference), 0);
+    ASSERT_EQ(findCredential(store, nullptr, &reference, nullptr, "service", "one"), 0);
 
     SystemCallFaults::count();
     ASSERT_EQ(store.deleteItem(*reference), 0);
@@ -510,7 +539,7 @@ void LocalCredentialStoreWithLibraryTest::expectDeletionAllOrNothing(bool otherI
         std::filesystem::remove_all(root.locate(kFolder));
         ASSERT_TRUE(!otherItem || create("other", "kept") == 0);
         ASSERT_EQ(create("account", kSecret), 0);
-        ASSERT_EQ(store.findItem("service", "account", nullptr, &reference), 0);
+        ASSERT_EQ(findCredential(store, nullptr, &reference), 0);
 
         SystemCallFaults::failAt(number, ENOSPC);
         const std::int32_t status = store.deleteItem(*reference);
@@ -538,7 +567,7 @@ TEST_F(LocalCredentialStoreWithLibraryTest, AProcessThatIsKilledAtAnyMomentLeave
     std::unique_ptr<CredentialItemReference> reference;
     ASSERT_EQ(create("other", "kept"), 0);
     ASSERT_EQ(create("account", large), 0);
-    ASSERT_EQ(store.findItem("service", "account", nullptr, &reference), 0);
+    ASSERT_EQ(findCredential(store, nullptr, &reference), 0);
     ASSERT_EQ(store.deleteItem(*reference), 0);
     for (int round = 0; round < 30; ++round) {
         int progress[2] = {};

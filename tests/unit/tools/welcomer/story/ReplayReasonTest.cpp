@@ -26,19 +26,28 @@ TEST(ReplayReason, ExplainsTheStatusOfTheCredentialStore) {
 }
 
 TEST(ReplayReason, OfStoringSaysWhatElseCanBeDoneWhereTheKeyringCouldNotBeAsked) {
-    const auto storing = [](const char* line) {
+    const auto storing = [](const char* line, const platform::CredentialOutcome& stored) {
         KeptLog log;
         log.write(115, line);
-        return storingReason(log);
+        return storingReason(log, stored);
     };
     EXPECT_EQ(
-        storing("Failed to create replay keychain item: 12"),
+        storing("Failed to create replay keychain item: 12", {platform::kCredentialNoBus}),
         "Failed to create replay keychain item: 12 (the keyring could not be asked: there is no session "
         "bus); --local stores it in the user's local file");
     EXPECT_EQ(
-        storing("Failed to create replay keychain item: 1"),
+        storing("Failed to create replay keychain item: 1", {platform::kCredentialDuplicateItem}),
         "Failed to create replay keychain item: 1 (an item with this service and account exists already)");
-    EXPECT_EQ(storing("failed to create /x: no"), "failed to create /x: no");
+    EXPECT_EQ(storing("failed to create /x: no", {}), "failed to create /x: no");
+}
+
+TEST(ReplayReason, OfStoringSaysWhichPathCouldNotBeWritten) {
+    KeptLog log;
+    log.write(115, "Failed to create replay keychain item: 6");
+    EXPECT_EQ(storingReason(
+                  log, {platform::kCredentialWriteFailed, "/home/a/Items.plist: No space left on device"}),
+              "Failed to create replay keychain item: 6 (the credential store cannot be written: "
+              "/home/a/Items.plist: No space left on device)");
 }
 
 TEST(ReplayReason, LeavesALineAloneThatEndsInNoStatus) {
