@@ -3,7 +3,6 @@
 #include "propertylist/Characters.h"
 
 #include <chrono>
-#include <system_error>
 #include <systemd/sd-bus.h>
 #include <systemd/sd-daemon.h>
 
@@ -11,80 +10,19 @@ namespace welcomer::launch {
 
 namespace {
 
-constexpr const char* kManager = "org.freedesktop.systemd1";
-
-struct DropMessage {
-    void operator()(sd_bus_message* message) const { sd_bus_message_unref(message); }
-};
-using Message = std::unique_ptr<sd_bus_message, DropMessage>;
-
-// An error of one call, freed at its end.
-class CallError {
-  public:
-    CallError() = default;
-    ~CallError() { sd_bus_error_free(&_error); }
-    CallError(const CallError&) = delete;
-    CallError& operator=(const CallError&) = delete;
-
-    sd_bus_error* get() { return &_error; }
-
-    // What went wrong in a call with this negative result.
-    platform::Error asError(int result) const {
-        return {-result, _error.message ? _error.message : std::generic_category().message(-result)};
-    }
-
-  private:
-    sd_bus_error _error{};
-};
+constexpr bus::Peer kUserManager = {"org.freedesktop.systemd1", "/org/freedesktop/systemd1",
+                                    "org.freedesktop.systemd1.Manager", std::chrono::seconds(25)};
 
 bool isPlainInUnitName(char character) {
     return isLetterOrDigit(character) || character == '.' || character == '_' || character == '-' ||
            character == ':';
 }
 
-// One property whose value is a text.
-int appendText(sd_bus_message* message, const char* name, const char* value) {
-    return sd_bus_message_append(message, "(sv)", name, "s", value);
-}
-
-// What the service runs. "no-env-expand": a dollar sign in an argument is one.
-int appendCommand(sd_bus_message* message, const LaunchAgent& agent) {
-    std::vector<char*> arguments;
-    for (const std::string& argument : agent.arguments) {
-        arguments.push_back(const_cast<char*>(argument.c_str()));
-    }
-    arguments.push_back(nullptr);
-    int result = sd_bus_message_open_container(message, 'r', "sv");
-    const auto then = [&](int next) {
-        result = result < 0 ? result : next;
-    };
-    then(sd_bus_message_append(message, "s", "ExecStartEx"));
-    then(sd_bus_message_open_container(message, 'v', "a(sasas)"));
-    then(sd_bus_message_open_container(message, 'a', "(sasas)"));
-    then(sd_bus_message_open_container(message, 'r', "sasas"));
-    then(sd_bus_message_append(message, "s", agent.program.c_str()));
-    then(sd_bus_message_append_strv(message, arguments.data()));
-    then(sd_bus_message_append(message, "as", 1, "no-env-expand"));
-    for (int open = 0; open < 4; ++open) {
-        then(sd_bus_message_close_container(message));
-    }
-    return result;
-}
-
-// The whole request; a message that has failed once fails on.
-int appendUnit(sd_bus_message* message, const LaunchAgent& agent) {
-    int result = sd_bus_message_append(message, "ss", unitName(agent.label).c_str(), "fail");
-    const auto then = [&](int next) {
-        result = result < 0 ? result : next;
-    };
-    then(sd_bus_message_open_container(message, 'a', "(sv)"));
-    then(appendText(message, "Description", ("Launch agent " + agent.label).c_str()));
-    // Also one that failed goes away, so that the next login can start it again.
-    then(appendText(message, "CollectMode", "inactive-or-failed"));
-    then(appendCommand(message, agent));
-    then(sd_bus_message_close_container(message));
-    then(sd_bus_message_append(message, "a(sa(sv))", 0));
-    return result;
+// Adds what the service runs. "no-env-expand": a dollar sign in an argument is one.
+void appendCommand(bus::Call& call, const LaunchAgent& agent) {
+    call.open('r', "sv").append("s", "ExecStartEx").open('v', "a(sasas)").open('a', "(sasas)");
+    call.open('r', "sasas").append("s", agent.program.c_str()).append(agent.arguments);
+    call.append("as", 1, "no-env-expand").close(4);
 }
 
 } // namespace
@@ -102,37 +40,6 @@ std::string unitName(std::string_view label) {
     return name + ".service";
 }
 
-void UserManagerStarter::CloseBus::operator()(sd_bus* bus) const {
-    sd_bus_flush_close_unref(bus);
-}
-
-UserManagerStarter::Bus UserManagerStarter::_sessionBus() {
-    sd_bus* bus = nullptr;
-    return sd_bus_open_user(&bus) < 0 ? nullptr : Bus(bus);
-}
-
-UserManagerStarter::Bus UserManagerStarter::_busAt(const std::string& address) {
-    sd_bus* made = nullptr;
-    if (sd_bus_new(&made) < 0) {
-        return nullptr;
-    }
-    Bus bus(made);
-    const bool connected = sd_bus_set_address(made, address.c_str()) >= 0 &&
-                           sd_bus_set_bus_client(made, 1) >= 0 && sd_bus_start(made) >= 0;
-    return connected ? std::move(bus) : nullptr;
-}
-
-bool UserManagerStarter::_hasUserManager(sd_bus* bus) {
-    CallError error;
-    sd_bus_message* answer = nullptr;
-    const int called =
-        sd_bus_call_method(bus, "org.freedesktop.DBus", "/org/freedesktop/DBus", "org.freedesktop.DBus",
-                           "NameHasOwner", error.get(), &answer, "s", kManager);
-    const Message owned(answer);
-    int hasOwner = 0;
-    return called >= 0 && sd_bus_message_read(answer, "b", &hasOwner) >= 0 && hasOwner != 0;
-}
-
 bool UserManagerStarter::_waitForUserManager(sd_bus* bus) {
     using namespace std::chrono;
     // Signals are asked for before the first look, so that none is missed between the two; any message is a
@@ -143,7 +50,7 @@ bool UserManagerStarter::_waitForUserManager(sd_bus* bus) {
                          "arg0='org.freedesktop.systemd1'",
                          nullptr, nullptr);
     const auto end = steady_clock::now() + seconds(10);
-    while (asked >= 0 && !_hasUserManager(bus)) {
+    while (asked >= 0 && !bus::isRunning(bus, kUserManager)) {
         int processed = sd_bus_process(bus, nullptr);
         const auto left = duration_cast<microseconds>(end - steady_clock::now()).count();
         if (processed == 0 && left > 0) {
@@ -157,31 +64,27 @@ bool UserManagerStarter::_waitForUserManager(sd_bus* bus) {
 }
 
 std::unique_ptr<UserManagerStarter> UserManagerStarter::connect(const std::string& runtimeFolder) {
-    Bus bus = _sessionBus();
-    if (bus && _hasUserManager(bus.get())) {
+    bus::Bus bus = bus::openSessionBus();
+    if (bus && bus::isRunning(bus.get(), kUserManager)) {
         return std::unique_ptr<UserManagerStarter>(new UserManagerStarter(std::move(bus)));
     }
     // A session may have a bus of its own, which the user manager is not on.
-    bus = runtimeFolder.starts_with('/') ? _busAt("unix:path=" + runtimeFolder + "/bus") : nullptr;
-    if (bus && (::sd_booted() > 0 ? _waitForUserManager(bus.get()) : _hasUserManager(bus.get()))) {
+    bus = runtimeFolder.starts_with('/') ? bus::openBusAt("unix:path=" + runtimeFolder + "/bus") : nullptr;
+    if (bus &&
+        (::sd_booted() > 0 ? _waitForUserManager(bus.get()) : bus::isRunning(bus.get(), kUserManager))) {
         return std::unique_ptr<UserManagerStarter>(new UserManagerStarter(std::move(bus)));
     }
     return nullptr;
 }
 
 platform::Outcome UserManagerStarter::start(const LaunchAgent& agent) {
-    sd_bus_message* made = nullptr;
-    int result = sd_bus_message_new_method_call(_bus.get(), &made, kManager, "/org/freedesktop/systemd1",
-                                                "org.freedesktop.systemd1.Manager", "StartTransientUnit");
-    const Message request(made);
-    CallError error;
-    if (result >= 0) {
-        result = appendUnit(made, agent);
-    }
-    if (result >= 0) {
-        result = sd_bus_call(_bus.get(), made, 0, error.get(), nullptr);
-    }
-    return result < 0 ? platform::Outcome::failure(error.asError(result)) : platform::Outcome::success();
+    bus::Call call(_bus.get(), kUserManager, "StartTransientUnit");
+    call.append("ss", unitName(agent.label).c_str(), "fail").open('a', "(sv)");
+    call.append("(sv)", "Description", "s", ("Launch agent " + agent.label).c_str());
+    // Also one that failed goes away, so that the next login can start it again.
+    call.append("(sv)", "CollectMode", "s", "inactive-or-failed");
+    appendCommand(call, agent);
+    return call.close().append("a(sa(sv))", 0).send();
 }
 
 } // namespace welcomer::launch

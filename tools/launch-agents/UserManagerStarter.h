@@ -3,12 +3,11 @@
 #pragma once
 
 #include "tools/launch-agents/AgentStarter.h"
+#include "tools/shared/BusCall.h"
 
 #include <memory>
 #include <string>
 #include <string_view>
-
-struct sd_bus;
 
 namespace welcomer::launch {
 
@@ -32,19 +31,11 @@ class UserManagerStarter final : public AgentStarter {
     platform::Outcome start(const LaunchAgent& agent) override;
 
   private:
-    struct CloseBus {
-        void operator()(sd_bus* bus) const;
-    };
-    using Bus = std::unique_ptr<sd_bus, CloseBus>;
+    explicit UserManagerStarter(bus::Bus bus) : _bus(std::move(bus)) {}
 
-    explicit UserManagerStarter(Bus bus) : _bus(std::move(bus)) {}
-
-    static Bus _sessionBus();
-    static Bus _busAt(const std::string& address);
-    static bool _hasUserManager(sd_bus* bus);
     static bool _waitForUserManager(sd_bus* bus);
 
-    Bus _bus;
+    const bus::Bus _bus;
 };
 
 } // namespace welcomer::launch

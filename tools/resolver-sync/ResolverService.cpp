@@ -1,9 +1,6 @@
 #include "tools/resolver-sync/ResolverService.h"
 
 #include <arpa/inet.h>
-#include <cerrno>
-#include <cstdarg>
-#include <cstring>
 #include <string_view>
 #include <sys/socket.h>
 #include <system_error>
@@ -13,49 +10,21 @@ namespace welcomer::resolver {
 
 namespace {
 
-constexpr const char* kService = "org.freedesktop.resolve1";
-constexpr const char* kPath = "/org/freedesktop/resolve1";
-constexpr const char* kInterface = "org.freedesktop.resolve1.Manager";
+// Whoever does not run it resolves names in another way, and is to go on doing so: no call starts it.
+constexpr bus::Peer kResolver = {"org.freedesktop.resolve1", "/org/freedesktop/resolve1",
+                                 "org.freedesktop.resolve1.Manager", std::chrono::seconds(25)};
+constexpr bus::Peer kIntrospection = {kResolver.name, kResolver.path, "org.freedesktop.DBus.Introspectable",
+                                      kResolver.limit};
+constexpr bus::Peer kServiceManager = {"org.freedesktop.systemd1", "/org/freedesktop/systemd1",
+                                       "org.freedesktop.systemd1.Manager", std::chrono::seconds(25)};
 
-struct DropMessage {
-    void operator()(sd_bus_message* message) const { sd_bus_message_unref(message); }
-};
-using Message = std::unique_ptr<sd_bus_message, DropMessage>;
-
-class CallError {
-  public:
-    CallError() = default;
-    ~CallError() { sd_bus_error_free(&_error); }
-    CallError(const CallError&) = delete;
-    CallError& operator=(const CallError&) = delete;
-    sd_bus_error* get() { return &_error; }
-
-    // The outcome of a call with this result.
-    platform::Outcome outcome(int result, const char* method) const {
-        if (result >= 0) {
-            return platform::Outcome::success();
-        }
-        const std::string reason = _error.message ? _error.message : std::generic_category().message(-result);
-        return platform::Outcome::failure({-result, std::string(method) + ": " + reason});
+// Sends a call whose failure is to name its method.
+platform::Outcome send(bus::Call& call, const char* method) {
+    platform::Outcome outcome = call.send();
+    if (!outcome) {
+        outcome.error.message = std::string(method) + ": " + outcome.error.message;
     }
-
-  private:
-    sd_bus_error _error{};
-};
-
-Message newCall(sd_bus* bus, const char* method) {
-    sd_bus_message* made = nullptr;
-    sd_bus_message_new_method_call(bus, &made, kService, kPath, kInterface, method);
-    if (made) {
-        // Whoever does not run the service resolves names in another way, and is to go on doing so.
-        sd_bus_message_set_auto_start(made, 0);
-    }
-    return Message(made);
-}
-
-platform::Outcome finish(sd_bus* bus, sd_bus_message* message, int built, const char* method) {
-    CallError error;
-    return error.outcome(built < 0 ? built : sd_bus_call(bus, message, 0, error.get(), nullptr), method);
+    return outcome;
 }
 
 int ownerChanged(sd_bus_message* message, void* userdata, sd_bus_error* /*error*/) {
@@ -74,10 +43,6 @@ int busLost(sd_bus_message* /*message*/, void* userdata, sd_bus_error* /*error*/
 }
 
 } // namespace
-
-void ResolverService::CloseBus::operator()(sd_bus* bus) const {
-    sd_bus_flush_close_unref(bus);
-}
 
 ResolverService::ResolverService(sd_event* event, std::function<void(bool running)> appeared)
     : _appeared(std::move(appeared)) {
@@ -111,98 +76,72 @@ ResolverService::~ResolverService() {
 }
 
 bool ResolverService::isRunning() {
-    sd_bus_message* answer = nullptr;
-    int owned = 0;
-    const int called =
-        sd_bus_call_method(_bus.get(), "org.freedesktop.DBus", "/org/freedesktop/DBus",
-                           "org.freedesktop.DBus", "NameHasOwner", nullptr, &answer, "s", kService);
-    const Message held(answer);
-    return called >= 0 && sd_bus_message_read(answer, "b", &owned) >= 0 && owned != 0;
+    return bus::isRunning(_bus.get(), kResolver);
 }
 
 bool ResolverService::hasDelegates() {
-    sd_bus_message* answer = nullptr;
+    bus::Message answer;
     const char* description = nullptr;
-    const int called = sd_bus_call_method(_bus.get(), kService, kPath, "org.freedesktop.DBus.Introspectable",
-                                          "Introspect", nullptr, &answer, "");
-    const Message held(answer);
-    return called >= 0 && sd_bus_message_read(answer, "s", &description) >= 0 &&
+    return bus::Call(_bus.get(), kIntrospection, "Introspect").send(&answer) &&
+           sd_bus_message_read(answer.get(), "s", &description) >= 0 &&
            std::string_view(description).find("\"ListDelegates\"") != std::string_view::npos;
 }
 
-platform::Outcome ResolverService::_call(const char* method, const char* types, ...) {
-    const Message message = newCall(_bus.get(), method);
-    va_list arguments;
-    va_start(arguments, types);
-    const int built = message ? sd_bus_message_appendv(message.get(), types, arguments) : -ENOMEM;
-    va_end(arguments);
-    return finish(_bus.get(), message.get(), built, method);
+platform::Outcome ResolverService::_setText(const char* method, int link, const char* text) {
+    bus::Call call(_bus.get(), kResolver, method);
+    return send(call.append("is", link, text), method);
+}
+
+platform::Outcome ResolverService::_keepFromBeingTheDefault(int link) {
+    bus::Call call(_bus.get(), kResolver, "SetLinkDefaultRoute");
+    return send(call.append("ib", link, 0), "SetLinkDefaultRoute");
 }
 
 platform::Outcome ResolverService::_setNameserver(int link, const std::string& address, std::uint16_t port) {
     in_addr bytes{};
     ::inet_pton(AF_INET, address.c_str(), &bytes);
-    const Message message = newCall(_bus.get(), "SetLinkDNSEx");
-    int result = message ? 0 : -ENOMEM;
-    const auto then = [&](auto next) {
-        result = result < 0 ? result : next(message.get());
-    };
-    then([&](sd_bus_message* built) { return sd_bus_message_append(built, "i", link); });
-    then([&](sd_bus_message* built) { return sd_bus_message_open_container(built, 'a', "(iayqs)"); });
-    then([&](sd_bus_message* built) { return sd_bus_message_open_container(built, 'r', "iayqs"); });
-    then([&](sd_bus_message* built) { return sd_bus_message_append(built, "i", AF_INET); });
-    then(
-        [&](sd_bus_message* built) { return sd_bus_message_append_array(built, 'y', &bytes, sizeof bytes); });
-    then([&](sd_bus_message* built) { return sd_bus_message_append(built, "qs", port, ""); });
-    then([&](sd_bus_message* built) { return sd_bus_message_close_container(built); });
-    then([&](sd_bus_message* built) { return sd_bus_message_close_container(built); });
-    return finish(_bus.get(), message.get(), result, "SetLinkDNSEx");
+    bus::Call call(_bus.get(), kResolver, "SetLinkDNSEx");
+    call.append("i", link).open('a', "(iayqs)").open('r', "iayqs").append("i", AF_INET);
+    call.appendBytes(&bytes, sizeof bytes).append("qs", port, "").close(2);
+    return send(call, "SetLinkDNSEx");
 }
 
 platform::Outcome ResolverService::_setDomains(int link, const std::vector<std::string>& domains) {
-    const Message message = newCall(_bus.get(), "SetLinkDomains");
-    int result = message ? 0 : -ENOMEM;
-    const auto then = [&](auto next) {
-        result = result < 0 ? result : next(message.get());
-    };
-    then([&](sd_bus_message* built) { return sd_bus_message_append(built, "i", link); });
-    then([&](sd_bus_message* built) { return sd_bus_message_open_container(built, 'a', "(sb)"); });
+    bus::Call call(_bus.get(), kResolver, "SetLinkDomains");
+    call.append("i", link).open('a', "(sb)");
     for (const std::string& domain : domains) {
         // Routing alone: short names are not looked up in it.
-        then([&](sd_bus_message* built) { return sd_bus_message_append(built, "(sb)", domain.c_str(), 1); });
+        call.append("(sb)", domain.c_str(), 1);
     }
-    then([&](sd_bus_message* built) { return sd_bus_message_close_container(built); });
-    return finish(_bus.get(), message.get(), result, "SetLinkDomains");
+    return send(call.close(), "SetLinkDomains");
 }
 
 platform::Outcome ResolverService::routeLink(int link, const std::vector<std::string>& domains,
                                              const std::string& address, std::uint16_t port) {
     // What a forwarder on this machine cannot do, and what names of other domains are not to be asked with.
-    platform::Outcome outcome = _call("SetLinkDNSOverTLS", "is", link, "no");
+    platform::Outcome outcome = _setText("SetLinkDNSOverTLS", link, "no");
     const auto then = [&](auto next) {
         if (outcome) {
             outcome = next();
         }
     };
-    then([&] { return _call("SetLinkDNSSEC", "is", link, "no"); });
-    then([&] { return _call("SetLinkLLMNR", "is", link, "no"); });
-    then([&] { return _call("SetLinkMulticastDNS", "is", link, "no"); });
-    then([&] { return _call("SetLinkDefaultRoute", "ib", link, 0); });
+    then([&] { return _setText("SetLinkDNSSEC", link, "no"); });
+    then([&] { return _setText("SetLinkLLMNR", link, "no"); });
+    then([&] { return _setText("SetLinkMulticastDNS", link, "no"); });
+    then([&] { return _keepFromBeingTheDefault(link); });
     then([&] { return _setNameserver(link, address, port); });
     then([&] { return _setDomains(link, domains); });
     return outcome;
 }
 
 platform::Outcome ResolverService::flushCaches() {
-    return _call("FlushCaches", "");
+    bus::Call call(_bus.get(), kResolver, "FlushCaches");
+    return send(call, "FlushCaches");
 }
 
 platform::Outcome ResolverService::reload() {
-    CallError error;
-    const int result = sd_bus_call_method(_bus.get(), "org.freedesktop.systemd1", "/org/freedesktop/systemd1",
-                                          "org.freedesktop.systemd1.Manager", "ReloadUnit", error.get(),
-                                          nullptr, "ss", "systemd-resolved.service", "replace");
-    return error.outcome(result, "ReloadUnit");
+    bus::Call call(_bus.get(), kServiceManager, "ReloadUnit");
+    return send(call.append("ss", "systemd-resolved.service", "replace"), "ReloadUnit");
 }
 
 } // namespace welcomer::resolver

@@ -3,14 +3,13 @@
 #pragma once
 
 #include "platform/Error.h"
+#include "tools/shared/BusCall.h"
 
 #include <cstdint>
 #include <functional>
-#include <memory>
 #include <string>
 #include <vector>
 
-struct sd_bus;
 struct sd_event;
 
 namespace welcomer::resolver {
@@ -42,16 +41,13 @@ class ResolverService {
     platform::Outcome reload();
 
   private:
-    struct CloseBus {
-        void operator()(sd_bus* bus) const;
-    };
-
-    // One call of the service's manager object.
-    platform::Outcome _call(const char* method, const char* types, ...);
+    // Gives a link's setting this text.
+    platform::Outcome _setText(const char* method, int link, const char* text);
+    platform::Outcome _keepFromBeingTheDefault(int link);
     platform::Outcome _setNameserver(int link, const std::string& address, std::uint16_t port);
     platform::Outcome _setDomains(int link, const std::vector<std::string>& domains);
 
-    std::unique_ptr<sd_bus, CloseBus> _bus;
+    bus::Bus _bus;
     std::function<void(bool)> _appeared;
 };
 

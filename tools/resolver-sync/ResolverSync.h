@@ -7,7 +7,7 @@
 #include "tools/resolver-sync/Forwarder.h"
 #include "tools/resolver-sync/LinkRouting.h"
 #include "tools/resolver-sync/ResolverService.h"
-#include "tools/resolver-sync/RunningMark.h"
+#include "tools/shared/RunningMark.h"
 
 #include <cstdint>
 #include <memory>

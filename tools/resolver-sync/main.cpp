@@ -4,7 +4,7 @@
 #include "log/PCLogManager.h"
 #include "text/ProgramOptions.h"
 #include "tools/resolver-sync/ResolverSync.h"
-#include "tools/resolver-sync/RunningMark.h"
+#include "tools/shared/RunningMark.h"
 
 #include <exception>
 #include <string>

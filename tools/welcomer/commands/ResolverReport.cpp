@@ -2,7 +2,7 @@
 
 #include "platform/Path.h"
 #include "platform/Platform.h"
-#include "tools/resolver-sync/RunningMark.h"
+#include "tools/shared/RunningMark.h"
 
 #include <sstream>
 #include <sys/socket.h>

@@ -1,4 +1,4 @@
-#include "tools/resolver-sync/RunningMark.h"
+#include "tools/shared/RunningMark.h"
 
 #include "tests/contract/TemporaryRoot.h"
 

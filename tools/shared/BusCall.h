@@ -1,0 +1,77 @@
+// Calls to services on a bus, for the tools: connections, one call, and who has a name.
+
+#pragma once
+
+#include "platform/Error.h"
+
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <vector>
+
+struct sd_bus;
+struct sd_bus_message;
+
+namespace welcomer::bus {
+
+// A service's object on a bus, as every call takes it.
+struct Peer {
+    const char* name;
+    const char* path;
+    const char* interface;
+    std::chrono::microseconds limit; // how long each call may take
+};
+
+struct CloseBus {
+    void operator()(sd_bus* bus) const;
+};
+using Bus = std::unique_ptr<sd_bus, CloseBus>;
+
+struct DropMessage {
+    void operator()(sd_bus_message* message) const;
+};
+using Message = std::unique_ptr<sd_bus_message, DropMessage>;
+
+// The bus of the session that this process runs in, or the one at an address.
+//  result  null where there is none
+// One thread for each bus, as for all that is done on it.
+Bus openSessionBus();
+Bus openBusAt(const std::string& address);
+
+// One call of a method. Starts nobody. Its arguments are added in their order; what cannot be added is told
+// when the call is sent.
+class Call {
+  public:
+    //  bus  borrowed
+    Call(sd_bus* bus, const Peer& peer, const char* method);
+
+    // Adds values of these types, as sd_bus_message_append() takes them.
+    Call& append(const char* types, ...);
+    // Adds an array of texts, or one of bytes.
+    Call& append(const std::vector<std::string>& texts);
+    Call& appendBytes(const void* bytes, std::size_t size);
+    // Opens a container, 'a', 'v' or 'r', with these contents, and closes the innermost ones.
+    Call& open(char kind, const char* contents);
+    Call& close(int count = 1);
+
+    // Sends it, and waits for the answer.
+    //  answer  where to put it, or null; written on success only
+    //  result  the error's number and text
+    platform::Outcome send(Message* answer = nullptr);
+
+  private:
+    // Keeps the first failure.
+    Call& _note(int result);
+
+    sd_bus* const _bus;
+    const std::uint64_t _microseconds;
+    Message _message;
+    int _result;
+};
+
+// Whether a peer runs; not, where the bus does not answer.
+bool isRunning(sd_bus* bus, const Peer& peer);
+
+} // namespace welcomer::bus
