@@ -140,7 +140,7 @@ std::string newServiceID(const Dictionary& content, const std::string& device) {
 }
 
 std::string addService(Dictionary& content, const std::string& device, const std::string& name) {
-    const std::string serviceID = newServiceID(content, device);
+    std::string serviceID = newServiceID(content, device);
     serviceToChange(content, serviceID) = {{kName, name}, {kDevice, device}, {kEnabled, true}};
     setProtocols(content, serviceID, network::defaultProtocols());
     const std::string setID = currentSet(content);
