@@ -137,6 +137,10 @@ class NetworkingManager {
     // Adds services for hardware that has none, stores and applies that. What came of it is logged.
     void registerNewNetworkServices();
 
+    // Whether it was the store that did not take what `applySettings` or `registerNewNetworkServices` last
+    // had for it; its error is in the line that was logged last then.
+    bool wasRefusedByStore() const { return _wasRefusedByStore; }
+
   protected:
     // The interface type of the user's choice: Ethernet for "lan", wireless for everything else, no choice
     // among it. Never none here; callers cope with none.
@@ -155,6 +159,7 @@ class NetworkingManager {
     void _setManualDNSDns(platform::NetworkService& service, const TextList& dns) const;
 
     std::shared_ptr<platform::NetworkConfigConnection> _prefs;
+    bool _wasRefusedByStore = false;
     [[maybe_unused]] bool _readDefaults = false; // declared, never set or read
     platform::Atomic<Text> _userChoice;
     std::int64_t _secondsToWait = 0;

@@ -137,6 +137,7 @@ std::shared_ptr<platform::NetworkSet> NetworkingManager::_currentSet() {
 bool NetworkingManager::applySettings(PropertyList::Dictionary* error) {
     const std::uint64_t warningType = _internetConnectionWarningType;
     const bool configuresLAN = userSaidConfigureLAN();
+    _wasRefusedByStore = false;
     const auto failed = [&](PropertyList::Dictionary dictionary) {
         if (error) {
             *error = std::move(dictionary);
@@ -223,12 +224,14 @@ bool NetworkingManager::configureManual() {
 }
 
 bool NetworkingManager::configureService(platform::NetworkService& service) {
+    _wasRefusedByStore = false;
     try {
         _configureService(service);
     } catch (const std::exception&) {
         return false;
     }
-    return commitPrefs();
+    _wasRefusedByStore = !commitPrefs();
+    return !_wasRefusedByStore;
 }
 
 void NetworkingManager::_configureService(platform::NetworkService& service) {
@@ -267,6 +270,7 @@ void NetworkingManager::_configureService(platform::NetworkService& service) {
     }
     if (!protocol->setConfiguration(configuration)) {
         const StoreError error(*protocol);
+        _wasRefusedByStore = true;
         WL_LOG_AS(kServiceFunction,
                   "NetworkingManager: NCNetworkProtocolSetConfiguration failed error code %ld error %s",
                   error.number(), error.characters());
@@ -344,6 +348,7 @@ bool NetworkingManager::commitPrefs() {
 }
 
 void NetworkingManager::registerNewNetworkServices() {
+    _wasRefusedByStore = false;
     const auto preferences = systemPreferences();
     const auto set = preferences->copyCurrentSet();
     if (!set) {
@@ -354,7 +359,7 @@ void NetworkingManager::registerNewNetworkServices() {
         WL_LOG_AS(kRegisterFunction, "NCNetworkSetEstablishDefaultConfiguration : no new devices.");
         return;
     }
-    storeEstablished(*preferences, kRegisterFunction);
+    _wasRefusedByStore = !storeEstablished(*preferences, kRegisterFunction);
 }
 
 } // namespace welcomer

@@ -117,6 +117,33 @@ TEST_F(ApplyTest, AConfigurationThatFailsIsTheConfigurationErrorWithoutAProbe) {
     }
 }
 
+TEST_F(ApplyTest, WhetherTheStoreRefusedIsSaidOfTheLastCallAlone) {
+    NetworkingManager& made = manualManager();
+    made.setInternetConnectionWarningType(3);
+    EXPECT_FALSE(made.wasRefusedByStore());
+    store.failures["apply"] = {7};
+    EXPECT_FALSE(apply(made));
+    EXPECT_TRUE(made.wasRefusedByStore());
+
+    store.failures.clear();
+    EXPECT_TRUE(apply(made));
+    EXPECT_FALSE(made.wasRefusedByStore());
+
+    store.failures["commit"] = {7};
+    EXPECT_FALSE(apply(made));
+    EXPECT_TRUE(made.wasRefusedByStore());
+    store.failures.clear();
+    made.setInternetConnectionWarningType(2); // fails always
+    EXPECT_FALSE(apply(made));
+    EXPECT_FALSE(made.wasRefusedByStore());
+
+    store.failures["commit"] = {7};
+    EXPECT_FALSE(apply(made));
+    made.setIpAddress(std::nullopt); // what cannot be configured never comes to the store
+    EXPECT_FALSE(apply(made));
+    EXPECT_FALSE(made.wasRefusedByStore());
+}
+
 TEST_F(ApplyTest, ErrorTextsThatTheBundleLacksAreEmpty) {
     fake.resourceBundles.mainBundleTexts.clear();
     const Dictionary empty = {{"title", ""}, {"body", ""}};
@@ -567,6 +594,7 @@ TEST_F(ApplyTest, RegisteringStopsAtAFailureWithACode) {
         NetworkingManager& made = openManager();
         store.newHardware = {service("new", "eth7")};
         made.registerNewNetworkServices();
+        EXPECT_EQ(made.wasRefusedByStore(), code != 0);
         Lines lines = {"NCPreferencesCommitChanges failed error code " + tail};
         Lines calls = {"establish", "commit", "synchronize"};
         if (code == 0) {
@@ -580,6 +608,7 @@ TEST_F(ApplyTest, RegisteringStopsAtAFailureWithACode) {
         NetworkingManager& other = openManager();
         store.newHardware = {service("newer", "eth8")};
         other.registerNewNetworkServices();
+        EXPECT_EQ(other.wasRefusedByStore(), code != 0);
         lines = {"NCPreferencesApplyChanges failed error code " + tail};
         if (code == 0) {
             lines.emplace_back("updated network configuration");

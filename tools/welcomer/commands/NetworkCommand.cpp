@@ -21,8 +21,6 @@ namespace {
 using Text = NetworkingManager::Text;
 using TextList = NetworkingManager::TextList;
 
-constexpr const char* kStoreFailed = "failed error code"; // in the log lines that tell of the store's error
-
 constexpr std::uint64_t kDefaultWarningType = 1;
 constexpr std::int64_t kDefaultWait = 10;
 
@@ -120,17 +118,8 @@ bool leaveNothingToDo(const Settings& settings) {
            (settings.warningType > lastCheckingType && settings.choice != kUserChoiceLAN);
 }
 
-// Why the configuration could not be stored or put to use, to go behind the text for people; nothing when the
-// last line of the log tells of something else.
-std::string storeFailure(const KeptLog& log) {
-    const std::string line = log.reason();
-    return line.find(kStoreFailed) == std::string::npos ? "" : " (" + line + ")";
-}
-
 Report apply(Session& session, const Settings& settings) {
     checkSettings(settings);
-    PropertyList::Dictionary error;
-    bool succeeded = false;
     {
         const WaitingLine waiting("Applying, and waiting for the network for at most " +
                                       std::to_string(settings.wait) + " s",
@@ -147,10 +136,11 @@ Report apply(Session& session, const Settings& settings) {
         manager.setDhcpClientID(settings.dhcpClientID);
         manager.setInternetConnectionWarningType(settings.warningType);
         manager.setSecondsToWaitForInternetReachability(settings.wait);
-        succeeded = manager.applySettings(&error);
-    }
-    if (!succeeded) {
-        throw CommandFailure(entry(error, "title") + ". " + entry(error, "body") + storeFailure(session.log));
+        PropertyList::Dictionary error;
+        if (!manager.applySettings(&error)) {
+            throw CommandFailure(entry(error, "title") + ". " + entry(error, "body") +
+                                 (manager.wasRefusedByStore() ? " (" + session.log.reason() + ")" : ""));
+        }
     }
     const bool applied = !leaveNothingToDo(settings);
     return Report({{"applied", applied}},
@@ -163,6 +153,9 @@ Report registerServices(Session& session) {
         const WaitingLine waiting("Waiting for the network configuration", true);
         NetworkingManager manager;
         manager.registerNewNetworkServices();
+        if (manager.wasRefusedByStore()) {
+            throw CommandFailure(session.log.reason());
+        }
         const auto set = manager.systemPreferences()->copyCurrentSet();
         const auto services = set ? set->copyServices() : std::nullopt;
         if (!services) {
@@ -171,11 +164,6 @@ Report registerServices(Session& session) {
         for (const auto& service : *services) {
             names.push_back(service->name().value_or("-"));
         }
-    }
-    // The last line says what came of it.
-    const std::string outcome = session.log.reason();
-    if (outcome.find(kStoreFailed) != std::string::npos) {
-        throw CommandFailure(outcome);
     }
     Report report({{"services", names}}, "The network services are stored:");
     for (const std::string& name : names) {
