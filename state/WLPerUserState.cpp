@@ -272,6 +272,24 @@ std::vector<std::string> WLPerUserState::_keys() {
     return keys;
 }
 
+std::vector<WLPerUserState::Key> WLPerUserState::keys() {
+    std::vector<Key> keys;
+    for (const Entry& entry : _entries()) {
+        keys.push_back({entry.key, entry.flag != nullptr});
+    }
+    return keys;
+}
+
+void WLPerUserState::setValueForKey(const std::string& key, const std::optional<PropertyList>& value) {
+    for (const Entry& entry : _entries()) {
+        if (entry.key == key && entry.text) {
+            _setText(entry.text, std::optional(value));
+        } else if (entry.key == key) {
+            (this->*entry.flag).set(value && booleanReading(*value));
+        }
+    }
+}
+
 void WLPerUserState::_setText(Text WLPerUserState::*property, std::optional<PropertyList>&& value) {
     if (property == &WLPerUserState::_previousSystemVersion) {
         change(kPreviousSystemVersionProperty, [&] { _previousSystemVersion.set(std::move(value)); });

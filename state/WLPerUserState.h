@@ -93,6 +93,17 @@ class WLPerUserState final : public platform::Observable {
     bool showKeychainSyncGreeterAtLogin() const;
     void setShowKeychainSyncGreeterAtLogin(bool show);
 
+    // The keys in their canonical order, with what their properties are.
+    struct Key {
+        std::string name;
+        bool isFlag = false; // a text otherwise
+    };
+    static std::vector<Key> keys();
+
+    // Sets the property that has this key: a text or a flag, which none makes none or false; nothing for a
+    // key that is none of the record's.
+    void setValueForKey(const std::string& key, const std::optional<PropertyList>& value);
+
     // Whether the user has never run a system before: the previous version is missing or empty, is "0" or
     // begins with "0.".
     bool isNewUserAccount() const;

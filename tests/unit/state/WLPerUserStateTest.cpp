@@ -5,6 +5,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -245,6 +246,39 @@ TEST_F(WLPerUserStateTest, EveryPropertyIsItsOwn) {
         (state.*flag.set)(false);
     }
     expectEmpty(state);
+}
+
+TEST_F(WLPerUserStateTest, TheKeysSayWhichPropertiesAreFlags) {
+    Lines all;
+    Lines flags;
+    for (const WLPerUserState::Key& key : WLPerUserState::keys()) {
+        all.push_back(key.name);
+        if (key.isFlag) {
+            flags.push_back(key.name);
+        }
+    }
+    EXPECT_EQ(all, kCanonicalOrder);
+    EXPECT_EQ(flags.size(), kFlags.size());
+    for (const FlagProperty& flag : kFlags) {
+        EXPECT_EQ(std::count(flags.begin(), flags.end(), flag.key), 1) << flag.key;
+    }
+}
+
+TEST_F(WLPerUserStateTest, EveryPropertyCanBeSetUnderItsKey) {
+    WLPerUserState state;
+    for (const TextProperty& text : kTexts) {
+        state.setValueForKey(text.key, text.key);
+        EXPECT_EQ(state.dictionaryRepresentation(), (Dictionary{{text.key, text.key}}));
+        state.setValueForKey(text.key, std::nullopt);
+    }
+    for (const FlagProperty& flag : kFlags) {
+        state.setValueForKey(flag.key, true);
+        EXPECT_EQ(state.dictionaryRepresentation(), (Dictionary{{flag.key, true}}));
+        state.setValueForKey(flag.key, std::nullopt);
+    }
+    state.setValueForKey("Other", "x");
+    expectEmpty(state);
+    EXPECT_EQ(state.dictionaryRepresentation(), Dictionary());
 }
 
 TEST_F(WLPerUserStateTest, SettingBothPreviousVersionsSetsTheSystemsFirst) {

@@ -17,33 +17,12 @@ namespace welcomer::tool {
 
 namespace {
 
-// One key of the record: a text or a flag, and how it is set.
-struct Key {
-    const char* name;
-    void (WLPerUserState::*setText)(const std::optional<std::string>&);
-    void (WLPerUserState::*setFlag)(bool);
-};
+using Key = WLPerUserState::Key;
 
-const Key kKeys[] = {
-    {kPreviousSystemVersionKey, &WLPerUserState::setPreviousSystemVersion, nullptr},
-    {kPreviousBuildVersionKey, &WLPerUserState::setPreviousBuildVersion, nullptr},
-    {kDidSeeCloudSetupKey, nullptr, &WLPerUserState::setDidSeeCloudSetup},
-    {kLastSeenCloudProductVersionKey, &WLPerUserState::setLastSeenCloudProductVersion, nullptr},
-    {kDidSeeSyncSetupKey, nullptr, &WLPerUserState::setDidSeeSyncSetup},
-    {kDidSeeSyncSetup2Key, nullptr, &WLPerUserState::setDidSeeSyncSetup2},
-    {kLastSeenSyncProductVersionKey, &WLPerUserState::setLastSeenSyncProductVersion, nullptr},
-    {kLastPreLoginTasksPerformedBuildKey, &WLPerUserState::setLastPreLoginTasksPerformedBuild, nullptr},
-    {kLastPreLoginTasksPerformedVersionKey, &WLPerUserState::setLastPreLoginTasksPerformedVersion, nullptr},
-    {kSkipFirstLoginOptimizationKey, nullptr, &WLPerUserState::setSkipFirstLoginOptimization},
-    {kLastCacheCleanupProductVersionKey, &WLPerUserState::setLastCacheCleanupProductVersion, nullptr},
-    {kLastCacheCleanupStillRunningKey, nullptr, &WLPerUserState::setLastCacheCleanupStillRunning},
-    {kRunNonInteractiveKey, nullptr, &WLPerUserState::setRunNonInteractive},
-    {kShowKeychainSyncGreeterAtLoginKey, nullptr, &WLPerUserState::setShowKeychainSyncGreeterAtLogin},
-};
-
-const Key& keyNamed(const std::string& name) {
-    const auto* const found = std::ranges::find(kKeys, name, &Key::name);
-    if (found == std::end(kKeys)) {
+Key keyNamed(const std::string& name) {
+    const std::vector<Key> keys = WLPerUserState::keys();
+    const auto found = std::ranges::find(keys, name, &Key::name);
+    if (found == keys.end()) {
         throw UsageError("the record has no key " + name);
     }
     return *found;
@@ -77,7 +56,7 @@ void storeRecord(const Session& session) {
 
 std::string valueOf(const Key& key, const PropertyList::Dictionary& record) {
     const auto found = record.find(key.name);
-    if (key.setFlag) {
+    if (key.isFlag) {
         return found == record.end() ? "false" : "true";
     }
     return found == record.end() ? "-" : text::describe(found->second);
@@ -88,10 +67,10 @@ Report show(Session& /*session*/) {
     const PropertyList::Dictionary record = state.dictionaryRepresentation();
     Json values = Json::object();
     TextTable table({"KEY", "VALUE"});
-    for (const Key& key : kKeys) {
+    for (const Key& key : WLPerUserState::keys()) {
         const auto found = record.find(key.name);
         values[key.name] =
-            found != record.end() ? toJson(found->second) : (key.setFlag ? Json(false) : Json());
+            found != record.end() ? toJson(found->second) : (key.isFlag ? Json(false) : Json());
         table.addRow({key.name, valueOf(key, record)});
     }
     Report report;
@@ -107,29 +86,19 @@ Report show(Session& /*session*/) {
 }
 
 Report set(Session& session, const std::string& name, const std::string& value) {
-    const Key& key = keyNamed(name);
+    const Key key = keyNamed(name);
     if (const auto unwritable = findUnwritableEntry(name, value)) {
         throw CommandFailure("the value could not be stored: " + *unwritable);
     }
-    const Json stored = key.setFlag ? Json(flagIn(value, name)) : Json(value);
-    WLPerUserState& state = recordToChange();
-    if (key.setFlag) {
-        (state.*key.setFlag)(stored.get<bool>());
-    } else {
-        (state.*key.setText)(value);
-    }
+    const PropertyList stored = key.isFlag ? PropertyList(flagIn(value, name)) : PropertyList(value);
+    recordToChange().setValueForKey(name, stored);
     storeRecord(session);
-    return Report({{"key", name}, {"value", stored}}, "Stored " + name + ".");
+    return Report({{"key", name}, {"value", toJson(stored)}}, "Stored " + name + ".");
 }
 
 Report remove(Session& session, const std::string& name) {
-    const Key& key = keyNamed(name);
-    WLPerUserState& state = recordToChange();
-    if (key.setFlag) {
-        (state.*key.setFlag)(false);
-    } else {
-        (state.*key.setText)(std::nullopt);
-    }
+    const Key key = keyNamed(name);
+    recordToChange().setValueForKey(key.name, std::nullopt);
     storeRecord(session);
     return Report({{"key", name}, {"removed", true}}, "Removed " + name + ".");
 }
