@@ -6,19 +6,17 @@
 
 #include <CLI/CLI.hpp>
 #include <memory>
-#include <optional>
 
 namespace welcomer::tool {
 
 namespace {
 
-Report tellStory(Session& session, bool timeLapse, InterruptionGuard& guard) {
-    std::optional<TemporaryFolder> temporary;
-    if (!session.options.rootGiven) {
-        temporary.emplace();
+Report tellInFolder(Session& session, bool timeLapse, InterruptionGuard& guard) {
+    if (session.options.rootGiven) {
+        return tellStory(session, timeLapse, session.options.root, guard);
     }
-    return Story(session, timeLapse, temporary ? temporary->path().string() : session.options.root, guard)
-        .tell();
+    const TemporaryFolder temporary;
+    return tellStory(session, timeLapse, temporary.path(), guard);
 }
 
 Report tryStory(Session& session, bool timeLapse) {
@@ -29,7 +27,7 @@ Report tryStory(Session& session, bool timeLapse) {
     // Before anything is made that an interruption would leave behind.
     InterruptionGuard guard;
     try {
-        Report report = tellStory(session, timeLapse, guard);
+        Report report = tellInFolder(session, timeLapse, guard);
         if (!report.failure) {
             report.line("").line(options.rootGiven ? options.root + " is left as it is."
                                                    : "The temporary folder is removed.");

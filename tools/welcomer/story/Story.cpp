@@ -3,14 +3,22 @@
 #include "handoff/LaunchAgentFile.h"
 #include "handoff/ReplayItem.h"
 #include "plugins/WLNimbusDelegatePlugins.h"
+#include "tools/welcomer/story/AgentProcess.h"
+#include "tools/welcomer/story/DelegateReport.h"
 #include "tools/welcomer/story/ExampleFiles.h"
 #include "tools/welcomer/story/ExampleSetup.h"
 #include "tools/welcomer/story/FolderCopy.h"
 #include "tools/welcomer/story/FolderSnapshot.h"
+#include "tools/welcomer/story/ServiceStates.h"
 #include "tools/welcomer/story/SetupFlow.h"
+#include "tools/welcomer/terminal/ProgressLine.h"
 
+#include <chrono>
 #include <iomanip>
+#include <optional>
 #include <sstream>
+#include <string>
+#include <vector>
 
 namespace welcomer::tool {
 
@@ -25,280 +33,323 @@ std::string wholeSeconds(std::chrono::nanoseconds duration) {
     return std::to_string(std::chrono::duration_cast<std::chrono::seconds>(duration).count());
 }
 
-} // namespace
+// The setup, as it was seen from outside.
+struct Setup {
+    std::vector<AgentLogRecord> log;
+    Json result;
+    Json services; // afterwards
+};
 
-Story::Story(Session& session, bool timeLapse, const fs::path& root, InterruptionGuard& guard)
-    : _session(session),
-      _timeLapse(timeLapse),
-      _root(root),
-      _guard(guard),
-      _owner(session.buildPlatform({.root = root.string(), .systemLog = &_log}, TimeKind::Real)),
-      _installed(_owner->platform()),
-      _home(_owner->platform().processIdentity.homeDirectory()) {}
+// One login, as it was seen from outside.
+struct Login {
+    std::vector<AgentLogRecord> log;
+    DelegateReport report;
+    AgentEnd end;
+    std::chrono::steady_clock::time_point started = std::chrono::steady_clock::now();
+    std::optional<std::chrono::steady_clock::time_point> lingering; // since when
+};
 
-Report Story::tell() {
-    _prepare();
-    _say("");
-    _say("Setup, before the first login:");
-    const Setup setup = _setUp();
-    _say("");
-    _say(_timeLapse ? "First login, on simulated time (which stands still while plug-ins work):"
-                    : "First login:");
-    const Login first = _login();
-    _say("");
-    _say("What is left on disk:");
-    const LeftOnDisk left = _look();
+// What a login left on disk.
+struct LeftOnDisk {
+    bool launchAgent = false;
+    bool replayItem = false;
+    std::vector<ServiceState> services;
+    std::vector<std::string> files; // in the home folder, relative to it
+};
 
-    _say("");
-    _say("Second login. No launch agent is left that would start the agent.");
-    _say("Started all the same, it has nothing to do:");
-    const FolderSnapshot before(_root);
-    const Login second = _login();
-    const std::vector<std::string> changes = before.changesUntilNow();
-    _say("  The second login has changed " + (changes.empty() ? std::string("nothing.") : changes.front()));
+class Story {
+  public:
+    Story(Session& session, bool timeLapse, const fs::path& root, InterruptionGuard& guard)
+        : _session(session),
+          _timeLapse(timeLapse),
+          _root(root),
+          _guard(guard),
+          _owner(session.buildPlatform({.root = root.string(), .systemLog = &_log}, TimeKind::Real)),
+          _installed(_owner->platform()),
+          _home(_owner->platform().processIdentity.homeDirectory()) {}
 
-    Report report;
-    report.document = {{"account", kExampleAccount},
-                       {"root", _root.string()},
-                       {"home", _home},
-                       {"timeLapse", _timeLapse},
-                       {"setup",
-                        {{"log", _asJson(setup.log)},
-                         {"aliases", setup.result["aliases"]},
-                         {"delegates", setup.result["delegates"]},
-                         {"services", setup.services}}},
-                       {"firstLogin", _asJson(first)},
-                       {"left",
-                        {{"launchAgent", left.launchAgent},
-                         {"replayItem", left.replayItem},
-                         {"services", toJson(left.services)},
-                         {"files", left.files}}},
-                       {"secondLogin", _asJson(second)},
-                       {"changedBySecondLogin", changes}};
-    report.failure = _failure(first, second, left, changes);
-    return report;
-}
+    Report tell() {
+        _prepare();
+        _say("");
+        _say("Setup, before the first login:");
+        const Setup setup = _setUp();
+        _say("");
+        _say(_timeLapse ? "First login, on simulated time (which stands still while plug-ins work):"
+                        : "First login:");
+        const Login first = _login();
+        _say("");
+        _say("What is left on disk:");
+        const LeftOnDisk left = _look();
 
-// The machine
+        _say("");
+        _say("Second login. No launch agent is left that would start the agent.");
+        _say("Started all the same, it has nothing to do:");
+        const FolderSnapshot before(_root);
+        const Login second = _login();
+        const std::vector<std::string> changes = before.changesUntilNow();
+        _say("  The second login has changed " +
+             (changes.empty() ? std::string("nothing.") : changes.front()));
 
-// Where a path of the story's machine lies. What is there is put there as the machine's maker would, and
-// follows links as this machine has them: none may lead out.
-fs::path Story::_below(const fs::path& path) const {
-    fs::path below = _root / path.relative_path();
-    if (!fs::weakly_canonical(below).string().starts_with(fs::canonical(_root).string() + "/")) {
-        throw CommandFailure("a link leads from " + below.string() + " out of " + _root.string());
+        Report report;
+        report.document = {{"account", kExampleAccount},
+                           {"root", _root.string()},
+                           {"home", _home},
+                           {"timeLapse", _timeLapse},
+                           {"setup",
+                            {{"log", _asJson(setup.log)},
+                             {"aliases", setup.result["aliases"]},
+                             {"delegates", setup.result["delegates"]},
+                             {"services", setup.services}}},
+                           {"firstLogin", _asJson(first)},
+                           {"left",
+                            {{"launchAgent", left.launchAgent},
+                             {"replayItem", left.replayItem},
+                             {"services", toJson(left.services)},
+                             {"files", left.files}}},
+                           {"secondLogin", _asJson(second)},
+                           {"changedBySecondLogin", changes}};
+        report.failure = _failure(first, second, left, changes);
+        return report;
     }
-    return below;
-}
 
-std::string Story::_launchAgentPath() const {
-    return _home + "/Library/LaunchAgents/" + kLaunchAgentLabel + ".plist";
-}
+  private:
+    // The machine
 
-// The home folder, the plug-ins and the setup application, as a machine would have them.
-void Story::_prepare() {
-    const ExampleFiles examples = findExampleFiles();
-    if (makeFolders(_below(_home))) {
-        fs::permissions(_below(_home), fs::perms::owner_all);
+    // Where a path of the story's machine lies. What is there is put there as the machine's maker would, and
+    // follows links as this machine has them: none may lead out.
+    fs::path _below(const fs::path& path) const {
+        fs::path below = _root / path.relative_path();
+        if (!fs::weakly_canonical(below).string().starts_with(fs::canonical(_root).string() + "/")) {
+            throw CommandFailure("a link leads from " + below.string() + " out of " + _root.string());
+        }
+        return below;
     }
-    const fs::path plugins = _below(kPluginDirectory);
-    makeFolders(plugins);
-    for (const fs::path& plugin : examples.plugins) {
-        copyTree(plugin, plugins / plugin.filename());
+
+    std::string _launchAgentPath() const {
+        return _home + "/Library/LaunchAgents/" + kLaunchAgentLabel + ".plist";
     }
-    makeFolders(_below(kSetupBundlePath).parent_path());
-    copyTree(examples.setupBundle, _below(kSetupBundlePath));
 
-    const platform::CloudUser user = exampleUser();
-    if (const platform::Outcome outcome = _owner->accountDirectory().storeUser(user); !outcome) {
-        throw CommandFailure("cannot add the user: " + outcome.error.message);
+    // The home folder, the plug-ins and the setup application, as a machine would have them.
+    void _prepare() {
+        const ExampleFiles examples = findExampleFiles();
+        if (makeFolders(_below(_home))) {
+            fs::permissions(_below(_home), fs::perms::owner_all);
+        }
+        const fs::path plugins = _below(kPluginDirectory);
+        makeFolders(plugins);
+        for (const fs::path& plugin : examples.plugins) {
+            copyTree(plugin, plugins / plugin.filename());
+        }
+        makeFolders(_below(kSetupBundlePath).parent_path());
+        copyTree(examples.setupBundle, _below(kSetupBundlePath));
+
+        const platform::CloudUser user = exampleUser();
+        if (const platform::Outcome outcome = _owner->accountDirectory().storeUser(user); !outcome) {
+            throw CommandFailure("cannot add the user: " + outcome.error.message);
+        }
+        _password = user.password;
+        _sayWhatIsPrepared(examples.plugins.size());
     }
-    _password = user.password;
-    _sayWhatIsPrepared(examples.plugins.size());
-}
 
-std::vector<ServiceState> Story::_services() const {
-    return serviceStates(
-        _owner->platform().accountService.sharedManager().accountForID(kExampleAccount, false).get());
-}
-
-// What happens on it
-
-// Signs in, enables the services that are on before the first login, and hands over what only the user's own
-// login can finish.
-Story::Setup Story::_setUp() {
-    Setup setup;
-    AgentListener listener;
-    listener.record = [&](const AgentLogRecord& record) {
-        setup.log.push_back(record);
-        _showRecord(record);
-    };
-    listener.told = [&](const std::string& text) {
-        setup.result = Json::parse(text);
-    };
-    const AgentEnd end = runChildProcess(_session.buildPlatform, _root.string(), TimeKind::Real, _guard,
-                                         listener, setupLife(_password));
-    if (!end.succeeded()) {
-        throw CommandFailure(setup.result.contains("failure") ? setup.result["failure"].get<std::string>()
-                                                              : "the setup ended with " + end.description());
+    std::vector<ServiceState> _services() const {
+        return serviceStates(
+            _owner->platform().accountService.sharedManager().accountForID(kExampleAccount, false).get());
     }
-    setup.services = toJson(_services());
-    _say("");
-    for (const auto& [identifier, aliases] : setup.result["aliases"].items()) {
-        _say("  " + std::to_string(aliases.size()) + " aliases chosen for " + identifier);
-    }
-    _say(std::string("  The replay item is stored for ") + kExampleAccount + ", with " +
-         std::to_string(setup.result["delegates"].size()) + " responses.");
-    _say("  The launch agent is installed: " + _launchAgentPath());
-    _showServices(setup.services);
-    return setup;
-}
 
-Story::Login Story::_login() {
-    Login login;
-    ProgressLine progress;
-    AgentListener listener;
-    listener.record = [&](const AgentLogRecord& record) {
+    // What happens on it
+
+    // Signs in, enables the services that are on before the first login, and hands over what only the user's
+    // own login can finish.
+    Setup _setUp() {
+        Setup setup;
+        AgentListener listener;
+        listener.record = [&](const AgentLogRecord& record) {
+            setup.log.push_back(record);
+            _showRecord(record);
+        };
+        listener.told = [&](const std::string& text) {
+            setup.result = Json::parse(text);
+        };
+        const AgentEnd end = runChildProcess(_session.buildPlatform, _root.string(), TimeKind::Real, _guard,
+                                             listener, setupLife(_password));
+        if (!end.succeeded()) {
+            throw CommandFailure(setup.result.contains("failure")
+                                     ? setup.result["failure"].get<std::string>()
+                                     : "the setup ended with " + end.description());
+        }
+        setup.services = toJson(_services());
+        _say("");
+        for (const auto& [identifier, aliases] : setup.result["aliases"].items()) {
+            _say("  " + std::to_string(aliases.size()) + " aliases chosen for " + identifier);
+        }
+        _say(std::string("  The replay item is stored for ") + kExampleAccount + ", with " +
+             std::to_string(setup.result["delegates"].size()) + " responses.");
+        _say("  The launch agent is installed: " + _launchAgentPath());
+        _showServices(setup.services);
+        return setup;
+    }
+
+    Login _login() {
+        Login login;
+        ProgressLine progress;
+        AgentListener listener;
+        listener.record = [&](const AgentLogRecord& record) {
+            progress.clear();
+            login.log.push_back(record);
+            login.report.read(record.message);
+            _showRecord(record);
+            if (record.message == kLingerLine) {
+                login.lingering = std::chrono::steady_clock::now();
+                _showDelegates(login.report);
+                if (_timeLapse || !progress.visible()) {
+                    _say(_timeLapse ? "  Lingering: the two minutes pass at once on simulated time."
+                                    : "  Lingering for two minutes ...");
+                }
+            }
+        };
+        if (progress.visible()) {
+            listener.tick = [&] {
+                _showProgress(progress, login);
+            };
+        }
+        login.end = runAgentProcess(_session.buildPlatform, _root.string(),
+                                    _timeLapse ? TimeKind::Simulated : TimeKind::Real, _guard, listener);
         progress.clear();
-        login.log.push_back(record);
-        login.report.read(record.message);
-        _showRecord(record);
-        if (record.message == kLingerLine) {
-            login.lingering = std::chrono::steady_clock::now();
-            _showDelegates(login.report);
-            if (_timeLapse || !progress.visible()) {
-                _say(_timeLapse ? "  Lingering: the two minutes pass at once on simulated time."
-                                : "  Lingering for two minutes ...");
+        _say("  The agent has ended with " + login.end.description() + ".");
+        return login;
+    }
+
+    LeftOnDisk _look() {
+        LeftOnDisk left;
+        left.launchAgent = _owner->platform().fileSystem.exists(_launchAgentPath());
+        left.replayItem = WLGetNimbusReplayKeychainItem(nullptr, nullptr);
+        left.services = _services();
+        const fs::path home = _below(_home);
+        for (const auto& entry : fs::recursive_directory_iterator(home)) {
+            if (!entry.is_directory()) {
+                left.files.push_back(entry.path().lexically_relative(home).string());
             }
         }
-    };
-    if (progress.visible()) {
-        listener.tick = [&] {
-            _showProgress(progress, login);
-        };
+        _say(std::string("  launch agent  ") + (left.launchAgent ? "still there" : "none"));
+        _say(std::string("  replay item   ") + (left.replayItem ? "still there" : "none"));
+        for (const std::string& file : left.files) {
+            _say("  file          " + _home + "/" + file);
+        }
+        _showServices(toJson(left.services));
+        return left;
     }
-    login.end = runAgentProcess(_session.buildPlatform, _root.string(),
-                                _timeLapse ? TimeKind::Simulated : TimeKind::Real, _guard, listener);
-    progress.clear();
-    _say("  The agent has ended with " + login.end.description() + ".");
-    return login;
-}
 
-Story::LeftOnDisk Story::_look() {
-    LeftOnDisk left;
-    left.launchAgent = _owner->platform().fileSystem.exists(_launchAgentPath());
-    left.replayItem = WLGetNimbusReplayKeychainItem(nullptr, nullptr);
-    left.services = _services();
-    const fs::path home = _below(_home);
-    for (const auto& entry : fs::recursive_directory_iterator(home)) {
-        if (!entry.is_directory()) {
-            left.files.push_back(entry.path().lexically_relative(home).string());
+    // What people see
+
+    void _say(const std::string& line) { _session.printer.tell(Report().line(line)); }
+
+    void _sayWhatIsPrepared(std::size_t plugins) {
+        _say("A machine, below " + _root.string() + ":");
+        _say("  home folder        " + _home);
+        _say("  plug-ins           " + std::to_string(plugins) + " in " + kPluginDirectory);
+        _say(std::string("  setup application  ") + kSetupBundlePath);
+        _say(std::string("  who can sign in    ") + kExampleAccount);
+    }
+
+    void _showRecord(const AgentLogRecord& record) {
+        std::ostringstream line;
+        line << std::setw(11) << std::fixed << std::setprecision(3)
+             << std::chrono::duration<double>(record.time).count() << "  " << record.message;
+        _say(line.str());
+    }
+
+    void _showServices(const Json& services) {
+        Report report;
+        report.line("");
+        addServiceTable(report, services, "  ");
+        _session.printer.tell(report);
+    }
+
+    void _showDelegates(const DelegateReport& report) {
+        TextTable table({"DELEGATE", "OUTCOME", "SECONDS"}, "  ");
+        for (const DelegateOutcome& delegate : report.delegates()) {
+            table.addRow(
+                {delegate.identifier, delegate.outcome, delegate.seconds.empty() ? "-" : delegate.seconds});
+        }
+        _session.printer.tell(Report().line("").table(std::move(table)).line(""));
+    }
+
+    void _showProgress(ProgressLine& progress, const Login& login) const {
+        const auto now = std::chrono::steady_clock::now();
+        if (login.lingering && !_timeLapse) {
+            const std::chrono::duration<double> passed = now - *login.lingering;
+            progress.show("  Lingering " + ProgressLine::bar(passed / kLinger) + " " +
+                          wholeSeconds(now - *login.lingering) + " of " + wholeSeconds(kLinger) + " s");
+        } else if (!login.lingering && login.report.working() > 0) {
+            progress.show("  " + std::to_string(login.report.working()) + " of " +
+                          std::to_string(login.report.delegates().size()) + " delegates at work, " +
+                          wholeSeconds(now - login.started) + " s");
         }
     }
-    _say(std::string("  launch agent  ") + (left.launchAgent ? "still there" : "none"));
-    _say(std::string("  replay item   ") + (left.replayItem ? "still there" : "none"));
-    for (const std::string& file : left.files) {
-        _say("  file          " + _home + "/" + file);
-    }
-    _showServices(toJson(left.services));
-    return left;
-}
 
-// What people see
+    // What programs get
 
-void Story::_say(const std::string& line) {
-    _session.printer.tell(Report().line(line));
-}
-
-void Story::_sayWhatIsPrepared(std::size_t plugins) {
-    _say("A machine, below " + _root.string() + ":");
-    _say("  home folder        " + _home);
-    _say("  plug-ins           " + std::to_string(plugins) + " in " + kPluginDirectory);
-    _say(std::string("  setup application  ") + kSetupBundlePath);
-    _say(std::string("  who can sign in    ") + kExampleAccount);
-}
-
-void Story::_showRecord(const AgentLogRecord& record) {
-    std::ostringstream line;
-    line << std::setw(11) << std::fixed << std::setprecision(3)
-         << std::chrono::duration<double>(record.time).count() << "  " << record.message;
-    _say(line.str());
-}
-
-void Story::_showServices(const Json& services) {
-    Report report;
-    report.line("");
-    addServiceTable(report, services, "  ");
-    _session.printer.tell(report);
-}
-
-void Story::_showDelegates(const DelegateReport& report) {
-    TextTable table({"DELEGATE", "OUTCOME", "SECONDS"}, "  ");
-    for (const DelegateOutcome& delegate : report.delegates()) {
-        table.addRow(
-            {delegate.identifier, delegate.outcome, delegate.seconds.empty() ? "-" : delegate.seconds});
-    }
-    _session.printer.tell(Report().line("").table(std::move(table)).line(""));
-}
-
-void Story::_showProgress(ProgressLine& progress, const Login& login) const {
-    const auto now = std::chrono::steady_clock::now();
-    if (login.lingering && !_timeLapse) {
-        const std::chrono::duration<double> passed = now - *login.lingering;
-        progress.show("  Lingering " + ProgressLine::bar(passed / kLinger) + " " +
-                      wholeSeconds(now - *login.lingering) + " of " + wholeSeconds(kLinger) + " s");
-    } else if (!login.lingering && login.report.working() > 0) {
-        progress.show("  " + std::to_string(login.report.working()) + " of " +
-                      std::to_string(login.report.delegates().size()) + " delegates at work, " +
-                      wholeSeconds(now - login.started) + " s");
-    }
-}
-
-// What programs get
-
-Json Story::_asJson(const std::vector<AgentLogRecord>& records) {
-    Json log = Json::array();
-    for (const AgentLogRecord& record : records) {
-        log.push_back(
-            {{"seconds", std::chrono::duration<double>(record.time).count()}, {"message", record.message}});
-    }
-    return log;
-}
-
-Json Story::_asJson(const Login& login) {
-    Json delegates = Json::array();
-    for (const DelegateOutcome& delegate : login.report.delegates()) {
-        delegates.push_back(
-            {{"identifier", delegate.identifier},
-             {"outcome", delegate.outcome},
-             {"seconds", delegate.seconds.empty() ? Json() : Json(std::stod(delegate.seconds))}});
-    }
-    return {{"log", _asJson(login.log)},
-            {"delegates", delegates},
-            {"exitStatus", login.end.exitStatus ? Json(*login.end.exitStatus) : Json()}};
-}
-
-std::optional<std::string> Story::_failure(const Login& first, const Login& second, const LeftOnDisk& left,
-                                           const std::vector<std::string>& changes) {
-    if (!first.end.succeeded()) {
-        return "the agent of the first login ended with " + first.end.description();
-    }
-    if (left.launchAgent || left.replayItem) {
-        return std::string("the first login left the ") +
-               (left.launchAgent ? "launch agent" : "replay item") + " behind";
-    }
-    for (const ServiceState& service : left.services) {
-        if (!service.isEnabled) {
-            return "after the first login " + service.entry.name + " is not enabled";
+    static Json _asJson(const std::vector<AgentLogRecord>& records) {
+        Json log = Json::array();
+        for (const AgentLogRecord& record : records) {
+            log.push_back({{"seconds", std::chrono::duration<double>(record.time).count()},
+                           {"message", record.message}});
         }
+        return log;
     }
-    if (!second.end.succeeded()) {
-        return "the agent of the second login ended with " + second.end.description();
+
+    static Json _asJson(const Login& login) {
+        Json delegates = Json::array();
+        for (const DelegateOutcome& delegate : login.report.delegates()) {
+            delegates.push_back(
+                {{"identifier", delegate.identifier},
+                 {"outcome", delegate.outcome},
+                 {"seconds", delegate.seconds.empty() ? Json() : Json(std::stod(delegate.seconds))}});
+        }
+        return {{"log", _asJson(login.log)},
+                {"delegates", delegates},
+                {"exitStatus", login.end.exitStatus ? Json(*login.end.exitStatus) : Json()}};
     }
-    if (!changes.empty()) {
-        return "the second login changed " + changes.front();
+
+    static std::optional<std::string> _failure(const Login& first, const Login& second,
+                                               const LeftOnDisk& left,
+                                               const std::vector<std::string>& changes) {
+        if (!first.end.succeeded()) {
+            return "the agent of the first login ended with " + first.end.description();
+        }
+        if (left.launchAgent || left.replayItem) {
+            return std::string("the first login left the ") +
+                   (left.launchAgent ? "launch agent" : "replay item") + " behind";
+        }
+        for (const ServiceState& service : left.services) {
+            if (!service.isEnabled) {
+                return "after the first login " + service.entry.name + " is not enabled";
+            }
+        }
+        if (!second.end.succeeded()) {
+            return "the agent of the second login ended with " + second.end.description();
+        }
+        if (!changes.empty()) {
+            return "the second login changed " + changes.front();
+        }
+        return std::nullopt;
     }
-    return std::nullopt;
+
+    Session& _session;
+    const bool _timeLapse;
+    const fs::path _root;
+    InterruptionGuard& _guard;
+    KeptLog _log;
+    const std::shared_ptr<PlatformOwner> _owner;
+    const platform::ScopedPlatform _installed;
+    const std::string _home;
+    std::string _password; // of the story's user
+};
+
+} // namespace
+
+Report tellStory(Session& session, bool timeLapse, const fs::path& root, InterruptionGuard& guard) {
+    return Story(session, timeLapse, root, guard).tell();
 }
 
 } // namespace welcomer::tool
