@@ -422,16 +422,19 @@ class SetupAnswers(SetupTest):
         self.assertIn("hello", result.stderr)
 
 
-class SetupAtTerminal(SetupTest):
+class AtTerminal:
     """A person, on a terminal of 100 columns."""
 
     def start(self, *arguments, stdout=None):
+        self.start_program(str(PROGRAM), "--root", str(self.root), *arguments, stdout=stdout)
+
+    def start_program(self, *command, stdout=None):
         self.process, self.terminal = pty.fork()
         if self.process == 0:
             fcntl.ioctl(1, termios.TIOCSWINSZ, struct.pack("HHHH", 40, 100, 0, 0))
             if stdout:
                 os.dup2(os.open(stdout, os.O_WRONLY | os.O_CREAT), 1)
-            os.execv(PROGRAM, [str(PROGRAM), "--root", str(self.root), *arguments])
+            os.execv(command[0], command)
         self.addCleanup(os.close, self.terminal)
         self.seen = ""
 
@@ -479,6 +482,16 @@ class SetupAtTerminal(SetupTest):
         _, status = os.waitpid(self.process, 0)
         return rest, status
 
+    def accept_everything(self):
+        """All aliases, all services, and the last yes; the setup then ends well."""
+        for _ in range(3):
+            self.answer(r"none \[all\]: ", "")
+        self.answer(r"\[Y/n\] ", "")
+        rest, status = self.end()
+        self.assertEqual(status, 0, rest)
+
+
+class SetupAtTerminal(AtTerminal, SetupTest):
     def test_a_person_sets_up_an_account(self):
         self.start("setup")
         self.answer("account's name: ", "  anna ")
@@ -527,14 +540,6 @@ class SetupAtTerminal(SetupTest):
         rest, status = self.end()
         self.assertEqual(os.waitstatus_to_exitcode(status), 1)
         self.assertIn("welcomer: cannot sign in anna: the password is wrong", rest)
-
-    def accept_everything(self):
-        """All aliases, all services, and the last yes; the setup then ends well."""
-        for _ in range(3):
-            self.answer(r"none \[all\]: ", "")
-        self.answer(r"\[Y/n\] ", "")
-        rest, status = self.end()
-        self.assertEqual(status, 0, rest)
 
     def test_a_mistyped_name_is_asked_for_again(self):
         self.start("setup")

@@ -101,7 +101,7 @@ void ReportPrinter::_printForPeople(const Report& report) {
         if (const auto* line = std::get_if<std::string>(&part)) {
             _out << *line << '\n';
         } else {
-            std::get<TextTable>(part).print(_out);
+            std::get<TextTable>(part).print(_out, terminalWidth(_descriptor));
         }
     }
 }

@@ -66,8 +66,12 @@ class Report {
 // The one that knows whether people or programs read.
 class ReportPrinter {
   public:
-    //  out  borrowed
-    ReportPrinter(std::ostream& out, bool isForPrograms) : _out(out), _isForPrograms(isForPrograms) {}
+    //  out         borrowed
+    //  descriptor  where that leads: tables are cut to the width of a terminal; -1 for somewhere else
+    ReportPrinter(std::ostream& out, int descriptor, bool isForPrograms)
+        : _out(out),
+          _descriptor(descriptor),
+          _isForPrograms(isForPrograms) {}
 
     // Prints a command's result.
     void print(const Report& report);
@@ -79,6 +83,7 @@ class ReportPrinter {
     void _printForPeople(const Report& report);
 
     std::ostream& _out;
+    const int _descriptor;
     const bool _isForPrograms;
 };
 

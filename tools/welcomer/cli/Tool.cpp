@@ -6,6 +6,7 @@
 #include <filesystem>
 #include <iostream>
 #include <optional>
+#include <unistd.h>
 #include <utility>
 
 namespace welcomer::tool {
@@ -124,7 +125,7 @@ int runCommand(const Command& command, const Options& options, const PlatformFac
         TimeKind::Real);
     const platform::ScopedPlatform installed(owner->platform());
     const DamageReport damageReport(owner->platform().preferenceStore);
-    ReportPrinter printer(std::cout, options.json);
+    ReportPrinter printer(std::cout, STDOUT_FILENO, options.json);
     Session session{options, buildPlatform, owner->accountDirectory(), log, printer};
     const Report report = command(session);
     printer.print(report);

@@ -4,7 +4,6 @@
 
 #include <algorithm>
 #include <iostream>
-#include <sys/ioctl.h>
 #include <unistd.h>
 
 namespace welcomer::tool {
@@ -12,12 +11,7 @@ namespace welcomer::tool {
 namespace {
 
 constexpr std::size_t kBarWidth = 40;
-
-std::size_t terminalWidth() {
-    winsize size{};
-    const bool known = ioctl(STDERR_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col > 0;
-    return known ? size.ws_col : 80;
-}
+constexpr std::size_t kUsualWidth = 80; // of a terminal that does not say
 
 } // namespace
 
@@ -31,9 +25,10 @@ void ProgressLine::show(const std::string& text) {
     if (!_visible) {
         return;
     }
+    const std::size_t width = std::max<std::size_t>(terminalWidth(STDERR_FILENO).value_or(kUsualWidth), 2);
     std::cout.flush();
     // One column stays free: a full line would wrap and could not be written over.
-    std::cerr << '\r' << printable(text).substr(0, terminalWidth() - 1) << "\x1b[K" << std::flush;
+    std::cerr << '\r' << cutTo(printable(text), width - 1) << "\x1b[K" << std::flush;
     _shown = true;
 }
 

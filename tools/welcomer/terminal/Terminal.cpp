@@ -2,7 +2,9 @@
 
 #include "tools/welcomer/terminal/Failure.h"
 #include "tools/welcomer/terminal/InterruptionGuard.h"
+#include "tools/welcomer/terminal/LineEditor.h"
 #include "tools/welcomer/terminal/Printable.h"
+#include "tools/welcomer/terminal/SuspensionWatch.h"
 
 #include <array>
 #include <cerrno>
@@ -20,6 +22,7 @@ namespace welcomer::tool {
 namespace {
 
 constexpr std::size_t kLongestLine = 4096; // what a terminal takes in one line
+constexpr const char* kInputHasEnded = "the input has ended";
 
 // While it lives, the terminal does not show what is typed.
 class EchoGuard {
@@ -28,7 +31,6 @@ class EchoGuard {
         tcgetattr(terminal, &_before);
         termios quiet = _before;
         quiet.c_lflag &= ~static_cast<tcflag_t>(ECHO);
-        quiet.c_cc[VSUSP] = _POSIX_VDISABLE; // stopped here, the shell would get a terminal without echo
         tcsetattr(terminal, TCSAFLUSH, &quiet);
     }
     ~EchoGuard() { tcsetattr(_terminal, TCSAFLUSH, &_before); }
@@ -66,16 +68,23 @@ void Terminal::say(const std::string& line) {
 }
 
 std::string Terminal::ask(const std::string& question) {
-    _write(printable(question) + ' ');
-    return trimmed(_readLine(-1));
+    const std::string prompt = printable(question) + ' ';
+    const LineEditor editor(_descriptor);
+    if (!editor.isThere()) {
+        return trimmed(_askPlainly(prompt, true, -1));
+    }
+    const std::optional<std::string> line = editor.readLine(prompt);
+    if (!line) {
+        _write("\n");
+        throw CommandFailure(kInputHasEnded);
+    }
+    return trimmed(*line);
 }
 
 std::string Terminal::askWithoutEcho(const std::string& question) {
     InterruptionGuard guard;
     try {
-        const EchoGuard quiet(_descriptor);
-        _write(printable(question) + ' ');
-        std::string line = _readLine(guard.descriptor());
+        std::string line = _askPlainly(printable(question) + ' ', false, guard.descriptor());
         _write("\n"); // the one that was typed is not shown either
         return line;
     } catch (const Interrupted&) {
@@ -122,16 +131,39 @@ void Terminal::_write(const std::string& text) {
     }
 }
 
+// Asks with no more than the terminal itself has for mending the line.
+std::string Terminal::_askPlainly(const std::string& prompt, bool isShown, int interruption) {
+    SuspensionWatch suspension;
+    for (;;) {
+        {
+            std::optional<EchoGuard> quiet;
+            if (!isShown) {
+                quiet.emplace(_descriptor);
+            }
+            _write(prompt);
+            if (auto line = _readLine(interruption, suspension.descriptor())) {
+                return *line;
+            }
+        }
+        suspension.takeEffect();
+    }
+}
+
 // Throws Interrupted when the descriptor given for that is readable first.
-std::string Terminal::_readLine(int interruption) {
+//  result  none when the one for suspensions is
+std::optional<std::string> Terminal::_readLine(int interruption, int suspension) {
     std::string line;
     for (;;) {
-        std::array<pollfd, 2> watched{{{_descriptor, POLLIN, 0}, {interruption, POLLIN, 0}}};
+        std::array<pollfd, 3> watched{
+            {{_descriptor, POLLIN, 0}, {interruption, POLLIN, 0}, {suspension, POLLIN, 0}}};
         if (poll(watched.data(), watched.size(), -1) < 0 && errno == EINTR) {
             continue;
         }
         if (watched[1].revents != 0) {
             throw Interrupted();
+        }
+        if (watched[2].revents != 0) {
+            return std::nullopt;
         }
         std::array<char, kLongestLine> buffer;
         const ssize_t count = ::read(_descriptor, buffer.data(), buffer.size());
@@ -140,7 +172,7 @@ std::string Terminal::_readLine(int interruption) {
         }
         if (count <= 0) {
             _write("\n");
-            throw CommandFailure("the input has ended");
+            throw CommandFailure(kInputHasEnded);
         }
         line.append(buffer.data(), static_cast<std::size_t>(count));
         if (line.ends_with('\n')) {

@@ -23,13 +23,14 @@ class Terminal {
     // Writes a line, with control characters made visible.
     void say(const std::string& line);
 
-    // Asks for a line.
+    // Asks for a line, which can be mended while it is typed. After Ctrl-Z and the return from it the
+    // question is shown again.
     //  result  without its end and without spaces around it
     // Throws CommandFailure when the input has ended.
     std::string ask(const std::string& question);
 
-    // Asks for a line that is not shown while it is typed. A signal that ends the program takes its course
-    // only after the terminal shows what is typed again.
+    // Asks for a line that is not shown while it is typed. A signal that ends or stops the program takes its
+    // course only after the terminal shows what is typed again; after a stop the question is asked anew.
     //  result  without its end
     // Throws CommandFailure when the input has ended.
     std::string askWithoutEcho(const std::string& question);
@@ -44,7 +45,8 @@ class Terminal {
 
   private:
     void _write(const std::string& text);
-    std::string _readLine(int interruption);
+    std::string _askPlainly(const std::string& prompt, bool isShown, int interruption);
+    std::optional<std::string> _readLine(int interruption, int suspension);
 
     const int _descriptor;
 };

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <iosfwd>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -17,9 +18,14 @@ class TextTable {
     void addRow(const std::vector<std::string>& cells);
 
     // Prints the header and the rows.
-    void print(std::ostream& out) const;
+    //  width  of the terminal that they are to fit on, in columns: the widest cells are cut, down to their
+    //  headings' widths; none
+    //         where nothing may be lost
+    void print(std::ostream& out, std::optional<std::size_t> width = std::nullopt) const;
 
   private:
+    std::vector<std::size_t> _widths(std::optional<std::size_t> width) const;
+
     std::string _indent;
     std::vector<std::vector<std::string>> _lines;
 };

@@ -62,13 +62,13 @@ TEST(Outline, ShowsOneEntryPerLine) {
                                           {"yes", true},
                                           {"nested", Dictionary{{"number", 7}}}};
     EXPECT_EQ(outlineText(value), "  aliases:\n"
-                              "    - one\n"
-                              "    - two\n"
-                              "  empty: (empty array)\n"
-                              "  nested:\n"
-                              "    number: 7\n"
-                              "  none: (empty dictionary)\n"
-                              "  yes: 1\n");
+                                  "    - one\n"
+                                  "    - two\n"
+                                  "  empty: (empty array)\n"
+                                  "  nested:\n"
+                                  "    number: 7\n"
+                                  "  none: (empty dictionary)\n"
+                                  "  yes: 1\n");
 }
 
 TEST(Outline, ShowsAValueThatIsNoContainer) {

@@ -8,7 +8,7 @@ namespace {
 
 std::string printed(const Report& report, bool isForPrograms = false) {
     std::ostringstream out;
-    ReportPrinter(out, isForPrograms).print(report);
+    ReportPrinter(out, -1, isForPrograms).print(report);
     return out.str();
 }
 
@@ -53,10 +53,10 @@ TEST(Report, NothingInItCanControlATerminal) {
 
 TEST(Report, WhatIsToldOnTheWayIsForPeopleAlone) {
     std::ostringstream people;
-    ReportPrinter(people, false).tell(Report().line("Setting up"));
+    ReportPrinter(people, -1, false).tell(Report().line("Setting up"));
     EXPECT_EQ(people.str(), "Setting up\n");
     std::ostringstream programs;
-    ReportPrinter(programs, true).tell(Report().line("Setting up"));
+    ReportPrinter(programs, -1, true).tell(Report().line("Setting up"));
     EXPECT_EQ(programs.str(), "");
 }
 

@@ -30,5 +30,18 @@ TEST(Printable, ColumnsCountCharactersNotBytes) {
     EXPECT_EQ(columns("Zürich"), 6U);
 }
 
+TEST(Printable, ColumnsCountWideCharactersTwiceAndCombiningOnesNotAtAll) {
+    EXPECT_EQ(columns("東京"), 4U);
+    EXPECT_EQ(columns("e\u0301"), 1U);
+    EXPECT_EQ(columns("\xff\xc2"), 2U); // no UTF-8
+}
+
+TEST(Printable, WhatIsCutEndsWhereACharacterEnds) {
+    EXPECT_EQ(cutTo("Zürich", 6), "Zürich");
+    EXPECT_EQ(cutTo("Zürich", 3), "Zü…");
+    EXPECT_EQ(cutTo("東京都", 4), "東…"); // the next one would take two
+    EXPECT_EQ(cutTo("Zürich", 1), "…");
+}
+
 } // namespace
 } // namespace welcomer::tool
