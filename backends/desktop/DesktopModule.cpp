@@ -53,7 +53,7 @@ bool isModuleInstalled(const std::string& name, const std::string& folder) {
     return !pathOf(name, folder).empty();
 }
 
-const ModuleEntry* loadModule(const std::string& name, const std::string& folder, std::string& whyNot) {
+const void* loadModule(const std::string& name, const std::string& folder, std::string& whyNot) {
     const std::string path = pathOf(name, folder);
     if (path.empty()) {
         whyNot = "the module " + name + ".so is not installed";
@@ -65,13 +65,14 @@ const ModuleEntry* loadModule(const std::string& name, const std::string& folder
         whyNot = "the module cannot be loaded: " + std::string(loadingError());
         return nullptr;
     }
-    const auto* const entry = static_cast<const ModuleEntry*>(::dlsym(library, kModuleEntrySymbol));
+    const void* const entry = ::dlsym(library, kModuleEntrySymbol);
     if (!entry) {
         whyNot = path + " is no module: " + loadingError();
         return nullptr;
     }
-    if (std::strcmp(entry->build, WELCOMER_MODULE_BUILD) != 0) {
-        whyNot = path + " is of another build: " + entry->build;
+    const char* const build = *static_cast<const char* const*>(entry); // its first member
+    if (std::strcmp(build, WELCOMER_MODULE_BUILD) != 0) {
+        whyNot = path + " is of another build: " + build;
         return nullptr;
     }
     return entry;

@@ -15,14 +15,15 @@ namespace welcomer::desktop {
 //  folder  where the modules are; empty: beside the program (in a build tree, and in an installed one,
 //          wherever that has been moved to), then where this build is installed
 //  whyNot  one line when there is no result
-//  result  the module's entry, valid until the process ends; or null
+//  result  the module's entry, a ModuleEntry of its description, valid until the process ends; or null
 // Any thread. Loading is what takes time: callers keep the result.
-const ModuleEntry* loadModule(const std::string& name, const std::string& folder, std::string& whyNot);
+const void* loadModule(const std::string& name, const std::string& folder, std::string& whyNot);
 
 // Whether the module NAME.so is where loadModule() looks for it. Any thread.
 bool isModuleInstalled(const std::string& name, const std::string& folder);
 
-// One module and its one service. `Module` describes it: kName, Interface and Arguments.
+// One module and its one service, with the local one behind it: the one place where the desktop's services
+// fall back. `Module` describes it: kName, Interface and Arguments.
 template <class Module>
 class DesktopModule {
   public:
@@ -30,21 +31,24 @@ class DesktopModule {
     using Arguments = typename Module::Arguments;
 
     // Costs nothing: everything happens when the service is first asked for.
-    explicit DesktopModule(Arguments arguments, std::string folder = "")
-        : _arguments(std::move(arguments)),
+    //  local   what serves where the desktop's service does not, or null; borrowed
+    //  folder  where the module is; empty: where it is looked for anyway
+    explicit DesktopModule(Interface* local, Arguments arguments = {}, std::string folder = "")
+        : _local(local),
+          _arguments(std::move(arguments)),
           _folder(std::move(folder)) {}
 
-    // The service, borrowed; null when there is none, and then there never will be: another backend serves.
-    // Throws what making it throws, once. Any thread.
+    // The service, borrowed; the local one when the desktop's is not there, and then it never will be. Throws
+    // what making it throws, once. Any thread.
     Interface* service() {
         const std::lock_guard lock(_mutex);
         if (!_isSettled) {
             _isSettled = true;
-            if (const ModuleEntry* entry = _load()) {
-                _service.reset(static_cast<Interface*>(entry->create(&_arguments, _whyNot)));
+            if (const Entry* entry = _load()) {
+                _service = entry->create(_local, _arguments, _whyNot);
             }
         }
-        return _service.get();
+        return _service ? _service.get() : _local;
     }
 
     // Whether there is a module, as far as is known without loading it. Any thread.
@@ -60,8 +64,8 @@ class DesktopModule {
     // Any thread.
     bool describe(platform::BackendReport& report) {
         const std::lock_guard lock(_mutex);
-        if (const ModuleEntry* entry = _load()) {
-            return entry->describe(&_arguments, report);
+        if (const Entry* entry = _load()) {
+            return entry->describe(_arguments, report);
         }
         report.reason = _whyNot;
         report.advice =
@@ -70,20 +74,23 @@ class DesktopModule {
     }
 
   private:
-    const ModuleEntry* _load() {
+    using Entry = ModuleEntry<Module>;
+
+    const Entry* _load() {
         if (!_wasLoaded) {
             _wasLoaded = true;
-            _entry = loadModule(Module::kName, _folder, _whyNot);
+            _entry = static_cast<const Entry*>(loadModule(Module::kName, _folder, _whyNot));
         }
         return _entry;
     }
 
+    Interface* const _local;
     const Arguments _arguments;
     const std::string _folder;
     std::mutex _mutex;
     bool _wasLoaded = false;
     bool _isSettled = false;
-    const ModuleEntry* _entry = nullptr;
+    const Entry* _entry = nullptr;
     std::unique_ptr<Interface> _service;
     std::string _whyNot;
 };

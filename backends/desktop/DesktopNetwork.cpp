@@ -6,13 +6,12 @@ namespace welcomer::desktop {
 
 DesktopNetwork::DesktopNetwork(const Kernel& kernel, const std::string& folder)
     : _kernel(kernel),
-      _configModule({&kernel.configStore}, folder),
-      _stateModule({&kernel.stateStore, &kernel.hostReachability}, folder) {}
+      _configModule(&kernel.configStore, {}, folder),
+      _stateModule(&_kernelState, {}, folder) {}
 
 std::shared_ptr<platform::NetworkConfigConnection>
 DesktopNetwork::ConfigStore::open(const std::string& name) {
-    platform::NetworkConfigStore* const store = _network._configModule.service();
-    return (store ? *store : _network._kernel.configStore).open(name);
+    return _network._configModule.service()->open(name);
 }
 
 std::vector<std::shared_ptr<platform::NetworkInterface>> DesktopNetwork::ConfigStore::copyInterfaces() {
@@ -21,15 +20,12 @@ std::vector<std::shared_ptr<platform::NetworkInterface>> DesktopNetwork::ConfigS
 
 std::unique_ptr<platform::NetworkStateConnection>
 DesktopNetwork::StateStore::open(const std::string& clientName) {
-    NetworkStateServices* const services = _network._stateModule.service();
-    return (services ? services->stateStore() : _network._kernel.stateStore).open(clientName);
+    return _network._stateModule.service()->stateStore().open(clientName);
 }
 
 std::unique_ptr<platform::HostReachabilityTarget>
 DesktopNetwork::Reachability::createTarget(const std::string& hostName) {
-    NetworkStateServices* const services = _network._stateModule.service();
-    return (services ? services->hostReachability() : _network._kernel.hostReachability)
-        .createTarget(hostName);
+    return _network._stateModule.service()->hostReachability().createTarget(hostName);
 }
 
 std::vector<platform::BackendReport> DesktopNetwork::reports() {

@@ -60,7 +60,18 @@ class DesktopNetwork {
         DesktopNetwork& _network;
     };
 
+    class KernelState final : public NetworkStateServices {
+      public:
+        explicit KernelState(const Kernel& kernel) : _kernel(kernel) {}
+        platform::NetworkStateStore& stateStore() override { return _kernel.stateStore; }
+        platform::HostReachability& hostReachability() override { return _kernel.hostReachability; }
+
+      private:
+        const Kernel _kernel;
+    };
+
     const Kernel _kernel;
+    KernelState _kernelState{_kernel};
     DesktopModule<NetworkConfigModule> _configModule;
     DesktopModule<NetworkStateModule> _stateModule;
     ConfigStore _configStore{*this};

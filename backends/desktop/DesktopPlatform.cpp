@@ -58,7 +58,7 @@ DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
       _credentialStore(posix::RootFolder(options.root), _local.platform().processIdentity,
                        _local.platform().credentialStore, {}, newItemsOf(options)),
       _onlineAccounts(
-          {[root = posix::RootFolder(options.root), &identity = _local.platform().processIdentity] {
+          nullptr, {[root = posix::RootFolder(options.root), &identity = _local.platform().processIdentity] {
               const std::vector<std::string> libraries = identity.userLibraryDirectories();
               return libraries.empty()
                          ? posix::FileLock()

@@ -4,14 +4,14 @@
 #pragma once
 
 #include "backends/Backends.h"
-#include "backends/desktop/DesktopCredentialStore.h"
 #include "backends/desktop/DesktopModule.h"
-#include "backends/desktop/DesktopNameServers.h"
 #include "backends/desktop/DesktopNetwork.h"
-#include "backends/desktop/DesktopPreferenceStore.h"
-#include "backends/desktop/DesktopRunLoops.h"
-#include "backends/desktop/OnlineAccountService.h"
-#include "backends/desktop/OnlineAccountsModule.h"
+#include "backends/desktop/accounts/OnlineAccountService.h"
+#include "backends/desktop/accounts/OnlineAccountsModule.h"
+#include "backends/desktop/credentials/DesktopCredentialStore.h"
+#include "backends/desktop/preferences/DesktopPreferenceStore.h"
+#include "backends/desktop/resolved/DesktopNameServers.h"
+#include "backends/desktop/runloop/DesktopRunLoops.h"
 #include "backends/local/LocalPlatform.h"
 
 #include <string>

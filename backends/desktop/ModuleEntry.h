@@ -15,15 +15,15 @@
 //    exception may leave it.
 //  - Nothing is ever unloaded.
 //
-// How to add a backend:
+// How to add a backend, in a room of its own:
 //
-//  1. Describe the module in backends/desktop/NameModule.h, for both sides, as RunLoopModule.h does.
-//  2. Write backends/desktop/name/: the service, derived from the interface, and one file that ends with
+//  1. Describe the module in NameModule.h, for both sides, as runloop/RunLoopModule.h does.
+//  2. Write the service, derived from the interface, and one file that ends with
 //         WELCOMER_DESKTOP_MODULE(NameModule, createService, describeService)
 //     Say welcomer_desktop_module(name PACKAGES ... SOURCES ...) in backends/desktop/CMakeLists.txt.
 //  3. On the program's side, without the service's library, write DesktopName.h: the interface once more,
-//     each operation handed to DesktopModule<NameModule>::service(), or to the local backend where that is
-//     null, as DesktopRunLoops does.
+//     each operation handed to DesktopModule<NameModule>::service(), which is the local service where the
+//     desktop's is not there.
 //  4. Make it a member of DesktopPlatform, and add its report there.
 
 #pragma once
@@ -35,50 +35,34 @@
 
 namespace welcomer::desktop {
 
-// The one symbol that a module exports has this type. The functions' arguments are Module::Arguments.
+// The one symbol that a module exports has this type. `Module` is the description that both sides share, with
+// kName, Interface and Arguments.
+template <class Module>
 struct ModuleEntry {
-    const char* build; // what the module was built from and with: WELCOMER_MODULE_BUILD
+    using Interface = typename Module::Interface;
+    using Arguments = typename Module::Arguments;
 
-    // Makes the service. Called once, on the thread that first asks for it.
-    //  result  Module::Interface, owned by the caller, who deletes it through the interface; null when the
-    //          desktop's service is not there: `whyNot` then says why, in one line
-    void* (*create)(const void* arguments, std::string& whyNot);
+    // What the module was built from and with: WELCOMER_MODULE_BUILD. It comes first, and is read before
+    // anything else of a module that may be another one.
+    const char* build;
+
+    // Makes the service that stands in front of the local one. Called once, on the thread that first asks for
+    // it.
+    //  local   what serves where the desktop's service does not, or null where there is no such thing;
+    //  borrowed result  null when the desktop's service is not there: `whyNot` then says why, in one line
+    std::unique_ptr<Interface> (*create)(Interface* local, const Arguments& arguments, std::string& whyNot);
 
     // Says how the backend serves now: fills `backend`, `reason` and `advice`. May block while the desktop's
     // service answers. Any thread; also when `create` has never been called or has made nothing.
     //  result  whether the desktop's service serves
-    bool (*describe)(const void* arguments, platform::BackendReport& report);
+    bool (*describe)(const Arguments& arguments, platform::BackendReport& report);
 };
 
 inline constexpr char kModuleEntrySymbol[] = "welcomer_desktop_module";
 
-namespace detail {
-
-template <class Module>
-using Create = std::unique_ptr<typename Module::Interface> (*)(const typename Module::Arguments&,
-                                                               std::string&);
-template <class Module>
-using Describe = bool (*)(const typename Module::Arguments&, platform::BackendReport&);
-
-template <class Module, Create<Module> create>
-void* createErased(const void* arguments, std::string& whyNot) {
-    return create(*static_cast<const typename Module::Arguments*>(arguments), whyNot).release();
-}
-
-template <class Module, Describe<Module> describe>
-bool describeErased(const void* arguments, platform::BackendReport& report) {
-    return describe(*static_cast<const typename Module::Arguments*>(arguments), report);
-}
-
-} // namespace detail
 } // namespace welcomer::desktop
 
 // Exports a module's entry; once in a module, at namespace scope.
-//  Module    the description that both sides share
-//  create    std::unique_ptr<Module::Interface> (const Module::Arguments&, std::string& whyNot)
-//  describe  bool (const Module::Arguments&, platform::BackendReport&)
 #define WELCOMER_DESKTOP_MODULE(Module, create, describe)                                                    \
-    extern "C"                                                                                               \
-        [[gnu::visibility("default")]] const welcomer::desktop::ModuleEntry welcomer_desktop_module = {      \
-            WELCOMER_MODULE_BUILD, welcomer::desktop::detail::createErased<Module, create>,                  \
-            welcomer::desktop::detail::describeErased<Module, describe>};
+    extern "C" [[gnu::visibility("default")]] const welcomer::desktop::ModuleEntry<Module>                   \
+        welcomer_desktop_module = {WELCOMER_MODULE_BUILD, create, describe};

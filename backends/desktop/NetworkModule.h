@@ -13,9 +13,7 @@ namespace welcomer::desktop {
 struct NetworkConfigModule {
     static constexpr char kName[] = "networkconfig";
     using Interface = platform::NetworkConfigStore;
-    struct Arguments {
-        platform::NetworkConfigStore* kernel = nullptr; // borrowed, never null
-    };
+    struct Arguments {};
 };
 
 // The two interfaces that tell how the network is.
@@ -31,11 +29,7 @@ class NetworkStateServices {
 struct NetworkStateModule {
     static constexpr char kName[] = "networkstate";
     using Interface = NetworkStateServices;
-    // The kernel backend's; borrowed, and never null.
-    struct Arguments {
-        platform::NetworkStateStore* stateStore = nullptr;
-        platform::HostReachability* hostReachability = nullptr;
-    };
+    struct Arguments {};
 };
 
 } // namespace welcomer::desktop

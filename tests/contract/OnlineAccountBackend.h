@@ -3,7 +3,7 @@
 
 #pragma once
 
-#include "backends/desktop/OnlineAccountService.h"
+#include "backends/desktop/accounts/OnlineAccountService.h"
 #include "tests/contract/LocalAccounts.h"
 #include "tests/fakes/FakePreferenceStore.h"
 

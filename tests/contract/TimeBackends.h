@@ -7,7 +7,7 @@
 #include "backends/local/time/LocalRunLoops.h"
 #include "backends/simulated/VirtualTime.h"
 #ifdef WELCOMER_DESKTOP_RUNLOOP
-#include "backends/desktop/DesktopRunLoops.h"
+#include "backends/desktop/runloop/DesktopRunLoops.h"
 #endif
 
 #include <gtest/gtest.h>

@@ -2,7 +2,7 @@
 
 #pragma once
 
-#include "backends/desktop/CredentialModule.h"
+#include "backends/desktop/credentials/CredentialModule.h"
 #include "backends/desktop/credentials/SecretServiceQuestion.h"
 
 #include <mutex>

@@ -1,5 +1,5 @@
-#include "backends/desktop/CredentialModule.h"
 #include "backends/desktop/ModuleEntry.h"
+#include "backends/desktop/credentials/CredentialModule.h"
 #include "backends/desktop/credentials/SecretServiceReport.h"
 #include "backends/desktop/credentials/SecretServiceStore.h"
 
@@ -8,7 +8,8 @@ namespace welcomer::desktop {
 namespace {
 
 // Whether there is a service is asked at each operation: it may come and go.
-std::unique_ptr<platform::CredentialStore> createCredentialStore(const CredentialModule::Arguments& arguments,
+std::unique_ptr<platform::CredentialStore> createCredentialStore(platform::CredentialStore* /*local*/,
+                                                                 const CredentialModule::Arguments& arguments,
                                                                  std::string& /*whyNot*/) {
     return std::make_unique<SecretServiceStore>(arguments);
 }

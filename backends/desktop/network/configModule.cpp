@@ -8,8 +8,9 @@ namespace welcomer::desktop {
 namespace {
 
 std::unique_ptr<platform::NetworkConfigStore>
-createNetworkConfig(const NetworkConfigModule::Arguments& arguments, std::string& /*whyNot*/) {
-    return std::make_unique<NetworkManagerConfigStore>(*arguments.kernel);
+createNetworkConfig(platform::NetworkConfigStore* kernel, const NetworkConfigModule::Arguments& /*arguments*/,
+                    std::string& /*whyNot*/) {
+    return std::make_unique<NetworkManagerConfigStore>(*kernel);
 }
 
 bool describeNetworkConfig(const NetworkConfigModule::Arguments& /*arguments*/,

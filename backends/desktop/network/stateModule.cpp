@@ -10,9 +10,9 @@ namespace {
 
 class NetworkManagerState final : public NetworkStateServices {
   public:
-    explicit NetworkManagerState(const NetworkStateModule::Arguments& kernel)
-        : _stateStore(*kernel.stateStore),
-          _hostReachability(*kernel.hostReachability) {}
+    explicit NetworkManagerState(NetworkStateServices& kernel)
+        : _stateStore(kernel.stateStore()),
+          _hostReachability(kernel.hostReachability()) {}
 
     platform::NetworkStateStore& stateStore() override { return _stateStore; }
     platform::HostReachability& hostReachability() override { return _hostReachability; }
@@ -22,12 +22,14 @@ class NetworkManagerState final : public NetworkStateServices {
     NetworkManagerReachability _hostReachability;
 };
 
-std::unique_ptr<NetworkStateServices> createNetworkState(const NetworkStateModule::Arguments& kernel,
+std::unique_ptr<NetworkStateServices> createNetworkState(NetworkStateServices* kernel,
+                                                         const NetworkStateModule::Arguments& /*arguments*/,
                                                          std::string& /*whyNot*/) {
-    return std::make_unique<NetworkManagerState>(kernel);
+    return std::make_unique<NetworkManagerState>(*kernel);
 }
 
-bool describeNetworkState(const NetworkStateModule::Arguments& /*kernel*/, platform::BackendReport& report) {
+bool describeNetworkState(const NetworkStateModule::Arguments& /*arguments*/,
+                          platform::BackendReport& report) {
     return reportNetworkManager(report);
 }
 

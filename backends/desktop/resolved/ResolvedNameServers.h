@@ -2,7 +2,7 @@
 
 #pragma once
 
-#include "backends/local/network/NameServerService.h"
+#include "backends/network/NameServerService.h"
 
 #include <string>
 #include <vector>
@@ -10,7 +10,7 @@
 namespace welcomer::desktop {
 
 // Asks the running service and starts nobody. The bus and the service have ten seconds together.
-class ResolvedNameServers final : public local::NameServerService {
+class ResolvedNameServers final : public network::NameServerService {
   public:
     //  detail  receives on failure the device, or what the bus or the service said
     //  result  0; kNetworkConfigNoDevice; kNetworkConfigNameServersElsewhere when the service does not run;

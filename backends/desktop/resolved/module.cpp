@@ -1,13 +1,14 @@
 #include "backends/desktop/ModuleEntry.h"
-#include "backends/desktop/ResolvedModule.h"
+#include "backends/desktop/resolved/ResolvedModule.h"
 #include "backends/desktop/resolved/ResolvedNameServers.h"
 
 namespace welcomer::desktop {
 
 namespace {
 
-std::unique_ptr<local::NameServerService> createNameServers(const ResolvedModule::Arguments& /*arguments*/,
-                                                            std::string& /*whyNot*/) {
+std::unique_ptr<network::NameServerService> createNameServers(network::NameServerService* /*local*/,
+                                                              const ResolvedModule::Arguments& /*arguments*/,
+                                                              std::string& /*whyNot*/) {
     return std::make_unique<ResolvedNameServers>();
 }
 

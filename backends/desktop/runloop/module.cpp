@@ -1,6 +1,6 @@
 #include "backends/desktop/ModuleEntry.h"
-#include "backends/desktop/RunLoopModule.h"
 #include "backends/desktop/runloop/GLibRunLoop.h"
+#include "backends/desktop/runloop/RunLoopModule.h"
 
 #include <glib.h>
 
@@ -8,7 +8,8 @@ namespace welcomer::desktop {
 
 namespace {
 
-std::unique_ptr<platform::RunLoops> createRunLoops(const RunLoopModule::Arguments& /*arguments*/,
+std::unique_ptr<platform::RunLoops> createRunLoops(platform::RunLoops* /*local*/,
+                                                   const RunLoopModule::Arguments& /*arguments*/,
                                                    std::string& whyNot) {
     std::unique_ptr<platform::RunLoops> loops = GLibRunLoops::create();
     if (!loops) {

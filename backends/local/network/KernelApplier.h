@@ -4,8 +4,8 @@
 
 #include "backends/local/network/DHCPClient.h"
 #include "backends/local/network/KernelNetwork.h"
-#include "backends/local/network/NameServerService.h"
 #include "backends/network/IPv4Configuration.h"
+#include "backends/network/NameServerService.h"
 #include "backends/posix/RootFolder.h"
 
 #include <cstdint>
@@ -19,7 +19,7 @@ namespace welcomer::local {
 class KernelApplier {
   public:
     //  nameServers  told of the name servers where /etc/resolv.conf is systemd-resolved's; borrowed, or null
-    explicit KernelApplier(posix::RootFolder root, NameServerService* nameServers = nullptr)
+    explicit KernelApplier(posix::RootFolder root, network::NameServerService* nameServers = nullptr)
         : _root(std::move(root)),
           _client(_root),
           _nameServers(nameServers) {}
@@ -53,7 +53,7 @@ class KernelApplier {
 
     const posix::RootFolder _root;
     const DHCPClient _client;
-    NameServerService* const _nameServers;
+    network::NameServerService* const _nameServers;
     KernelNetwork _kernel;
 };
 

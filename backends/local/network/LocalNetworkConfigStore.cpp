@@ -62,7 +62,7 @@ Outcome storeInto(PropertyList::Dictionary& content, ChangedService& changed) {
 
 class FileAndKernel final : public network::Backing {
   public:
-    FileAndKernel(const posix::RootFolder& root, NameServerService* nameServers)
+    FileAndKernel(const posix::RootFolder& root, network::NameServerService* nameServers)
         : _applier(root, nameServers),
           _file(root) {}
 

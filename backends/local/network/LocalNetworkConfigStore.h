@@ -2,7 +2,7 @@
 
 #pragma once
 
-#include "backends/local/network/NameServerService.h"
+#include "backends/network/NameServerService.h"
 #include "backends/posix/RootFolder.h"
 #include "platform/NetworkConfigStore.h"
 
@@ -20,7 +20,8 @@ namespace welcomer::local {
 class LocalNetworkConfigStore final : public platform::NetworkConfigStore {
   public:
     //  nameServers  as KernelApplier.h has it; borrowed
-    explicit LocalNetworkConfigStore(posix::RootFolder root, NameServerService* nameServers = nullptr)
+    explicit LocalNetworkConfigStore(posix::RootFolder root,
+                                     network::NameServerService* nameServers = nullptr)
         : _root(std::move(root)),
           _nameServers(nameServers) {}
 
@@ -29,7 +30,7 @@ class LocalNetworkConfigStore final : public platform::NetworkConfigStore {
 
   private:
     const posix::RootFolder _root;
-    NameServerService* const _nameServers;
+    network::NameServerService* const _nameServers;
 };
 
 } // namespace welcomer::local

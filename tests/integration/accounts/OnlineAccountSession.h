@@ -3,7 +3,7 @@
 #pragma once
 
 #include "backends/desktop/DesktopModule.h"
-#include "backends/desktop/OnlineAccountsModule.h"
+#include "backends/desktop/accounts/OnlineAccountsModule.h"
 #include "tests/contract/OnlineAccountBackend.h"
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/support/DesktopSession.h"
@@ -25,9 +25,10 @@ struct OnlineAccountSession {
 
     TemporaryRoot folder;
     DesktopSession session{folder.path()};
-    desktop::DesktopModule<desktop::OnlineAccountsModule> module{{[this] {
-        return posix::FileLock(posix::RootFolder(folder.path()), "/locks/online-accounts");
-    }}};
+    desktop::DesktopModule<desktop::OnlineAccountsModule> module{
+        nullptr, {[this] {
+            return posix::FileLock(posix::RootFolder(folder.path()), "/locks/online-accounts");
+        }}};
 };
 
 // Everything runs.

@@ -19,9 +19,10 @@ int main(int argumentCount, char** arguments) {
     fakes::FakePreferenceStore preferenceStore(recorder);
     fakes::FakeSystemLog log(recorder);
     local::LocalNotificationCenter center;
-    desktop::DesktopModule<desktop::OnlineAccountsModule> module({[&] {
-        return posix::FileLock(root, "/online-accounts/lock");
-    }});
+    desktop::DesktopModule<desktop::OnlineAccountsModule> module(nullptr, {[&] {
+                                                                     return posix::FileLock(
+                                                                         root, "/online-accounts/lock");
+                                                                 }});
     desktop::OnlineAccountService service({[&] { return module.service(); },
                                            [&](platform::NotificationCenter& posts) {
                                                return std::make_unique<local::LocalAccountService>(

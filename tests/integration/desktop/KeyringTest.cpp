@@ -1,6 +1,6 @@
 // The credential store of a desktop on a real gnome-keyring.
 
-#include "backends/desktop/DesktopCredentialStore.h"
+#include "backends/desktop/credentials/DesktopCredentialStore.h"
 #include "backends/local/credentials/LocalCredentialStore.h"
 #include "tests/contract/CredentialStoreContract.h"
 #include "tests/fakes/FakeFileSystem.h"

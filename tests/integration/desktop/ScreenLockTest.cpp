@@ -1,6 +1,6 @@
 // The screen lock's setting, from the real settings library on a file of the test's own.
 
-#include "backends/desktop/DesktopPreferenceStore.h"
+#include "backends/desktop/preferences/DesktopPreferenceStore.h"
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakePreferenceStore.h"
 

@@ -19,8 +19,9 @@ struct Counts {
 };
 
 template <int number>
-DesktopModule<VisitorModule<number>> moduleWith(Counts& counts) {
-    return DesktopModule<VisitorModule<number>>({&counts.created, &counts.ended}, WELCOMER_FIXTURE_MODULES);
+DesktopModule<VisitorModule<number>> moduleWith(Counts& counts, Visitor* local = nullptr) {
+    return DesktopModule<VisitorModule<number>>(local, {&counts.created, &counts.ended},
+                                                WELCOMER_FIXTURE_MODULES);
 }
 
 // What loading says about a module that cannot serve.
@@ -112,6 +113,19 @@ TEST(DesktopModuleTest, AModuleWhoseServiceIsNotThereMakesNone) {
     auto module = moduleWith<1>(counts);
     EXPECT_EQ(module.service(), nullptr);
     EXPECT_EQ(module.service(), nullptr);
+}
+
+TEST(DesktopModuleTest, TheLocalServiceServesWhereTheModulesIsNotThereAndStandsBehindItElsewhere) {
+    Counts counts;
+    auto good = moduleWith<0>(counts);
+    Visitor* const local = good.service();
+    auto absent = moduleWith<1>(counts, local);
+    EXPECT_EQ(absent.service(), local);
+    auto stale = moduleWith<2>(counts, local);
+    EXPECT_EQ(stale.service(), local);
+    auto another = moduleWith<0>(counts, local);
+    EXPECT_NE(another.service(), local);
+    EXPECT_EQ(another.service()->behind(), local);
 }
 
 TEST(DesktopModuleTest, AModuleOfAnotherBuildIsRefused) {

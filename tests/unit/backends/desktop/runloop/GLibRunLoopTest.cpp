@@ -1,6 +1,6 @@
 // The main thread's loop while other threads run GLib's default main context, or try to.
 
-#include "backends/desktop/DesktopRunLoops.h"
+#include "backends/desktop/runloop/DesktopRunLoops.h"
 
 #include <glib.h>
 #include <gtest/gtest.h>

@@ -40,7 +40,7 @@ IPv4Configuration withServers(IPv4Configuration configuration) {
 }
 
 // Answers with a status, and keeps what it was told.
-class RecordingNameServers final : public NameServerService {
+class RecordingNameServers final : public network::NameServerService {
   public:
     std::int32_t setServers(const std::string& device, const std::vector<std::string>& servers,
                             std::string& detail) override {
@@ -71,7 +71,8 @@ class KernelApplierTest : public testing::Test {
         root.addFile("/etc/resolv.conf", kResolver);
     }
 
-    std::int32_t apply(const IPv4Configuration& configuration, NameServerService* nameServers = nullptr) {
+    std::int32_t apply(const IPv4Configuration& configuration,
+                       network::NameServerService* nameServers = nullptr) {
         return KernelApplier(posix::RootFolder(root.path()), nameServers)
             .apply(configuration, "eth7", detail);
     }

@@ -2,9 +2,9 @@
 
 #pragma once
 
-#include "backends/desktop/CredentialModule.h"
 #include "backends/desktop/DesktopModule.h"
-#include "backends/desktop/SearchListCredentialStore.h"
+#include "backends/desktop/credentials/CredentialModule.h"
+#include "backends/desktop/credentials/SearchListCredentialStore.h"
 #include "backends/posix/RootFolder.h"
 #include "platform/ProcessIdentity.h"
 

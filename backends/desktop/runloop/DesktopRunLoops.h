@@ -4,7 +4,7 @@
 #pragma once
 
 #include "backends/desktop/DesktopModule.h"
-#include "backends/desktop/RunLoopModule.h"
+#include "backends/desktop/runloop/RunLoopModule.h"
 #include "backends/local/time/LocalRunLoops.h"
 
 namespace welcomer::desktop {
@@ -20,8 +20,8 @@ class DesktopRunLoops final : public platform::RunLoops {
     platform::BackendReport report();
 
   private:
-    DesktopModule<RunLoopModule> _module{{}};
     local::LocalRunLoops _local;
+    DesktopModule<RunLoopModule> _module{&_local};
 };
 
 } // namespace welcomer::desktop

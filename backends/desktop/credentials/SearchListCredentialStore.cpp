@@ -1,4 +1,4 @@
-#include "backends/desktop/SearchListCredentialStore.h"
+#include "backends/desktop/credentials/SearchListCredentialStore.h"
 
 #include <cerrno>
 #include <utility>

@@ -1,4 +1,4 @@
-#include "backends/desktop/DesktopRunLoops.h"
+#include "backends/desktop/runloop/DesktopRunLoops.h"
 
 #include <unistd.h>
 
@@ -6,8 +6,7 @@ namespace welcomer::desktop {
 
 std::shared_ptr<platform::RunLoop> DesktopRunLoops::current() {
     const bool isMainThread = ::gettid() == ::getpid();
-    platform::RunLoops* const loops = isMainThread ? _module.service() : nullptr;
-    return loops ? loops->current() : _local.current();
+    return isMainThread ? _module.service()->current() : _local.current();
 }
 
 platform::BackendReport DesktopRunLoops::report() {

@@ -3,17 +3,17 @@
 #pragma once
 
 #include "backends/desktop/DesktopModule.h"
-#include "backends/desktop/ResolvedModule.h"
+#include "backends/desktop/resolved/ResolvedModule.h"
 
 #include <string>
 #include <vector>
 
 namespace welcomer::desktop {
 
-class DesktopNameServers final : public local::NameServerService {
+class DesktopNameServers final : public network::NameServerService {
   public:
     //  folder  where the modules are; empty: where they are looked for anyway
-    explicit DesktopNameServers(const std::string& folder = "") : _module({}, folder) {}
+    explicit DesktopNameServers(const std::string& folder = "") : _module(nullptr, {}, folder) {}
 
     // Loads the module when it is first needed. Without it, the name servers are another program's.
     std::int32_t setServers(const std::string& device, const std::vector<std::string>& servers,

@@ -1,4 +1,4 @@
-#include "backends/desktop/OnlineAccountService.h"
+#include "backends/desktop/accounts/OnlineAccountService.h"
 
 #include "propertylist/PropertyListReadings.h"
 

@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-namespace welcomer::local {
+namespace welcomer::network {
 
 // systemd-resolved, where /etc/resolv.conf is its own. The embedded side has no client of it: whoever puts a
 // platform together from the desktop's services hands one in.
@@ -24,4 +24,4 @@ class NameServerService {
                                     std::string& detail) = 0;
 };
 
-} // namespace welcomer::local
+} // namespace welcomer::network

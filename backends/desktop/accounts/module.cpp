@@ -1,13 +1,14 @@
 #include "backends/desktop/ModuleEntry.h"
-#include "backends/desktop/OnlineAccountsModule.h"
-#include "backends/desktop/onlineaccounts/GoaOnlineAccounts.h"
+#include "backends/desktop/accounts/GoaOnlineAccounts.h"
+#include "backends/desktop/accounts/OnlineAccountsModule.h"
 
 namespace welcomer::desktop {
 
 namespace {
 
 // Whether the daemon serves is asked with every question.
-std::unique_ptr<OnlineAccounts> createOnlineAccounts(const OnlineAccountsModule::Arguments& arguments,
+std::unique_ptr<OnlineAccounts> createOnlineAccounts(OnlineAccounts* /*local*/,
+                                                     const OnlineAccountsModule::Arguments& arguments,
                                                      std::string& /*whyNot*/) {
     return std::make_unique<GoaOnlineAccounts>(arguments.lock);
 }

@@ -1,4 +1,4 @@
-#include "backends/desktop/DesktopRunLoops.h"
+#include "backends/desktop/runloop/DesktopRunLoops.h"
 
 #include <gtest/gtest.h>
 

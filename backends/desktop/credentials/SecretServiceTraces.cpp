@@ -1,4 +1,4 @@
-#include "backends/desktop/SecretServiceTraces.h"
+#include "backends/desktop/credentials/SecretServiceTraces.h"
 
 #include "backends/posix/Directory.h"
 #include "platform/Error.h"

@@ -1,4 +1,4 @@
-#include "backends/desktop/DesktopPreferenceStore.h"
+#include "backends/desktop/preferences/DesktopPreferenceStore.h"
 
 namespace welcomer::desktop {
 
@@ -11,8 +11,7 @@ constexpr char kScreenSaverDomain[] = "com.corvid.screensaver";
 std::optional<PropertyList> DesktopPreferenceStore::copyValue(const std::string& key,
                                                               const std::string& domain) {
     if (key == "askForPassword" && domain == kScreenSaverDomain) {
-        ScreenLock* const screenLock = _module.service();
-        if (const std::optional<bool> asks = screenLock ? screenLock->asksForPassword() : std::nullopt) {
+        if (const std::optional<bool> asks = (*_module.service())()) {
             return PropertyList(*asks);
         }
     }

@@ -1,4 +1,4 @@
-#include "backends/desktop/SecretServiceTraces.h"
+#include "backends/desktop/credentials/SecretServiceTraces.h"
 
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakeFileSystem.h"

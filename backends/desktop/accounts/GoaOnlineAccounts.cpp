@@ -1,4 +1,4 @@
-#include "backends/desktop/onlineaccounts/GoaOnlineAccounts.h"
+#include "backends/desktop/accounts/GoaOnlineAccounts.h"
 
 #include "backends/desktop/glib/MainContext.h"
 

@@ -1,6 +1,6 @@
 // Which service is a switch of an online account, and what happens where there is none.
 
-#include "backends/desktop/OnlineAccountService.h"
+#include "backends/desktop/accounts/OnlineAccountService.h"
 #include "tests/contract/OnlineAccountBackend.h"
 #include "tests/contract/TimeBackends.h"
 #include "tests/fakes/FakeOnlineAccounts.h"

@@ -1,7 +1,7 @@
-#include "backends/desktop/DesktopCredentialStore.h"
+#include "backends/desktop/credentials/DesktopCredentialStore.h"
 
-#include "backends/desktop/SecretServiceTraces.h"
 #include "backends/desktop/SessionBusTrace.h"
+#include "backends/desktop/credentials/SecretServiceTraces.h"
 
 #include <utility>
 
@@ -22,7 +22,7 @@ DesktopCredentialStore::DesktopCredentialStore(posix::RootFolder root, platform:
     : _root(std::move(root)),
       _identity(identity),
       _local(local),
-      _module(arguments),
+      _module(nullptr, arguments),
       _store(
           {[this] { return mayHaveSessionBus() ? _module.service() : nullptr; },
            [this] {

@@ -2,13 +2,13 @@
 
 #pragma once
 
-#include "backends/local/network/NameServerService.h"
+#include "backends/network/NameServerService.h"
 
 namespace welcomer::desktop {
 
 struct ResolvedModule {
     static constexpr char kName[] = "resolved";
-    using Interface = local::NameServerService;
+    using Interface = network::NameServerService;
     struct Arguments {};
 };
 

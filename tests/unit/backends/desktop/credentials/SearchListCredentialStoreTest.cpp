@@ -1,4 +1,4 @@
-#include "backends/desktop/SearchListCredentialStore.h"
+#include "backends/desktop/credentials/SearchListCredentialStore.h"
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakeCredentialStore.h"
 #include "tests/support/FindCredential.h"

@@ -2,7 +2,7 @@
 
 #pragma once
 
-#include "backends/desktop/OnlineAccounts.h"
+#include "backends/desktop/accounts/OnlineAccounts.h"
 #include "platform/AccountService.h"
 #include "platform/DispatchQueue.h"
 #include "platform/NotificationCenter.h"

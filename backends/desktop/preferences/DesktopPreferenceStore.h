@@ -3,10 +3,23 @@
 #pragma once
 
 #include "backends/desktop/DesktopModule.h"
-#include "backends/desktop/ScreenLockModule.h"
 #include "platform/PreferenceStore.h"
 
+#include <functional>
+#include <optional>
+#include <string>
+#include <vector>
+
 namespace welcomer::desktop {
+
+// The desktop's setting of the screen lock, as a module.
+struct ScreenLockModule {
+    static constexpr char kName[] = "screenlock";
+    // Whether the screen asks for the password once it is locked: "lock-enabled" of
+    // org.gnome.desktop.screensaver; none where that schema is not installed. Any thread; never throws.
+    using Interface = std::function<std::optional<bool>()>;
+    struct Arguments {};
+};
 
 // "askForPassword" of "com.corvid.screensaver" reads as the desktop's "lock-enabled" where that schema is
 // installed, and as stored elsewhere. Writing it changes what is stored, never the desktop's setting. The
@@ -29,7 +42,11 @@ class DesktopPreferenceStore final : public platform::PreferenceStore {
 
   private:
     platform::PreferenceStore& _local;
-    DesktopModule<ScreenLockModule> _module{{}};
+    // Without it what is stored is the answer.
+    ScreenLockModule::Interface _notInstalled = [] {
+        return std::nullopt;
+    };
+    DesktopModule<ScreenLockModule> _module{&_notInstalled};
 };
 
 } // namespace welcomer::desktop

@@ -1,4 +1,4 @@
-#include "backends/desktop/DesktopNameServers.h"
+#include "backends/desktop/resolved/DesktopNameServers.h"
 
 #include "platform/NetworkConfigStore.h"
 
@@ -6,7 +6,7 @@ namespace welcomer::desktop {
 
 std::int32_t DesktopNameServers::setServers(const std::string& device,
                                             const std::vector<std::string>& servers, std::string& detail) {
-    local::NameServerService* const service = _module.service();
+    network::NameServerService* const service = _module.service();
     return service ? service->setServers(device, servers, detail)
                    : platform::kNetworkConfigNameServersElsewhere;
 }
