@@ -56,7 +56,7 @@ class NameServers(unittest.TestCase):
     def state(self):
         """What an application may change, but for what systemd-resolved knows."""
         listed = [subprocess.run(["ip", "-4", *what], check=True, stdout=subprocess.PIPE, text=True).stdout
-                  for what in (["addr", "show"], ["route", "show", "table", "all"])]
+                  for what in (["-o", "addr", "show"], ["route", "show", "table", "all"])]
         return [*listed, os.readlink(self.file), (self.machine.root / STUB.lstrip("/")).read_bytes()]
 
     def servers(self):

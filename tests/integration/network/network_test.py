@@ -357,7 +357,7 @@ class Applying(SpaceTest):
 
     def state(self):
         """What an application may change."""
-        return [self.here.shell("ip -4 addr show; ip -4 route show table all"), self.resolver.read_bytes()]
+        return [self.here.shell("ip -4 -o addr show; ip -4 route show table all"), self.resolver.read_bytes()]
 
     def test_a_router_that_the_kernel_refuses_leaves_the_working_network_alone(self):
         # Which it does only when the address through which the router is reached has gone.
@@ -370,11 +370,11 @@ class Applying(SpaceTest):
 
     def test_name_servers_that_cannot_be_stored_leave_the_working_network_alone(self):
         self.here.shell("ip addr add 10.0.0.7/8 dev eth7; ip route add default via 10.0.0.1")
-        before = self.here.shell("ip -4 addr show; ip -4 route show table all")
+        before = self.here.shell("ip -4 -o addr show; ip -4 route show table all")
         self.resolver.unlink()
         self.resolver.mkdir()
         self.fails(self.call("apply", *MANUAL, "--dns", "192.0.2.1", "--warning-type", "3"), 1, NOT_CONFIGURED)
-        self.assertEqual(self.here.shell("ip -4 addr show; ip -4 route show table all"), before)
+        self.assertEqual(self.here.shell("ip -4 -o addr show; ip -4 route show table all"), before)
 
     def test_another_links_default_route_stays(self):
         self.here.connect("eth8", self.there, "eth1")
