@@ -18,9 +18,8 @@ namespace welcomer {
 //  selectedServices             service identifiers; a service that is not among them counts as opted out
 //  accountAndKeyValueStoreOnly  enables documents and data alone, whatever the phase and the selection
 //  postLogin                    the phase: after the user's first login, or before it
-//  window                       the parent of what the account service shows while enabling,
-//                               or null to have it done silently. Held until the last
-//                               service has been enabled.
+//  window                       the parent of what the account service shows while enabling, or null to have
+//                               it done silently; held until the last service has been enabled
 //  errorOut                     never written; may be null
 //  result                       false only when there is no account; how the services fared is in the log
 // Any thread. After login, calendars and reminders are enabled later, on the global queue: 3 seconds after

@@ -23,11 +23,12 @@ struct CloudUser {
     PropertyList::Dictionary response;
 };
 
+// Any thread.
 class AccountDirectory {
   public:
     virtual ~AccountDirectory() = default;
 
-    // The names of the current user's accounts, in order. Any thread, as all of these.
+    // The names of the current user's accounts, in order.
     virtual std::vector<std::string> accounts() = 0;
 
     // The names of those who can sign in, in order; none when that cannot be known here.

@@ -43,8 +43,8 @@ inline constexpr char kDelegatesKey[] = "delegates";
 inline constexpr char kStatusKey[] = "status";
 
 // The notifications that end an authentication and a sign-in. A completed one carries the server's response,
-// among it its status; a failed one the account error (an integer under kSKPropertyAccountError)
-// and, where there is more to say, its info.
+// with its status; a failed one the account error (an integer under kSKPropertyAccountError) and, where there
+// is more to say, its info.
 inline constexpr char kSKNotificationAuthenticationCompleted[] =
     "com.corvid.nimbus.notification.authenticationCompleted";
 inline constexpr char kSKNotificationAuthenticationFailed[] =
@@ -62,64 +62,62 @@ inline constexpr std::int64_t kSKAccountErrorServerUnavailable = 4;
 inline constexpr std::int64_t kSKAccountErrorRepair = 5;    // the account is to be repaired
 inline constexpr std::int64_t kSKAccountErrorNotStored = 6; // signed in, but the account could not be kept
 
-// One service of one account.
+// One service of one account. Any thread.
 class CloudService {
   public:
     virtual ~CloudService() = default;
 
-    // Whether this machine and this user can have the service enabled. Any thread.
+    // Whether this machine and this user can have the service enabled.
     virtual bool canBeEnabled() = 0;
 
-    // The value of one of the service's properties, or none. Any thread.
+    // The value of one of the service's properties, or none.
     virtual std::optional<PropertyList> propertyValue(const std::string& key) = 0;
 
-    // Turns the service on or off, with an interface where the account service has one to show.
+    // Turns the service on or off, with an interface where the account service has one to show. What became
+    // of it is not reported.
     //  creating  whether the service is being set up for the first time
     //  window    the parent of that interface; borrowed for the call
-    // What became of it is not reported. Any thread.
     virtual void enableWithWindow(bool enabled, bool creating, Window* window) = 0;
 
-    // The same without any interface. Any thread.
+    // The same without any interface.
     virtual void enableSilently(bool enabled) = 0;
 };
 
-// One cloud account of the current user.
+// One cloud account of the current user. Any thread.
 class CloudAccount {
   public:
     virtual ~CloudAccount() = default;
 
-    // The account's user name. Any thread.
+    // The account's user name.
     virtual std::string accountID() = 0;
 
     // Keeps the account service from showing its own dialogs about failures of this account, for as long as
-    // the process lives. Any thread.
+    // the process lives.
     virtual void suppressFailureDialogs() = 0;
 
     // The account's service with this identifier, or null when it has none. The service keeps what it needs
-    // alive. Any thread.
+    // alive.
     virtual std::shared_ptr<CloudService> serviceForID(const std::string& identifier) = 0;
 };
 
-// The shared account manager.
+// The shared account manager. Any thread, but where something else is said.
 class AccountManager {
   public:
     virtual ~AccountManager() = default;
 
     // The account with this identifier, or null.
-    //  identifier       as it came from the caller; the manager has no account
-    //                   for none, for an empty text and for what is no
-    //                   text
+    //  identifier       as it came from the caller; the manager has no account for none, for an empty text
+    //                   and for what is no text
     //  createIfMissing  whether to make an account that does not exist; null then says that it could not be
     //                   made
-    // Any thread.
     virtual std::shared_ptr<CloudAccount> accountForID(const std::optional<PropertyList>& identifier,
                                                        bool createIfMissing) = 0;
 
     // Starts to check a user's password with the server and returns. The answer comes as exactly one
     // authentication-completed or authentication-failed notification on the default centre, on the run loop
-    // of the thread that called; a port is attached to that loop until then. There is no time limit.
+    // of the thread that called, which must run it; a port is attached to that loop until then. There is no
+    // time limit.
     //  delegateRequest  what is asked of each delegate, under kDelegatesKey
-    // Any thread that runs its run loop.
     virtual void authenticate(const std::string& username, const std::string& password,
                               const PropertyList::Dictionary& delegateRequest) = 0;
 
@@ -128,24 +126,24 @@ class AccountManager {
     virtual void finishSignIn(const std::string& username, const std::string& password,
                               const PropertyList::Dictionary& delegateRequest) = 0;
 
-    // Says that setup has finished. The system has nothing to add and always passes none. Any thread.
+    // Says that setup has finished. The system has nothing to add and always passes none.
     virtual void markSetupFinished(const std::optional<PropertyList>& information) = 0;
 };
 
+// Any thread.
 class AccountService {
   public:
     virtual ~AccountService() = default;
 
-    // Lives as long as this object. Any thread.
+    // Lives as long as this object.
     virtual AccountManager& sharedManager() = 0;
 
-    // The account that is logged in for the current user, or null. Any thread.
+    // The account that is logged in for the current user, or null.
     virtual std::shared_ptr<CloudAccount> loggedInAccount() = 0;
 
     // Whether a service of an account is enabled; false for no account and for a service that it does not
     // have.
     //  account  borrowed for the call; may be null
-    // Any thread.
     virtual bool isServiceEnabled(CloudAccount* account, const std::string& identifier) = 0;
 };
 

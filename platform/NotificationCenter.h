@@ -24,7 +24,7 @@ class NotificationObservation {
     virtual ~NotificationObservation() = default;
 };
 
-// The process's default centre.
+// The process's default centre. Any thread, also within an observer.
 class NotificationCenter {
   public:
     using Observer = std::function<void(const Notification&)>;
@@ -32,13 +32,13 @@ class NotificationCenter {
     virtual ~NotificationCenter() = default;
 
     // Has the observer called for every notification of a name, from any sender. It is called on the posting
-    // thread and must not throw. Any thread.
+    // thread and must not throw.
     virtual std::unique_ptr<NotificationObservation> addObserver(const std::string& name,
                                                                  Observer observer) = 0;
 
     // Calls the observers that are registered for the notification's name, in the order in which they were
     // added, and returns after the last. One that is added meanwhile is not called, and one that is removed
-    // before its turn neither. Any thread, also within an observer.
+    // before its turn neither.
     virtual void post(const Notification& notification) = 0;
 };
 

@@ -18,7 +18,8 @@ class PluginBundle {
 
     // Loads a bundle and looks up one exported data symbol in it.
     //  path    a shared library, or a folder holding "Info.plist" (whose "Executable" names the library) and
-    //  the library symbol  the symbol's name
+    //          the library
+    //  symbol  the symbol's name
     // Runs the library's own initialisers on the calling thread. Any thread.
     virtual PluginSymbol load(const std::string& path, const char* symbol) = 0;
 };

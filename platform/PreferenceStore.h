@@ -34,36 +34,36 @@ struct DamagedPreferences {
 // as it is, and does not synchronise with changes, until they set or remove the key in question: no value is
 // lost, or changes its type, for the sake of another. Refusals and damage are told in the system log, one
 // line each.
+//
+// Any thread. Values and defaults may be read from a file, which setting and removing never changes.
 class PreferenceStore {
   public:
     virtual ~PreferenceStore() = default;
 
-    // A copy of the value, or none when the domain has no such key. Any thread; may read a file.
+    // A copy of the value, or none when the domain has no such key.
     virtual std::optional<PropertyList> copyValue(const std::string& key, const std::string& domain) = 0;
 
     // Copies of several values; unless a store does better, one `copyValue` after the other.
     //  keys    distinct ones
     //  result  one for each key, in their order; none where the domain has no such key
-    // Any thread; may read a file.
     virtual std::vector<std::optional<PropertyList>> copyValues(std::span<const std::string> keys,
                                                                 const std::string& domain);
 
     // Sets or removes a value. One that cannot be written is refused with a line that names domain and key;
-    // what was there stays. Any thread; changes no file.
+    // what was there stays.
     virtual void setValue(const std::string& key, const PropertyList& value, const std::string& domain) = 0;
     virtual void removeValue(const std::string& key, const std::string& domain) = 0;
 
     // Brings a domain and this store in line: stores the keys that were changed here, and those alone, and
     // then sees what others have stored. All or nothing, also when the process is killed meanwhile; without
-    // changes nothing is written.
+    // changes nothing is written. Any process; may block while another one synchronises.
     //  result  false when the changes could not be stored; they are kept, and the next call tries again
-    // Any thread and any process; may block while another process synchronises.
     virtual bool synchronise(const std::string& domain) = 0;
 
-    // The damage that this store has met so far, in order. Any thread.
+    // The damage that this store has met so far, in order.
     virtual std::vector<DamagedPreferences> damagedPreferences() = 0;
 
-    // The application's standard defaults, read as `copyValue` reads. Any thread.
+    // The application's standard defaults, read as `copyValue` reads.
     bool booleanDefault(const std::string& key);
     std::int64_t integerDefault(const std::string& key);
 };

@@ -8,6 +8,7 @@
 
 namespace welcomer::platform {
 
+// Any thread.
 class ResourceBundle {
   public:
     virtual ~ResourceBundle() = default;
@@ -16,25 +17,23 @@ class ResourceBundle {
     // resource.
     //  name  the resource's name without its type
     //  type  its type, the file name's extension without the dot; empty: the name stands alone
-    // Any thread.
     virtual std::optional<std::string> pathForResource(const std::string& name, const std::string& type) = 0;
 
     // The text under a key of the bundle's default string table, in the user's language where the bundle has
-    // it.
+    // it. May read a file.
     //  fallback  the result when there is no such text
-    // Any thread; may read a file.
     virtual std::string localizedString(const std::string& key, const std::string& fallback) = 0;
 };
 
+// Any thread.
 class ResourceBundles {
   public:
     virtual ~ResourceBundles() = default;
 
-    // Opens the bundle at a path. A bundle that does not exist has no resources. Any thread.
+    // Opens the bundle at a path. A bundle that does not exist has no resources.
     virtual std::unique_ptr<ResourceBundle> open(const std::string& path) = 0;
 
     // Opens the main bundle: that of the running application. An application without one has no resources.
-    // Any thread.
     virtual std::unique_ptr<ResourceBundle> openMainBundle() = 0;
 };
 

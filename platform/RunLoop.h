@@ -21,9 +21,8 @@ class RunLoop {
 
     // Processes performed blocks and attached sources until the duration is over, or until nothing is
     // attached and nothing is pending; with neither at the start it returns at once. A loop to which others
-    // may attach sources of their own always counts as having one. Blocks that are pending
-    // at the start are run even when the duration is 0 or less. Only on the loop's own thread, also from
-    // within a block.
+    // may attach sources of their own always counts as having one. Blocks that are pending at the start are
+    // run even when the duration is 0 or less. Only on the loop's own thread, also from within a block.
     virtual void run(std::chrono::nanoseconds duration) = 0;
 
     // Has the loop's thread run a block, in the order of the calls, and wakes the loop. Any thread. The block

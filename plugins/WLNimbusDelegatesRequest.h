@@ -11,8 +11,8 @@
 namespace welcomer {
 
 // Builds the request from every plug-in's own part: under platform::kDelegatesKey a dictionary from delegate
-// identifier to request. A plug-in that raises or leaves itself out costs one log
-// line and is left out. The former online service takes part with an empty dictionary.
+// identifier to request. A plug-in that raises or leaves itself out costs one log line and is left out. The
+// former online service takes part with an empty dictionary.
 //  additionalDelegates  identifiers with their requests; they replace those of the same identifier
 //  omittedDelegates     the identifiers of plug-ins that are not asked
 // Any thread, one call at a time: the plug-ins are called on it.

@@ -14,8 +14,7 @@ namespace welcomer {
 //  value   the value; only read during the call
 //  error   where to say what cannot be written and why, or null
 //  result  the bytes, or none when the value cannot be written; UnwritableValue.h says what that is, and
-//  finds it
-//          beforehand
+//          finds it beforehand
 // Any thread.
 std::optional<std::string> writeXMLPropertyList(const PropertyList& value, std::string* error = nullptr);
 

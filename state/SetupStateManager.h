@@ -68,9 +68,8 @@ class WLLoginHelper {
                                                       const std::optional<std::string>& password) = 0;
 
     //  query   always none
-    //  result  the circle's status under "status": 1 when a circle exists, 0
-    //          when none does;
-    //          anything else is a failure
+    //  result  the circle's status under "status": 1 when a circle exists, 0 when none does; anything else is
+    //          a failure
     virtual std::optional<PropertyList::Dictionary>
     queryKeychainSyncStatus(const std::optional<PropertyList>& query) = 0;
 

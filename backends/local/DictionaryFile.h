@@ -28,18 +28,15 @@ struct DictionaryFileContent {
     std::string otherBytes{};        // of no meaning; the memory for the next reading
 };
 
-// Reads a file, in any property-list format, without a lock.
-// Any thread.
+// Reads a file, in any property-list format, without a lock. Any thread.
 DictionaryFileContent readDictionaryFile(const posix::RootFolder& root, const std::string& path);
 
-// The same, where it was read before: bytes that did not change are not parsed again.
+// The same, where it was read before: bytes that did not change are not parsed again. Any thread.
 //  content  what was there before, replaced by what is there now
-// Any thread.
 void rereadDictionaryFile(const posix::RootFolder& root, const std::string& path,
                           DictionaryFileContent& content);
 
-// A folder of such files, with the lock of all of them held for as long as this lives. One thread
-// at a time.
+// A folder of such files, with the lock of all of them held for as long as this lives. One thread at a time.
 class LockedDictionaryFolder {
   public:
     // Opens the folder, making it where it is missing, and waits for the other writers.

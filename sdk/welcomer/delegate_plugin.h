@@ -8,22 +8,22 @@
  *
  * Rules for both sides
  *  - Threads. Each function below says on which thread it is called; "any thread" is any number of threads at
- * once. A plug-in is loaded once per process and never unloaded, so its threads may run on. A thread must not
- * be cancelled, and must not exit, while it is inside a function of the other side.
+ *    once. A plug-in is loaded once per process and never unloaded, so its threads may run on. A thread must
+ *    not be cancelled, and must not exit, while it is inside a function of the other side.
  *  - Ownership. A `const wl_value *` and a `const char *` are borrowed: the receiver reads them until its
- * call returns, or until the time that is given, and copies what it needs longer. A `wl_value *` is owned by
- *    who holds it, and returning it or giving it to a function that says so passes it on.
+ *    call returns, or until the time that is given, and copies what it needs longer. A `wl_value *` is owned
+ *    by who holds it, and returning it or giving it to a function that says so passes it on.
  *  - Text is UTF-8. What a plug-in builds can be written as an XML property list: its text has no control
- * characters but tab, line feed and carriage return, and neither U+FFFE nor U+FFFF; its dates lie in the
- * years 0000 to 9999. A borrowed value can hold anything.
+ *    characters but tab, line feed and carriage return, and neither U+FFFE nor U+FFFF; its dates lie in the
+ *    years 0000 to 9999. A borrowed value can hold anything.
  *  - Failure. No C++ exception, and no other kind of unwinding, may leave a function of either side. A
- * plug-in raises through the error slot that it is given. The host catches C++ exceptions that leave a
- * plug-in's function all the same and takes them as raised; a plug-in written in C++ does better to catch
- * them itself.
+ *    plug-in raises through the error slot that it is given. The host catches C++ exceptions that leave a
+ *    plug-in's function all the same and takes them as raised; a plug-in written in C++ does better to catch
+ *    them itself.
  *  - Growth. Every structure begins with its version or its size, as its maker knew it. New members are only
- * ever added at the end, and a reader looks at no member that lies beyond the maker's size. A change that
+ *    ever added at the end, and a reader looks at no member that lies beyond the maker's size. A change that
  *    cannot be made like this takes a new WL_DELEGATE_PLUGIN_ABI_VERSION, which a host of another version
- * refuses.
+ *    refuses.
  */
 
 #ifndef WELCOMER_DELEGATE_PLUGIN_H

@@ -16,7 +16,7 @@ class Daemon {
     Daemon() = default;
     //  input   what it reads from its standard input
     //  expect  starting has succeeded when it has printed a line that begins with this; empty: once it is
-    //  started
+    //          started
     Daemon(const std::vector<std::string>& command, const std::string& input, const std::string& expect);
     ~Daemon() { stop(); }
     Daemon(Daemon&& other) noexcept;

@@ -42,9 +42,8 @@ class AccountFile {
           _log(log) {}
 
     // Asks something of what is in the file now.
-    //  question  is given everything, which is empty when there is nothing that
-    //            can be read, and is valid only during the call; must not use
-    //            this file itself
+    //  question  is given everything, which is empty when there is nothing that can be read, and is valid
+    //            only during the call; must not use this file itself
     //  result    the question's
     template <typename Question>
     auto ask(const Question& question) {

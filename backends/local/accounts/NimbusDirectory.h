@@ -20,10 +20,9 @@ inline constexpr char kNimbusDirectoryPath[] = "/var/lib/welcomer/nimbus-directo
 //     Password          the password's hash, as crypt(3) writes it (yescrypt where this system writes it);
 //                       without one no password is right
 //     Response          dictionary: what the server answers to the right password.
-//                       "status" is an integer, 0 for success; "delegates" maps
-//                       delegate identifiers to their responses, with the aliases on
-//                       offer. Without one the answer is a status of 0; what is there and is no
-//                       dictionary cannot be read
+//                       "status" is an integer, 0 for success; "delegates" maps delegate identifiers to
+//                       their responses, with the aliases on offer. Without one the answer is a status of
+//                       0; what is there and is no dictionary cannot be read
 //     AccountError      integer: has the operation fail with this account error
 //     AccountErrorInfo  anything: goes with the account error
 //     Fails             boolean: has the operation fail although there is no account error; so does what
