@@ -108,8 +108,8 @@ Array serversOf(GVariant* settings) {
 
 // Name servers in the order that they have when they are read from a profile's settings.
 Array settingForm(std::vector<std::string> servers) {
-    std::ranges::stable_partition(
-        servers, [](const std::string& each) { return each.find(':') == std::string::npos; });
+    std::stable_partition(servers.begin(), servers.end(),
+                          [](const std::string& each) { return each.find(':') == std::string::npos; });
     return {servers.begin(), servers.end()};
 }
 
