@@ -57,7 +57,9 @@ Report& Report::fields(const std::vector<std::pair<std::string, std::string>>& f
         width = std::max(width, label.size() + kBetween);
     }
     for (const auto& [label, value] : fields) {
-        line(label + std::string(width - label.size(), ' ') + value);
+        std::string text = label;
+        text.resize(width, ' ');
+        line(text += value);
     }
     return *this;
 }

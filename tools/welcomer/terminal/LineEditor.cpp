@@ -3,49 +3,47 @@
 #include "tools/welcomer/terminal/UTF8Characters.h"
 
 #include <cstdio>
-#include <cstdlib>
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <histedit.h>
 #include <memory>
-#include <type_traits>
 
 namespace welcomer::tool {
 
 namespace {
 
 struct Library {
-    decltype(&el_init) init = nullptr;
-    decltype(&el_end) end = nullptr;
-    decltype(&el_set) set = nullptr;
-    decltype(&el_get) get = nullptr;
-    decltype(&el_gets) gets = nullptr;
-
-    bool isWhole() const { return init && end && set && get && gets; }
+    decltype(&el_init) init;
+    decltype(&el_end) end;
+    decltype(&el_set) set;
+    decltype(&el_get) get;
+    decltype(&el_gets) gets;
 };
 
+template <typename Function>
+bool find(void* handle, const char* name, Function& function) {
+    function = reinterpret_cast<Function>(dlsym(handle, name));
+    return function != nullptr;
+}
+
+std::optional<Library> load() {
+    void* const handle = dlopen("libedit.so.2", RTLD_NOW | RTLD_LOCAL);
+    Library found{};
+    const bool isWhole = handle && find(handle, "el_init", found.init) && find(handle, "el_end", found.end) &&
+                         find(handle, "el_set", found.set) && find(handle, "el_get", found.get) &&
+                         find(handle, "el_gets", found.gets);
+    return isWhole ? std::optional(found) : std::nullopt;
+}
+
 // Loaded once, and for as long as the program runs.
-const Library& library() {
-    static const Library loaded = [] {
-        Library found;
-        if (void* const handle = dlopen("libedit.so.2", RTLD_NOW | RTLD_LOCAL)) {
-            const auto find = [handle](auto& function, const char* name) {
-                function = reinterpret_cast<std::remove_reference_t<decltype(function)>>(dlsym(handle, name));
-            };
-            find(found.init, "el_init");
-            find(found.end, "el_end");
-            find(found.set, "el_set");
-            find(found.get, "el_get");
-            find(found.gets, "el_gets");
-        }
-        return found;
-    }();
+const std::optional<Library>& library() {
+    static const std::optional<Library> loaded = load();
     return loaded;
 }
 
 char* promptOf(EditLine* editor) {
     void* prompt = nullptr;
-    library().get(editor, EL_CLIENTDATA, &prompt);
+    library()->get(editor, EL_CLIENTDATA, &prompt);
     return static_cast<char*>(prompt);
 }
 
@@ -54,7 +52,7 @@ char* promptOf(EditLine* editor) {
 LineEditor::LineEditor(int terminal) : _terminal(terminal) {}
 
 bool LineEditor::isThere() const {
-    return library().isWhole();
+    return library().has_value();
 }
 
 std::optional<std::string> LineEditor::readLine(const std::string& prompt) const {
@@ -65,19 +63,19 @@ std::optional<std::string> LineEditor::readLine(const std::string& prompt) const
         return std::nullopt;
     }
     const std::unique_ptr<EditLine, decltype(&el_end)> editor(
-        library().init("welcomer", terminal.get(), terminal.get(), terminal.get()), library().end);
+        library()->init("welcomer", terminal.get(), terminal.get(), terminal.get()), library()->end);
     if (!editor) {
         return std::nullopt;
     }
     std::string shown = prompt;
-    library().set(editor.get(), EL_CLIENTDATA, shown.data());
-    library().set(editor.get(), EL_PROMPT, promptOf);
-    library().set(editor.get(), EL_EDITOR, "emacs");
-    library().set(editor.get(), EL_SIGNAL, 1);
+    library()->set(editor.get(), EL_CLIENTDATA, shown.data());
+    library()->set(editor.get(), EL_PROMPT, promptOf);
+    library()->set(editor.get(), EL_EDITOR, "emacs");
+    library()->set(editor.get(), EL_SIGNAL, 1);
     // Before the prompt: what is typed at once would still be the terminal's own, and Ctrl-D would be lost.
-    library().set(editor.get(), EL_PREP_TERM, 1);
+    library()->set(editor.get(), EL_PREP_TERM, 1);
     int count = 0;
-    const char* const line = library().gets(editor.get(), &count);
+    const char* const line = library()->gets(editor.get(), &count);
     if (!line || count <= 0) {
         return std::nullopt;
     }
