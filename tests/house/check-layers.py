@@ -25,11 +25,20 @@ FLOORS = {
     "agent": 6,
     "tools": 7,
 }
-# What the folders beside the floors may include, besides themselves.
+# What the rooms beside the floors may include, besides themselves. A room's name is a path; the longest that fits counts.
 SIDES = {
-    "backends": {"platform", "propertylist"},
+    "backends": {"platform", "propertylist", "backends/posix", "backends/local", "backends/desktop"},
+    "backends/posix": {"platform", "propertylist"},
+    "backends/network": {"platform", "propertylist"},
+    "backends/local": {"platform", "propertylist", "backends/posix", "backends/network"},
+    "backends/desktop": {"platform", "propertylist", "backends/posix", "backends/network", "backends/local"},
+    "backends/simulated": {"platform", "propertylist"},
     "examples": {"sdk"},
 }
+# Lies beside its rooms and below them: how a program asks for a platform.
+ASKED = {"backends/Backends.h"}
+# What a room shows of itself to those that may include it; the others show everything.
+SHOWN = {"backends/local": re.compile(r"/Local[^/]*\.h$")}
 # The rooms of one program, from the lowest: a room includes itself and those before it. What stands beside them may
 # include all of them.
 TOOL_ROOMS = {"tools/welcomer": ["terminal", "cli", "story", "commands"]}
@@ -38,8 +47,9 @@ TESTS = {"tests"}
 # The only files, besides tests and the backends themselves, that may choose a backend, and what is offered to them.
 PROGRAMS = re.compile(r"^(agent/main\.cpp|tools/[^/]+/main\.cpp)$")
 OFFERED = re.compile(r"^backends/(Backends|UnexpectedEnd|simulated/.+)\.h$")
+
 # What of the backends tools may use, too: the one base on the kernel, and addresses as text.
-BASE = re.compile(r"^backends/(posix/[^/]+|network/IPv4Text)\.h$")
+FOR_TOOLS = re.compile(r"^backends/(posix/[^/]+|network/IPv4Text)\.h$")
 
 SOURCES = {".h", ".hpp", ".c", ".cpp"}
 INCLUDE = re.compile(r'^\s*#\s*include\s*([<"])([^>"]+)[>"]')
@@ -49,7 +59,7 @@ STANDARD_C = {"stdbool.h", "stddef.h", "stdint.h"}
 
 
 def source_files(tree):
-    for folder in sorted([*FLOORS, *SIDES, *TESTS]):
+    for folder in sorted({room.split("/")[0] for room in [*FLOORS, *SIDES, *TESTS]}):
         for path in sorted((tree / folder).rglob("*")):
             if path.suffix in SOURCES and path.is_file():
                 yield path.relative_to(tree)
@@ -60,6 +70,29 @@ def includes(path):
         match = INCLUDE.match(line)
         if match:
             yield number, match.group(1) == '"', match.group(2)
+
+
+def side_of(path):
+    """The room beside the floors that a file is in, or None."""
+    fitting = [room for room in SIDES if path.startswith(room + "/")]
+    return max(fitting, key=len, default=None)
+
+
+def beside_the_floors(side, target):
+    """Why a file of this side may not include that one, or None."""
+    aim = side_of(target) or target.split("/")[0]
+    if aim == side or target in ASKED:
+        return None
+    if aim not in SIDES[side]:
+        return f"{side}/ includes {', '.join(sorted(SIDES[side]))} only"
+    if aim in SHOWN and side != "backends" and not SHOWN[aim].search(target):
+        return f"is not what {aim}/ shows of itself"
+    return None
+
+
+def program_of(path):
+    """The program among the tools that a file belongs to."""
+    return path.split("/")[1]
 
 
 def room_refusal(source, target):
@@ -92,14 +125,19 @@ def refusal(source, target, quoted, tree):
     aim = target.split("/")[0]
     if aim in TESTS:
         return "includes a test"
-    if aim == "backends" and room != "backends":
-        if OFFERED.match(target) and PROGRAMS.match(str(source)) or room == "tools" and BASE.match(target):
+    side = side_of(str(source))
+    if side:
+        return beside_the_floors(side, target)
+    if aim == "backends":
+        if OFFERED.match(target) and PROGRAMS.match(str(source)):
+            return None
+        if room == "tools" and FOR_TOOLS.match(target):
             return None
         return "chooses a backend; only a program's main.cpp does"
+    if aim == "tools" and room == "tools" and program_of(target) not in (program_of(str(source)), "shared"):
+        return "belongs to another program"
     if aim == room:
         return room_refusal(source, target)
-    if room in SIDES:
-        return None if aim in SIDES[room] else f"{room}/ includes {', '.join(sorted(SIDES[room]))} only"
     if FLOORS[aim] >= FLOORS[room]:
         return f"{aim}/ (floor {FLOORS[aim]}) is not below {room}/ (floor {FLOORS[room]})"
     return None

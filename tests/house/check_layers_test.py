@@ -46,7 +46,34 @@ class CheckLayers(unittest.TestCase):
         self.assert_one({"log/A.h": '#include "log/B.h"\n', "log/B.h": '#include "log/A.h"\n'}, "include cycle")
 
     def test_a_backend_that_includes_the_system_is_found(self):
-        self.assert_one({"backends/local/A.h": '#include "log/B.h"\n', "log/B.h": ""}, "backends/ includes")
+        self.assert_one({"backends/local/A.h": '#include "log/B.h"\n', "log/B.h": ""}, "backends/local/ includes")
+
+    def test_the_sides_have_floors_of_their_own(self):
+        names = ("posix/P", "network/N", "local/LocalL", "desktop/D", "simulated/S")
+        headers = {f"backends/{name}.h": "" for name in names}
+        allowed = {"posix": (), "network": (), "simulated": (), "local": ("posix", "network"),
+                   "desktop": ("posix", "network", "local")}
+        for name in names:
+            side = name.split("/")[0]
+            for other in names:
+                aim = other.split("/")[0]
+                source = {f"backends/{side}/A.cpp": f'#include "backends/{other}.h"\n'}
+                with self.subTest(side=side, aim=aim):
+                    found = self.findings({**headers, **source})
+                    self.assertEqual(len(found), 0 if aim == side or aim in allowed[side] else 1, found)
+
+    def test_the_desktop_sees_only_what_the_embedded_default_shows(self):
+        source = {"backends/desktop/A.cpp": '#include "backends/local/accounts/AccountFile.h"\n'}
+        self.assert_one({"backends/local/accounts/AccountFile.h": "", **source}, "shows of itself")
+
+    def test_what_asks_for_a_platform_lies_below_what_builds_it(self):
+        for side in ("local", "desktop"):
+            source = {f"backends/{side}/A.cpp": '#include "backends/Backends.h"\n'}
+            self.assertEqual(self.findings({"backends/Backends.h": "", **source}), [])
+
+    def test_no_tool_includes_another(self):
+        source = {"tools/welcomer/A.cpp": '#include "tools/resolver-sync/B.h"\n#include "tools/shared/C.h"\n'}
+        self.assert_one({"tools/resolver-sync/B.h": "", "tools/shared/C.h": "", **source}, "another program")
 
     def test_only_a_program_chooses_a_backend(self):
         backend = {"backends/Backends.h": ""}

@@ -2,7 +2,7 @@
 
 #include "backends/desktop/network/NetworkManagerDevices.h"
 #include "backends/desktop/network/NetworkManagerServices.h"
-#include "backends/local/network/KernelNetwork.h"
+#include "backends/posix/KernelNetwork.h"
 
 #include <algorithm>
 #include <set>
@@ -141,7 +141,7 @@ bool hasRouteOf(const std::string& device, const IPv4Configuration& configuratio
     if (configuration.method != Method::Manual || !configuration.router) {
         return true;
     }
-    local::KernelNetwork kernel;
+    posix::KernelNetwork kernel;
     const auto link = kernel.linkNamed(device);
     return link && std::ranges::any_of(kernel.defaultRoutes(), [&](const posix::KernelRoute& route) {
                return route.linkIndex == link->index;

@@ -3,9 +3,9 @@
 #pragma once
 
 #include "backends/local/network/DHCPClient.h"
-#include "backends/local/network/KernelNetwork.h"
 #include "backends/network/IPv4Configuration.h"
 #include "backends/network/NameServerService.h"
+#include "backends/posix/KernelNetwork.h"
 #include "backends/posix/RootFolder.h"
 
 #include <cstdint>
@@ -54,7 +54,7 @@ class KernelApplier {
     const posix::RootFolder _root;
     const DHCPClient _client;
     network::NameServerService* const _nameServers;
-    KernelNetwork _kernel;
+    posix::KernelNetwork _kernel;
 };
 
 } // namespace welcomer::local

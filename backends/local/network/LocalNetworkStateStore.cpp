@@ -1,9 +1,9 @@
 #include "backends/local/network/LocalNetworkStateStore.h"
 
-#include "backends/local/network/KernelNetwork.h"
 #include "backends/local/network/NetworkFile.h"
 #include "backends/local/network/ResolverFile.h"
 #include "backends/network/IPv4Text.h"
+#include "backends/posix/KernelNetwork.h"
 #include "platform/NetworkConfigStore.h"
 
 #include <algorithm>
@@ -116,7 +116,7 @@ class Connection final : public platform::NetworkStateConnection {
     std::mutex _mutex;
     const NetworkFile _file;
     const ResolverFile _resolver;
-    KernelNetwork _kernel;
+    posix::KernelNetwork _kernel;
     Value _read;
 };
 

@@ -1,7 +1,7 @@
 #include "backends/local/network/MachineInterfaces.h"
 
-#include "backends/local/network/KernelNetwork.h"
 #include "backends/local/network/WirelessLinks.h"
+#include "backends/posix/KernelNetwork.h"
 
 #include <algorithm>
 #include <array>
@@ -98,7 +98,7 @@ class LocalInterface final : public platform::NetworkInterface {
 } // namespace
 
 std::vector<MachineLink> listMachineLinks() {
-    return listMachineLinks(KernelNetwork().links(), wirelessLinks());
+    return listMachineLinks(posix::KernelNetwork().links(), wirelessLinks());
 }
 
 std::vector<MachineLink> listMachineLinks(const std::vector<posix::KernelLink>& links,
