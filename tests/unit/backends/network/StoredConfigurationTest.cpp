@@ -243,7 +243,7 @@ TEST_F(StoredConfigurationTest, ChangesAreMadeToWhatIsStoredByThen) {
     EXPECT_TRUE(first->commitChanges());
     EXPECT_TRUE(second->commitChanges());
     EXPECT_EQ(onDisk(), (Protocols{{kIPv4, manual("192.0.2.7")}, {kDNS, servers("192.0.2.53")}}));
-    EXPECT_TRUE(second->applyChanges());
+    ASSERT_TRUE(second->applyChanges());
     EXPECT_EQ(disk.applied.back().second.address, 0xC0000207U); // that of the first, whole
 }
 
@@ -251,14 +251,14 @@ TEST_F(StoredConfigurationTest, WhatIsStoredAndMakesNoSenseIsPassedOver) {
     disk.services->front().protocols = {{kIPv4, manual("nonsense")}, {kDNS, servers("nonsense")}};
     const auto connection = open();
     ipv4(*connection)->setConfiguration(manual("192.0.2.7"));
-    EXPECT_TRUE(connection->commitChanges()) << connection->lastErrorText();
-    EXPECT_TRUE(connection->applyChanges());
+    ASSERT_TRUE(connection->commitChanges()) << connection->lastErrorText();
+    ASSERT_TRUE(connection->applyChanges());
     EXPECT_TRUE(disk.applied.back().second.servers.empty());
     disk.services->back().protocols = {{kIPv4, manual("nonsense")}, {kDNS, std::nullopt}};
     connection->synchronize();
     service(*connection, 1)->copyProtocol(kDNS)->setConfiguration(servers("192.0.2.53"));
-    EXPECT_TRUE(connection->commitChanges()) << connection->lastErrorText();
-    EXPECT_TRUE(connection->applyChanges());
+    ASSERT_TRUE(connection->commitChanges()) << connection->lastErrorText();
+    ASSERT_TRUE(connection->applyChanges());
     EXPECT_EQ(disk.applied.back().second.method, IPv4Configuration::Method::Unset);
     EXPECT_EQ(disk.applied.back().second.servers, (std::vector<std::string>{"192.0.2.53"}));
 }
