@@ -95,10 +95,11 @@ int KernelApplier::_setAddress(const IPv4Configuration& configuration, int linkI
         return error == 0 && route ? _kernel.addDefaultRoute(*route) : error;
     };
     int error = add();
+    bool isRemoved = false;
     if (error == 0) {
-        error = _removeOthers(linkIndex, address, route);
+        error = _removeOthers(linkIndex, address, route, isRemoved);
     }
-    return error == 0 ? add() : error; // what was removed may have taken these along
+    return error == 0 && isRemoved ? add() : error; // what was removed may have taken these along
 }
 
 std::int32_t KernelApplier::_startClient(const IPv4Configuration& configuration,
@@ -106,7 +107,8 @@ std::int32_t KernelApplier::_startClient(const IPv4Configuration& configuration,
     if (!_client.isInstalled()) {
         return platform::kNetworkConfigNoDHCPClient;
     }
-    if (const int error = _removeOthers(link.index, std::nullopt, std::nullopt)) {
+    bool isRemoved = false;
+    if (const int error = _removeOthers(link.index, std::nullopt, std::nullopt, isRemoved)) {
         return statusOf(error);
     }
     DHCPRequest request{link.name, std::nullopt, configuration.servers};
@@ -117,8 +119,9 @@ std::int32_t KernelApplier::_startClient(const IPv4Configuration& configuration,
 }
 
 // Removes the link's addresses and default routes but those to be kept.
+//  isRemoved  receives whether an address was removed, which may take other things along
 int KernelApplier::_removeOthers(int linkIndex, const std::optional<posix::KernelAddress>& address,
-                                 const std::optional<posix::KernelRoute>& route) {
+                                 const std::optional<posix::KernelRoute>& route, bool& isRemoved) {
     std::vector<posix::KernelRoute> routes;
     int error = _kernel.listDefaultRoutes(routes);
     for (const posix::KernelRoute& each : routes) {
@@ -132,6 +135,7 @@ int KernelApplier::_removeOthers(int linkIndex, const std::optional<posix::Kerne
     for (const posix::KernelAddress& each : addresses) {
         if (error == 0 && each != address) {
             error = _kernel.removeAddress(each);
+            isRemoved = true;
         }
     }
     return error;

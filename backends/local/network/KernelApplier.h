@@ -47,7 +47,7 @@ class KernelApplier {
     int _setAddress(const network::IPv4Configuration& configuration, int linkIndex);
     std::int32_t _startClient(const network::IPv4Configuration& configuration, const posix::KernelLink& link);
     int _removeOthers(int linkIndex, const std::optional<posix::KernelAddress>& address,
-                      const std::optional<posix::KernelRoute>& route);
+                      const std::optional<posix::KernelRoute>& route, bool& isRemoved);
     std::int32_t _setServers(const std::vector<std::string>& servers, const std::string& device,
                              std::string& detail);
 
