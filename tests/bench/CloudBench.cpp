@@ -9,8 +9,10 @@
 #include "cloud/NimbusTesselDelegate.h"
 #include "cloud/WLNimbusServiceCatalogue.h"
 #include "cloud/WLNimbusSetupWithDictionary.h"
+#include "plugins/WLFirstRunDelegateConfiguration.h"
 #include "plugins/WLNimbusDelegatesRequest.h"
 #include "propertylist/PropertyListWriter.h"
+#include "tests/fakes/PluginRegistry.h"
 
 #include <benchmark/benchmark.h>
 
@@ -185,15 +187,17 @@ class RequestingDelegate final : public WLFirstRunDelegateConfiguration {
 };
 
 void buildRequest(benchmark::State& benchmarkState) {
+    const Fixture fixture({}, kQuickHash);
     DelegatePluginArray plugins;
     for (std::int64_t number = 0; number < benchmarkState.range(0); ++number) {
         plugins.push_back(
             std::make_shared<RequestingDelegate>("com.corvid.bench.number" + std::to_string(number)));
     }
+    fakes::fillPluginRegistry(std::move(plugins));
     for ([[maybe_unused]] auto _ : benchmarkState) {
-        benchmark::DoNotOptimize(
-            WLNimbusDelegatesRequest({}, {}, [&]() -> const DelegatePluginArray& { return plugins; }));
+        benchmark::DoNotOptimize(WLNimbusDelegatesRequest({}, {}));
     }
+    fakes::fillPluginRegistry({});
 }
 BENCHMARK(buildRequest)->Arg(1)->Arg(10)->Arg(100)->Arg(1000)->Unit(benchmark::kMicrosecond);
 
