@@ -52,9 +52,7 @@ struct CredentialOutcome {
     // status says all that there is to say.
     std::string detail = {};
 
-    friend bool operator==(const CredentialOutcome& outcome, std::int32_t status) {
-        return outcome.status == status;
-    }
+    bool operator==(std::int32_t other) const { return status == other; }
 };
 
 // The text of an outcome, for people: that of its status, and its detail. Any thread.

@@ -288,6 +288,9 @@ Outcome StoredService::rebase(Protocols stored, IPv4Configuration& configuration
                           [](const auto& values) { return readIPv4Configuration(std::nullopt, values); });
     IPv4Reading reading = readIPv4Configuration(ipv4, dns);
     configuration = std::move(reading.configuration);
+    if (!reading && device) {
+        reading.detail = reading.detail.empty() ? *device : *device + ": " + reading.detail;
+    }
     return {reading.status, std::move(reading.detail)};
 }
 

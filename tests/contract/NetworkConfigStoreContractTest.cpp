@@ -249,7 +249,7 @@ TEST_P(NetworkConfigStoreContractTest, WhatWasRefusedStandsInNobodysWay) {
     const Dictionary good = manual("192.0.2.7", "255.255.255.0", "192.0.2.1");
     EXPECT_EQ(refusal("eth7", good, {{"ServerAddresses", Array{"nonsense"}}}),
               platform::kNetworkConfigInvalid);
-    EXPECT_NE(errorText.find("(name server \"nonsense\")"), std::string::npos) << errorText;
+    EXPECT_NE(errorText.find("(eth7: name server \"nonsense\")"), std::string::npos) << errorText;
     EXPECT_EQ(configure("eth7", good), 0);
     EXPECT_EQ(addresses("eth7"), "192.0.2.7/24\n");
     // On one connection, too.

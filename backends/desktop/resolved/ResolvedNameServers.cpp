@@ -83,7 +83,7 @@ class Conversation {
 
     const Clock::time_point _end = Clock::now() + kPatience;
     std::unique_ptr<sd_bus, CloseBus> _bus;
-    sd_bus_error _error = SD_BUS_ERROR_NULL;
+    sd_bus_error _error{};
 };
 
 // Adds an address, which was checked, as its family and its bytes. A zone goes: it is the link's.

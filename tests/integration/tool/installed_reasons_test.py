@@ -121,7 +121,7 @@ class Network(ToolsReasons):
     def test_a_configuration_that_makes_no_sense_names_the_device(self):
         apply = [word.replace("192.0.2.7", "nonsense") for word in self.APPLY]
         self.fails(self.machine.run(apply),
-                   self.NOT_CONFIGURED + r"an address, .* makes no sense \(eth7\)")
+                   self.NOT_CONFIGURED + r"an address, .* makes no sense \(eth7: address \"nonsense\"\)")
 
 
 class Switch(ToolsReasons):

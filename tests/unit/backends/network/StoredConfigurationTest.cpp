@@ -175,7 +175,7 @@ TEST_F(StoredConfigurationTest, WhatMakesNoSenseIsRefusedAndNamed) {
     EXPECT_TRUE(ipv4(*connection)->setConfiguration(manual("192.0.2.255")));
     EXPECT_FALSE(connection->commitChanges());
     EXPECT_EQ(connection->lastErrorCode(), platform::kNetworkConfigInvalid);
-    EXPECT_NE(connection->lastErrorText().find("(address 192.0.2.255/24)"), std::string::npos);
+    EXPECT_NE(connection->lastErrorText().find("(eth7: address 192.0.2.255/24)"), std::string::npos);
     EXPECT_EQ(onDisk(), defaultProtocols());
 }
 

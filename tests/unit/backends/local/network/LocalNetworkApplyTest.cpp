@@ -91,7 +91,7 @@ TEST_F(LocalNetworkApplyTest, ARouterThatTheKernelWouldRefuseIsRefusedBeforeAndT
     EXPECT_EQ(refusal("eth7", manual("192.0.2.7", "255.255.255.0", "198.51.100.1")),
               platform::kNetworkConfigInvalid);
     EXPECT_EQ(errorText, "an address, a subnet mask, a router or a name server is missing or makes no sense "
-                         "(router \"198.51.100.1\")");
+                         "(eth7: router \"198.51.100.1\")");
     EXPECT_EQ(addresses("eth7"), "10.0.0.9/8\n");
     EXPECT_EQ(defaultRoutes(), "default via 10.0.0.1 dev eth7\n");
 }
