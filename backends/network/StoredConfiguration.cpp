@@ -208,7 +208,8 @@ class Service final : public Handle<platform::NetworkService> {
 
     std::optional<std::vector<std::shared_ptr<platform::NetworkProtocol>>> copyProtocols() override {
         const StoredService* const service = _core->find(_serviceID);
-        if (!_core->keep(service ? platform::kNetworkConfigSuccess : platform::kNetworkConfigNotFound)) {
+        _core->keep(service ? platform::kNetworkConfigSuccess : platform::kNetworkConfigNotFound);
+        if (!service) {
             return std::nullopt;
         }
         std::vector<std::shared_ptr<platform::NetworkProtocol>> protocols;
