@@ -48,8 +48,9 @@ struct ModuleEntry {
 
     // Makes the service that stands in front of the local one. Called once, on the thread that first asks for
     // it.
-    //  local   what serves where the desktop's service does not, or null where there is no such thing;
-    //  borrowed result  null when the desktop's service is not there: `whyNot` then says why, in one line
+    //  local   what serves where the desktop's service does not, or null where there is no such
+    //          thing; borrowed
+    //  result  null when the desktop's service is not there: `whyNot` then says why, in one line
     std::unique_ptr<Interface> (*create)(Interface* local, const Arguments& arguments, std::string& whyNot);
 
     // Says how the backend serves now: fills `backend`, `reason` and `advice`. May block while the desktop's

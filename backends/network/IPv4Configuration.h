@@ -27,8 +27,7 @@ struct IPv4Configuration {
     std::optional<int> prefixLength;   // 1 to 32; there with an address
     std::optional<IPv4Address> router; // lies on the address's network; there at most with an address
     std::string clientID;              // empty: none; with DHCP alone
-    std::vector<std::string>
-        servers; // name servers, IPv4 or IPv6, with any method; empty: none are asked for
+    std::vector<std::string> servers;  // name servers of both kinds, with any method; empty: none are set
 
     bool hasAddress() const { return method == Method::Inform || method == Method::Manual; }
     friend bool operator==(const IPv4Configuration&, const IPv4Configuration&) = default;

@@ -5,7 +5,6 @@
 #include "handoff/LaunchAgentFile.h"
 #include "handoff/ReplayItem.h"
 #include "handoff/WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup.h"
-#include "platform/Path.h"
 #include "platform/Platform.h"
 #include "plugins/DelegateIdentifiers.h"
 #include "plugins/WLNimbusDelegatesRequest.h"
@@ -90,9 +89,7 @@ void SetupFlow::checkNothingIsWaiting(bool storesLocally) {
         throw CommandFailure("cannot tell whether a replay item is waiting for the next login already: " +
                              platform::credentialStatusText(status) + storingAdvice(status));
     }
-    const std::string agent =
-        platform::joinPath(platform.processIdentity.homeDirectory(),
-                           std::string("Library/LaunchAgents/") + kLaunchAgentLabel + ".plist");
+    const std::string agent = launchAgentPath(platform.processIdentity.homeDirectory());
     if (platform.fileSystem.exists(agent)) {
         throw CommandFailure("the agent is installed already: " + agent);
     }

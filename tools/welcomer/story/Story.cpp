@@ -125,10 +125,6 @@ class Story {
         return below;
     }
 
-    std::string _launchAgentPath() const {
-        return _home + "/Library/LaunchAgents/" + kLaunchAgentLabel + ".plist";
-    }
-
     // The home folder, the plug-ins and the setup application, as a machine would have them.
     void _prepare() {
         const ExampleFiles examples = findExampleFiles();
@@ -184,7 +180,7 @@ class Story {
         }
         _say(std::string("  The replay item is stored for ") + kExampleAccount + ", with " +
              std::to_string(setup.result["delegates"].size()) + " responses.");
-        _say("  The launch agent is installed: " + _launchAgentPath());
+        _say("  The launch agent is installed: " + launchAgentPath(_home));
         _showServices(setup.services);
         return setup;
     }
@@ -221,7 +217,7 @@ class Story {
 
     LeftOnDisk _look() {
         LeftOnDisk left;
-        left.launchAgent = _owner->platform().fileSystem.exists(_launchAgentPath());
+        left.launchAgent = _owner->platform().fileSystem.exists(launchAgentPath(_home));
         left.replayItem = WLGetNimbusReplayKeychainItem(nullptr, nullptr);
         left.services = _services();
         const fs::path home = _below(_home);
