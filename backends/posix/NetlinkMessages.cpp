@@ -1,8 +1,8 @@
 #include "backends/posix/NetlinkMessages.h"
 
+#include <algorithm>
 #include <arpa/inet.h>
 #include <cstring>
-#include <libmnl/libmnl.h>
 #include <linux/if_addr.h>
 #include <linux/if_link.h>
 #include <linux/rtnetlink.h>
@@ -17,15 +17,27 @@ constexpr unsigned int kLowerUp = 1U << 16U; // IFF_LOWER_UP, which <net/if.h> h
 // The structure that a message begins with, or null when it is too short for that.
 template <class Body>
 const Body* bodyOf(const nlmsghdr& message) {
-    const bool isThere = mnl_nlmsg_get_payload_len(&message) >= sizeof(Body);
-    return isThere ? static_cast<const Body*>(mnl_nlmsg_get_payload(&message)) : nullptr;
+    const bool isThere = message.nlmsg_len >= NLMSG_LENGTH(sizeof(Body));
+    return isThere ? static_cast<const Body*>(NLMSG_DATA(&message)) : nullptr;
 }
 
 // The attributes behind that structure.
 template <class Body, class Take>
 bool readAttributesBehind(const nlmsghdr& message, const Take& take) {
-    return readAttributes(mnl_nlmsg_get_payload_offset(&message, sizeof(Body)),
-                          mnl_nlmsg_get_payload_len(&message) - sizeof(Body), take);
+    constexpr std::size_t kBegin = NLMSG_SPACE(sizeof(Body));
+    return message.nlmsg_len <= kBegin ||
+           readAttributes(reinterpret_cast<const char*>(&message) + kBegin, message.nlmsg_len - kBegin, take);
+}
+
+// A number of that size, or 0 when it is none.
+template <class Number>
+Number valueIn(const nlattr& attribute) {
+    const std::string_view data = dataIn(attribute);
+    Number number = 0;
+    if (data.size() == sizeof number) {
+        std::memcpy(&number, data.data(), sizeof number);
+    }
+    return number;
 }
 
 int indexIn(const nlattr& attribute) {
@@ -33,14 +45,15 @@ int indexIn(const nlattr& attribute) {
 }
 
 std::optional<IPv4Address> addressIn(const nlattr& attribute) {
-    const bool isAddress = mnl_attr_get_payload_len(&attribute) == sizeof(IPv4Address);
+    const bool isAddress = dataIn(attribute).size() == sizeof(IPv4Address);
     return isAddress ? std::optional(ntohl(numberIn(attribute))) : std::nullopt;
 }
 
 // What a route with several hops says: the first one, and whether others are on other links.
 void readHops(const nlattr& hops, KernelRoute& route) {
-    const auto* hop = static_cast<const rtnexthop*>(mnl_attr_get_payload(&hops));
-    int size = mnl_attr_get_payload_len(&hops);
+    const std::string_view data = dataIn(hops);
+    const auto* hop = reinterpret_cast<const rtnexthop*>(data.data());
+    int size = static_cast<int>(data.size());
     while (size >= static_cast<int>(sizeof *hop) && RTNH_OK(hop, size)) {
         if (route.linkIndex == 0) {
             route.linkIndex = hop->rtnh_ifindex;
@@ -64,30 +77,34 @@ bool KernelLink::isActive() const {
 
 bool readAttributes(const void* begin, std::size_t size,
                     const std::function<void(int type, const nlattr& attribute)>& take) {
-    const auto* attribute = static_cast<const nlattr*>(begin);
-    const auto left = [&] {
-        return static_cast<int>(static_cast<const char*>(begin) + size -
-                                reinterpret_cast<const char*>(attribute));
-    };
-    for (; mnl_attr_ok(attribute, left()); attribute = mnl_attr_next(attribute)) {
-        take(mnl_attr_get_type(attribute), *attribute);
+    std::string_view left(static_cast<const char*>(begin), size);
+    while (left.size() >= NLA_HDRLEN) {
+        const auto* const attribute = reinterpret_cast<const nlattr*>(left.data());
+        if (attribute->nla_len < NLA_HDRLEN || attribute->nla_len > left.size()) {
+            return false;
+        }
+        take(attribute->nla_type & NLA_TYPE_MASK, *attribute);
+        left.remove_prefix(std::min<std::size_t>(NLA_ALIGN(attribute->nla_len), left.size()));
     }
-    return left() <= 0;
+    return left.empty();
+}
+
+std::string_view dataIn(const nlattr& attribute) {
+    return {reinterpret_cast<const char*>(&attribute) + NLA_HDRLEN,
+            static_cast<std::size_t>(attribute.nla_len - NLA_HDRLEN)};
 }
 
 std::uint32_t numberIn(const nlattr& attribute) {
-    const bool isNumber = mnl_attr_get_payload_len(&attribute) == sizeof(std::uint32_t);
-    return isNumber ? mnl_attr_get_u32(&attribute) : 0;
+    return valueIn<std::uint32_t>(attribute);
 }
 
 std::uint16_t shortNumberIn(const nlattr& attribute) {
-    const bool isNumber = mnl_attr_get_payload_len(&attribute) == sizeof(std::uint16_t);
-    return isNumber ? mnl_attr_get_u16(&attribute) : std::uint16_t{0};
+    return valueIn<std::uint16_t>(attribute);
 }
 
 std::string textIn(const nlattr& attribute) {
-    const char* const text = mnl_attr_get_str(&attribute);
-    return {text, ::strnlen(text, mnl_attr_get_payload_len(&attribute))};
+    const std::string_view text = dataIn(attribute);
+    return std::string(text.substr(0, text.find('\0')));
 }
 
 std::optional<KernelLink> readLink(const nlmsghdr& message) {
@@ -110,7 +127,7 @@ std::optional<KernelLink> readLink(const nlmsghdr& message) {
         } else if (type == IFLA_MASTER) {
             link.masterIndex = indexIn(each);
         } else if (type == IFLA_LINKINFO) {
-            readAttributes(mnl_attr_get_payload(&each), mnl_attr_get_payload_len(&each),
+            readAttributes(dataIn(each).data(), dataIn(each).size(),
                            [&](int inner, const nlattr& information) {
                                if (inner == IFLA_INFO_KIND) {
                                    link.kind = textIn(information);
@@ -171,10 +188,9 @@ std::optional<KernelRoute> readDefaultRoute(const nlmsghdr& message) {
 }
 
 NetlinkRequest::NetlinkRequest(std::uint16_t type, std::uint16_t flags, std::string_view payload)
-    : _bytes(MNL_NLMSG_HDRLEN) {
-    nlmsghdr* const header = mnl_nlmsg_put_header(_bytes.data());
-    header->nlmsg_type = type;
-    header->nlmsg_flags = static_cast<std::uint16_t>(flags | NLM_F_REQUEST);
+    : _bytes(NLMSG_HDRLEN) {
+    message().nlmsg_type = type;
+    message().nlmsg_flags = static_cast<std::uint16_t>(flags | NLM_F_REQUEST);
     _append(payload);
 }
 
@@ -187,25 +203,26 @@ void NetlinkRequest::addAddress(std::uint16_t type, IPv4Address address) {
 }
 
 void NetlinkRequest::addText(std::uint16_t type, const std::string& text) {
-    _bytes.resize(message().nlmsg_len + MNL_ATTR_HDRLEN + MNL_ALIGN(text.size() + 1));
-    mnl_attr_put_strz(&message(), type, text.c_str());
+    const std::size_t size = text.size() + 1;
+    addBody(nlattr{static_cast<std::uint16_t>(NLA_HDRLEN + size), type});
+    _append({text.c_str(), size});
 }
 
 std::size_t NetlinkRequest::_open(std::uint16_t type) {
-    const std::size_t begin = message().nlmsg_len;
-    _bytes.resize(begin + MNL_ATTR_HDRLEN);
-    mnl_attr_put(&message(), type, 0, nullptr);
+    const std::size_t begin = _bytes.size();
+    addBody(nlattr{NLA_HDRLEN, type});
     return begin;
 }
 
 void NetlinkRequest::_close(std::size_t begin) {
-    mnl_attr_nest_end(&message(), reinterpret_cast<nlattr*>(_bytes.data() + begin));
+    reinterpret_cast<nlattr*>(_bytes.data() + begin)->nla_len =
+        static_cast<std::uint16_t>(_bytes.size() - begin);
 }
 
 void NetlinkRequest::_append(std::string_view data) {
-    const std::size_t begin = message().nlmsg_len;
-    _bytes.resize(begin + MNL_ALIGN(data.size()));
-    data.copy(static_cast<char*>(mnl_nlmsg_put_extra_header(&message(), data.size())), data.size());
+    _bytes.insert(_bytes.end(), data.begin(), data.end());
+    _bytes.resize(NLMSG_ALIGN(_bytes.size())); // what comes next begins where it may
+    message().nlmsg_len = static_cast<std::uint32_t>(_bytes.size());
 }
 
 } // namespace welcomer::posix

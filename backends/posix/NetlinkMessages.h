@@ -62,8 +62,9 @@ std::optional<KernelRoute> readDefaultRoute(const nlmsghdr& message);
 bool readAttributes(const void* begin, std::size_t size,
                     const std::function<void(int type, const nlattr& attribute)>& take);
 
-// What an attribute holds: a number, which is 0 when it is none of that size, and a text, which may or may
-// not end with a zero byte.
+// What an attribute holds: the bytes, which live as long as its message; a number, which is 0 when it is none of
+// that size; and a text, which may or may not end with a zero byte.
+std::string_view dataIn(const nlattr& attribute);
 std::uint32_t numberIn(const nlattr& attribute);
 std::uint16_t shortNumberIn(const nlattr& attribute);
 std::string textIn(const nlattr& attribute);
@@ -105,7 +106,7 @@ class NetlinkRequest {
     void _close(std::size_t begin);
     void _append(std::string_view data);
 
-    std::vector<char> _bytes; // at least the message, which says its own length
+    std::vector<char> _bytes; // the message, which says its own length
 };
 
 } // namespace welcomer::posix

@@ -1,7 +1,8 @@
 #include "backends/posix/NetlinkSocket.h"
 
+#include "backends/posix/Libmnl.h"
+
 #include <cerrno>
-#include <libmnl/libmnl.h>
 #include <sys/socket.h>
 #include <sys/time.h>
 
@@ -21,7 +22,7 @@ int showMessage(const nlmsghdr* message, void* take) {
 } // namespace
 
 void NetlinkSocket::Close::operator()(mnl_socket* socket) const {
-    mnl_socket_close(socket);
+    libmnl()->socketClose(socket);
 }
 
 int NetlinkSocket::ask(NetlinkRequest& request, const Take& take) {
@@ -43,15 +44,16 @@ int NetlinkSocket::_exchange(nlmsghdr& request, const Take& take) {
         return error;
     }
     request.nlmsg_seq = ++_sequence;
-    int result = mnl_socket_sendto(_socket.get(), &request, request.nlmsg_len) < 0 ? MNL_CB_ERROR : MNL_CB_OK;
+    int result =
+        libmnl()->socketSendto(_socket.get(), &request, request.nlmsg_len) < 0 ? MNL_CB_ERROR : MNL_CB_OK;
     while (result == MNL_CB_OK) {
-        const ssize_t size = mnl_socket_recvfrom(_socket.get(), _buffer.data(), _buffer.size());
+        const ssize_t size = libmnl()->socketRecvfrom(_socket.get(), _buffer.data(), _buffer.size());
         if (size < 0 && errno == EINTR) {
             continue; // a signal; a list that has changed meanwhile is told in a message
         }
         result = size < 0 ? MNL_CB_ERROR
-                          : mnl_cb_run(_buffer.data(), static_cast<std::size_t>(size), _sequence, 0,
-                                       showMessage, const_cast<Take*>(&take));
+                          : libmnl()->cbRun(_buffer.data(), static_cast<std::size_t>(size), _sequence, 0,
+                                            showMessage, const_cast<Take*>(&take));
     }
     const int error = result == MNL_CB_ERROR ? errno : 0;
     if (error != 0) {
@@ -64,16 +66,20 @@ int NetlinkSocket::_open() {
     if (_socket) {
         return 0;
     }
-    _socket.reset(mnl_socket_open2(_protocol, SOCK_CLOEXEC));
-    if (!_socket || mnl_socket_bind(_socket.get(), 0, MNL_SOCKET_AUTOPID) != 0) {
+    const Libmnl* const mnl = libmnl();
+    if (!mnl) {
+        return ELIBACC;
+    }
+    _socket.reset(mnl->socketOpen2(_protocol, SOCK_CLOEXEC));
+    if (!_socket || mnl->socketBind(_socket.get(), 0, MNL_SOCKET_AUTOPID) != 0) {
         const int error = errno;
         _socket.reset();
         return error;
     }
     int on = 1;
     // Has the kernel heed filters; one that cannot lists more, which is looked through where it is asked.
-    mnl_socket_setsockopt(_socket.get(), NETLINK_GET_STRICT_CHK, &on, sizeof on);
-    ::setsockopt(mnl_socket_get_fd(_socket.get()), SOL_SOCKET, SO_RCVTIMEO, &kPatience, sizeof kPatience);
+    mnl->socketSetsockopt(_socket.get(), NETLINK_GET_STRICT_CHK, &on, sizeof on);
+    ::setsockopt(mnl->socketGetFd(_socket.get()), SOL_SOCKET, SO_RCVTIMEO, &kPatience, sizeof kPatience);
     _buffer.resize(kBufferSize);
     return 0;
 }
