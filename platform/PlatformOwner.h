@@ -48,6 +48,10 @@ class PlatformOwner {
 
     // How the interfaces that have more than one backend are served now. Asks every service: may block.
     virtual std::vector<platform::BackendReport> backendReports() = 0;
+
+    // The folder that plug-ins are found in now, in the place of platform::kPluginDirectory or that itself: a path
+    // of the system, below the root.
+    virtual std::string pluginFolder() const = 0;
 };
 
 } // namespace welcomer

@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "platform/PluginDirectory.h"
 #include "plugins/WLFirstRunDelegateConfiguration.h"
 
 #include <memory>
@@ -12,7 +13,7 @@
 namespace welcomer {
 
 // Where the plug-ins are, and what the names of their entries end in (compared case-sensitively).
-inline constexpr char kPluginDirectory[] = "/System/Library/CoreServices/FirstRunPlugins";
+using platform::kPluginDirectory;
 inline constexpr char kPluginExtension[] = "ncdplugin";
 
 using DelegatePluginArray = std::vector<std::shared_ptr<WLFirstRunDelegateConfiguration>>;

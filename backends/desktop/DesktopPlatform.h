@@ -28,6 +28,7 @@ class DesktopPlatform final : public PlatformOwner {
     const platform::Platform& platform() const override { return _platform; }
     platform::AccountDirectory& accountDirectory() override { return _local.accountDirectory(); }
     std::vector<platform::BackendReport> backendReports() override;
+    std::string pluginFolder() const override { return _local.pluginFolder(); }
 
   private:
     OnlineAccountSurroundings _accountSurroundings(const std::string& root);

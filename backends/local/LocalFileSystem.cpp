@@ -151,7 +151,7 @@ platform::Outcome LocalFileSystem::copy(const std::string& source, const std::st
 }
 
 std::optional<std::vector<std::string>> LocalFileSystem::list(const std::string& path) {
-    return posix::listDirectory(_root.open(path, O_RDONLY | O_DIRECTORY));
+    return posix::listDirectory(_root.open(_pluginFolder.located(path), O_RDONLY | O_DIRECTORY));
 }
 
 std::optional<std::string> LocalFileSystem::readText(const std::string& path) {

@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "backends/local/PluginFolder.h"
 #include "backends/posix/RootFolder.h"
 #include "platform/FileSystem.h"
 
@@ -9,7 +10,11 @@ namespace welcomer::local {
 
 class LocalFileSystem final : public platform::FileSystem {
   public:
-    explicit LocalFileSystem(posix::RootFolder root) : _root(std::move(root)) {}
+    explicit LocalFileSystem(const posix::RootFolder& root) : LocalFileSystem(root, PluginFolder(root)) {}
+    //  pluginFolder  what is listed in the place of the system's plug-in directory
+    LocalFileSystem(posix::RootFolder root, PluginFolder pluginFolder)
+        : _root(std::move(root)),
+          _pluginFolder(std::move(pluginFolder)) {}
 
     bool exists(const std::string& path) override;
     platform::Outcome remove(const std::string& path) override;
@@ -25,6 +30,7 @@ class LocalFileSystem final : public platform::FileSystem {
 
   private:
     const posix::RootFolder _root;
+    const PluginFolder _pluginFolder;
 };
 
 } // namespace welcomer::local

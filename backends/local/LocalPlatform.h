@@ -34,14 +34,16 @@ class LocalPlatform final : public PlatformOwner {
     const platform::Platform& platform() const override { return _platform; }
     platform::AccountDirectory& accountDirectory() override { return _accountDirectory; }
     std::vector<platform::BackendReport> backendReports() override;
+    std::string pluginFolder() const override { return _pluginFolder.serving(); }
 
   private:
     const posix::RootFolder _root;
     LocalSystemLog _systemLog;
-    LocalFileSystem _fileSystem{_root};
+    const PluginFolder _pluginFolder{_root};
+    LocalFileSystem _fileSystem{_root, _pluginFolder};
     LocalProcessIdentity _processIdentity{_root};
     LocalCredentialStore _credentialStore{_root, _processIdentity};
-    LocalPluginBundle _pluginBundle{_root};
+    LocalPluginBundle _pluginBundle{_root, _pluginFolder};
     LocalResourceBundles _resourceBundles;
     LocalClock _clock;
     LocalRunLoops _runLoops;

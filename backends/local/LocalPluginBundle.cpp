@@ -65,7 +65,8 @@ std::string lastLoaderError(const std::string& path) {
 
 } // namespace
 
-platform::PluginSymbol LocalPluginBundle::load(const std::string& path, const char* symbol) {
+platform::PluginSymbol LocalPluginBundle::load(const std::string& given, const char* symbol) {
+    const std::string path = _pluginFolder.located(given);
     const std::string shown = _root.shown(path);
     // The loader knows libraries by their paths, so that a descriptor's in /proc, whose number is used again,
     // would be taken for another's. With the root "/" it follows links as the system does.

@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "backends/local/PluginFolder.h"
 #include "backends/posix/RootFolder.h"
 #include "platform/PluginBundle.h"
 
@@ -11,12 +12,17 @@ namespace welcomer::local {
 // folder is a path in it: one that leads out of the folder, also by a symbolic link, is refused.
 class LocalPluginBundle final : public platform::PluginBundle {
   public:
-    explicit LocalPluginBundle(posix::RootFolder root) : _root(std::move(root)) {}
+    explicit LocalPluginBundle(const posix::RootFolder& root) : LocalPluginBundle(root, PluginFolder(root)) {}
+    //  pluginFolder  what plug-ins are loaded from in the place of the system's directory of them
+    LocalPluginBundle(posix::RootFolder root, PluginFolder pluginFolder)
+        : _root(std::move(root)),
+          _pluginFolder(std::move(pluginFolder)) {}
 
     platform::PluginSymbol load(const std::string& path, const char* symbol) override;
 
   private:
     const posix::RootFolder _root;
+    const PluginFolder _pluginFolder;
 };
 
 } // namespace welcomer::local
