@@ -19,16 +19,17 @@ set(WELCOMER_SYSTEMD "${CMAKE_INSTALL_PREFIX}/lib/systemd")
 string(RANDOM LENGTH 16 run)
 set(WELCOMER_INSTALLED "${WELCOMER_INSTALLED}/${run}")
 
-function(install_service_file name destination)
+# Macros, since `cmake --install` lists what was installed in a variable of its own.
+macro(install_service_file name destination)
     configure_file("${WELCOMER_PACKAGING}/${name}.in" "${WELCOMER_INSTALLED}/${name}" @ONLY)
     file(INSTALL "${WELCOMER_INSTALLED}/${name}" DESTINATION "${destination}")
-endfunction()
+endmacro()
 # install_wish(UNIT TARGET FOLDER): has a target start a unit, without anybody enabling it first.
-function(install_wish unit target folder)
+macro(install_wish unit target folder)
     file(MAKE_DIRECTORY "${WELCOMER_INSTALLED}/${target}.wants")
     file(CREATE_LINK "../${unit}" "${WELCOMER_INSTALLED}/${target}.wants/${unit}" SYMBOLIC)
     file(INSTALL "${WELCOMER_INSTALLED}/${target}.wants/${unit}" DESTINATION "${folder}/${target}.wants")
-endfunction()
+endmacro()
 
 install_service_file(welcomer-launch-agents.service "${WELCOMER_SYSTEMD}/user")
 install_wish(welcomer-launch-agents.service graphical-session.target "${WELCOMER_SYSTEMD}/user")

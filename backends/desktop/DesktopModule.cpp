@@ -1,9 +1,13 @@
 #include "backends/desktop/DesktopModule.h"
 
-#include <array>
-#include <climits>
+#include "backends/posix/Directory.h"
+#include "backends/posix/FileDescriptor.h"
+#include "generated/WelcomerConfiguration.h"
+#include "platform/Path.h"
+
 #include <cstring>
 #include <dlfcn.h>
+#include <fcntl.h>
 #include <unistd.h>
 #include <vector>
 
@@ -11,35 +15,68 @@ namespace welcomer::desktop {
 
 namespace {
 
-// The folder of the running program, or none.
-std::string programFolder() {
-    std::array<char, PATH_MAX> path{};
-    const ssize_t length = ::readlink("/proc/self/exe", path.data(), path.size());
-    if (length <= 0) {
-        return "";
+constexpr std::string_view kVersion = configuration::kVersion;
+
+// Where each version's modules have a folder: beside the library, and, for a program of the build tree that holds
+// all of it, beside that program's folder.
+std::vector<std::string> folderParents() {
+    Dl_info info = {};
+    if (::dladdr(reinterpret_cast<const void*>(&loadModule), &info) == 0 || !info.dli_fname) {
+        return {};
     }
-    const std::string program(path.data(), static_cast<std::size_t>(length));
-    return program.substr(0, program.rfind('/'));
+    const std::string path = info.dli_fname;
+    const std::string here = path.substr(0, path.rfind('/') + 1);
+    return {here + "welcomer", here + "../lib/welcomer"};
 }
 
-std::vector<std::string> moduleFolders() {
-    std::vector<std::string> folders;
-    if (const std::string program = programFolder(); !program.empty()) {
-        folders = {program + "/../lib/welcomer", program + "/" WELCOMER_MODULES_FROM_PROGRAMS};
-    }
-    folders.emplace_back(WELCOMER_MODULES_INSTALLED);
-    return folders;
+std::string fileIn(const std::string& folder, const std::string& name) {
+    return platform::joinPath(folder, name + ".so");
 }
 
+bool isThere(const std::string& path) {
+    return ::access(path.c_str(), F_OK) == 0;
+}
+
+// Empty where it is not installed.
 std::string pathOf(const std::string& name, const std::string& folder) {
-    for (const std::string& candidate : folder.empty() ? moduleFolders() : std::vector{folder}) {
-        std::string path = candidate;
-        path.append("/").append(name).append(".so");
-        if (::access(path.c_str(), F_OK) == 0) {
-            return path;
+    std::vector<std::string> candidates;
+    if (!folder.empty()) {
+        candidates.push_back(fileIn(folder, name));
+    } else {
+        for (const std::string& parent : folderParents()) {
+            candidates.push_back(fileIn(platform::joinPath(parent, std::string(kVersion)), name));
+        }
+    }
+    for (std::string& path : candidates) {
+        if (isThere(path)) {
+            return std::move(path);
         }
     }
     return "";
+}
+
+// Another version whose module is there in the place of this one's, or none.
+std::string otherVersionOf(const std::string& name) {
+    for (const std::string& parent : folderParents()) {
+        const auto versions = posix::listDirectory(
+            posix::FileDescriptor(::open(parent.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)));
+        for (const std::string& version : versions.value_or(std::vector<std::string>())) {
+            if (isThere(fileIn(platform::joinPath(parent, version), name))) {
+                return version;
+            }
+        }
+    }
+    return "";
+}
+
+// What there is to say of a module that was not found.
+ModuleOutcome missing(const std::string& name, const std::string& folder) {
+    const std::string other = folder.empty() ? otherVersionOf(name) : "";
+    if (other.empty()) {
+        return {.whyNot = "the module " + name + ".so is not installed", .isMissing = true};
+    }
+    return {.whyNot = "the module " + name + ".so of version " + std::string(kVersion) +
+                      " is not installed, but that of version " + other};
 }
 
 const char* loadingError() {
@@ -53,29 +90,32 @@ bool isModuleInstalled(const std::string& name, const std::string& folder) {
     return !pathOf(name, folder).empty();
 }
 
-const void* loadModule(const std::string& name, const std::string& folder, std::string& whyNot) {
+ModuleOutcome loadModule(const std::string& name, const std::string& folder) {
     const std::string path = pathOf(name, folder);
     if (path.empty()) {
-        whyNot = "the module " + name + ".so is not installed";
-        return nullptr;
+        return missing(name, folder);
     }
     // Never closed: libraries of the desktop leave threads and types behind that cannot be unloaded.
     void* const library = ::dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL | RTLD_NODELETE);
     if (!library) {
-        whyNot = "the module cannot be loaded: " + std::string(loadingError());
-        return nullptr;
+        return {.whyNot = "the module cannot be loaded: " + std::string(loadingError())};
     }
     const void* const entry = ::dlsym(library, kModuleEntrySymbol);
     if (!entry) {
-        whyNot = path + " is no module: " + loadingError();
-        return nullptr;
+        return {.whyNot = path + " is no module: " + loadingError()};
     }
     const char* const build = *static_cast<const char* const*>(entry); // its first member
     if (std::strcmp(build, WELCOMER_MODULE_BUILD) != 0) {
-        whyNot = path + " is of another build: " + build;
-        return nullptr;
+        return {.whyNot = path + " is of another build: " + build};
     }
-    return entry;
+    return {.entry = entry};
+}
+
+void reportFallback(const Modules& modules, const std::string& name, const std::string& whyNot) {
+    if (modules.systemLog) {
+        modules.systemLog->write(platform::kErrorPriority,
+                                 "The desktop's " + name + " is not used, but what is local: " + whyNot);
+    }
 }
 
 } // namespace welcomer::desktop

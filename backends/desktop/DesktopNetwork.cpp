@@ -4,10 +4,10 @@
 
 namespace welcomer::desktop {
 
-DesktopNetwork::DesktopNetwork(const Kernel& kernel, const std::string& folder)
+DesktopNetwork::DesktopNetwork(const Kernel& kernel, const Modules& modules)
     : _kernel(kernel),
-      _configModule(&kernel.configStore, {}, folder),
-      _stateModule(&_kernelState, {}, folder) {}
+      _configModule(&kernel.configStore, {}, modules),
+      _stateModule(&_kernelState, {}, modules) {}
 
 std::shared_ptr<platform::NetworkConfigConnection>
 DesktopNetwork::ConfigStore::open(const std::string& name) {

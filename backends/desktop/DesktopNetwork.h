@@ -20,8 +20,7 @@ class DesktopNetwork {
         platform::HostReachability& hostReachability;
     };
 
-    //  folder  where the modules are; empty: where they are looked for anyway
-    explicit DesktopNetwork(const Kernel& kernel, const std::string& folder = "");
+    explicit DesktopNetwork(const Kernel& kernel, const Modules& modules = {});
 
     // Each loads its module when it is first used, not before. Borrowed.
     platform::NetworkConfigStore& configStore() { return _configStore; }

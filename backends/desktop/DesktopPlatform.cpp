@@ -54,21 +54,26 @@ platform::Platform withDesktop(const platform::Platform& local, platform::Creden
 } // namespace
 
 DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
-    : _local(withRunLoops(options, _runLoops)),
+    : _modules{options.systemLog ? options.systemLog : &_systemLog},
+      _runLoops(_modules),
+      _local(withRunLoops(options, _runLoops)),
       _credentialStore(posix::RootFolder(options.root), _local.platform().processIdentity,
-                       _local.platform().credentialStore, {}, newItemsOf(options)),
+                       _local.platform().credentialStore, {}, newItemsOf(options), _modules),
       _onlineAccounts(
           nullptr, {[root = posix::RootFolder(options.root), &identity = _local.platform().processIdentity] {
               const std::vector<std::string> libraries = identity.userLibraryDirectories();
               return libraries.empty()
                          ? posix::FileLock()
                          : posix::FileLock(root, posix::userLockPath(libraries.front(), kOnlineAccountsLock));
-          }}),
+          }},
+          _modules),
       _accountService(_accountSurroundings(options.root), {std::string(configuration::kOnlineAccountProvider),
                                                            std::string(configuration::kOnlineAccountServer)}),
-      _preferenceStore(_local.platform().preferenceStore),
+      _preferenceStore(_local.platform().preferenceStore, _modules),
+      _nameServers(_modules),
       _kernelConfigStore(posix::RootFolder(options.root), &_nameServers),
-      _network({_kernelConfigStore, _local.platform().networkStateStore, _local.platform().hostReachability}),
+      _network({_kernelConfigStore, _local.platform().networkStateStore, _local.platform().hostReachability},
+               _modules),
       _platform(withDesktop(
           _local.platform(), _credentialStore.store(), _preferenceStore, _accountService, _network,
           options.hostReachability ? *options.hostReachability : _network.hostReachability())) {}

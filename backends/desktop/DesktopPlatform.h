@@ -33,6 +33,8 @@ class DesktopPlatform final : public PlatformOwner {
   private:
     OnlineAccountSurroundings _accountSurroundings(const std::string& root);
 
+    local::LocalSystemLog _systemLog; // where the program has chosen no other
+    const Modules _modules;
     DesktopRunLoops _runLoops;
     local::LocalPlatform _local; // stands on _runLoops
     DesktopCredentialStore _credentialStore;

@@ -6,11 +6,12 @@
 //
 // C++ objects and exceptions cross between the two as within one program: both are built from the same
 // sources by the same compiler, which `build` makes sure of, and the process has one C++ runtime and one
-// heap. Yet a module links the system's static library for itself, which leaves these rules:
+// heap. A module links the shared library that loads it, and takes from the backends in it what is exported under
+// that version's own name: of another version's library, the loader refuses it. Yet a program that holds all
+// of the library itself, as tests do, has another copy than its modules, which leaves these rules:
 //
-//  - A module has its own copy of every static object: platform::current() is not installed there, and
-//    thread-local objects (local::LocalRunLoops) are others. A module takes what it needs from its
-//    arguments, and logs nothing.
+//  - A module asks for nothing that is kept in the library: platform::current(), thread-local objects
+//    (local::LocalRunLoops). It takes what it needs from its arguments, and logs nothing.
 //  - What a module hands to a library that calls it back is called through that library's C code: no
 //    exception may leave it.
 //  - Nothing is ever unloaded.

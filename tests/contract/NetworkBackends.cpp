@@ -68,7 +68,7 @@ class NetworkManagerBackend final : public NetworkBackend {
     KernelBackend _kernel;
     std::unique_ptr<NetworkManagerDaemon> _daemon;
     desktop::DesktopNetwork _network{{_kernel.configStore(), _kernel.stateStore(), _kernel.reachability()},
-                                     kNetworkModules};
+                                     {nullptr, kNetworkModules}};
 };
 #endif
 

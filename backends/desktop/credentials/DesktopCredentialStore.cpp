@@ -18,11 +18,12 @@ constexpr char kNone[] = "none"; // who serves where a bus cannot be asked
 DesktopCredentialStore::DesktopCredentialStore(posix::RootFolder root, platform::ProcessIdentity& identity,
                                                platform::CredentialStore& local,
                                                CredentialModule::Arguments arguments,
-                                               SearchListCredentialStore::NewItems newItems)
+                                               SearchListCredentialStore::NewItems newItems,
+                                               const Modules& modules)
     : _root(std::move(root)),
       _identity(identity),
       _local(local),
-      _module(nullptr, arguments),
+      _module(nullptr, arguments, modules),
       _store(
           {[this] { return mayHaveSessionBus() ? _module.service() : nullptr; },
            [this] {

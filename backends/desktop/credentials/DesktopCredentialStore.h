@@ -21,7 +21,8 @@ class DesktopCredentialStore {
     DesktopCredentialStore(
         posix::RootFolder root, platform::ProcessIdentity& identity, platform::CredentialStore& local,
         CredentialModule::Arguments arguments = {},
-        SearchListCredentialStore::NewItems newItems = SearchListCredentialStore::NewItems::ToTheService);
+        SearchListCredentialStore::NewItems newItems = SearchListCredentialStore::NewItems::ToTheService,
+        const Modules& modules = {});
 
     platform::CredentialStore& store() { return _store; }
 

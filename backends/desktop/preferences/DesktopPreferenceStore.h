@@ -8,6 +8,7 @@
 #include <functional>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace welcomer::desktop {
@@ -27,7 +28,9 @@ struct ScreenLockModule {
 class DesktopPreferenceStore final : public platform::PreferenceStore {
   public:
     //  local  borrowed
-    explicit DesktopPreferenceStore(platform::PreferenceStore& local) : _local(local) {}
+    explicit DesktopPreferenceStore(platform::PreferenceStore& local, Modules modules = {})
+        : _local(local),
+          _module(&_notInstalled, {}, std::move(modules)) {}
 
     std::optional<PropertyList> copyValue(const std::string& key, const std::string& domain) override;
     std::vector<std::optional<PropertyList>> copyValues(std::span<const std::string> keys,
@@ -46,7 +49,7 @@ class DesktopPreferenceStore final : public platform::PreferenceStore {
     ScreenLockModule::Interface _notInstalled = [] {
         return std::nullopt;
     };
-    DesktopModule<ScreenLockModule> _module{&_notInstalled};
+    DesktopModule<ScreenLockModule> _module;
 };
 
 } // namespace welcomer::desktop

@@ -6,14 +6,14 @@
 #include "backends/desktop/resolved/ResolvedModule.h"
 
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace welcomer::desktop {
 
 class DesktopNameServers final : public network::NameServerService {
   public:
-    //  folder  where the modules are; empty: where they are looked for anyway
-    explicit DesktopNameServers(const std::string& folder = "") : _module(nullptr, {}, folder) {}
+    explicit DesktopNameServers(Modules modules = {}) : _module(nullptr, {}, std::move(modules)) {}
 
     // Loads the module when it is first needed. Without it, the name servers are another program's.
     std::int32_t setServers(const std::string& device, const std::vector<std::string>& servers,

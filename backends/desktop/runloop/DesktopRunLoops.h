@@ -7,6 +7,8 @@
 #include "backends/desktop/runloop/RunLoopModule.h"
 #include "backends/local/time/LocalRunLoops.h"
 
+#include <utility>
+
 namespace welcomer::desktop {
 
 // The main thread's loop, once asked for, is the same until the process ends. Whoever loads plug-ins asks for
@@ -14,6 +16,8 @@ namespace welcomer::desktop {
 // the local loop.
 class DesktopRunLoops final : public platform::RunLoops {
   public:
+    explicit DesktopRunLoops(Modules modules = {}) : _module(&_local, {}, std::move(modules)) {}
+
     std::shared_ptr<platform::RunLoop> current() override;
 
     // Any thread; loads the module.
@@ -21,7 +25,7 @@ class DesktopRunLoops final : public platform::RunLoops {
 
   private:
     local::LocalRunLoops _local;
-    DesktopModule<RunLoopModule> _module{&_local};
+    DesktopModule<RunLoopModule> _module;
 };
 
 } // namespace welcomer::desktop

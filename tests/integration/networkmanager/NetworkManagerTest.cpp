@@ -141,7 +141,7 @@ class NetworkManagerTest : public testing::Test {
     local::LocalNetworkConfigStore kernelStore{posix::RootFolder(root.path())};
     local::LocalNetworkStateStore kernelStateStore{posix::RootFolder(root.path())};
     local::LocalHostReachability kernelReachability;
-    desktop::DesktopNetwork network{{kernelStore, kernelStateStore, kernelReachability}, kNetworkModules};
+    desktop::DesktopNetwork network{{kernelStore, kernelStateStore, kernelReachability}, {nullptr, kNetworkModules}};
     platform::NetworkConfigStore& store = network.configStore();
     platform::NetworkStateStore& stateStore = network.stateStore();
     platform::HostReachability& reachability = network.hostReachability();
@@ -653,7 +653,7 @@ TEST_F(NetworkManagerTest, TheReportsSayWhoServesAndWhatWouldBeNeeded) {
 TEST_F(NetworkManagerTest, WithoutTheModuleTheKernelServes) {
     shell("ip link add p-one type veth peer name p-two");
     desktop::DesktopNetwork bare({kernelStore, kernelStateStore, kernelReachability},
-                                 root.locate("/no modules"));
+                                 {nullptr, root.locate("/no modules")});
     EXPECT_EQ(bare.configStore().open("a test")->copyCurrentSet()->copyServices()->size(), 2U);
     EXPECT_EQ(bare.configStore().copyInterfaces().size(), 2U);
     EXPECT_EQ(bare.stateStore().open("a test")->copyValue(

@@ -62,8 +62,10 @@ class Try(ToolsReasons):
                    rf"cannot write /tmp/full/welcomer-try\.\w+/System/\S+\.ncdplugin: {NO_SPACE}")
 
     def test_wherever_in_the_story_the_disk_is_full(self):
-        examples = [path for folder in ("plugins", "setup-bundle")
-                    for path in (self.machine.root / "usr/local/share/welcomer" / folder).rglob("*") if path.is_file()]
+        installed = self.machine.root / "usr/local"
+        examples = [path for folder in (*installed.glob("lib*/**/welcomer/examples/plugins"),
+                                        installed / "share/welcomer/setup-bundle")
+                    for path in folder.rglob("*") if path.is_file()]
         for path in examples:
             # As a package has them; what is no library or program stays as it is.
             subprocess.run(["strip", path], check=False, stderr=subprocess.DEVNULL)

@@ -4,6 +4,7 @@
 #include "tools/welcomer/terminal/Failure.h"
 
 #include <algorithm>
+#include <utility>
 
 namespace welcomer::tool {
 
@@ -11,10 +12,13 @@ namespace fs = std::filesystem;
 
 ExampleFiles findExampleFiles() {
     const fs::path programs = fs::read_symlink("/proc/self/exe").parent_path();
+    const fs::path built = programs.parent_path();
     // The installed tree first, then the build tree.
-    for (const fs::path& folder : {programs / WELCOMER_DATA_FROM_PROGRAMS, programs.parent_path()}) {
-        ExampleFiles files{folder / "setup-bundle", {}};
-        const fs::path plugins = folder / "plugins";
+    for (const auto& [data, examples] :
+         {std::pair(programs / WELCOMER_DATA_FROM_PROGRAMS, programs / WELCOMER_EXAMPLES_FROM_PROGRAMS),
+          std::pair(built, built)}) {
+        ExampleFiles files{data / "setup-bundle", {}};
+        const fs::path plugins = examples / "plugins";
         if (!fs::is_directory(files.setupBundle) || !fs::is_directory(plugins)) {
             continue;
         }

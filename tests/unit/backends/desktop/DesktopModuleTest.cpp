@@ -1,4 +1,5 @@
 #include "backends/desktop/DesktopModule.h"
+#include "tests/fakes/FakeSystemLog.h"
 #include "tests/fixtures/modules/FixtureModule.h"
 
 #include <gtest/gtest.h>
@@ -21,7 +22,7 @@ struct Counts {
 template <int number>
 DesktopModule<VisitorModule<number>> moduleWith(Counts& counts, Visitor* local = nullptr) {
     return DesktopModule<VisitorModule<number>>(local, {&counts.created, &counts.ended},
-                                                WELCOMER_FIXTURE_MODULES);
+                                                {nullptr, WELCOMER_FIXTURE_MODULES});
 }
 
 // What loading says about a module that cannot serve.
@@ -138,6 +139,28 @@ TEST(DesktopModuleTest, ALibraryWithoutAnEntryIsNoModule) {
 
 TEST(DesktopModuleTest, AModuleThatIsNotInstalledIsSaidToBeMissing) {
     EXPECT_EQ(reasonOf<4>(), "the module missing.so is not installed");
+}
+
+TEST(DesktopModuleTest, WhyWhatIsLocalServesIsLoggedOnceUnlessNobodyHasInstalledTheModules) {
+    Counts counts;
+    fakes::CallRecorder recorder;
+    fakes::FakeSystemLog log(recorder);
+    const Modules modules{&log, WELCOMER_FIXTURE_MODULES};
+    DesktopModule<VisitorModule<0>> good(nullptr, {&counts.created, &counts.ended}, modules);
+    DesktopModule<VisitorModule<1>> absent(nullptr, {&counts.created, &counts.ended}, modules);
+    DesktopModule<VisitorModule<2>> stale(nullptr, {&counts.created, &counts.ended}, modules);
+    DesktopModule<VisitorModule<4>> missing(nullptr, {&counts.created, &counts.ended}, modules);
+    for (int i = 0; i < 2; ++i) {
+        good.service();
+        absent.service();
+        stale.service();
+        missing.service();
+    }
+    EXPECT_EQ(log.lines(),
+              (std::vector<std::string>{
+                  "The desktop's absent is not used, but what is local: the service is not there",
+                  "The desktop's stale is not used, but what is local: " WELCOMER_FIXTURE_MODULES
+                  "/stale.so is of another build: another build"}));
 }
 
 } // namespace welcomer::desktop
