@@ -1,93 +1,19 @@
-#include "plugins/WLNimbusDelegatesRequest.h"
+// The request that is sent for all delegates.
 
+#include "plugins/WLNimbusDelegatesRequest.h"
 #include "plugins/AbiDelegatePlugin.h"
 #include "plugins/PropertyListHandles.h"
 #include "propertylist/PropertyListReader.h"
 #include "propertylist/PropertyListWriter.h"
-#include "tests/fakes/FakePlatform.h"
 #include "tests/fakes/PluginRegistry.h"
 #include "tests/unit/plugins/InProcessPlugin.h"
+#include "tests/unit/plugins/WLNimbusDelegatesRequestFixture.h"
 
-#include <functional>
-#include <gtest/gtest.h>
-#include <memory>
 #include <stdexcept>
 #include <string>
-#include <vector>
 
 namespace welcomer {
 namespace {
-
-using Dictionary = PropertyList::Dictionary;
-using Strings = std::vector<std::string>;
-using Identifier = std::optional<std::string>;
-
-// A plug-in whose answers a test chooses, and which keeps count of the questions.
-class RequestingPlugin final : public WLFirstRunDelegateConfiguration {
-  public:
-    explicit RequestingPlugin(Identifier identifier) : identify([identifier] { return identifier; }) {}
-
-    std::function<Identifier()> identify;
-    std::function<std::optional<PropertyList>()> request = [] {
-        return std::optional<PropertyList>(Dictionary{{"version", 1}});
-    };
-    std::function<std::optional<Strings>(const PropertyList&)> aliases = [](const PropertyList&) {
-        return std::optional<Strings>(Strings{"alias"});
-    };
-    int requests = 0;
-    int aliasQuestions = 0;
-
-    Identifier delegateIdentifier() override { return identify(); }
-    std::optional<PropertyList> delegateSetupRequest() override {
-        ++requests;
-        return request();
-    }
-    void completeSetupWithResponseHandler(const PropertyList&, CompletionHandler) override {}
-    void completeSetupWithResponseChosenAliasesHandler(const PropertyList&, const std::optional<Strings>&,
-                                                       CompletionHandler) override {}
-    std::optional<Strings> messagingAliasesFromResponse(const PropertyList& response) override {
-        ++aliasQuestions;
-        return aliases(response);
-    }
-    std::string className() const override { return "RequestingPlugin"; }
-};
-
-class WLNimbusDelegatesRequestTest : public testing::Test {
-  protected:
-    RequestingPlugin& add(const Identifier& identifier) {
-        auto plugin = std::make_shared<RequestingPlugin>(identifier);
-        _plugins.push_back(plugin);
-        fakes::fillPluginRegistry(_plugins);
-        return *plugin;
-    }
-
-    // What the request has under "delegates"; the request must have nothing else.
-    static Dictionary delegates(const Dictionary& request) {
-        EXPECT_EQ(request.size(), 1U);
-        const auto found = request.find("delegates");
-        return found != request.end() && found->second.dictionary() ? *found->second.dictionary()
-                                                                    : Dictionary{{"no delegates", true}};
-    }
-
-    Dictionary request(const Dictionary& additions = {}, const Strings& omissions = {}) {
-        return delegates(WLNimbusDelegatesRequest(additions, omissions));
-    }
-    Dictionary messagingRequest() {
-        return delegates(WLNimbusCreateOrLoginDelegatesRequestForMessagingAliases());
-    }
-
-    Strings lines() const { return fake.systemLog.lines(); }
-
-    static constexpr const char* kSkylark = "com.corvid.skylark";
-    const Dictionary own{{"version", 1}};
-    const Dictionary none{};
-
-    fakes::FakePlatform fake;
-    const platform::ScopedPlatform installed{fake.platform()};
-
-  private:
-    DelegatePluginArray _plugins;
-};
 
 TEST_F(WLNimbusDelegatesRequestTest, WithoutPluginsItHoldsTheFormerOnlineServiceAlone) {
     EXPECT_EQ(request(), (Dictionary{{kSkylark, none}}));
@@ -324,84 +250,6 @@ TEST_F(WLNimbusDelegatesRequestTest, ForMessagingAliasesADelegateThatOmitsItself
               (Strings{"Nimbus Plugins: Delegate com.corvid.vidlink omits itself from Nimbus setup",
                        "Nimbus Plugins: Exception querying 'com.corvid.chatter' for setup request: no",
                        "Nimbus Plugins: Exception querying '(unknown)' for setup request: never"}));
-}
-
-class MessagingAliasesTest : public WLNimbusDelegatesRequestTest {
-  protected:
-    std::optional<Strings> aliases(const std::string& identifier, const PropertyList& response = "response") {
-        return WLNimbusGetMessagingAliasesFromDelegateResponse(identifier, response);
-    }
-};
-
-TEST_F(MessagingAliasesTest, AreThoseOfTheFirstPluginWithTheIdentifier) {
-    RequestingPlugin& other = add("com.corvid.vidlink");
-    add("com.corvid.chatter").aliases = [](const PropertyList& response) {
-        return std::optional<Strings>(Strings{"a", *response.string()});
-    };
-    RequestingPlugin& later = add("com.corvid.chatter");
-    EXPECT_EQ(aliases("com.corvid.chatter"), (Strings{"a", "response"}));
-    EXPECT_EQ(other.aliasQuestions, 0);
-    EXPECT_EQ(later.aliasQuestions, 0);
-}
-
-TEST_F(MessagingAliasesTest, AreNoneWithoutAPluginOfThatIdentifier) {
-    add("com.corvid.vidlink");
-    add(std::nullopt);
-    EXPECT_EQ(aliases("com.corvid.chatter"), std::nullopt);
-    EXPECT_EQ(lines(), Strings{});
-}
-
-TEST_F(MessagingAliasesTest, AreNoneWhenThePluginHasNone) {
-    add("a").aliases = [](const PropertyList&) {
-        return std::optional<Strings>();
-    };
-    RequestingPlugin& later = add("a");
-    EXPECT_EQ(aliases("a"), std::nullopt);
-    EXPECT_EQ(later.aliasQuestions, 0);
-}
-
-TEST_F(MessagingAliasesTest, APluginThatRaisesIsLoggedAndTheNextIsAsked) {
-    add("x").identify = []() -> Identifier {
-        throw std::runtime_error("no identity");
-    };
-    add("a").aliases = [](const PropertyList&) -> std::optional<Strings> {
-        throw std::runtime_error("no aliases");
-    };
-    add("a");
-    EXPECT_EQ(aliases("a"), Strings{"alias"});
-    EXPECT_EQ(lines(), (Strings{"Nimbus Plugins: Exception querying 'a' for aliases: no identity",
-                                "Nimbus Plugins: Exception querying 'a' for aliases: no aliases"}));
-}
-
-TEST_F(MessagingAliasesTest, AnEmptyIdentifierIsUnknownInTheLog) {
-    add("").aliases = [](const PropertyList&) -> std::optional<Strings> {
-        throw std::runtime_error("no");
-    };
-    EXPECT_EQ(aliases(""), std::nullopt);
-    EXPECT_EQ(lines(), Strings{"Nimbus Plugins: Exception querying '(unknown)' for aliases: no"});
-}
-
-using DelegateIdentifiersTest = WLNimbusDelegatesRequestTest;
-
-TEST_F(DelegateIdentifiersTest, AllBeginWithTheFormerOnlineServiceAndKeepTheRegistrysOrder) {
-    add("z");
-    add("a");
-    EXPECT_EQ(WLNimbusAllDelegateIdentifiers(), (Strings{kSkylark, "z", "a"}));
-}
-
-TEST_F(DelegateIdentifiersTest, EmptyOnesAndThoseThatRaiseAreLeftOutSilently) {
-    add("");
-    add(std::nullopt);
-    add("x").identify = []() -> Identifier {
-        throw 42;
-    };
-    add("a");
-    EXPECT_EQ(WLNimbusAllDelegateIdentifiers(), (Strings{kSkylark, "a"}));
-    EXPECT_EQ(lines(), Strings{});
-}
-
-TEST_F(DelegateIdentifiersTest, TheStoresAreTheAppStoreAndTheEBookStore) {
-    EXPECT_EQ(WLNimbusStoreDelegateIdentifiers(), (Strings{"com.corvid.storefront", "com.corvid.reader"}));
 }
 
 } // namespace

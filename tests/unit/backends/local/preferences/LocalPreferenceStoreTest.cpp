@@ -1,86 +1,20 @@
-// What only preferences in files can do: survive other processes, kills and damage.
+// What only preferences in files can do: their file, failures, and other processes.
 
 #include "backends/local/preferences/LocalPreferenceStore.h"
-#include "propertylist/PropertyListReader.h"
-#include "tests/contract/TemporaryRoot.h"
-#include "tests/fakes/FakeFileSystem.h"
-#include "tests/fakes/FakeProcessIdentity.h"
 #include "tests/fakes/FakeSystemLog.h"
-#include "tests/support/MountNamespace.h"
+#include "tests/support/KillAtSystemCall.h"
+#include "tests/unit/backends/local/preferences/LocalPreferenceStoreFixture.h"
 
-#include <gtest/gtest.h>
-
-#include <cerrno>
 #include <csignal>
-#include <fcntl.h>
 #include <filesystem>
-#include <functional>
 #include <string>
-#include <sys/mount.h>
-#include <sys/ptrace.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
-#include <unistd.h>
 #include <vector>
 
 namespace welcomer {
 namespace {
-
-using Names = std::vector<std::string>;
-
-const std::string kDomain = "com.corvid.FirstRun";
-const std::string kFolder = "/home/user/Library/Preferences";
-const std::string kFile = kFolder + "/com.corvid.FirstRun.plist";
-
-class LocalPreferenceStoreTest : public testing::Test {
-  protected:
-    LocalPreferenceStoreTest() { root.addDirectory("/home/user/Library"); }
-
-    // What another process reads.
-    PropertyList::Dictionary stored() {
-        const PropertyListReadResult result = readPropertyList(root.content(kFile).value_or("nothing"));
-        EXPECT_TRUE(result) << result.error;
-        return result && result.value->isDictionary() ? *result.value->dictionary()
-                                                      : PropertyList::Dictionary();
-    }
-
-    mode_t mode(const std::string& path) {
-        struct stat status = {};
-        EXPECT_EQ(::stat(root.locate(path).c_str(), &status), 0);
-        return status.st_mode & 07777;
-    }
-
-    // Stores one value as another process.
-    bool storeElsewhere(const std::string& key, const PropertyList& value) {
-        local::LocalPreferenceStore other(posix::RootFolder(root.path()), identity, log);
-        other.setValue(key, value, kDomain);
-        return other.synchronise(kDomain);
-    }
-
-    // Runs a block in a process of its own; its result is that process's exit status.
-    pid_t start(const std::function<int()>& block) {
-        const pid_t child = ::fork();
-        if (child == 0) {
-            ::_exit(block());
-        }
-        return child;
-    }
-
-    static int waitFor(pid_t child) {
-        int status = 0;
-        while (::waitpid(child, &status, 0) < 0 && errno == EINTR) {
-        }
-        return status;
-    }
-
-    TemporaryRoot root;
-    fakes::CallRecorder recorder;
-    fakes::FakeFileSystem fileSystem{recorder};
-    fakes::FakeProcessIdentity identity{recorder, fileSystem};
-    fakes::FakeSystemLog log{recorder};
-    local::LocalPreferenceStore store{posix::RootFolder(root.path()), identity, log};
-};
 
 // The file
 
@@ -263,116 +197,6 @@ TEST_F(LocalPreferenceStoreTest, AFileOfAGigabyteIsUnreadableAndLeftAlone) {
     EXPECT_EQ(std::filesystem::file_size(root.locate(kFile)), std::uintmax_t{1} << 30);
 }
 
-// Damage
-
-class DamagedPreferencesTest : public LocalPreferenceStoreTest,
-                               public testing::WithParamInterface<const char*> {};
-
-INSTANTIATE_TEST_SUITE_P(Contents, DamagedPreferencesTest,
-                         testing::Values("<?xml version=\"1.0\"?><plist version=\"1.0\"><dict><key>Trunc",
-                                         "<plist version=\"1.0\"><array/></plist>", "{ Key = 1; ", "bplist00",
-                                         "\xff\xfe\x01 garbage"));
-
-TEST_P(DamagedPreferencesTest, CountAsEmptyAndAreSetAsideWhenTheyAreRead) {
-    root.addFile(kFile, GetParam());
-    EXPECT_EQ(store.copyValue("Key", kDomain), std::nullopt);
-    EXPECT_EQ(root.names(kFolder), (Names{"com.corvid.FirstRun.plist.damaged"}));
-    EXPECT_EQ(root.content(kFile + ".damaged"), GetParam());
-    ASSERT_EQ(store.damagedPreferences().size(), 1U);
-    const platform::DamagedPreferences damage = store.damagedPreferences().front();
-    EXPECT_EQ(damage.domain, kDomain);
-    EXPECT_EQ(damage.setAsidePath, kFile + ".damaged");
-    EXPECT_FALSE(damage.reason.empty());
-    EXPECT_EQ(damage.reason.find('\n'), std::string::npos);
-    EXPECT_EQ(log.lines(), std::vector<std::string>{"Preferences com.corvid.FirstRun are damaged (" +
-                                                    damage.reason + ") and now at " + kFile + ".damaged"});
-    EXPECT_TRUE(store.synchronise(kDomain));
-    EXPECT_EQ(store.damagedPreferences().size(), 1U);
-}
-
-TEST_P(DamagedPreferencesTest, AreNeverOverwrittenButSetAsideWhenTheDomainIsWritten) {
-    root.addFile(kFile, GetParam());
-    store.setValue("Key", 1, kDomain);
-    EXPECT_TRUE(store.synchronise(kDomain));
-    EXPECT_EQ(root.content(kFile + ".damaged"), GetParam());
-    EXPECT_EQ(stored(), (PropertyList::Dictionary{{"Key", 1}}));
-    EXPECT_EQ(store.damagedPreferences().size(), 1U);
-}
-
-TEST_F(LocalPreferenceStoreTest, EachDamagedFileGetsANameOfItsOwn) {
-    for (const char* content : {"first", "second", "third"}) {
-        root.addFile(kFile, std::string("{ damaged, ") + content);
-        EXPECT_TRUE(store.synchronise(kDomain));
-    }
-    EXPECT_EQ(root.names(kFolder),
-              (Names{"com.corvid.FirstRun.plist.damaged", "com.corvid.FirstRun.plist.damaged-2",
-                     "com.corvid.FirstRun.plist.damaged-3"}));
-    EXPECT_EQ(root.content(kFile + ".damaged"), "{ damaged, first");
-    EXPECT_EQ(root.content(kFile + ".damaged-2"), "{ damaged, second");
-    EXPECT_EQ(root.content(kFile + ".damaged-3"), "{ damaged, third");
-    EXPECT_EQ(store.damagedPreferences().size(), 3U);
-}
-
-TEST_F(LocalPreferenceStoreTest, ADamagedFileThatCannotBeSetAsideIsLeftAloneAndNothingIsStored) {
-    root.addFile(kFile, "{ damaged");
-    root.addFile(kFile + ".damaged", "");
-    for (int number = 2; number <= 1000; ++number) {
-        root.addFile(kFile + ".damaged-" + std::to_string(number), "");
-    }
-    store.setValue("Key", 1, kDomain);
-    EXPECT_FALSE(store.synchronise(kDomain));
-    EXPECT_FALSE(store.synchronise(kDomain));
-    EXPECT_EQ(root.content(kFile), "{ damaged");
-    ASSERT_EQ(store.damagedPreferences().size(), 1U);
-    EXPECT_EQ(store.damagedPreferences().front().setAsidePath, "");
-    std::filesystem::remove(root.locate(kFile + ".damaged"));
-    EXPECT_TRUE(store.synchronise(kDomain));
-    EXPECT_EQ(root.content(kFile + ".damaged"), "{ damaged");
-}
-
-// Mount points
-
-class MountedPreferenceFileTest : public LocalPreferenceStoreTest {
-  protected:
-    void SetUp() override {
-        if (!mayMount()) {
-            GTEST_SKIP() << "needs the right to mount a file in a namespace of its own";
-        }
-        enterMountNamespace();
-    }
-
-    ~MountedPreferenceFileTest() override { unmount(root.locate(kFile)); }
-
-    // Makes the domain's file a mount point.
-    void mountFile(const std::string& content) {
-        root.addFile("/elsewhere", content);
-        root.addFile(kFile, "");
-        ASSERT_EQ(
-            ::mount(root.locate("/elsewhere").c_str(), root.locate(kFile).c_str(), nullptr, MS_BIND, nullptr),
-            0);
-    }
-};
-
-TEST_F(MountedPreferenceFileTest, IsRewrittenInPlace) {
-    mountFile("{ Old = \"" + std::string(1000, 'x') + "\"; Kept = yes; }");
-    store.removeValue("Old", kDomain);
-    store.setValue("New", 1, kDomain);
-    EXPECT_TRUE(store.synchronise(kDomain));
-    EXPECT_EQ(stored(), (PropertyList::Dictionary{{"Kept", "yes"}, {"New", 1}}));
-    EXPECT_EQ(root.content("/elsewhere"), root.content(kFile));
-    EXPECT_EQ(root.names(kFolder), (Names{"com.corvid.FirstRun.plist"}));
-}
-
-TEST_F(MountedPreferenceFileTest, IsSetAsideByItsContentWhenItIsDamaged) {
-    mountFile("{ damaged");
-    store.setValue("New", 1, kDomain);
-    EXPECT_TRUE(store.synchronise(kDomain));
-    EXPECT_EQ(root.content(kFile + ".damaged"), "{ damaged");
-    EXPECT_EQ(stored(), (PropertyList::Dictionary{{"New", 1}}));
-    EXPECT_EQ(root.content("/elsewhere"), root.content(kFile));
-    EXPECT_EQ(store.damagedPreferences().front().setAsidePath, kFile + ".damaged");
-}
-
 // Other processes
 
 TEST_F(LocalPreferenceStoreTest, ProcessesThatSetDifferentKeysThousandsOfTimesLoseNone) {
@@ -432,25 +256,10 @@ TEST_F(LocalPreferenceStoreTest, KilledAtAnySystemCallOfSynchronisingItLeavesThe
         local::LocalPreferenceStore own(posix::RootFolder(root.path()), identity, log);
         own.setValue("First", current + 1, kDomain);
         own.setValue("Last", current + 1, kDomain);
-        const pid_t child = start([&] {
-            ::ptrace(PTRACE_TRACEME, 0, nullptr, nullptr);
-            ::raise(SIGSTOP);
-            return own.synchronise(kDomain) ? 0 : 1;
-        });
-        int status = waitFor(child);
-        ASSERT_TRUE(WIFSTOPPED(status));
-        // Each system call stops the child twice: before it and after it.
-        for (int stop = 0; stop <= calls && WIFSTOPPED(status); ++stop) {
-            ASSERT_EQ(::ptrace(PTRACE_SYSCALL, child, nullptr, nullptr), 0);
-            status = waitFor(child);
-        }
-        finished = WIFEXITED(status);
-        if (finished) {
-            EXPECT_EQ(WEXITSTATUS(status), 0);
-        } else {
-            ASSERT_EQ(::kill(child, SIGKILL), 0);
-            waitFor(child);
-        }
+        const std::optional<int> ended =
+            killAtSystemCall([&] { return own.synchronise(kDomain) ? 0 : 1; }, calls + 1);
+        finished = ended.has_value();
+        EXPECT_EQ(ended.value_or(0), 0);
 
         const PropertyList::Dictionary after = stored();
         const bool isNew = after == generation(current + 1);
