@@ -11,10 +11,10 @@ import termios
 import time
 import unittest
 
-import account_test
 import installed_values_test
+import setup_test
 import tool_test
-from account_test import PASSWORD
+from account_test import PASSWORD, CloudTest
 
 WIDTH = 100  # of the terminals of AtTerminal
 LONG = "x" * 5000
@@ -23,14 +23,14 @@ BEGINNING, LEFT, BACKSPACE, SUSPEND = "\x01", "\x1b[D", "\x7f", "\x1a"
 
 def setUpModule():
     installed_values_test.setUpModule()
-    account_test.PROGRAM = tool_test.PROGRAM
+    setup_test.PROGRAM = tool_test.PROGRAM
 
 
 def tearDownModule():
     installed_values_test.tearDownModule()
 
 
-class Terminal(account_test.AtTerminal, account_test.SetupTest):
+class Terminal(setup_test.AtTerminal, setup_test.SetupTest):
     def echoes(self):
         return bool(termios.tcgetattr(self.terminal)[3] & termios.ECHO)
 
@@ -127,7 +127,7 @@ class WithoutTheLibrary(Terminal):
         self.accept_everything()
 
 
-class Tables(account_test.AtTerminal, account_test.CloudTest):
+class Tables(setup_test.AtTerminal, CloudTest):
     def setUp(self):
         super().setUp()
         for name in (LONG, "bert", "東京" * 40):

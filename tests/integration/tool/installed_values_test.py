@@ -17,7 +17,8 @@ from pathlib import Path
 
 import state_test
 import tool_test
-from account_test import PASSWORD, CloudTest, SetupTest
+from account_test import PASSWORD, CloudTest
+from setup_test import SetupTest
 from state_test import OrdinaryUserTest
 from tool_test import ACCOUNT, BUILD, LAUNCH_AGENT, OWN_PLUGINS, ToolTest
 
