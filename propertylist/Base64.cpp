@@ -49,6 +49,17 @@ inline void storeGroup(char* bytes, std::uint32_t group) {
     bytes[2] = static_cast<char>(group);
 }
 
+// Decodes whole groups of digits alone, for as long as there are any. Moves `input` and `output` past them.
+void decodeGroups(const char*& input, const char* end, char*& output) {
+    for (; end - input >= 4; input += 4, output += 3) {
+        const std::uint32_t value = decodeGroup(input);
+        if (value & kNoDigit) {
+            return;
+        }
+        storeGroup(output, value);
+    }
+}
+
 } // namespace
 
 void appendBase64(std::string& text, std::string_view bytes) {
@@ -83,15 +94,7 @@ std::size_t decodeBase64(std::string_view text, std::string& bytes) {
     std::size_t padding = 0;
     while (input != end) {
         if (gathered == 0 && padding == 0) {
-            while (end - input >= 4) {
-                const std::uint32_t value = decodeGroup(input);
-                if (value & kNoDigit) {
-                    break;
-                }
-                storeGroup(output, value);
-                output += 3;
-                input += 4;
-            }
+            decodeGroups(input, end, output);
             if (input == end) {
                 break;
             }
