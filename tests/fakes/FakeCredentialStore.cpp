@@ -1,28 +1,11 @@
 #include "tests/fakes/FakeCredentialStore.h"
 
+#include "platform/KeyedItemReference.h"
+
 #include <algorithm>
 #include <utility>
 
 namespace welcomer::fakes {
-
-namespace {
-
-class Reference final : public platform::CredentialItemReference {
-  public:
-    Reference(std::string service, std::string account)
-        : _service(std::move(service)),
-          _account(std::move(account)) {}
-
-    platform::CredentialStoreDescription store() const override { return {"memory", "this process alone"}; }
-    const std::string& service() const { return _service; }
-    const std::string& account() const { return _account; }
-
-  private:
-    std::string _service;
-    std::string _account;
-};
-
-} // namespace
 
 std::int32_t FakeCredentialStore::statusOf(Operation operation) const {
     const auto found = _statuses.find(operation);
@@ -85,7 +68,8 @@ platform::CredentialFinding FakeCredentialStore::findItem(const std::string& ser
     if (!result || wish == platform::CredentialWish::Presence) {
         return result;
     }
-    result.reference = std::make_unique<Reference>(service, account);
+    result.reference = std::make_unique<platform::KeyedItemReference>(
+        platform::CredentialStoreDescription{"memory", "this process alone"}, service, account);
     result.itemStatus = statusOf(Operation::ReadAttributes);
     if (result.itemStatus == platform::kCredentialSuccess) {
         result.item = found->item;
@@ -98,7 +82,7 @@ platform::CredentialFinding FakeCredentialStore::findItem(const std::string& ser
 }
 
 std::int32_t FakeCredentialStore::deleteItem(const platform::CredentialItemReference& reference) {
-    const auto& key = dynamic_cast<const Reference&>(reference);
+    const auto& key = dynamic_cast<const platform::KeyedItemReference&>(reference);
     _recorder.record("CredentialStore.deleteItem " + key.service() + ", " + key.account());
     const std::lock_guard lock(_mutex);
     if (const std::int32_t status = statusOf(Operation::DeleteItem)) {

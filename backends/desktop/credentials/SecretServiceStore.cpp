@@ -2,6 +2,7 @@
 
 #include "backends/desktop/credentials/SecretServiceItem.h"
 #include "backends/desktop/credentials/SecretServiceQuestion.h"
+#include "platform/KeyedItemReference.h"
 
 #include <string_view>
 #include <utility>
@@ -13,22 +14,6 @@ namespace {
 using platform::CredentialItem;
 using Status = std::int32_t;
 using Paths = std::vector<std::string>;
-
-class Reference final : public platform::CredentialItemReference {
-  public:
-    Reference(std::string service, std::string account)
-        : _service(std::move(service)),
-          _account(std::move(account)) {}
-    platform::CredentialStoreDescription store() const override {
-        return {"Secret Service", "every program of the session, while the keyring is unlocked"};
-    }
-    const std::string& service() const { return _service; }
-    const std::string& account() const { return _account; }
-
-  private:
-    const std::string _service;
-    const std::string _account;
-};
 
 // The objects of the items with a service and an account.
 struct SearchResult {
@@ -255,7 +240,10 @@ platform::CredentialFinding SecretServiceStore::findItem(const std::string& serv
     platform::CredentialFinding found;
     if (status == platform::kCredentialSuccess && wish != platform::CredentialWish::Presence) {
         status = take(question, items, wish, found);
-        found.reference = std::make_unique<Reference>(service, account);
+        found.reference = std::make_unique<platform::KeyedItemReference>(
+            platform::CredentialStoreDescription{
+                "Secret Service", "every program of the session, while the keyring is unlocked"},
+            service, account);
     }
     if (status != platform::kCredentialSuccess) {
         found = {};
@@ -267,7 +255,7 @@ platform::CredentialFinding SecretServiceStore::findItem(const std::string& serv
 Status SecretServiceStore::deleteItem(const platform::CredentialItemReference& reference) {
     const std::lock_guard lock(_mutex);
     SecretServiceQuestion question = _question();
-    const auto& key = static_cast<const Reference&>(reference);
+    const auto& key = static_cast<const platform::KeyedItemReference&>(reference);
     Status result = question.begin();
     SearchResult found;
     if (result == platform::kCredentialSuccess) {

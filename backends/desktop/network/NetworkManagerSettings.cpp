@@ -28,6 +28,12 @@ std::string textOf(GVariant* settings, const char* setting, const char* name) {
     return value ? g_variant_get_string(value.get(), nullptr) : "";
 }
 
+// The mask of a prefix of this length.
+std::string maskText(unsigned prefixLength) {
+    constexpr unsigned kAddressBits = 32;
+    return network::formatIPv4(network::maskOf(static_cast<int>(std::min(prefixLength, kAddressBits))));
+}
+
 // An IPv4 configuration in the one form that it has when it is read from a profile's setting.
 Dictionary settingForm(Method method, Array addresses, Array masks, const std::string& router,
                        const std::string& clientID) {
@@ -63,20 +69,10 @@ Dictionary settingForm(const IPv4Configuration& configuration) {
 
 // What a profile's IPv4 setting says; empty for a method that has no name here.
 Dictionary ipv4Of(GVariant* settings) {
-    Array addresses;
-    Array masks;
     const VariantPointer list = valueOf(settings, "ipv4", "address-data", G_VARIANT_TYPE("aa{sv}"));
-    for (gsize index = 0; list && index < g_variant_n_children(list.get()); ++index) {
-        const VariantPointer each(g_variant_get_child_value(list.get(), index));
-        const char* address = "";
-        guint32 prefixLength = 0;
-        g_variant_lookup(each.get(), "address", "&s", &address);
-        g_variant_lookup(each.get(), "prefix", "u", &prefixLength);
-        addresses.emplace_back(address);
-        masks.emplace_back(maskText(prefixLength));
-    }
+    AddressTexts texts = readAddresses(list.get());
     const std::string name = textOf(settings, "ipv4", "method");
-    Method method = addresses.empty() ? Method::DHCP : Method::Inform;
+    Method method = texts.addresses.empty() ? Method::DHCP : Method::Inform;
     if (name == "manual") {
         method = Method::Manual;
     } else if (name == kMethodLinkLocal) {
@@ -84,8 +80,8 @@ Dictionary ipv4Of(GVariant* settings) {
     } else if (name != "auto" && !name.empty()) {
         return {};
     }
-    return settingForm(method, std::move(addresses), std::move(masks), textOf(settings, "ipv4", "gateway"),
-                       textOf(settings, "ipv4", "dhcp-client-id"));
+    return settingForm(method, std::move(texts.addresses), std::move(texts.masks),
+                       textOf(settings, "ipv4", "gateway"), textOf(settings, "ipv4", "dhcp-client-id"));
 }
 
 // The servers of one family. They may carry names for the encryption, behind a number sign.
@@ -177,11 +173,6 @@ void updateDNS(std::optional<Dictionary>& kept, const Array& now) {
 
 } // namespace
 
-std::string maskText(unsigned prefixLength) {
-    constexpr unsigned kAddressBits = 32;
-    return network::formatIPv4(network::maskOf(static_cast<int>(std::min(prefixLength, kAddressBits))));
-}
-
 network::Protocols readProtocols(GVariant* settings) {
     const Dictionary ipv4Now = ipv4Of(settings);
     const Array serversNow = serversOf(settings);
@@ -198,6 +189,20 @@ network::Protocols readProtocols(GVariant* settings) {
         updateDNS(dns->second, serversNow);
     }
     return *std::move(kept);
+}
+
+AddressTexts readAddresses(GVariant* list) {
+    AddressTexts texts;
+    for (gsize index = 0; list && index < g_variant_n_children(list); ++index) {
+        const VariantPointer each(g_variant_get_child_value(list, index));
+        const char* address = "";
+        guint32 prefixLength = 0;
+        g_variant_lookup(each.get(), "address", "&s", &address);
+        g_variant_lookup(each.get(), "prefix", "u", &prefixLength);
+        texts.addresses.emplace_back(address);
+        texts.masks.emplace_back(maskText(prefixLength));
+    }
+    return texts;
 }
 
 } // namespace welcomer::desktop

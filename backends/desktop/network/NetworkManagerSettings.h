@@ -21,7 +21,13 @@ network::Protocols readProtocols(GVariant* settings);
 inline constexpr char kPiecePrefix[] = "com.corvid.welcomer.protocols.";
 inline constexpr char kIPv6Before[] = "com.corvid.welcomer.ipv6-before";
 
-// The mask of a prefix of this length as text.
-std::string maskText(unsigned prefixLength);
+// The addresses of a list as NetworkManager gives it, and the mask of each, as texts.
+struct AddressTexts {
+    PropertyList::Array addresses;
+    PropertyList::Array masks;
+};
+
+//  list  of type aa{sv}, borrowed; null is an empty one
+AddressTexts readAddresses(GVariant* list);
 
 } // namespace welcomer::desktop

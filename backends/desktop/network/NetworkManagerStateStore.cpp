@@ -25,23 +25,12 @@ using Value = std::optional<Dictionary>;
 
 // The addresses and masks of an IPv4 configuration; none when it has none.
 Value addressesOf(const NetworkManagerProperties& configuration) {
-    const VariantPointer list = configuration.value("AddressData", "aa{sv}");
-    Array addresses;
-    Array masks;
-    for (gsize index = 0; list && index < g_variant_n_children(list.get()); ++index) {
-        const VariantPointer each(g_variant_get_child_value(list.get(), index));
-        const char* address = "";
-        guint32 prefixLength = 0;
-        g_variant_lookup(each.get(), "address", "&s", &address);
-        g_variant_lookup(each.get(), "prefix", "u", &prefixLength);
-        addresses.emplace_back(address);
-        masks.emplace_back(maskText(prefixLength));
-    }
-    if (addresses.empty()) {
+    AddressTexts texts = readAddresses(configuration.value("AddressData", "aa{sv}").get());
+    if (texts.addresses.empty()) {
         return std::nullopt;
     }
-    return Dictionary{{platform::kNetworkAddresses, std::move(addresses)},
-                      {platform::kNetworkSubnetMasks, std::move(masks)}};
+    return Dictionary{{platform::kNetworkAddresses, std::move(texts.addresses)},
+                      {platform::kNetworkSubnetMasks, std::move(texts.masks)}};
 }
 
 void addIPv4Servers(const NetworkManagerProperties& configuration, Array& servers) {

@@ -5,6 +5,7 @@
 #include "backends/posix/Directory.h"
 #include "backends/posix/SystemError.h"
 #include "platform/Error.h"
+#include "platform/KeyedItemReference.h"
 #include "platform/Path.h"
 
 #include <algorithm>
@@ -21,23 +22,6 @@ using Outcome = platform::CredentialOutcome;
 
 constexpr char kFolderName[] = "Credentials";
 constexpr mode_t kFolderMode = 0700;
-
-class Reference final : public platform::CredentialItemReference {
-  public:
-    Reference(std::string service, std::string account)
-        : _service(std::move(service)),
-          _account(std::move(account)) {}
-
-    platform::CredentialStoreDescription store() const override {
-        return {"local file", "every program of this user"};
-    }
-    const std::string& service() const { return _service; }
-    const std::string& account() const { return _account; }
-
-  private:
-    std::string _service;
-    std::string _account;
-};
 
 PropertyList::Array::iterator findIn(PropertyList::Array& items, const std::string& service,
                                      const std::string& account) {
@@ -153,7 +137,8 @@ platform::CredentialFinding LocalCredentialStore::findItem(const std::string& se
     }
     result.item = credentialItemAttributes(*found);
     result.item.changed = folder.changed();
-    result.reference = std::make_unique<Reference>(service, account);
+    result.reference = std::make_unique<platform::KeyedItemReference>(
+        platform::CredentialStoreDescription{"local file", "every program of this user"}, service, account);
     if (wish == platform::CredentialWish::Secret) {
         result.secret = takeCredentialItemData(*found);
     }
@@ -161,7 +146,7 @@ platform::CredentialFinding LocalCredentialStore::findItem(const std::string& se
 }
 
 std::int32_t LocalCredentialStore::deleteItem(const platform::CredentialItemReference& reference) {
-    const auto& key = dynamic_cast<const Reference&>(reference);
+    const auto& key = dynamic_cast<const platform::KeyedItemReference&>(reference);
     CredentialFolder folder;
     PropertyList::Array items;
     Outcome outcome = folder.open(_root, _folderPath());

@@ -7,6 +7,7 @@
 #include "backends/posix/FileDescriptor.h"
 #include "platform/Error.h"
 #include "platform/NetworkConfigStore.h"
+#include "propertylist/Characters.h"
 
 #include <algorithm>
 #include <array>
@@ -43,15 +44,12 @@ std::string find(const std::string& name) {
 
 // The bytes in hexadecimal, with a separator between them.
 std::string hexadecimal(std::string_view bytes, std::string_view separator) {
-    constexpr char kDigits[] = "0123456789abcdef";
     std::string text;
     for (const char byte : bytes) {
         if (!text.empty()) {
             text += separator;
         }
-        const auto value = static_cast<unsigned char>(byte);
-        text += kDigits[value >> 4U];
-        text += kDigits[value & 15U];
+        appendHex(text, static_cast<unsigned char>(byte));
     }
     return text;
 }

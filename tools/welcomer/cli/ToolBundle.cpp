@@ -11,9 +11,8 @@ namespace {
 
 std::string findBundle(const char* name) {
     std::error_code error;
-    const fs::path programs = fs::read_symlink("/proc/self/exe", error).parent_path();
-    for (const fs::path& folder : {programs / WELCOMER_DATA_FROM_PROGRAMS, programs.parent_path()}) {
-        const fs::path bundle = (folder / name).lexically_normal();
+    for (const ToolFolders& folders : toolFolders()) {
+        const fs::path bundle = (folders.data / name).lexically_normal();
         if (fs::is_directory(bundle, error)) {
             return bundle.string();
         }
@@ -22,6 +21,16 @@ std::string findBundle(const char* name) {
 }
 
 } // namespace
+
+std::vector<ToolFolders> toolFolders() {
+    std::error_code error;
+    const fs::path programs = fs::read_symlink("/proc/self/exe", error).parent_path();
+    if (error) {
+        return {};
+    }
+    const fs::path built = programs.parent_path();
+    return {{programs / WELCOMER_DATA_FROM_PROGRAMS, programs / WELCOMER_EXAMPLES_FROM_PROGRAMS}, {built, built}};
+}
 
 std::string findToolBundle() {
     return findBundle("tool-bundle");

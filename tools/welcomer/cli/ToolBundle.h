@@ -1,11 +1,22 @@
-// The bundles that come with the tool, beside the running program in the installed tree or in the tree in
-// which it was built. Each function gives the bundle's folder; empty when it is in neither.
+// What comes with the tool, beside the running program in the installed tree or in the tree in which it was
+// built. Each function that finds a bundle gives its folder; empty when it is in neither.
 
 #pragma once
 
+#include <filesystem>
 #include <string>
+#include <vector>
 
 namespace welcomer::tool {
+
+// Where what comes with the tool lies.
+struct ToolFolders {
+    std::filesystem::path data;     // the bundles
+    std::filesystem::path examples; // the example plug-ins, in "plugins"
+};
+
+// Where to look, in this order; empty when the system does not say where the program is.
+std::vector<ToolFolders> toolFolders();
 
 // The tool's own: the texts that it has as an application.
 std::string findToolBundle();

@@ -77,12 +77,12 @@ PropertyList::Dictionary responseFor(const std::vector<std::string>& aliases) {
     PropertyList::Dictionary delegates;
     for (const char* identifier : {kVidlinkIdentifier, kChatterIdentifier}) {
         delegates[identifier] = PropertyList::Dictionary{
-            {"status", 0}, {"aliases", PropertyList::Array(aliases.begin(), aliases.end())}};
+            {platform::kStatusKey, 0}, {"aliases", PropertyList::Array(aliases.begin(), aliases.end())}};
     }
     for (const std::string& identifier : WLNimbusStoreDelegateIdentifiers()) {
-        delegates[identifier] = PropertyList::Dictionary{{"status", 0}};
+        delegates[identifier] = PropertyList::Dictionary{{platform::kStatusKey, 0}};
     }
-    return {{"status", 0}, {"delegates", delegates}};
+    return {{platform::kStatusKey, 0}, {platform::kDelegatesKey, delegates}};
 }
 
 Report add(Session& session, const AddArguments& arguments) {

@@ -1,24 +1,21 @@
 #include "tools/welcomer/story/ExampleFiles.h"
 
 #include "plugins/WLNimbusDelegatePlugins.h"
+#include "tools/welcomer/cli/ToolBundle.h"
 #include "tools/welcomer/terminal/Failure.h"
 
 #include <algorithm>
-#include <utility>
 
 namespace welcomer::tool {
 
 namespace fs = std::filesystem;
 
 ExampleFiles findExampleFiles() {
-    const fs::path programs = fs::read_symlink("/proc/self/exe").parent_path();
-    const fs::path built = programs.parent_path();
-    // The installed tree first, then the build tree.
-    for (const auto& [data, examples] :
-         {std::pair(programs / WELCOMER_DATA_FROM_PROGRAMS, programs / WELCOMER_EXAMPLES_FROM_PROGRAMS),
-          std::pair(built, built)}) {
-        ExampleFiles files{data / "setup-bundle", {}};
-        const fs::path plugins = examples / "plugins";
+    std::string looked;
+    for (const ToolFolders& folders : toolFolders()) {
+        looked += (looked.empty() ? "" : " or ") + folders.data.lexically_normal().string();
+        ExampleFiles files{folders.data / "setup-bundle", {}};
+        const fs::path plugins = folders.examples / "plugins";
         if (!fs::is_directory(files.setupBundle) || !fs::is_directory(plugins)) {
             continue;
         }
@@ -32,8 +29,7 @@ ExampleFiles findExampleFiles() {
             return files;
         }
     }
-    throw CommandFailure("the example plug-ins and the example setup application are not beside " +
-                         programs.string());
+    throw CommandFailure("the example plug-ins and the example setup application are not in " + looked);
 }
 
 } // namespace welcomer::tool

@@ -16,7 +16,7 @@ namespace welcomer::tool {
 platform::CloudUser exampleUser() {
     // The example plug-ins take as long as the response says, so that one sees them work beside one another.
     const auto response = [](double delaySeconds) {
-        return PropertyList::Dictionary{{"status", 0}, {"delaySeconds", delaySeconds}};
+        return PropertyList::Dictionary{{platform::kStatusKey, 0}, {"delaySeconds", delaySeconds}};
     };
     PropertyList::Dictionary vidlink = response(0.8);
     PropertyList::Dictionary chatter = response(0.5);
@@ -28,7 +28,7 @@ platform::CloudUser exampleUser() {
     return {kExampleAccount,
             password.str(),
             kExampleAccount,
-            {{"status", 0},
+            {{platform::kStatusKey, 0},
              {platform::kDelegatesKey, PropertyList::Dictionary{{kVidlinkIdentifier, vidlink},
                                                                 {kChatterIdentifier, chatter},
                                                                 {kStorefrontIdentifier, response(1.0)}}}}};

@@ -122,21 +122,6 @@ TEST_F(LocalNetworkConfigStoreTest, SynchronizingDropsChanges) {
     EXPECT_EQ(root.content(kFile), std::nullopt);
 }
 
-TEST_F(LocalNetworkConfigStoreTest, TwoConnectionsLoseNoneOfTheirChanges) {
-    addPair("eth7");
-    const auto first = store().open("a test");
-    const auto second = store().open("another");
-    serviceOf(*first, "eth7")->addProtocolType("One");
-    serviceOf(*second, "eth7")->addProtocolType("Two");
-    serviceOf(*second, "p-eth7")->addProtocolType("Three");
-    EXPECT_TRUE(first->commitChanges());
-    EXPECT_TRUE(second->commitChanges());
-    const auto read = store().open("a test");
-    EXPECT_NE(serviceOf(*read, "eth7")->copyProtocol("One"), nullptr);
-    EXPECT_NE(serviceOf(*read, "eth7")->copyProtocol("Two"), nullptr);
-    EXPECT_NE(serviceOf(*read, "p-eth7")->copyProtocol("Three"), nullptr);
-}
-
 TEST_F(LocalNetworkConfigStoreTest, ADamagedFileCountsAsEmptyAndIsSetAside) {
     addPair("eth7");
     root.addFile(kFile, "<plist><dict>");
