@@ -4,10 +4,12 @@
 
 #include <atomic>
 #include <chrono>
+#include <fstream>
 #include <functional>
 #include <memory>
 #include <string>
 #include <thread>
+#include <unistd.h>
 #include <vector>
 
 namespace welcomer::simulated {
@@ -16,6 +18,14 @@ namespace {
 using namespace std::chrono_literals;
 using Wait = fakes::RecordedTime::Wait;
 using Names = std::vector<std::string>;
+
+// Whether the kernel has a thread of this process wait for something.
+bool isWaiting(pid_t thread) {
+    std::ifstream file("/proc/self/task/" + std::to_string(thread) + "/stat");
+    std::string text;
+    std::getline(file, text);
+    return text.find(") S ") != std::string::npos;
+}
 
 class VirtualTimeTest : public testing::Test {
   protected:
@@ -204,8 +214,16 @@ TEST_F(VirtualTimeTest, TimeStandsStillWhileAnotherThreadRunsABlock) {
     std::thread runner([&] { time.settle(); });
     while (!started)
         std::this_thread::yield();
-    std::thread sleeper([&] { time.sleep(1s); });
+    std::atomic<pid_t> sleeperID = 0;
+    std::atomic<bool> slept = false;
+    std::thread sleeper([&] {
+        sleeperID = ::gettid();
+        time.sleep(1s);
+        slept = true;
+    });
     while (time.waits().empty())
+        std::this_thread::yield();
+    while (!slept && !isWaiting(sleeperID))
         std::this_thread::yield();
     proceed = true;
     runner.join();
