@@ -65,9 +65,16 @@ bool WLGetNimbusReplayKeychainItem(PropertyList* replayObject, std::string* acco
 }
 
 bool WLGetNimbusReplayKeychainItem(ReplayItem& found) {
+    std::int32_t status = platform::kCredentialSuccess;
+    return WLGetNimbusReplayKeychainItem(found, status);
+}
+
+bool WLGetNimbusReplayKeychainItem(ReplayItem& found, std::int32_t& status) {
     platform::CredentialFinding finding;
     PropertyList replayObject;
-    if (!read(finding, &replayObject, true)) {
+    const bool isRead = read(finding, &replayObject, true);
+    status = finding.status;
+    if (!isRead) {
         return false;
     }
     found = {std::move(replayObject), std::move(finding.item), std::move(finding.reference)};
@@ -75,8 +82,14 @@ bool WLGetNimbusReplayKeychainItem(ReplayItem& found) {
 }
 
 bool WLDeleteNimbusReplayKeychainItem() {
+    std::int32_t status = platform::kCredentialSuccess;
+    return WLDeleteNimbusReplayKeychainItem(status);
+}
+
+bool WLDeleteNimbusReplayKeychainItem(std::int32_t& status) {
     const platform::CredentialFinding found = findReplayItem(platform::CredentialWish::Item);
-    return isDeleted(found ? platform::current().credentialStore.deleteItem(*found.reference) : found.status);
+    status = found ? platform::current().credentialStore.deleteItem(*found.reference) : found.status;
+    return isDeleted(status);
 }
 
 bool WLDeleteNimbusReplayKeychainItem(const ReplayItem& read) {

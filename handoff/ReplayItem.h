@@ -6,6 +6,7 @@
 #include "platform/CredentialStore.h"
 #include "propertylist/PropertyList.h"
 
+#include <cstdint>
 #include <memory>
 #include <string>
 
@@ -44,10 +45,18 @@ struct ReplayItem {
 // Any thread; may block while another process changes the credential store.
 bool WLGetNimbusReplayKeychainItem(ReplayItem& found);
 
+// The same.
+//  status  of finding it; success also where it was found and could not be read
+bool WLGetNimbusReplayKeychainItem(ReplayItem& found, std::int32_t& status);
+
 // Deletes the replay item.
 //  result  whether it was there and is gone now; else one log line with the credential store's status
 // May block while another process changes the credential store.
 bool WLDeleteNimbusReplayKeychainItem();
+
+// The same.
+//  status  the credential store's
+bool WLDeleteNimbusReplayKeychainItem(std::int32_t& status);
 
 // Deletes the one that has been read, without looking for it once more.
 //  result  as above

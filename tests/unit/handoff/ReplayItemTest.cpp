@@ -240,5 +240,28 @@ TEST_F(ReplayItemTest, DeletingLogsTheStatusOfDeleting) {
     EXPECT_EQ(fake.credentialStore.items().size(), 1U);
 }
 
+TEST_F(ReplayItemTest, WhoReadsTheWholeItemIsToldTheStatusOfFindingIt) {
+    ReplayItem found;
+    std::int32_t status = platform::kCredentialWriteFailed;
+    EXPECT_FALSE(WLGetNimbusReplayKeychainItem(found, status));
+    EXPECT_EQ(status, platform::kCredentialItemNotFound);
+    put("no property list");
+    EXPECT_FALSE(WLGetNimbusReplayKeychainItem(found, status));
+    EXPECT_EQ(status, platform::kCredentialSuccess);
+}
+
+TEST_F(ReplayItemTest, WhoDeletesIsToldTheStatus) {
+    std::int32_t status = platform::kCredentialSuccess;
+    EXPECT_FALSE(WLDeleteNimbusReplayKeychainItem(status));
+    EXPECT_EQ(status, platform::kCredentialItemNotFound);
+    put("anything");
+    fake.credentialStore.setStatus(Operation::DeleteItem, platform::kCredentialWriteFailed);
+    EXPECT_FALSE(WLDeleteNimbusReplayKeychainItem(status));
+    EXPECT_EQ(status, platform::kCredentialWriteFailed);
+    fake.credentialStore.setStatus(Operation::DeleteItem, platform::kCredentialSuccess);
+    EXPECT_TRUE(WLDeleteNimbusReplayKeychainItem(status));
+    EXPECT_EQ(status, platform::kCredentialSuccess);
+}
+
 } // namespace
 } // namespace welcomer

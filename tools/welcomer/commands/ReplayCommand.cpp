@@ -76,8 +76,9 @@ void addAccess(Report& report, const ReplayItem& found) {
 
 Report show(Session& session) {
     ReplayItem found;
-    if (!WLGetNimbusReplayKeychainItem(found)) {
-        throw CommandFailure("cannot read the replay item: " + replayReason(session.log));
+    std::int32_t status = platform::kCredentialSuccess;
+    if (!WLGetNimbusReplayKeychainItem(found, status)) {
+        throw CommandFailure("cannot read the replay item: " + replayReason(session.log, status));
     }
     const std::string& account = found.item.label;
     Report report({{"account", account}, {"replay", toJson(found.replayObject)}}, "Account:   " + account);
@@ -86,8 +87,9 @@ Report show(Session& session) {
 }
 
 Report remove(Session& session) {
-    if (!WLDeleteNimbusReplayKeychainItem()) {
-        throw CommandFailure("cannot delete the replay item: " + replayReason(session.log));
+    std::int32_t status = platform::kCredentialSuccess;
+    if (!WLDeleteNimbusReplayKeychainItem(status)) {
+        throw CommandFailure("cannot delete the replay item: " + replayReason(session.log, status));
     }
     return Report({{"deleted", true}}, "Deleted the replay item.");
 }

@@ -1,31 +1,12 @@
 #include "tools/welcomer/story/ReplayReason.h"
 
-#include <charconv>
-#include <optional>
-
 namespace welcomer::tool {
 
-namespace {
-
-// The credential store's status that a log line ends in; none when it does not.
-std::optional<std::int32_t> statusIn(const std::string& line) {
-    constexpr std::string_view beforeStatus = "replay keychain item: ";
-    const std::size_t position = line.rfind(beforeStatus);
-    if (position == std::string::npos) {
-        return std::nullopt;
-    }
-    std::int32_t status = 0;
-    const char* const end = line.data() + line.size();
-    const auto result = std::from_chars(line.data() + position + beforeStatus.size(), end, status);
-    return result.ec == std::errc() && result.ptr == end ? std::optional(status) : std::nullopt;
-}
-
-} // namespace
-
-std::string replayReason(const KeptLog& log) {
+std::string replayReason(const KeptLog& log, std::int32_t status) {
     const std::string line = log.reason();
-    const std::optional<std::int32_t> status = statusIn(line);
-    return status ? line + " (" + platform::credentialStatusText(*status) + ")" : line;
+    return status == platform::kCredentialSuccess
+               ? line
+               : line + " (" + platform::credentialStatusText(status) + ")";
 }
 
 std::string storingReason(const KeptLog& log, const platform::CredentialOutcome& stored) {

@@ -10,8 +10,8 @@
 
 namespace welcomer::tool {
 
-// The system's last log line. Where it ends in a status of the credential store, the status's text follows.
-std::string replayReason(const KeptLog& log);
+// The system's last log line, and the text of the credential store's status where that is no success.
+std::string replayReason(const KeptLog& log, std::int32_t status);
 
 // The same for an item that was to be stored and the agent that was to be installed: with the reason that the
 // log line has no place for, and what else can be done where the keyring could not be asked.

@@ -5,12 +5,13 @@
 namespace welcomer::tool {
 namespace {
 
-std::string reasonAfter(std::initializer_list<const char*> lines) {
+std::string reasonAfter(std::initializer_list<const char*> lines,
+                        std::int32_t status = platform::kCredentialSuccess) {
     KeptLog log;
     for (const char* line : lines) {
         log.write(115, line);
     }
-    return replayReason(log);
+    return replayReason(log, status);
 }
 
 TEST(ReplayReason, IsTheLastLine) {
@@ -19,9 +20,9 @@ TEST(ReplayReason, IsTheLastLine) {
 
 TEST(ReplayReason, ExplainsTheStatusOfTheCredentialStore) {
     EXPECT_EQ(
-        reasonAfter({"Failed to create replay keychain item: 1"}),
+        reasonAfter({"Failed to create replay keychain item: 1"}, platform::kCredentialDuplicateItem),
         "Failed to create replay keychain item: 1 (an item with this service and account exists already)");
-    EXPECT_EQ(reasonAfter({"Failed to find replay keychain item: -5"}),
+    EXPECT_EQ(reasonAfter({"Failed to find replay keychain item: -5"}, -5),
               "Failed to find replay keychain item: -5 (unknown credential store status -5)");
 }
 
@@ -50,7 +51,7 @@ TEST(ReplayReason, OfStoringSaysWhichPathCouldNotBeWritten) {
               "/home/a/Items.plist: No space left on device)");
 }
 
-TEST(ReplayReason, LeavesALineAloneThatEndsInNoStatus) {
+TEST(ReplayReason, LeavesTheLineAloneWhereTheStoreDidNotFail) {
     EXPECT_EQ(reasonAfter({"replay keychain item: 1 or 2"}), "replay keychain item: 1 or 2");
     EXPECT_EQ(reasonAfter({"replay keychain item: "}), "replay keychain item: ");
 }
