@@ -1,41 +1,58 @@
 # Run by `cmake --install`, which has the last word on the prefix, and so on the paths in these files.
-#   PREFIX/lib/systemd   for the prefixes /usr and /usr/local this is on systemd's own search path
-#   /etc/xdg             the only place where sessions look for what they start, whichever of the two it is; with another
-#                        prefix nothing outside it is written
+#   PREFIX/lib             for the prefixes /usr and /usr/local this is on the search paths of systemd and its helpers
+#   WELCOMER_SYSTEM_UNITS  where units of the system go, when that is not PREFIX/lib/systemd/system
+#   /etc                   for what is looked for nowhere below /usr/local: with that prefix, and what sessions start with
+#                          /usr, too; with another prefix nothing outside it is written
+# Nothing is enabled here: the presets say what is to be.
 
-if(IS_ABSOLUTE "${WELCOMER_LIBEXECDIR}")
-    set(WELCOMER_LIBEXEC "${WELCOMER_LIBEXECDIR}")
-else()
-    set(WELCOMER_LIBEXEC "${CMAKE_INSTALL_PREFIX}/${WELCOMER_LIBEXECDIR}")
-endif()
+function(installed_path variable folder)
+    if(IS_ABSOLUTE "${folder}")
+        set(${variable} "${folder}" PARENT_SCOPE)
+    else()
+        set(${variable} "${CMAKE_INSTALL_PREFIX}/${folder}" PARENT_SCOPE)
+    endif()
+endfunction()
+installed_path(WELCOMER_LIBEXEC "${WELCOMER_LIBEXECDIR}")
+installed_path(WELCOMER_SYSTEM_UNITS "${WELCOMER_SYSTEM_UNIT_DIR}")
+
 if(CMAKE_INSTALL_PREFIX MATCHES "^/usr(/local)?/?$")
     set(WELCOMER_AUTOSTART "/etc/xdg/autostart")
 else()
     set(WELCOMER_AUTOSTART "${CMAKE_INSTALL_PREFIX}/etc/xdg/autostart")
 endif()
-set(WELCOMER_SYSTEMD "${CMAKE_INSTALL_PREFIX}/lib/systemd")
+if(CMAKE_INSTALL_PREFIX MATCHES "^/usr/local/?$")
+    set(WELCOMER_POLKIT_RULES "/etc/polkit-1/rules.d")
+else()
+    set(WELCOMER_POLKIT_RULES "${CMAKE_INSTALL_PREFIX}/share/polkit-1/rules.d")
+endif()
+set(WELCOMER_LIB "${CMAKE_INSTALL_PREFIX}/lib")
 
 # A folder of this run's own: installations of one build may run side by side, into different prefixes.
 string(RANDOM LENGTH 16 run)
 set(WELCOMER_INSTALLED "${WELCOMER_INSTALLED}/${run}")
 
-# Macros, since `cmake --install` lists what was installed in a variable of its own.
+# install_service_file(NAME FOLDER [INSTALLED_NAME])
+#   A macro, since `cmake --install` lists what was installed in a variable of its own.
 macro(install_service_file name destination)
-    configure_file("${WELCOMER_PACKAGING}/${name}.in" "${WELCOMER_INSTALLED}/${name}" @ONLY)
-    file(INSTALL "${WELCOMER_INSTALLED}/${name}" DESTINATION "${destination}")
-endmacro()
-# install_wish(UNIT TARGET FOLDER): has a target start a unit, without anybody enabling it first.
-macro(install_wish unit target folder)
-    file(MAKE_DIRECTORY "${WELCOMER_INSTALLED}/${target}.wants")
-    file(CREATE_LINK "../${unit}" "${WELCOMER_INSTALLED}/${target}.wants/${unit}" SYMBOLIC)
-    file(INSTALL "${WELCOMER_INSTALLED}/${target}.wants/${unit}" DESTINATION "${folder}/${target}.wants")
+    set(installed "${name}")
+    if(${ARGC} GREATER 2)
+        set(installed "${ARGV2}")
+    endif()
+    configure_file("${WELCOMER_PACKAGING}/${name}.in" "${WELCOMER_INSTALLED}/${installed}" @ONLY)
+    file(INSTALL "${WELCOMER_INSTALLED}/${installed}" DESTINATION "${destination}")
 endmacro()
 
-install_service_file(welcomer-launch-agents.service "${WELCOMER_SYSTEMD}/user")
-install_wish(welcomer-launch-agents.service graphical-session.target "${WELCOMER_SYSTEMD}/user")
+install_service_file(welcomer-launch-agents.service "${WELCOMER_LIB}/systemd/user")
 install_service_file(welcomer-launch-agents.desktop "${WELCOMER_AUTOSTART}")
+install_service_file(user.preset "${WELCOMER_LIB}/systemd/user-preset" 80-welcomer.preset)
 
-install_service_file(welcomer-resolver-sync.service "${WELCOMER_SYSTEMD}/system")
-install_wish(welcomer-resolver-sync.service multi-user.target "${WELCOMER_SYSTEMD}/system")
+install_service_file(welcomer-restore-network.service "${WELCOMER_SYSTEM_UNITS}")
+install_service_file(system.preset "${WELCOMER_LIB}/systemd/system-preset" 80-welcomer.preset)
+
+install_service_file(welcomer-resolver-sync.service "${WELCOMER_SYSTEM_UNITS}")
+install_service_file(resolver-sync.preset "${WELCOMER_LIB}/systemd/system-preset" 80-welcomer-resolver-sync.preset)
+install_service_file(resolver-sync.sysusers "${WELCOMER_LIB}/sysusers.d" welcomer-resolver-sync.conf)
+install_service_file(resolver-sync.tmpfiles "${WELCOMER_LIB}/tmpfiles.d" welcomer-resolver-sync.conf)
+install_service_file(resolver-sync.rules "${WELCOMER_POLKIT_RULES}" welcomer-resolver-sync.rules)
 
 file(REMOVE_RECURSE "${WELCOMER_INSTALLED}")

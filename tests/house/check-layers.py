@@ -46,7 +46,7 @@ TOOL_ROOMS = {"tools/welcomer": ["terminal", "cli", "story", "commands"]}
 TESTS = {"tests"}
 # The only files, besides tests and the backends themselves, that may choose a backend, and what is offered to them.
 PROGRAMS = re.compile(r"^(agent/main\.cpp|tools/[^/]+/main\.cpp)$")
-OFFERED = re.compile(r"^backends/(Backends|UnexpectedEnd|simulated/.+)\.h$")
+OFFERED = re.compile(r"^backends/(Backends|StoredNetwork|UnexpectedEnd|simulated/.+)\.h$")
 
 # What of the backends tools may use, too: the one base on the kernel, and addresses as text.
 FOR_TOOLS = re.compile(r"^backends/(posix/[^/]+|network/IPv4Text)\.h$")

@@ -136,6 +136,7 @@ class Story:
 
     def install(self):
         self.machine.install(BUILD)
+        self.machine.enable_for_users("welcomer-launch-agents.service")
         plugin_folder = self.machine.root / "System/Library/CoreServices/FirstRunPlugins"
         plugin_folder.mkdir(parents=True)
         for plugin in PLUGINS:

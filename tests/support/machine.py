@@ -92,7 +92,7 @@ class Machine:
 
     def install(self, build):
         """Installs a build tree where it says that it is installed."""
-        stage = self.root / "tmp" / "stage"
+        stage = self.root / "stage"
         subprocess.run(["cmake", "--install", str(build)], check=True, stdout=subprocess.DEVNULL,
                        env={**os.environ, "DESTDIR": str(stage)})
         for folder in sorted(stage.iterdir()):
@@ -100,6 +100,12 @@ class Machine:
                 mount(stage / "usr" / "local", self.root / "usr" / "local", None, MS_BIND)
             else:
                 subprocess.run(["cp", "-a", str(folder), str(self.root)], check=True)
+
+    def enable_for_users(self, *units):
+        """Has user units be wanted, or not, as the presets say: what the installation of a package does."""
+        done = self.run(["/usr/bin/systemctl", "--global", "preset", *units])
+        if done.returncode != 0:
+            raise AssertionError(f"the presets failed: {done}")
 
     def start_system_log(self):
         """A real rsyslogd on /dev/log. Its records are read with log_records()."""

@@ -91,34 +91,39 @@ class ResolverMachine(machine.Machine):
         return done.stdout
 
     def _start_environments(self):
-        """A namespace behind a link, and the nameservers in it."""
-        place = subprocess.Popen(["unshare", "--net", "sleep", "infinity"])
-        self._daemons.append(place)
-        own = os.readlink("/proc/self/ns/net")
-        self.wait_for(lambda: os.readlink(f"/proc/{place.pid}/ns/net") != own, "the other network namespace")
+        self._daemons += start_environments()
 
-        def there(*command):
-            return ["nsenter", "--net", f"--target={place.pid}", *command]
 
-        commands = [["ip", "link", "add", LINK, "type", "veth", "peer", "name", "environments"],
-                    ["ip", "link", "set", "environments", "netns", str(place.pid)],
-                    ["ip", "address", "add", "10.7.0.1/24", "dev", LINK], ["ip", "link", "set", LINK, "up"],
-                    there("ip", "link", "set", "lo", "up"), there("ip", "link", "set", "environments", "up"),
-                    there("ip", "address", "add", "10.7.0.2/24", "dev", "environments")]
-        for address in (*NAMESERVERS.values(), OTHER_NAMESERVER):
-            commands += [there("ip", "address", "add", f"{address}/32", "dev", "environments"),
-                         ["ip", "route", "add", f"{address}/32", "via", "10.7.0.2"]]
-        for command in commands:
-            subprocess.run(command, check=True)
-        served = [(NAMESERVERS[name], {domain: ANSWERS[name] for domain in DOMAINS}) for name in NAMESERVERS]
-        served.append((OTHER_NAMESERVER, {OTHER_DOMAIN: OTHER_ANSWER}))
-        for address, names in served:
-            self._daemons.append(subprocess.Popen(
-                there("dnsmasq", "--no-daemon", "--conf-file=/dev/null", "--no-resolv", "--no-hosts", "--pid-file=",
-                      "--user=root", f"--listen-address={address}", "--bind-interfaces",
-                      *(f"--address=/{domain}/{answer}" for domain, answer in names.items())),
-                stderr=subprocess.DEVNULL))
-            self.wait_for(lambda: ask(f"x.{next(iter(names))}", address), f"the nameserver {address}")
+def start_environments():
+    """A namespace behind a link, and the nameservers in it: the processes, which are the caller's to end."""
+    place = subprocess.Popen(["unshare", "--net", "sleep", "infinity"])
+    daemons = [place]
+    own = os.readlink("/proc/self/ns/net")
+    machine.Machine.wait_for(lambda: os.readlink(f"/proc/{place.pid}/ns/net") != own, "the other network namespace")
+
+    def there(*command):
+        return ["nsenter", "--net", f"--target={place.pid}", *command]
+
+    commands = [["ip", "link", "add", LINK, "type", "veth", "peer", "name", "environments"],
+                ["ip", "link", "set", "environments", "netns", str(place.pid)],
+                ["ip", "address", "add", "10.7.0.1/24", "dev", LINK], ["ip", "link", "set", LINK, "up"],
+                there("ip", "link", "set", "lo", "up"), there("ip", "link", "set", "environments", "up"),
+                there("ip", "address", "add", "10.7.0.2/24", "dev", "environments")]
+    for address in (*NAMESERVERS.values(), OTHER_NAMESERVER):
+        commands += [there("ip", "address", "add", f"{address}/32", "dev", "environments"),
+                     ["ip", "route", "add", f"{address}/32", "via", "10.7.0.2"]]
+    for command in commands:
+        subprocess.run(command, check=True)
+    served = [(NAMESERVERS[name], {domain: ANSWERS[name] for domain in DOMAINS}) for name in NAMESERVERS]
+    served.append((OTHER_NAMESERVER, {OTHER_DOMAIN: OTHER_ANSWER}))
+    for address, names in served:
+        daemons.append(subprocess.Popen(
+            there("dnsmasq", "--no-daemon", "--conf-file=/dev/null", "--no-resolv", "--no-hosts", "--pid-file=",
+                  "--user=root", f"--listen-address={address}", "--bind-interfaces",
+                  *(f"--address=/{domain}/{answer}" for domain, answer in names.items())),
+            stderr=subprocess.DEVNULL))
+        machine.Machine.wait_for(lambda: ask(f"x.{next(iter(names))}", address), f"the nameserver {address}")
+    return daemons
 
 
 def ask(name, server="127.0.0.53", timeout=2):

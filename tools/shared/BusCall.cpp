@@ -42,6 +42,11 @@ Bus openSessionBus() {
     return sd_bus_open_user(&bus) < 0 ? nullptr : Bus(bus);
 }
 
+Bus openSystemBus() {
+    sd_bus* bus = nullptr;
+    return sd_bus_open_system(&bus) < 0 ? nullptr : Bus(bus);
+}
+
 Bus openBusAt(const std::string& address) {
     sd_bus* made = nullptr;
     if (sd_bus_new(&made) < 0) {

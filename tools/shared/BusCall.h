@@ -34,10 +34,11 @@ struct DropMessage {
 };
 using Message = std::unique_ptr<sd_bus_message, DropMessage>;
 
-// The bus of the session that this process runs in, or the one at an address.
+// The bus of the session that this process runs in, the machine's own, or the one at an address.
 //  result  null where there is none
 // One thread for each bus, as for all that is done on it.
 Bus openSessionBus();
+Bus openSystemBus();
 Bus openBusAt(const std::string& address);
 
 // One call of a method. Starts nobody. Its arguments are added in their order; what cannot be added is told

@@ -6,7 +6,9 @@
 
 namespace welcomer::resolver {
 
-inline constexpr const char* kRunningMark = "/run/welcomer-resolver-sync.state";
+// The service's own folder, while it runs, and the mark in it.
+inline constexpr const char* kRuntimeFolder = "/run/welcomer-resolver-sync";
+inline constexpr const char* kRunningMark = "/run/welcomer-resolver-sync/state";
 
 // A file that the service holds locked as long as it lives, so that a service that was killed is not taken
 // for one that runs. Everybody may read it, and so may lock it for reading: it is made anew by each service,

@@ -39,6 +39,7 @@ class LaunchAgentsTest(unittest.TestCase):
         self.folder = Path(tempfile.mkdtemp(prefix="launch-agents-"))
         self.machine = machine.Machine(self.folder / "machine")
         self.machine.install(self.build)
+        self.machine.enable_for_users(UNIT)
         self.machine.start_system_log()
         self.agents = self.machine.home / "Library/LaunchAgents"
         self.out = self.machine.home / "out"
@@ -105,6 +106,19 @@ class WithUserManager(LaunchAgentsTest):
         self.add("one", *arguments)
         self.log_in()
         self.assertEqual(self.wait_for_runs("one")[0][3], "".join(f"[{each}]" for each in arguments))
+
+    def test_an_administrator_can_disable_it(self):
+        self.add("one")
+        done = self.machine.run(["/usr/bin/systemctl", "--global", "disable", UNIT])
+        self.assertEqual(done.returncode, 0, done)
+        self.log_in()
+        self.assertEqual(self.login.systemctl("is-active", UNIT, check=False).stdout.strip(), "inactive")
+        self.assertEqual(self.login.systemctl("is-enabled", UNIT, check=False).stdout.strip(), "disabled")
+        self.assertEqual(self.runs("one"), [])
+        done = self.machine.run(["/usr/bin/systemctl", "--global", "preset", UNIT])
+        self.log_out()
+        self.log_in()
+        self.wait_for_runs("one")
 
     def test_nothing_starts_before_the_session_is_up(self):
         self.add("one")
@@ -282,5 +296,5 @@ class WithoutUserManager(LaunchAgentsTest):
 
 if __name__ == "__main__":
     machine.enter_namespaces()
-    LaunchAgentsTest.build = sys.argv[1]
-    unittest.main(argv=sys.argv[:1], verbosity=2)
+    LaunchAgentsTest.build = sys.argv.pop(1)
+    unittest.main(verbosity=2)

@@ -67,7 +67,7 @@ class ResolverSync(unittest.TestCase):
     def wait_until_nothing_is_left(self):
         self.machine.wait_for(lambda: not links(), "the end of the link")
         self.machine.wait_for(lambda: not self.forwarders(), "the end of the forwarder")
-        self.machine.wait_for(lambda: not (self.machine.root / "run/welcomer-resolver-sync").exists(),
+        self.machine.wait_for(lambda: not (self.machine.root / "run/welcomer-resolver-sync/forwarder").exists(),
                               "the end of the folder")
 
     def forwarders(self):
@@ -128,7 +128,7 @@ class ResolverSync(unittest.TestCase):
         self.machine.wait_for(lambda: self.diagnosis() == works, "the next service")
         self.end_service()
         self.assertEqual(self.diagnosis(), idle)
-        self.assertFalse((self.machine.root / "run/welcomer-resolver-sync.state").exists())
+        self.assertFalse((self.machine.root / "run/welcomer-resolver-sync/state").exists())
 
     def test_other_names_are_not_asked_of_the_environment(self):
         self.start_service()

@@ -65,7 +65,7 @@ class ResolverOverrides(unittest.TestCase):
         folder = tempfile.TemporaryDirectory()
         self.addCleanup(folder.cleanup)
         self.root = Path(folder.name)
-        for name in ("run/systemd/resolve", "etc"):
+        for name in ("run/systemd/resolve", "run/welcomer-resolver-sync", "etc"):
             (self.root / name).mkdir(parents=True)
 
     def start_resolver(self):
@@ -76,7 +76,7 @@ class ResolverOverrides(unittest.TestCase):
         return listener
 
     def start_service(self, trouble=""):
-        mark = (self.root / "run/welcomer-resolver-sync.state").open("w+", encoding="utf-8")
+        mark = (self.root / "run/welcomer-resolver-sync/state").open("w+", encoding="utf-8")
         self.addCleanup(mark.close)
         fcntl.lockf(mark, fcntl.LOCK_EX | fcntl.LOCK_NB)
         mark.write(trouble)
