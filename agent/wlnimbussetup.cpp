@@ -71,7 +71,7 @@ void finishSetup(const std::string& label) {
 int wlnimbussetup(int argc, const char* const* argv) {
     try {
         attempt([&] { finishSetup(argc >= 2 ? argv[1] : kLaunchAgentLabel); });
-        WL_LOG("exiting");
+        WL_LOG(kAgentExitingMessage);
     } catch (...) {
         // What cannot even be logged does not change how the agent ends.
     }

@@ -4,6 +4,9 @@
 
 namespace welcomer {
 
+// The agent's last log line.
+inline constexpr char kAgentExitingMessage[] = "exiting";
+
 // Runs the agent on the installed platform, as the logged-in user: removes its launch-agent file, reads and
 // deletes the replay item, carries out the setup stages, waits for their work and lingers for two minutes.
 // Without a readable replay item it ends at once. Nothing throws out of it.

@@ -4,6 +4,7 @@
 #include "platform/Platform.h"
 #include "propertylist/PropertyListReader.h"
 
+#include <charconv>
 #include <utility>
 
 namespace welcomer {
@@ -30,7 +31,7 @@ platform::CredentialFinding findReplayItem(platform::CredentialWish wish) {
 bool read(platform::CredentialFinding& found, PropertyList* replayObject, bool wantsAttributes) {
     found = findReplayItem(platform::CredentialWish::Secret);
     if (!found) {
-        WL_LOG("Failed to find replay keychain item: %d", found.status);
+        WL_LOG(kReplayItemNotFoundMessage, found.status);
         return false;
     }
     if (replayObject && !deserializeReplayObject(found.secret, *replayObject)) {
@@ -52,6 +53,19 @@ bool isDeleted(std::int32_t status) {
 }
 
 } // namespace
+
+std::optional<std::int32_t> replayItemNotFoundStatus(std::string_view line) {
+    constexpr std::string_view message = kReplayItemNotFoundMessage;
+    constexpr std::string_view beginning = message.substr(0, message.find('%'));
+    if (!line.starts_with(beginning)) {
+        return std::nullopt;
+    }
+    line.remove_prefix(beginning.size());
+    std::int32_t status = 0;
+    const auto [end, error] = std::from_chars(line.data(), line.data() + line.size(), status);
+    const bool isWhole = error == std::errc() && end == line.data() + line.size();
+    return isWhole ? std::optional(status) : std::nullopt;
+}
 
 bool WLGetNimbusReplayKeychainItem(PropertyList* replayObject, std::string* accountName) {
     platform::CredentialFinding found;

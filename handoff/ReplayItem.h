@@ -8,7 +8,9 @@
 
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
+#include <string_view>
 
 namespace welcomer {
 
@@ -22,6 +24,12 @@ inline constexpr char kReplayItemAccount[] = "Welcomer";
 inline constexpr char kReplayResponsesKey[] = "delegatesResponseDict";
 inline constexpr char kReplayVidlinkAliasesKey[] = "vlAliases";
 inline constexpr char kReplayChatterAliasesKey[] = "imAliases";
+
+// What the readers below log of an item that cannot be found, with the credential store's status.
+inline constexpr char kReplayItemNotFoundMessage[] = "Failed to find replay keychain item: %d";
+
+// The status in such a line of a log; none in any other line. Any thread.
+std::optional<std::int32_t> replayItemNotFoundStatus(std::string_view line);
 
 // Reads the replay item.
 //  replayObject  where to put the replay object, or null: then nothing is deserialised. Any property-list

@@ -84,6 +84,20 @@ int replaceFile(int folder, const std::string& name, std::string_view content, m
     return 0;
 }
 
+int createFile(int folder, const std::string& name, std::string_view content, mode_t mode) {
+    removeLeftOver(folder, name);
+    const std::string temporary = temporaryName(name);
+    int error = writeNewFile(folder, temporary, content, mode);
+    if (error == 0 && ::linkat(folder, temporary.c_str(), folder, name.c_str(), 0) != 0) {
+        error = errno;
+    }
+    removeLeftOver(folder, name);
+    if (error == 0) {
+        ::fsync(folder);
+    }
+    return error;
+}
+
 void removeLeftOver(int folder, const std::string& name) {
     ::unlinkat(folder, temporaryName(name).c_str(), 0);
 }

@@ -24,6 +24,11 @@ enum class AfterCrash { New, OldOrNew };
 int replaceFile(int folder, const std::string& name, std::string_view content, mode_t mode,
                 AfterCrash afterCrash = AfterCrash::New);
 
+// Makes a file that is not there yet: all of it appears at once.
+//  result  0, or the system's error number, EEXIST when something has the name; nothing is left behind then
+// The rest is as above. Any thread.
+int createFile(int folder, const std::string& name, std::string_view content, mode_t mode);
+
 // Removes what a writer that was killed left beside a file. The caller holds the file's lock. Any thread.
 void removeLeftOver(int folder, const std::string& name);
 

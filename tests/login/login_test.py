@@ -188,12 +188,6 @@ class Story:
         return [record[2] for record in self.machine.log_records("wlnimbussetup")]
 
     def log_in(self):
-        # With this beside the unit, the user manager writes down how the agent's process has ended.
-        ended = self.machine.root / "tmp/ended"
-        beside = self.machine.home / f".config/systemd/user/{UNIT}.d"
-        beside.mkdir(parents=True)
-        (beside / "ended.conf").write_text(
-            "[Service]\nExecStopPost=/bin/sh -c 'echo $SERVICE_RESULT $EXIT_CODE $EXIT_STATUS > /tmp/ended'\n")
         login = logins.Login(self.machine, environment=BUS)
         self.prepare_login(login)
         login.start_session()
@@ -203,8 +197,9 @@ class Story:
         self.meanwhile(login)
         self.machine.wait_for(lambda: self.texts()[-1:] == ["exiting"], "the agent's end", seconds=400)
         self.seconds = time.monotonic() - started
-        self.machine.wait_for(lambda: not self.agent_units(login), "the end of the agent's unit")
-        self.ended = ended.read_text().strip()
+        self.machine.wait_for(lambda: "running" not in self.agent_units(login), "the end of the agent's unit")
+        self.ended = [login.systemctl("show", UNIT, f"--property={name}", "--value").stdout.strip()
+                      for name in ("SubState", "Result", "ExecMainStatus")]
         self.log_out(login)
         self.launch_agent_at_end = self.launch_agent.exists()
         self.records_at_end = self.machine.log_records("wlnimbussetup")
@@ -343,7 +338,7 @@ class StoryTest(unittest.TestCase):
         self.assertFalse(self.seen.launch_agent_at_end)
         self.assertEqual(self.seen.seen["SubState"], "running")
         self.assertGreaterEqual(self.seen.seconds, 119)
-        self.assertEqual(self.seen.ended, "success exited 0")
+        self.assertEqual(self.seen.ended, ["exited", "success", "0"])
         self.assert_log_is_the_storys()
         self.assertEqual(self.seen.services_after_login, services_after_login)
         self.assertIsNone(self.seen.replay_after_login)
@@ -390,7 +385,7 @@ class LockedForGoodTest(StoryTest):
         self.assertGreaterEqual(self.seen.seconds, 119)
         self.assertEqual(self.seen.texts_at_end,
                          ["Self destructing...", "Failed to find replay keychain item: 10", "exiting"])
-        self.assertEqual(self.seen.ended, "success exited 0")
+        self.assertEqual(self.seen.ended, ["exited", "success", "0"])
         self.assertFalse(self.seen.launch_agent_at_end)
         self.assertEqual(self.seen.replay_after_login, ACCOUNT)
         self.assertEqual(self.seen.services_after_login, PRE_LOGIN)

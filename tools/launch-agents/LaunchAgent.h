@@ -14,6 +14,8 @@ struct LaunchAgent {
     std::string program;                // the full path of what is run
     std::vector<std::string> arguments; // with the program's own name first, as argv has it
     bool runAtLoad = false;             // whether it is started at the login
+    std::string file = {};              // the name of the file that it was read from, and
+    std::string content = {};           // what is in it; both empty where it was not read from a file
 
     friend bool operator==(const LaunchAgent&, const LaunchAgent&) = default;
 };

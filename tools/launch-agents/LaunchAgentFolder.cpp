@@ -11,6 +11,7 @@
 #include <sys/stat.h>
 #include <system_error>
 #include <unistd.h>
+#include <utility>
 
 namespace welcomer::launch {
 
@@ -87,7 +88,12 @@ LaunchAgentResult readFile(int folder, const std::string& name, uid_t owner) {
     if (std::string reason = readTrusted(folder, name, owner, content); !reason.empty()) {
         return {std::nullopt, std::move(reason)};
     }
-    return readLaunchAgent(content);
+    LaunchAgentResult result = readLaunchAgent(content);
+    if (result.agent) {
+        result.agent->file = name;
+        result.agent->content = std::move(content);
+    }
+    return result;
 }
 
 std::vector<std::string> sortedNames(DIR* folder) {

@@ -6,6 +6,7 @@
 #include "tools/shared/BusCall.h"
 
 #include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -15,8 +16,9 @@ namespace welcomer::launch {
 // unit's name cannot hold written as "\xNN".
 std::string unitName(std::string_view label);
 
-// Each agent is a transient service of its own, which goes away when it ends, however it ends. The user
-// manager sees to its environment and its output.
+// Each agent is a transient service of its own, which stays when it has ended, however it ended, so that its
+// status can be asked: as "active (exited)" or "failed", until the user manager ends or a later login starts
+// the agent again. The user manager sees to its environment and its output.
 class UserManagerStarter final : public AgentStarter {
   public:
     // Looks for the user manager on the session's bus, then on the bus in the runtime folder. A bus that is
@@ -27,15 +29,27 @@ class UserManagerStarter final : public AgentStarter {
     static std::unique_ptr<UserManagerStarter> connect(const std::string& runtimeFolder);
 
     // Done once the user manager has accepted the service; that its program cannot be run is for the manager
-    // to say.
+    // to say. Where an earlier login's service is still there, and has ended, it makes room.
     platform::Outcome start(const LaunchAgent& agent) override;
+
+    std::optional<AgentRun> waitForEnd(const LaunchAgent& agent) override;
 
   private:
     explicit UserManagerStarter(bus::Bus bus) : _bus(std::move(bus)) {}
 
     static bool _waitForUserManager(sd_bus* bus);
 
+    // The object of a unit that is loaded, or empty.
+    std::string _unit(const std::string& name);
+    std::string _subState(const std::string& unit);
+    std::string _invocation(const std::string& unit);
+    AgentRun _run(const std::string& unit, std::string invocation);
+    // Has what tells of units and their changes come here.
+    bool _listen();
+    void _removeEnded(const std::string& name);
+
     const bus::Bus _bus;
+    bool _isListening = false;
 };
 
 } // namespace welcomer::launch

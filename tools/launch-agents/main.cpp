@@ -8,28 +8,35 @@
 #include "text/ProgramOptions.h"
 #include "tools/launch-agents/ChildStarter.h"
 #include "tools/launch-agents/UserManagerStarter.h"
+#include "tools/launch-agents/offerAgain.h"
 #include "tools/launch-agents/startLaunchAgents.h"
 
 #include <cstdlib>
 #include <string_view>
+#include <systemd/sd-daemon.h>
+#include <utility>
 
 using namespace welcomer;
 
 namespace {
 
-// Starts the launch agents that lie in the user's home.
+// Starts the launch agents that lie in the user's home, and stays with the agent of this system until it has
+// ended.
 //  result  the exit status
 int startAgents(platform::ProcessIdentity& user, const std::string& runtimeFolder,
                 const launch::LoginStamp& stamp) {
     try {
         const std::string home = user.homeDirectory();
-        launch::startLaunchAgents(launchAgentsFolder(home), user.effectiveUserID(), stamp,
-                                  [&]() -> std::unique_ptr<launch::AgentStarter> {
-                                      if (auto manager = launch::UserManagerStarter::connect(runtimeFolder)) {
-                                          return manager;
-                                      }
-                                      return std::make_unique<launch::ChildStarter>(home);
-                                  });
+        const std::string folder = launchAgentsFolder(home);
+        launch::StartedAgents started = launch::startLaunchAgents(
+            folder, user.effectiveUserID(), stamp, [&]() -> std::unique_ptr<launch::AgentStarter> {
+                if (auto manager = launch::UserManagerStarter::connect(runtimeFolder)) {
+                    return manager;
+                }
+                return std::make_unique<launch::ChildStarter>(home);
+            });
+        ::sd_notify(0, "READY=1"); // who waits for the login's agents to be started need wait no longer
+        launch::offerAgain(folder, std::move(started));
         return 0;
     } catch (const platform::Exception& exception) { // there is no home
         WL_LOG("Launch agents cannot start: %@", exception);

@@ -12,6 +12,8 @@
 #include "propertylist/PropertyListWriter.h"
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/PluginRegistry.h"
+#include "tools/launch-agents/LaunchAgentFolder.h"
+#include "tools/launch-agents/offerAgain.h"
 
 #include <array>
 #include <cerrno>
@@ -21,10 +23,12 @@
 #include <functional>
 #include <gtest/gtest.h>
 #include <memory>
+#include <sstream>
 #include <string>
 #include <sys/ptrace.h>
 #include <sys/wait.h>
 #include <unistd.h>
+#include <vector>
 
 namespace welcomer {
 namespace {
@@ -88,6 +92,24 @@ class ActingDelegate final : public WLFirstRunDelegateConfiguration {
     const std::string _path;
 };
 
+// A keyring that nobody can be asked to unlock.
+class LockedStore final : public platform::CredentialStore {
+  public:
+    platform::CredentialOutcome createItem(const platform::CredentialItem& /*item*/,
+                                           const std::string& /*data*/) override {
+        return {platform::kCredentialLocked};
+    }
+    platform::CredentialFinding findItem(const std::string& /*service*/, const std::string& /*account*/,
+                                         platform::CredentialWish /*wish*/) override {
+        platform::CredentialFinding found;
+        found.status = platform::kCredentialLocked;
+        return found;
+    }
+    std::int32_t deleteItem(const platform::CredentialItemReference& /*reference*/) override {
+        return platform::kCredentialLocked;
+    }
+};
+
 // A home after setup: an account with every service, the replay item and the launch agent.
 class Home {
   public:
@@ -141,18 +163,47 @@ class Home {
         });
     }
 
+    // Whether the credential store can be asked at a login.
+    enum class Keyring { Open, Locked };
+
     // A login that is killed before a system call, counted from 1.
-    //  result  false when the linger began first; the agent is killed then
-    bool logInAndKillAt(int number) const {
-        const pid_t child = start([this] {
+    //  result  false when the agent ended or the linger began first; it is killed in the linger
+    bool logInAndKillAt(int number, Keyring keyring = Keyring::Open) const {
+        const pid_t child = start([&] {
             FileLog log(root.locate("/log"));
             log.signalsLinger = true;
             const auto platform = buildPlatform({.root = root.path(), .systemLog = &log});
+            LockedStore locked;
+            const platform::Platform chosen =
+                keyring == Keyring::Locked ? withStore(platform->platform(), locked) : platform->platform();
             ::ptrace(PTRACE_TRACEME, 0, nullptr, nullptr);
             ::raise(SIGSTOP);
-            return runAgent(platform->platform());
+            return runAgent(chosen);
         });
-        return killTraced(child, number);
+        return killTraced(child, number, keyring == Keyring::Open);
+    }
+
+    // What the launch service does after that login, with what the agent has logged.
+    //  result  whether the agent is offered again
+    bool offerAgain(const launch::LaunchAgent& agent) const {
+        std::vector<std::string> lines;
+        std::istringstream text(root.content("/log").value_or(""));
+        for (std::string line; std::getline(text, line);) {
+            lines.push_back(line);
+        }
+        const auto status = launch::statusOfUnaskedItem(lines);
+        if (status) {
+            const platform::ScopedPlatform installed(owner->platform());
+            launch::putBack(root.locate(launchAgentsFolder(home)), agent, *status);
+        }
+        return status.has_value();
+    }
+
+    // The agent's definition as the launch service reads it before the start.
+    launch::LaunchAgent readAgent() const {
+        const platform::ScopedPlatform installed(owner->platform());
+        const auto agents = launch::readLaunchAgents(root.locate(launchAgentsFolder(home)), ::geteuid());
+        return agents.empty() ? launch::LaunchAgent() : agents.front();
     }
 
     bool hasReplayItem() const {
@@ -214,8 +265,29 @@ class Home {
                information.op == PTRACE_SYSCALL_INFO_ENTRY;
     }
 
+    static platform::Platform withStore(const platform::Platform& of, platform::CredentialStore& store) {
+        return {.systemLog = of.systemLog,
+                .fileSystem = of.fileSystem,
+                .processIdentity = of.processIdentity,
+                .credentialStore = store,
+                .pluginBundle = of.pluginBundle,
+                .resourceBundles = of.resourceBundles,
+                .clock = of.clock,
+                .runLoops = of.runLoops,
+                .dispatchQueues = of.dispatchQueues,
+                .preferenceStore = of.preferenceStore,
+                .systemVersionInfo = of.systemVersionInfo,
+                .hostReachability = of.hostReachability,
+                .notificationCenter = of.notificationCenter,
+                .accountService = of.accountService,
+                .processLauncher = of.processLauncher,
+                .networkConfigStore = of.networkConfigStore,
+                .networkStateStore = of.networkStateStore,
+                .directoryService = of.directoryService};
+    }
+
     // Counts the system calls of all of the agent's threads.
-    static bool killTraced(pid_t child, int number) {
+    static bool killTraced(pid_t child, int number, bool lingers) {
         int status = 0;
         ::waitpid(child, &status, 0); // the stop that it gave itself
         ::ptrace(PTRACE_SETOPTIONS, child, nullptr,
@@ -230,8 +302,8 @@ class Home {
             }
             if (!WIFSTOPPED(status)) {
                 if (thread == child) {
-                    EXPECT_TRUE(WIFSIGNALED(status)) << "the agent ended by itself";
-                    return !hasLingered;
+                    EXPECT_TRUE(WIFSIGNALED(status) || !lingers) << "the agent ended by itself";
+                    return !hasLingered && WIFSIGNALED(status);
                 }
                 continue;
             }
@@ -262,8 +334,10 @@ TEST(AgentKillTest, KilledAtAnySystemCallNoItemIsActedOnTwiceAndTheAccountFileIs
         ++number;
         const Home home;
         ASSERT_TRUE(home.isReady);
+        const launch::LaunchAgent agent = home.readAgent();
         wasKilledBefore = home.logInAndKillAt(number);
         SCOPED_TRACE("killed at system call " + std::to_string(number));
+        ASSERT_FALSE(home.offerAgain(agent)) << "though it may have read its item";
 
         const long actsOfTheFirst = home.acts();
         const bool hadItem = home.hasReplayItem();
@@ -290,6 +364,36 @@ TEST(AgentKillTest, KilledAtAnySystemCallNoItemIsActedOnTwiceAndTheAccountFileIs
     EXPECT_TRUE(actedInTheFirst);
     EXPECT_GT(number, 100);
     RecordProperty("SystemCalls", number);
+}
+
+TEST(AgentKillTest, KilledAtAnySystemCallAnAgentThatCouldNotAskIsOfferedAtMostOnceAndThenActsOnce) {
+    bool wasEverOffered = false;
+    bool wasEverLost = false;
+    int number = 0;
+    for (bool wasKilled = true; wasKilled;) {
+        ++number;
+        const Home home;
+        ASSERT_TRUE(home.isReady);
+        const launch::LaunchAgent agent = home.readAgent();
+        wasKilled = home.logInAndKillAt(number, Home::Keyring::Locked);
+        SCOPED_TRACE("killed at system call " + std::to_string(number));
+        ASSERT_EQ(home.acts(), 0);
+        const bool hadFile = home.hasLaunchAgent();
+        const bool wasOffered = home.offerAgain(agent);
+        ASSERT_EQ(home.hasLaunchAgent(), hadFile || wasOffered);
+        ASSERT_TRUE(home.hasReplayItem());
+        wasEverOffered = wasEverOffered || wasOffered;
+        wasEverLost = wasEverLost || !home.hasLaunchAgent();
+        if (home.hasLaunchAgent()) {
+            ASSERT_EQ(home.logIn(), 0);
+            ASSERT_EQ(home.acts(), 1);
+            ASSERT_FALSE(home.offerAgain(agent));
+            ASSERT_FALSE(home.hasLaunchAgent());
+        }
+    }
+    EXPECT_TRUE(wasEverOffered);
+    EXPECT_TRUE(wasEverLost);
+    EXPECT_GT(number, 10);
 }
 
 } // namespace

@@ -84,6 +84,13 @@ class LaunchAgentsTest(unittest.TestCase):
     def records(self):
         return [record[2] for record in self.machine.log_records("welcomer-launch-agents")]
 
+    def property(self, label, name):
+        return self.login.systemctl("show", f"welcomer-agent-{label}.service", f"--property={name}",
+                                    "--value").stdout.strip()
+
+    def status(self, label):
+        return " ".join(self.property(label, name) for name in ("ActiveState", "SubState", "Result", "ExecMainStatus"))
+
     def agent_units(self):
         listed = self.login.systemctl("list-units", "--all", "--plain", "--no-legend", "welcomer-agent-*").stdout
         return [line.split()[0] for line in listed.splitlines()]
@@ -136,7 +143,7 @@ class WithUserManager(LaunchAgentsTest):
         again = self.login.run([PROGRAM])
         self.assertEqual((again.returncode, again.stdout, again.stderr), (0, "", ""))
         self.assertEqual((len(self.runs("one")), self.runs("two")), (1, []))
-        self.assertEqual(self.agent_units(), [])
+        self.assertEqual(self.agent_units(), ["welcomer-agent-one.service"])
 
     def test_the_next_login_starts_it_again(self):
         self.add("one")
@@ -163,11 +170,25 @@ class WithUserManager(LaunchAgentsTest):
         self.assertTrue((self.machine.root / "proc" / process).exists())
         self.assertEqual(self.agent_units(), ["welcomer-agent-long.service"])
 
-    def test_an_agent_that_fails_leaves_no_unit_behind(self):
+    def test_how_an_agent_has_ended_can_be_asked_until_the_next_login(self):
         self.add("bad")
+        self.add("good")
         self.log_in()
-        self.wait_for_runs("bad")
-        self.machine.wait_for(lambda: self.agent_units() == [], "the end of the failed unit")
+        ended = (("bad", "failed failed exit-code 3"), ("good", "active exited success 0"))
+        for label, status in ended:
+            self.wait_for_runs(label)
+            self.machine.wait_for(lambda: self.status(label) == status, f"the end of {label}")
+        self.assertEqual(self.agent_units(), ["welcomer-agent-bad.service", "welcomer-agent-good.service"])
+        # Also where the user manager stays from one session to the next.
+        before = self.property("good", "InvocationID")
+        self.login.end_session()
+        self.assertEqual([self.status(label) for label, _ in ended], [status for _, status in ended])
+        self.login.start_session()
+        for label, status in ended:
+            self.wait_for_runs(label, 2)
+            self.machine.wait_for(lambda: self.status(label) == status, f"the second end of {label}")
+        self.assertNotEqual(self.property("good", "InvocationID"), before)
+        self.assertEqual(self.records(), [])
 
     def test_an_agent_that_still_runs_is_not_started_twice(self):
         self.add("long")

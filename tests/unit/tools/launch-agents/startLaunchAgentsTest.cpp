@@ -26,12 +26,13 @@ class StartLaunchAgents : public testing::Test {
         EXPECT_EQ(::chmod(_root.locate(name).c_str(), 0644), 0);
     }
 
-    void logIn(const std::string& runtimeFolder = "/run") {
-        startLaunchAgents(_root.locate("/agents"), ::geteuid(),
-                          LoginStamp(runtimeFolder.empty() ? "" : _root.locate(runtimeFolder)), [this] {
-                              ++_startersMade;
-                              return std::make_unique<Starter>(*this);
-                          });
+    StartedAgents logIn(const std::string& runtimeFolder = "/run") {
+        return startLaunchAgents(_root.locate("/agents"), ::geteuid(),
+                                 LoginStamp(runtimeFolder.empty() ? "" : _root.locate(runtimeFolder)),
+                                 [this] {
+                                     ++_startersMade;
+                                     return std::make_unique<Starter>(*this);
+                                 });
     }
 
     // Keeps the labels; the one named "bad" cannot be started.
@@ -42,6 +43,7 @@ class StartLaunchAgents : public testing::Test {
             return agent.label == "bad" ? platform::Outcome::failure({2, "no such thing"})
                                         : platform::Outcome::success();
         }
+        std::optional<AgentRun> waitForEnd(const LaunchAgent& /*agent*/) override { return std::nullopt; }
         StartLaunchAgents& test;
     };
 
@@ -89,8 +91,12 @@ TEST_F(StartLaunchAgents, StartsThemWhereThereCanBeNoStamp) {
 TEST_F(StartLaunchAgents, AnAgentThatCannotBeStartedCostsOneLineAndNoOther) {
     add("bad");
     add("good");
-    logIn();
+    const StartedAgents started = logIn();
     EXPECT_EQ(_started, (std::vector<std::string>{"bad", "good"}));
+    ASSERT_EQ(started.agents.size(), 1U);
+    EXPECT_EQ(started.agents[0].label, "good");
+    EXPECT_EQ(started.agents[0].file, "good.plist");
+    EXPECT_EQ(started.agents[0].content, _root.content("/agents/good.plist"));
     EXPECT_EQ(_fake.systemLog.lines(),
               std::vector<std::string>{"Failed to start launch agent bad: no such thing"});
 }
