@@ -41,6 +41,17 @@ class AccountDirectory {
 
     // The same, in place of whoever had that name. Accounts that exist do not change.
     virtual Outcome storeUser(const CloudUser& user) = 0;
+
+    // Takes away what adding gave: nobody of that name can sign in any more. Accounts that exist do not
+    // change. Fails with ENOENT when nobody of that name could.
+    virtual Outcome removeUser(const std::string& name) = 0;
+
+    // Removes one of the current user's accounts with all that is known of its services; the one that is
+    // logged in is so no longer. Fails with ENOENT when there is none of that name.
+    virtual Outcome removeAccount(const std::string& name) = 0;
+
+    // Has none of the current user's accounts be logged in; all of them stay. Fails with ENOENT when none is.
+    virtual Outcome signOut() = 0;
 };
 
 } // namespace welcomer::platform

@@ -12,7 +12,8 @@ namespace welcomer {
 
 namespace platform {
 class AccountDirectory;
-}
+class SignInDirectory;
+} // namespace platform
 
 // What a program may choose.
 struct PlatformOptions {
@@ -27,6 +28,7 @@ struct PlatformOptions {
     platform::RunLoops* runLoops = nullptr;
     platform::DispatchQueues* dispatchQueues = nullptr;
     platform::HostReachability* hostReachability = nullptr;
+    platform::SignInDirectory* signInDirectory = nullptr;
 
     // The folder of the application's main bundle, a path of this machine; empty: the application has none.
     std::string mainBundle = {};
@@ -45,6 +47,9 @@ class PlatformOwner {
     // Who has an account here and who can sign in, for programs that try setup out: the system itself never
     // asks. Borrowed: lives as long as this object.
     virtual platform::AccountDirectory& accountDirectory() = 0;
+
+    // Whom signing in asks. Borrowed: lives as long as this object.
+    virtual platform::SignInDirectory& signInDirectory() = 0;
 
     // How the interfaces that have more than one backend are served now. Asks every service: may block.
     virtual std::vector<platform::BackendReport> backendReports() = 0;

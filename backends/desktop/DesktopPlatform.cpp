@@ -94,10 +94,10 @@ std::vector<platform::BackendReport> DesktopPlatform::backendReports() {
 OnlineAccountSurroundings DesktopPlatform::_accountSurroundings(const std::string& root) {
     const platform::Platform& local = _local.platform();
     return {[this] { return mayHaveSessionBus() ? _onlineAccounts.service() : nullptr; },
-            [root, &local](platform::NotificationCenter& posts) {
+            [root, &local, &directory = _local.signInDirectory()](platform::NotificationCenter& posts) {
                 return std::make_unique<local::LocalAccountService>(
                     posix::RootFolder(root), local.processIdentity, local.runLoops, local.dispatchQueues,
-                    posts, local.systemLog);
+                    posts, local.systemLog, &directory);
             },
             local.preferenceStore,
             local.runLoops,

@@ -27,6 +27,7 @@ class DesktopPlatform final : public PlatformOwner {
 
     const platform::Platform& platform() const override { return _platform; }
     platform::AccountDirectory& accountDirectory() override { return _local.accountDirectory(); }
+    platform::SignInDirectory& signInDirectory() override { return _local.signInDirectory(); }
     std::vector<platform::BackendReport> backendReports() override;
     std::string pluginFolder() const override { return _local.pluginFolder(); }
 

@@ -33,6 +33,7 @@ class LocalPlatform final : public PlatformOwner {
 
     const platform::Platform& platform() const override { return _platform; }
     platform::AccountDirectory& accountDirectory() override { return _accountDirectory; }
+    platform::SignInDirectory& signInDirectory() override { return _signInDirectory; }
     std::vector<platform::BackendReport> backendReports() override;
     std::string pluginFolder() const override { return _pluginFolder.serving(); }
 
@@ -52,6 +53,8 @@ class LocalPlatform final : public PlatformOwner {
     LocalSystemVersionInfo _systemVersionInfo{_fileSystem};
     LocalHostReachability _hostReachability;
     LocalNotificationCenter _notificationCenter;
+    NimbusDirectory _nimbusDirectory{_root};
+    platform::SignInDirectory& _signInDirectory;
     LocalAccountService _accountService;
     LocalAccountDirectory _accountDirectory;
     LocalProcessLauncher _processLauncher;

@@ -1,11 +1,11 @@
 #include "backends/local/LocalProcessIdentity.h"
 
 #include "backends/posix/Directory.h"
+#include "backends/posix/PasswordEntry.h"
 #include "platform/Error.h"
 #include "platform/Path.h"
 
-#include <cerrno>
-#include <pwd.h>
+#include <optional>
 #include <system_error>
 #include <unistd.h>
 
@@ -13,7 +13,6 @@ namespace welcomer::local {
 
 namespace {
 
-constexpr std::size_t kFirstEntrySize = 1024;
 constexpr mode_t kLibraryMode = 0700;
 
 } // namespace
@@ -21,25 +20,17 @@ constexpr mode_t kLibraryMode = 0700;
 void LocalProcessIdentity::_readEntry() {
     const uid_t userID = ::geteuid();
     _loginName = std::to_string(userID);
-    std::string buffer(kFirstEntrySize, '\0');
-    passwd entry = {};
-    passwd* found = nullptr;
     int error = 0;
-    while ((error = ::getpwuid_r(userID, &entry, buffer.data(), buffer.size(), &found)) == ERANGE ||
-           error == EINTR) {
-        if (error == ERANGE) {
-            buffer.resize(2 * buffer.size());
-        }
-    }
+    const std::optional<posix::PasswordEntry> found = posix::passwordEntryOf(userID, error);
     if (!found) {
         _whyNoHome = error != 0 ? ": " + std::generic_category().message(error) : "";
         return;
     }
-    if (*found->pw_name != '\0') {
-        _loginName = found->pw_name;
+    if (!found->name.empty()) {
+        _loginName = found->name;
     }
-    if (*found->pw_dir == '/') {
-        _homeDirectory = found->pw_dir;
+    if (found->home.starts_with('/')) {
+        _homeDirectory = found->home;
     }
 }
 

@@ -30,7 +30,25 @@ class FakeAccountDirectory final : public platform::AccountDirectory {
         return platform::Outcome::success();
     }
 
+    platform::Outcome removeUser(const std::string& name) override {
+        return _outcome(cloudUsers.erase(name) > 0, "there is no user " + name);
+    }
+    platform::Outcome removeAccount(const std::string& name) override {
+        if (_service.loggedIn == name) {
+            _service.loggedIn.reset();
+        }
+        return _outcome(_service.accounts.erase(name) > 0, "there is no account " + name);
+    }
+    platform::Outcome signOut() override {
+        const bool isThere = _service.loggedIn.has_value();
+        _service.loggedIn.reset();
+        return _outcome(isThere, "no account is logged in");
+    }
+
   private:
+    static platform::Outcome _outcome(bool isThere, const std::string& missing) {
+        return isThere ? platform::Outcome::success() : platform::Outcome::failure({ENOENT, missing});
+    }
     template <typename Map>
     static std::vector<std::string> _names(const Map& map) {
         std::vector<std::string> names;

@@ -131,7 +131,8 @@ class Machine:
         return found
 
     def _chroot(self, command, user):
-        identity = ["--userspec", f"{UID}:{UID}", "--groups", ""] if user else []
+        number = UID if user is True else user  # any other user of the machine by number
+        identity = ["--userspec", f"{number}:{number}", "--groups", ""] if user else []
         return ["/usr/sbin/chroot", *identity, str(self.root), *map(str, command)]
 
     def environment(self, user):

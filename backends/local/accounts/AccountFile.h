@@ -19,6 +19,7 @@
 namespace welcomer::local {
 
 inline constexpr char kAccountsKey[] = "Accounts";
+inline constexpr char kLoggedInAccountKey[] = "LoggedInAccount";
 
 // "Accounts.plist" (0600) in "<home>/Library/Accounts" (0700), an XML property list:
 //     Accounts         a dictionary from account name to account; each account has

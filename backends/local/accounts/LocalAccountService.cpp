@@ -11,7 +11,6 @@ namespace welcomer::local {
 
 namespace {
 
-constexpr char kLoggedInAccountKey[] = "LoggedInAccount";
 constexpr char kSetupFinishedKey[] = "SetupFinished";
 constexpr char kServicesKey[] = "Services";
 constexpr char kCanBeEnabledKey[] = "CanBeEnabled";
@@ -46,12 +45,15 @@ bool flag(const PropertyList::Dictionary& dictionary, const char* key, bool ifMi
 } // namespace
 
 struct LocalAccountService::Accounts {
-    Accounts(const posix::RootFolder& root, platform::ProcessIdentity& identity, platform::SystemLog& log)
+    Accounts(const posix::RootFolder& root, platform::ProcessIdentity& identity, platform::SystemLog& log,
+             const platform::SignInDirectory* replacement)
         : file(root, identity, log),
-          directory(root) {}
+          machines(root),
+          directory(replacement ? *replacement : machines) {}
 
     AccountFile file;
-    NimbusDirectory directory;
+    const NimbusDirectory machines;
+    const platform::SignInDirectory& directory;
 
     // Makes an account where it is missing, and then does more to the content, all in one change.
     platform::Outcome make(
@@ -151,7 +153,7 @@ struct LocalAccountService::Operation {
     std::shared_ptr<platform::RunLoopPort> port; // keeps that loop waiting for the answer
 
     // On a thread of the global queue.
-    platform::Notification notification(const NimbusAnswer& answer) {
+    platform::Notification notification(const platform::SignInAnswer& answer) {
         platform::Notification result{_name(answer.isCompleted), nullptr, answer.contents};
         const auto logIn = [this](PropertyList::Dictionary& content) {
             content[kLoggedInAccountKey] = username;
@@ -182,8 +184,8 @@ LocalAccountService::LocalAccountService(const posix::RootFolder& root, platform
                                          platform::RunLoops& runLoops,
                                          platform::DispatchQueues& dispatchQueues,
                                          platform::NotificationCenter& notificationCenter,
-                                         platform::SystemLog& log)
-    : _accounts(std::make_shared<Accounts>(root, identity, log)),
+                                         platform::SystemLog& log, const platform::SignInDirectory* directory)
+    : _accounts(std::make_shared<Accounts>(root, identity, log, directory)),
       _runLoops(runLoops),
       _dispatchQueues(dispatchQueues),
       _notificationCenter(notificationCenter),
@@ -252,7 +254,7 @@ void LocalAccountService::_start(const std::shared_ptr<Operation>& operation) {
     };
     platform::DispatchQueue& queue = _dispatchQueues.global();
     queue.async([&queue, operation, deliver, sender = static_cast<const void*>(this)] {
-        const NimbusAnswer answer =
+        const platform::SignInAnswer answer =
             operation->accounts->directory.answer(operation->username, operation->password);
         queue.asyncAfter(platform::nanosecondsOf(answer.delaySeconds), [operation, deliver, sender, answer] {
             platform::Notification notification = operation->notification(answer);

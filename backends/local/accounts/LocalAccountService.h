@@ -18,10 +18,12 @@ namespace welcomer::local {
 // It shows no interface, so that windows and failure dialogs mean nothing to it.
 class LocalAccountService final : public platform::AccountService, public platform::AccountManager {
   public:
-    // Borrows everything, which must outlive this.
+    // Borrows everything, which must outlive this and the queues' work.
+    //  directory  takes the place of the machine's file of users, or null
     LocalAccountService(const posix::RootFolder& root, platform::ProcessIdentity& identity,
                         platform::RunLoops& runLoops, platform::DispatchQueues& dispatchQueues,
-                        platform::NotificationCenter& notificationCenter, platform::SystemLog& log);
+                        platform::NotificationCenter& notificationCenter, platform::SystemLog& log,
+                        const platform::SignInDirectory* directory = nullptr);
 
     platform::AccountManager& sharedManager() override { return *this; }
     std::shared_ptr<platform::CloudAccount> loggedInAccount() override;

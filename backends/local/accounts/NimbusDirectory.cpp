@@ -32,7 +32,7 @@ platform::Outcome failure(std::string message) {
     return platform::Outcome::failure({0, std::move(message)});
 }
 
-NimbusAnswer accountError(std::int64_t error) {
+platform::SignInAnswer accountError(std::int64_t error) {
     return {false, {{platform::kSKPropertyAccountError, error}}, 0};
 }
 
@@ -56,12 +56,12 @@ bool fails(const PropertyList& user) {
 }
 
 // The answer to the right password.
-NimbusAnswer answerOf(const std::string& username, const PropertyList& user) {
+platform::SignInAnswer answerOf(const std::string& username, const PropertyList& user) {
     const PropertyList* response = user.find(kResponseKey);
     if (response && !response->isDictionary()) {
         return accountError(platform::kSKAccountErrorServerUnavailable);
     }
-    NimbusAnswer answer;
+    platform::SignInAnswer answer;
     answer.isCompleted = !fails(user);
     answer.delaySeconds = delaySeconds(user);
     if (response) {
@@ -100,7 +100,8 @@ void setMailAddress(PropertyList::Dictionary& services, const PropertyList& addr
 
 } // namespace
 
-NimbusAnswer NimbusDirectory::answer(const std::string& username, const std::string& password) const {
+platform::SignInAnswer NimbusDirectory::answer(const std::string& username,
+                                               const std::string& password) const {
     const std::optional<PropertyList::Dictionary> users = _users();
     if (!users) {
         return accountError(platform::kSKAccountErrorServerUnavailable);
@@ -150,7 +151,28 @@ platform::Outcome NimbusDirectory::writeUser(const platform::CloudUser& user, If
     if (user.mailAddress) {
         entry[kMailAddressKey] = *user.mailAddress;
     }
+    return _change([&](PropertyList::Dictionary& users, const std::string& shown) {
+        if (ifThere == IfThere::Fail && users.contains(user.name)) {
+            return platform::Outcome::failure(
+                {EEXIST, shown + ": the user " + user.name + " exists already"});
+        }
+        users.insert_or_assign(user.name, std::move(entry));
+        return platform::Outcome::success();
+    });
+}
 
+platform::Outcome NimbusDirectory::removeUser(const std::string& name) const {
+    if (userNames() == std::vector<std::string>()) { // perhaps there is no directory: none is made for this
+        return platform::Outcome::failure({ENOENT, "there is no user " + name});
+    }
+    return _change([&](PropertyList::Dictionary& users, const std::string& shown) {
+        return users.erase(name) > 0
+                   ? platform::Outcome::success()
+                   : platform::Outcome::failure({ENOENT, shown + ": there is no user " + name});
+    });
+}
+
+platform::Outcome NimbusDirectory::_change(const Change& change) const {
     const posix::PathParts path = posix::splitPath(kNimbusDirectoryPath);
     posix::makeDirectories(_root, path.folder, kFolderMode);
     LockedDictionaryFolder folder(_root, path.folder, posix::machineLockPath(posix::kMachineFilesLock),
@@ -167,10 +189,9 @@ platform::Outcome NimbusDirectory::writeUser(const platform::CloudUser& user, If
     if (!users.isDictionary()) {
         return failure(shown + ": " + kUsersKey + " is no dictionary");
     }
-    if (ifThere == IfThere::Fail && users.dictionary()->contains(user.name)) {
-        return platform::Outcome::failure({EEXIST, shown + ": the user " + user.name + " exists already"});
+    if (platform::Outcome outcome = change(*users.dictionary(), shown); !outcome) {
+        return outcome;
     }
-    users.dictionary()->insert_or_assign(user.name, std::move(entry));
     return folder.write(path.name, file.values) ? platform::Outcome::success()
                                                 : platform::Outcome::failure(folder.error());
 }

@@ -5,8 +5,10 @@
 
 #include "backends/posix/RootFolder.h"
 #include "platform/AccountDirectory.h"
+#include "platform/SignInDirectory.h"
 #include "propertylist/PropertyList.h"
 
+#include <functional>
 #include <optional>
 #include <string>
 #include <vector>
@@ -31,27 +33,14 @@ inline constexpr char kNimbusDirectoryPath[] = "/var/lib/welcomer/nimbus-directo
 //     MailAddress       string: the mail service's address in an account that is made for the user
 //     Services          dictionary from service identifier to service, as the account file has them: the
 //                       services of an account that is made for the user, in place of all of them
-struct NimbusAnswer {
-    bool isCompleted = false;
-    PropertyList::Dictionary contents; // what the notification says
-    double delaySeconds = 0;
-};
-
-class NimbusDirectory {
+class NimbusDirectory final : public platform::SignInDirectory {
   public:
     explicit NimbusDirectory(posix::RootFolder root) : _root(std::move(root)) {}
 
-    // What the server answers to a user name and a password. Reads the directory and computes the password's
-    // hash, which takes some milliseconds on purpose. Any thread.
-    NimbusAnswer answer(const std::string& username, const std::string& password) const;
-
-    // The services that an account gets when it is made: all of them for a user that the directory does not
-    // know. Any thread.
-    PropertyList::Dictionary servicesOfNewAccount(const std::string& username) const;
-
-    // The users' names in order, nobody's where there is no directory; none when it cannot be read or is
-    // damaged. Any thread.
-    std::optional<std::vector<std::string>> userNames() const;
+    // Each reads the file anew; one that is damaged counts as one that cannot be read.
+    platform::SignInAnswer answer(const std::string& username, const std::string& password) const override;
+    PropertyList::Dictionary servicesOfNewAccount(const std::string& username) const override;
+    std::optional<std::vector<std::string>> userNames() const override;
 
     // Writes a user. A directory that is made for it is its owner's alone: whoever can read it can try
     // passwords. A damaged one is left as it is. Any thread and any process.
@@ -60,7 +49,15 @@ class NimbusDirectory {
     enum class IfThere { Replace, Fail };
     platform::Outcome writeUser(const platform::CloudUser& user, IfThere ifThere) const;
 
+    // Removes a user; fails with ENOENT where there is none of that name. Any thread and any process.
+    platform::Outcome removeUser(const std::string& name) const;
+
   private:
+    // Changes the dictionary of users, in one step and under the lock.
+    //  change  is given the users and what the file is called; its failure leaves the file as it is
+    using Change = std::function<platform::Outcome(PropertyList::Dictionary&, const std::string&)>;
+    platform::Outcome _change(const Change& change) const;
+
     // What the directory has about a user; none when it cannot be read.
     std::optional<PropertyList::Dictionary> _users() const;
 

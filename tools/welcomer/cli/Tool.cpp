@@ -1,5 +1,6 @@
 #include "tools/welcomer/cli/Tool.h"
 
+#include "tools/welcomer/cli/AsUser.h"
 #include "tools/welcomer/terminal/Printable.h"
 
 #include <CLI/CLI.hpp>
@@ -117,12 +118,16 @@ class DamageReport {
     platform::PreferenceStore& _preferences;
 };
 
-int runCommand(const Command& command, const Options& options, const PlatformFactory& buildPlatform) {
+//  directory  takes the place of the machine's own, or null
+int runCommand(const Command& command, const Options& options, const PlatformFactory& buildPlatform,
+               platform::SignInDirectory* directory = nullptr) {
     KeptLog log;
     log.setVerbose(options.verbose);
-    const auto owner = buildPlatform(
-        {.root = options.root, .systemLog = &log, .storesCredentialsLocally = options.storesLocally},
-        TimeKind::Real);
+    const auto owner = buildPlatform({.root = options.root,
+                                      .systemLog = &log,
+                                      .signInDirectory = directory,
+                                      .storesCredentialsLocally = options.storesLocally},
+                                     TimeKind::Real);
     const platform::ScopedPlatform installed(owner->platform());
     const DamageReport damageReport(owner->platform().preferenceStore);
     ReportPrinter printer(std::cout, STDOUT_FILENO, options.json);
@@ -134,6 +139,21 @@ int runCommand(const Command& command, const Options& options, const PlatformFac
         return fail("the output could not be written", kExitFailed);
     }
     return report.failure ? fail(*report.failure, kExitFailed) : kExitSuccess;
+}
+
+int runChosen(const CommandLine& commandLine, Options& options, const PlatformFactory& buildPlatform) {
+    settleRoot(options);
+    if (commandLine.chosenPreparation()) {
+        commandLine.chosenPreparation()(options);
+    }
+    const Command& command = commandLine.chosen();
+    if (options.user.empty()) {
+        return runCommand(command, options, buildPlatform);
+    }
+    options.storesLocally = true;
+    return runAsUser(options.user, options.root, buildPlatform, [&](platform::SignInDirectory& directory) {
+        return runCommand(command, options, buildPlatform, &directory);
+    });
 }
 
 } // namespace
@@ -170,6 +190,23 @@ void CommandLine::addLocalOption(CLI::App& command) {
                      "finds it there");
 }
 
+CLI::Option& CommandLine::addUserOption(CLI::App& command) {
+    return *command
+                .add_option("--user", _options.user,
+                            "Act for this user of the machine, who logs in later; only root can. The user's "
+                            "keyring is "
+                            "not there: what is stored goes to the user's local file")
+                ->type_name("NAME")
+                ->check([](const std::string& name) {
+                    return std::string(name.empty() ? "the user's name is empty" : "");
+                });
+}
+
+void CommandLine::addPreparation(CLI::App& command, Preparation preparation) {
+    command.parse_complete_callback(
+        [this, preparation = std::move(preparation)] { _chosenPreparation = preparation; });
+}
+
 void CommandLine::addPasswordOption(CLI::App& command, PasswordSource& source) {
     command
         .add_option("--password-fd", source,
@@ -199,8 +236,7 @@ int runTool(int argc, char** argv, const PlatformFactory& buildPlatform,
     }
 
     try {
-        settleRoot(options);
-        return runCommand(commandLine.chosen(), options, buildPlatform);
+        return runChosen(commandLine, options, buildPlatform);
     } catch (const UsageError& error) {
         return fail(std::string(error.what()) + " (see " + commandLine.chosenName() + " --help)", kExitUsage);
     } catch (const std::filesystem::filesystem_error& error) {

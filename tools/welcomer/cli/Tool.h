@@ -15,7 +15,8 @@
 
 namespace CLI {
 class App;
-}
+class Option;
+} // namespace CLI
 
 namespace welcomer::tool {
 
@@ -30,6 +31,7 @@ struct Options {
     bool json = false;
     bool verbose = false;
     bool storesLocally = false; // what `--local` asks for, of the commands that have it
+    std::string user = {};      // whom `--user` names, of the commands that have it; empty: the caller
 };
 
 // What a command works with. The platform for the chosen root is installed while it runs.
@@ -43,6 +45,10 @@ struct Session {
 
 // A command's work: it returns what it has to say, and what it throws ends the tool with one line on stderr.
 using Command = std::function<Report(Session&)>;
+
+// What a command does as its caller, before its own work begins and the user of `--user` does it: reading
+// what the command line names and that user may not see. It fails as a command does.
+using Preparation = std::function<void(const Options&)>;
 
 // What a command registers itself with: the command line being built, and the place for the chosen command.
 class CommandLine {
@@ -67,11 +73,19 @@ class CommandLine {
     // Gives a command the option `--local`, which has the platform store new credentials in the local store.
     void addLocalOption(CLI::App& command);
 
+    // Gives a command the option `--user`, which has another user do its work (AsUser.h). That user has no
+    // session, so that new credentials go to the local store.
+    CLI::Option& addUserOption(CLI::App& command);
+
+    // Gives a command something to do first.
+    void addPreparation(CLI::App& command, Preparation preparation);
+
     // Gives a command the option `--password-fd`.
     static void addPasswordOption(CLI::App& command, PasswordSource& source);
 
     // The command that the arguments chose, with its full name.
     const Command& chosen() const { return _chosen; }
+    const Preparation& chosenPreparation() const { return _chosenPreparation; } // or none
     const std::string& chosenName() const { return _chosenName; }
 
   private:
@@ -79,6 +93,7 @@ class CommandLine {
     Options& _options;
     bool _needsHome = false;
     Command _chosen;
+    Preparation _chosenPreparation;
     std::string _chosenName;
 };
 

@@ -33,6 +33,11 @@ struct SignInArguments {
     PasswordSource password;
 };
 
+struct RemoveArguments {
+    std::string name;
+    bool fromDirectory = false;
+};
+
 void refuseEmpty(const std::string& user) {
     if (user.empty()) {
         throw UsageError("the user's name is empty");
@@ -192,6 +197,29 @@ Report showServices(const std::string& user) {
     return report;
 }
 
+Report remove(Session& session, const RemoveArguments& arguments) {
+    refuseEmpty(arguments.name);
+    platform::AccountDirectory& directory = session.accountDirectory;
+    const platform::Outcome outcome = arguments.fromDirectory ? directory.removeUser(arguments.name)
+                                                              : directory.removeAccount(arguments.name);
+    if (!outcome) {
+        throw CommandFailure("cannot remove " + arguments.name + ": " + outcome.error.message);
+    }
+    return Report({{"account", arguments.name}, {"removed", true}},
+                  arguments.fromDirectory ? arguments.name + " cannot sign in any more."
+                                          : "Removed the account " + arguments.name + ".");
+}
+
+Report signOut(Session& session) {
+    const std::string account = loggedInName();
+    if (const platform::Outcome outcome = session.accountDirectory.signOut(); !outcome) {
+        throw CommandFailure(outcome.error.number == ENOENT ? "nobody is logged in to a cloud account"
+                                                            : "cannot sign out: " + outcome.error.message);
+    }
+    return Report({{"account", account.empty() ? Json() : Json(account)}, {"signedOut", true}},
+                  (account.empty() ? "The account" : account) + " is signed out.");
+}
+
 void addAdd(CommandLine& commandLine, CLI::App& group) {
     const auto arguments = std::make_shared<AddArguments>();
     CLI::App& command =
@@ -218,6 +246,20 @@ void addSignIn(CommandLine& commandLine, CLI::App& group) {
                                [arguments](Session& session) { return signIn(session, *arguments); });
     command.add_option("user", arguments->user, "The user's name")->type_name("USER")->required();
     CommandLine::addPasswordOption(command, arguments->password);
+    commandLine.addUserOption(command);
+}
+
+void addRemove(CommandLine& commandLine, CLI::App& group) {
+    const auto arguments = std::make_shared<RemoveArguments>();
+    CLI::App& command =
+        commandLine.addCommand(group, "remove", "Remove an account with the states of its services",
+                               [arguments](Session& session) { return remove(session, *arguments); });
+    command.add_option("account", arguments->name, "The account's name")->type_name("NAME")->required();
+    CLI::Option* const fromDirectory =
+        command.add_flag("--from-directory", arguments->fromDirectory,
+                         "Remove what `account add` has added instead: nobody of that name can sign in any "
+                         "more, and accounts stay");
+    commandLine.addUserOption(command).excludes(fromDirectory);
 }
 
 } // namespace
@@ -225,16 +267,21 @@ void addSignIn(CommandLine& commandLine, CLI::App& group) {
 void addAccountCommands(CommandLine& commandLine) {
     CLI::App& group = commandLine.addGroup("account", "The user's cloud accounts, and who can sign in");
     addAdd(commandLine, group);
-    commandLine.addCommand(group, "list", "Show the accounts, and who can sign in", list);
-    commandLine.addCommand(group, "status", "Show who is logged in, with the services that are enabled",
-                           status);
+    commandLine.addUserOption(
+        commandLine.addCommand(group, "list", "Show the accounts, and who can sign in", list));
+    commandLine.addUserOption(commandLine.addCommand(
+        group, "status", "Show who is logged in, with the services that are enabled", status));
     addSignIn(commandLine, group);
+    commandLine.addUserOption(commandLine.addCommand(
+        group, "sign-out", "Have no account be logged in; the account itself stays", signOut));
+    addRemove(commandLine, group);
 
     const auto user = std::make_shared<std::string>();
     CLI::App& services = commandLine.addCommand(group, "services", "Show the services of an account",
                                                 [user](Session&) { return showServices(*user); });
     services.add_option("user", *user, "The account; without it the one that is logged in")
         ->type_name("USER");
+    commandLine.addUserOption(services);
 }
 
 } // namespace welcomer::tool

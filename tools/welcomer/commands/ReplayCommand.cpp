@@ -7,10 +7,11 @@
 #include "tools/welcomer/cli/PropertyListOutput.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/story/HandOver.h"
 #include "tools/welcomer/story/ReplayReason.h"
+#include "tools/welcomer/story/SetupBundle.h"
 
 #include <CLI/CLI.hpp>
-#include <filesystem>
 #include <memory>
 
 namespace welcomer::tool {
@@ -21,35 +22,29 @@ struct StoreArguments {
     std::string account;
     std::string file;
     std::string bundle;
+    PropertyList replayObject = {}; // what the file holds
 };
 
-// A path of the system, given on the command line.
-std::string systemPath(const Options& options, const std::string& path) {
-    if (path.starts_with('/')) {
-        return path;
+void prepareStore(const Options& options, StoreArguments& arguments) {
+    arguments.bundle = systemPath(options, "--bundle", arguments.bundle);
+    arguments.replayObject = readPropertyListFile(arguments.file);
+    // The writer would store an item without content in its place.
+    if (const auto unwritable = findUnwritableValue(arguments.replayObject)) {
+        throw CommandFailure(arguments.file + " cannot be stored: " + *unwritable);
     }
-    if (options.root != "/") {
-        throw UsageError("--bundle: " + path + " is looked up below --root and needs to begin with /");
-    }
-    return std::filesystem::absolute(path).string();
 }
 
 Report store(Session& session, const StoreArguments& arguments) {
     const platform::Platform& platform = platform::current();
-    const std::string bundlePath = systemPath(session.options, arguments.bundle);
-    const PropertyList replayObject = readPropertyListFile(arguments.file);
-    // The writer would store an item without content in its place.
-    if (const auto unwritable = findUnwritableValue(replayObject)) {
-        throw CommandFailure(arguments.file + " cannot be stored: " + *unwritable);
-    }
+    const std::string& bundlePath = arguments.bundle;
     if (!platform.fileSystem.exists(bundlePath)) {
         throw CommandFailure("there is no bundle at " + bundlePath +
                              (session.options.root == "/" ? "" : " below " + session.options.root));
     }
     const auto bundle = platform.resourceBundles.open(bundlePath);
     platform::CredentialOutcome stored;
-    if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(arguments.account, replayObject,
-                                                                      *bundle, stored)) {
+    if (!WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup(
+            arguments.account, arguments.replayObject, *bundle, stored)) {
         throw CommandFailure("cannot store the replay item and install the agent: " +
                              storingReason(session.log, stored));
     }
@@ -94,6 +89,13 @@ Report remove(Session& session) {
     return Report({{"deleted", true}}, "Deleted the replay item.");
 }
 
+Report arm(Session& session, const std::string& bundle) {
+    const bool wasInstalled = armAgent(session.log, *openSetupBundle(session.options, bundle));
+    return Report({{"installed", wasInstalled}}, wasInstalled
+                                                     ? "Installed the agent for the next login."
+                                                     : "The agent is installed already for the next login.");
+}
+
 void addStore(CommandLine& commandLine, CLI::App& group) {
     const auto arguments = std::make_shared<StoreArguments>();
     CLI::App& command = commandLine.addCommand(
@@ -115,6 +117,20 @@ void addStore(CommandLine& commandLine, CLI::App& group) {
         ->type_name("DIR")
         ->required();
     commandLine.addLocalOption(command);
+    commandLine.addUserOption(command);
+    commandLine.addPreparation(command,
+                               [arguments](const Options& options) { prepareStore(options, *arguments); });
+}
+
+void addArm(CommandLine& commandLine, CLI::App& group) {
+    const auto bundle = std::make_shared<std::string>();
+    CLI::App& command = commandLine.addCommand(
+        group, "arm", "Install the agent for a replay item that waits, for which none would start",
+        [bundle](Session& session) { return arm(session, *bundle); });
+    addBundleOption(command, *bundle);
+    commandLine.addUserOption(command);
+    commandLine.addPreparation(
+        command, [bundle](const Options& options) { *bundle = systemPath(options, "--bundle", *bundle); });
 }
 
 } // namespace
@@ -123,8 +139,11 @@ void addReplayCommands(CommandLine& commandLine) {
     CLI::App& group =
         commandLine.addGroup("replay", "The replay item, which waits for the agent of the next login");
     addStore(commandLine, group);
-    commandLine.addCommand(group, "show", "Show the replay item; it stays where it is", show);
-    commandLine.addCommand(group, "delete", "Delete the replay item; the launch agent stays", remove);
+    addArm(commandLine, group);
+    commandLine.addUserOption(
+        commandLine.addCommand(group, "show", "Show the replay item; it stays where it is", show));
+    commandLine.addUserOption(
+        commandLine.addCommand(group, "delete", "Delete the replay item; the launch agent stays", remove));
 }
 
 } // namespace welcomer::tool

@@ -3,20 +3,22 @@
 #include "cloud/WLNimbusServiceCatalogue.h"
 #include "handoff/LaunchAgentFile.h"
 #include "platform/Platform.h"
-#include "text/Format.h"
-#include "tools/welcomer/cli/PropertyListFile.h"
 #include "tools/welcomer/cli/Tool.h"
-#include "tools/welcomer/cli/ToolBundle.h"
 #include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/story/HandOver.h"
 #include "tools/welcomer/story/ServiceStates.h"
+#include "tools/welcomer/story/SetupAnswers.h"
+#include "tools/welcomer/story/SetupBundle.h"
 #include "tools/welcomer/story/SetupFlow.h"
 #include "tools/welcomer/terminal/Password.h"
 #include "tools/welcomer/terminal/Terminal.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
+#include <cstdlib>
 #include <memory>
 #include <optional>
+#include <unistd.h>
 #include <utility>
 
 namespace welcomer::tool {
@@ -25,25 +27,6 @@ namespace {
 
 constexpr int kSignInAttempts = 3;
 constexpr const char* kInsteadOfTerminal = "--answers PLIST";
-
-constexpr const char* kAccountKey = "Account";
-constexpr const char* kServicesKey = "Services";
-constexpr const char* kAliasesKey = "Aliases";
-constexpr const char* kJustTheAccountAndKVSKey = "JustTheAccountAndKVS";
-
-struct SetupArguments {
-    std::string answers;
-    std::string bundle; // empty: the one that comes with the tool
-    PasswordSource password;
-};
-
-// What the user decided.
-struct Decisions {
-    std::string account;
-    std::vector<std::string> services; // identifiers
-    ChosenAliases aliases;
-    bool justTheAccountAndKVS = false;
-};
 
 std::string joined(const std::vector<std::string>& texts) {
     std::string result;
@@ -65,107 +48,13 @@ std::vector<CatalogueEntry> catalogueOf(bool isPostLogin) {
     return entries;
 }
 
-// A file with the answers: a dictionary with the account's name, and where not everything is wanted the
-// services and, by delegate identifier, the aliases.
-class Answers {
-  public:
-    explicit Answers(const std::string& file) : _file(file) {
-        const PropertyList content = readPropertyListFile(file);
-        if (!content.isDictionary()) {
-            _fail("the answers are no dictionary");
-        }
-        _values = *content.dictionary();
-        for (const auto& [key, value] : _values) {
-            if (key != kAccountKey && key != kServicesKey && key != kAliasesKey &&
-                key != kJustTheAccountAndKVSKey) {
-                _fail("no question is called " + key);
-            }
-        }
-        const PropertyList* account = _find(kAccountKey);
-        if (!account || !account->isString() || account->string()->empty()) {
-            _fail(std::string(kAccountKey) + " is to be the account's name");
-        }
-        decisions.account = *account->string();
-        _readServices();
-        if (const PropertyList* flag = _find(kJustTheAccountAndKVSKey)) {
-            if (!flag->boolean()) {
-                _fail(std::string(kJustTheAccountAndKVSKey) + " is to be true or false");
-            }
-            decisions.justTheAccountAndKVS = *flag->boolean();
-        }
-        _checkAliases();
-    }
-
-    // Takes the chosen aliases, all that are on offer where the answers say nothing.
-    void choose(const std::vector<AliasOffer>& offers) {
-        for (const AliasOffer& offer : offers) {
-            decisions.aliases[offer.identifier] = offer.aliases;
-        }
-        const PropertyList* aliases = _find(kAliasesKey);
-        for (const auto& [identifier, wanted] :
-             aliases ? *aliases->dictionary() : PropertyList::Dictionary()) {
-            const auto offer = std::ranges::find(offers, identifier, &AliasOffer::identifier);
-            if (offer == offers.end()) {
-                _fail(identifier + " has no aliases on offer");
-            }
-            std::vector<std::string> chosen = _texts(wanted, kAliasesKey);
-            for (const std::string& alias : chosen) {
-                if (std::ranges::find(offer->aliases, alias) == offer->aliases.end()) {
-                    _fail(text::format("%@ has no alias %@ on offer", identifier, alias));
-                }
-            }
-            decisions.aliases[identifier] = std::move(chosen);
-        }
-    }
-
-    Decisions decisions;
-
-  private:
-    [[noreturn]] void _fail(const std::string& reason) const { throw CommandFailure(_file + ": " + reason); }
-
-    const PropertyList* _find(const char* key) const {
-        const auto found = _values.find(key);
-        return found == _values.end() ? nullptr : &found->second;
-    }
-
-    std::vector<std::string> _texts(const PropertyList& value, const char* key) const {
-        std::vector<std::string> texts;
-        if (!value.isArray()) {
-            _fail(std::string(key) + " is to hold texts in an array");
-        }
-        for (const PropertyList& element : *value.array()) {
-            if (!element.isString()) {
-                _fail(std::string(key) + " is to hold texts in an array");
-            }
-            texts.push_back(*element.string());
-        }
-        return texts;
-    }
-
-    void _readServices() {
-        decisions.services = WLNimbusAllSetupServiceIDs();
-        if (const PropertyList* services = _find(kServicesKey)) {
-            decisions.services.clear();
-            for (const std::string& name : _texts(*services, kServicesKey)) {
-                try {
-                    decisions.services.push_back(serviceNamed(name));
-                } catch (const UsageError& error) {
-                    _fail(error.what());
-                }
-            }
-        }
-    }
-
-    // As far as that is possible before the server has said what is on offer.
-    void _checkAliases() const {
-        const PropertyList* aliases = _find(kAliasesKey);
-        if (aliases && !aliases->isDictionary()) {
-            _fail(std::string(kAliasesKey) + " is to be a dictionary by delegate identifier");
-        }
-    }
-
-    const std::string _file;
-    PropertyList::Dictionary _values;
+struct SetupArguments {
+    std::string answers;
+    std::string bundle; // empty: the one that comes with the tool
+    PasswordSource password;
+    std::shared_ptr<SetupAnswers> read;   // what the file holds; null without one
+    std::optional<std::string> firstLine; // the password, where both come from the standard input
+    bool cancels = false;
 };
 
 std::string askForAccount(Terminal& terminal) {
@@ -276,38 +165,62 @@ Report result(const Decisions& decisions, SetupFlow& flow) {
                          "  - and ends two minutes after the last of them."});
 }
 
-// The path of the setup application's bundle, below the root.
-std::string bundlePath(const Session& session, const SetupArguments& arguments) {
-    if (!arguments.bundle.empty()) {
-        return arguments.bundle;
+// Who was given root's rights for this command alone, through pkexec, cannot use them for anything else: not
+// for root itself, and not on files of one's own choice.
+void refuseMoreThanAnotherUser(const Options& options, const SetupArguments& arguments) {
+    if (!std::getenv("PKEXEC_UID")) {
+        return;
     }
-    const std::string found = session.options.rootGiven ? std::string() : findSetupBundle();
-    return found.empty() ? kSetupBundlePath : found;
+    if (options.user.empty()) {
+        throw UsageError("through pkexec a setup is for another user: --user NAME");
+    }
+    const bool namesFiles = !arguments.answers.empty() && arguments.answers != "-";
+    if (options.rootGiven || !arguments.bundle.empty() || namesFiles) {
+        throw UsageError("through pkexec there is no --root, no --bundle, and no file for --answers but -");
+    }
+}
+
+void prepare(const Options& options, SetupArguments& arguments) {
+    refuseMoreThanAnotherUser(options, arguments);
+    arguments.bundle = systemPath(options, "--bundle", arguments.bundle);
+    if (arguments.answers == "-" && arguments.password == STDIN_FILENO) {
+        arguments.firstLine = getPassword(arguments.password, "");
+    }
+    if (!arguments.answers.empty()) {
+        arguments.read = std::make_shared<SetupAnswers>(arguments.answers);
+    }
+}
+
+Report cancel(Session& session) {
+    const WaitingHandOver there = cancelHandOver(session.log);
+    const bool hadItem = there.hasItem();
+    return Report(
+        {{"item", hadItem}, {"agent", there.hasAgent}},
+        std::string("Removed ") + (hadItem ? "the replay item" : "") +
+            (hadItem && there.hasAgent ? " and " : "") + (there.hasAgent ? "the agent" : "") +
+            ": nothing happens at the next login. The account stays as it is (see welcomer account).");
 }
 
 Report setUp(Session& session, const SetupArguments& arguments) {
-    const platform::Platform& platform = platform::current();
-    std::optional<Answers> answers;
+    if (arguments.cancels) {
+        return cancel(session);
+    }
+    const std::shared_ptr<SetupAnswers>& answers = arguments.read;
     std::optional<Terminal> terminal;
-    if (arguments.answers.empty()) {
+    if (!answers) {
         terminal.emplace(kInsteadOfTerminal);
-    } else {
-        answers.emplace(arguments.answers);
     }
-    const std::string path = bundlePath(session, arguments);
-    if (!platform.fileSystem.exists(path)) {
-        throw CommandFailure("there is no setup application at " + path +
-                             (session.options.rootGiven ? " below " + session.options.root : "") +
-                             " (see --bundle)");
-    }
-    SetupFlow::checkNothingIsWaiting(session.options.storesLocally);
+    const auto bundle = openSetupBundle(session.options, arguments.bundle);
+    refuseWhereSomethingIsWaiting({session.options.user, session.options.storesLocally});
 
     SetupFlow flow(session.log, !session.options.verbose);
     Decisions decisions;
     if (answers) {
         SetupFlow::checkWhoIsLoggedIn(answers->decisions.account);
-        flow.signIn(answers->decisions.account,
-                    getPassword(arguments.password, "Password for " + answers->decisions.account + ":"));
+        const std::string& account = answers->decisions.account;
+        flow.signIn(account, arguments.firstLine
+                                 ? *arguments.firstLine
+                                 : getPassword(arguments.password, "Password for " + account + ":"));
         answers->choose(flow.aliasOffers());
         decisions = answers->decisions;
     } else {
@@ -320,7 +233,6 @@ Report setUp(Session& session, const SetupArguments& arguments) {
     }
     flow.checkHandOver(decisions.aliases);
     flow.complete(decisions.services, decisions.justTheAccountAndKVS);
-    const auto bundle = platform.resourceBundles.open(path);
     flow.handOver(decisions.aliases, *bundle);
     return result(decisions, flow);
 }
@@ -339,16 +251,21 @@ void addSetupCommand(CommandLine& commandLine) {
             "--answers", arguments->answers,
             "Ask nothing but the password: a property list with Account and, where not everything is "
             "wanted, Services (an array of names or identifiers), Aliases (a dictionary from delegate "
-            "identifier to an array) and JustTheAccountAndKVS (a boolean); - for stdin")
+            "identifier to an array) and JustTheAccountAndKVS (a boolean); - for stdin, where the password's "
+            "line comes first with --password-fd 0")
         ->type_name("PLIST");
     CommandLine::addPasswordOption(command, arguments->password);
+    addBundleOption(command, arguments->bundle);
     command
-        .add_option("--bundle", arguments->bundle,
-                    std::string("The setup application's bundle, looked up below --root [the one that comes "
-                                "with the tool; below --root ") +
-                        kSetupBundlePath + "]")
-        ->type_name("DIR");
+        .add_flag("--cancel", arguments->cancels,
+                  "Take back what a setup has left for the next login: the replay item and the agent")
+        ->excludes("--answers")
+        ->excludes("--password-fd")
+        ->excludes("--bundle");
     commandLine.addLocalOption(command);
+    commandLine.addUserOption(command);
+    commandLine.addPreparation(command,
+                               [arguments](const Options& options) { prepare(options, *arguments); });
 }
 
 } // namespace welcomer::tool

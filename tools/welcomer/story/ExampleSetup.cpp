@@ -5,6 +5,7 @@
 #include "platform/Platform.h"
 #include "plugins/DelegateIdentifiers.h"
 #include "tools/welcomer/cli/PropertyListOutput.h"
+#include "tools/welcomer/story/SetupBundle.h"
 #include "tools/welcomer/story/SetupFlow.h"
 
 #include <cstdlib>

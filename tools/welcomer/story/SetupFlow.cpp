@@ -2,7 +2,6 @@
 
 #include "cloud/WLLoggedInNimbusAccount.h"
 #include "cloud/WLSetupProbes.h"
-#include "handoff/LaunchAgentFile.h"
 #include "handoff/ReplayItem.h"
 #include "handoff/WLSetWelcomerNimbusReplayKeychainItemAndInstallWLNimbusSetup.h"
 #include "platform/Platform.h"
@@ -73,25 +72,6 @@ void SetupFlow::checkWhoIsLoggedIn(const std::string& account) {
     const auto loggedIn = WLLoggedInNimbusAccount();
     if (loggedIn && loggedIn->accountID() != account) {
         throw CommandFailure(loggedIn->accountID() + " is logged in to the cloud already");
-    }
-}
-
-void SetupFlow::checkNothingIsWaiting(bool storesLocally) {
-    const platform::Platform& platform = platform::current();
-    const std::int32_t status =
-        platform.credentialStore
-            .findItem(kReplayItemService, kReplayItemAccount, platform::CredentialWish::Presence)
-            .status;
-    if (status == platform::kCredentialSuccess) {
-        throw CommandFailure("a replay item is waiting for the next login already (see welcomer replay)");
-    }
-    if (status != platform::kCredentialItemNotFound && !storesLocally) {
-        throw CommandFailure("cannot tell whether a replay item is waiting for the next login already: " +
-                             platform::credentialStatusText(status) + storingAdvice(status));
-    }
-    const std::string agent = launchAgentPath(platform.processIdentity.homeDirectory());
-    if (platform.fileSystem.exists(agent)) {
-        throw CommandFailure("the agent is installed already: " + agent);
     }
 }
 

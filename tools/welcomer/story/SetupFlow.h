@@ -17,9 +17,6 @@
 
 namespace welcomer::tool {
 
-// Where the setup application's bundle is expected below a root that was given.
-inline constexpr const char* kSetupBundlePath = "/usr/share/welcomer/setup-bundle";
-
 // The account service did not accept the user name and the password.
 class SignInFailure : public CommandFailure {
   public:
@@ -60,10 +57,6 @@ class SetupFlow {
     // Refuses to begin while somebody else is logged in to a cloud account: completing the setup would take
     // the one for the other.
     static void checkWhoIsLoggedIn(const std::string& account);
-
-    // Refuses to begin where a hand-over is waiting already, or where that cannot be told.
-    //  storesLocally  what the keyring does not tell is no obstacle then
-    static void checkNothingIsWaiting(bool storesLocally);
 
     // Has the server check the password and ask each delegate. Throws SignInFailure. May be called again
     // after that.

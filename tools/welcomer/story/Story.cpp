@@ -1,4 +1,5 @@
 #include "tools/welcomer/story/Story.h"
+#include "tools/welcomer/story/SetupBundle.h"
 
 #include "handoff/LaunchAgentFile.h"
 #include "handoff/ReplayItem.h"

@@ -95,9 +95,33 @@ TYPED_TEST(AccountDirectoryContract, OfTwoThatAddAUserOneSucceeds) {
     EXPECT_EQ(this->backend.directory.users(), Names{"anna"});
 }
 
+TYPED_TEST(AccountDirectoryContract, ARemovedUserIsGoneOnce) {
+    EXPECT_TRUE(this->backend.directory.addUser({"anna", "secret", std::nullopt, {}}));
+    EXPECT_TRUE(this->backend.directory.addUser({"bert", "secret", std::nullopt, {}}));
+    EXPECT_TRUE(this->backend.directory.removeUser("anna"));
+    EXPECT_EQ(this->backend.directory.users(), Names{"bert"});
+    EXPECT_EQ(this->backend.directory.removeUser("anna").error.number, ENOENT);
+    EXPECT_TRUE(this->backend.directory.removeUser("bert"));
+    EXPECT_EQ(this->backend.directory.users(), Names{});
+}
+
+TYPED_TEST(AccountDirectoryContract, ARemovedAccountIsGoneOnceAndTheOthersStay) {
+    this->backend.service.sharedManager().accountForID(PropertyList("anna"), true);
+    this->backend.service.sharedManager().accountForID(PropertyList("bert"), true);
+    EXPECT_TRUE(this->backend.directory.removeAccount("anna"));
+    EXPECT_EQ(this->backend.directory.accounts(), Names{"bert"});
+    EXPECT_EQ(this->backend.directory.removeAccount("anna").error.number, ENOENT);
+}
+
+TYPED_TEST(AccountDirectoryContract, WhereNobodyIsLoggedInNobodyIsSignedOut) {
+    this->backend.service.sharedManager().accountForID(PropertyList("anna"), true);
+    EXPECT_EQ(this->backend.directory.signOut().error.number, ENOENT);
+    EXPECT_EQ(this->backend.directory.accounts(), Names{"anna"});
+}
+
 class LocalAccountDirectoryTest : public testing::Test {
   protected:
-    local::NimbusAnswer answer(const std::string& name, const std::string& password) const {
+    SignInAnswer answer(const std::string& name, const std::string& password) const {
         return local::NimbusDirectory(posix::RootFolder(local.root.path())).answer(name, password);
     }
     mode_t mode(const std::string& path) const {

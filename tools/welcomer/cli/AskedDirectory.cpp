@@ -1,0 +1,168 @@
+#include "tools/welcomer/cli/AskedDirectory.h"
+
+#include "platform/AccountService.h"
+#include "propertylist/Lookup.h"
+#include "propertylist/PropertyListWriter.h"
+#include "propertylist/XMLPropertyListReader.h"
+
+#include <cerrno>
+#include <cstdint>
+#include <sys/socket.h>
+#include <utility>
+
+namespace welcomer::tool {
+
+namespace {
+
+// A message is the number of its bytes and an XML property list; texts are data in it, so that any can be
+// asked for.
+constexpr char kQuestionKey[] = "Question";
+constexpr char kUserKey[] = "User";
+constexpr char kPasswordKey[] = "Password";
+constexpr char kAnswerQuestion[] = "answer";
+constexpr char kServicesQuestion[] = "services";
+constexpr char kNamesQuestion[] = "names";
+
+constexpr char kCompletedKey[] = "Completed";
+constexpr char kContentsKey[] = "Contents";
+constexpr char kDelayKey[] = "DelaySeconds";
+constexpr char kServicesKey[] = "Services";
+constexpr char kNamesKey[] = "Names";
+
+constexpr std::uint32_t kLongestMessage = 64U << 20U; // bytes
+
+bool sendAll(int socket, const char* bytes, std::size_t size) {
+    while (size > 0) {
+        const ssize_t count = ::send(socket, bytes, size, MSG_NOSIGNAL);
+        if (count < 0 && errno == EINTR) {
+            continue;
+        }
+        if (count <= 0) {
+            return false;
+        }
+        bytes += count;
+        size -= static_cast<std::size_t>(count);
+    }
+    return true;
+}
+
+bool receiveAll(int socket, char* bytes, std::size_t size) {
+    while (size > 0) {
+        const ssize_t count = ::recv(socket, bytes, size, 0);
+        if (count < 0 && errno == EINTR) {
+            continue;
+        }
+        if (count <= 0) {
+            return false;
+        }
+        bytes += count;
+        size -= static_cast<std::size_t>(count);
+    }
+    return true;
+}
+
+// What cannot be written is sent as nothing.
+bool sendMessage(int socket, const PropertyList& message) {
+    const std::string bytes = writeXMLPropertyList(message).value_or("");
+    const auto size = static_cast<std::uint32_t>(bytes.size());
+    return bytes.size() <= kLongestMessage &&
+           sendAll(socket, reinterpret_cast<const char*>(&size), sizeof(size)) &&
+           sendAll(socket, bytes.data(), bytes.size());
+}
+
+// None at the end of all messages, and for one that makes no sense.
+std::optional<PropertyList> receiveMessage(int socket) {
+    std::uint32_t size = 0;
+    if (!receiveAll(socket, reinterpret_cast<char*>(&size), sizeof(size)) || size > kLongestMessage) {
+        return std::nullopt;
+    }
+    std::string bytes(size, '\0');
+    if (!receiveAll(socket, bytes.data(), bytes.size())) {
+        return std::nullopt;
+    }
+    return readXMLPropertyList(bytes).value;
+}
+
+std::string bytesIn(const PropertyList& message, const char* key) {
+    const PropertyList* const value = valueIn(message, key);
+    return value && value->data() ? value->data()->bytes : "";
+}
+
+PropertyList::Array dataOf(const std::vector<std::string>& texts) {
+    PropertyList::Array data;
+    for (const std::string& text : texts) {
+        data.emplace_back(PropertyList::Data{text});
+    }
+    return data;
+}
+
+PropertyList replyTo(const PropertyList& question, const platform::SignInDirectory& directory) {
+    const std::string* const kind = textIn(question, kQuestionKey);
+    const std::string user = bytesIn(question, kUserKey);
+    PropertyList::Dictionary reply;
+    if (kind && *kind == kAnswerQuestion) {
+        const platform::SignInAnswer answer = directory.answer(user, bytesIn(question, kPasswordKey));
+        reply = {{kCompletedKey, answer.isCompleted},
+                 {kContentsKey, answer.contents},
+                 {kDelayKey, answer.delaySeconds}};
+    } else if (kind && *kind == kServicesQuestion) {
+        reply = {{kServicesKey, directory.servicesOfNewAccount(user)}};
+    } else if (kind && *kind == kNamesQuestion) {
+        if (const auto names = directory.userNames()) {
+            reply = {{kNamesKey, dataOf(*names)}};
+        }
+    }
+    return reply;
+}
+
+} // namespace
+
+platform::SignInAnswer AskedDirectory::answer(const std::string& username,
+                                              const std::string& password) const {
+    const PropertyList reply = _ask({{kQuestionKey, kAnswerQuestion},
+                                     {kUserKey, PropertyList::Data{username}},
+                                     {kPasswordKey, PropertyList::Data{password}}});
+    const PropertyList::Dictionary* const contents = dictionaryIn(reply, kContentsKey);
+    if (!contents) {
+        return {false, {{platform::kSKPropertyAccountError, platform::kSKAccountErrorServerUnavailable}}, 0};
+    }
+    const PropertyList* const delay = valueIn(reply, kDelayKey);
+    return {isTrueIn(reply, kCompletedKey), *contents, delay ? delay->real().value_or(0) : 0};
+}
+
+PropertyList::Dictionary AskedDirectory::servicesOfNewAccount(const std::string& username) const {
+    const PropertyList reply =
+        _ask({{kQuestionKey, kServicesQuestion}, {kUserKey, PropertyList::Data{username}}});
+    return copyOf(dictionaryIn(reply, kServicesKey)).value_or(PropertyList::Dictionary());
+}
+
+std::optional<std::vector<std::string>> AskedDirectory::userNames() const {
+    const PropertyList reply = _ask({{kQuestionKey, kNamesQuestion}});
+    const PropertyList::Array* const names = arrayIn(reply, kNamesKey);
+    if (!names) {
+        return std::nullopt;
+    }
+    std::vector<std::string> texts;
+    for (const PropertyList& name : *names) {
+        texts.push_back(name.data() ? name.data()->bytes : "");
+    }
+    return texts;
+}
+
+PropertyList AskedDirectory::_ask(PropertyList::Dictionary question) const {
+    const std::lock_guard lock(_mutex);
+    if (!sendMessage(_socket.get(), std::move(question))) {
+        return {};
+    }
+    return receiveMessage(_socket.get()).value_or(PropertyList());
+}
+
+void answerQuestions(int socket, const platform::SignInDirectory& directory) {
+    while (const std::optional<PropertyList> question = receiveMessage(socket)) {
+        if (!sendMessage(socket, replyTo(*question, directory))) {
+            return;
+        }
+    }
+}
+
+} // namespace welcomer::tool

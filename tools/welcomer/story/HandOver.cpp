@@ -1,0 +1,92 @@
+#include "tools/welcomer/story/HandOver.h"
+
+#include "handoff/LaunchAgentFile.h"
+#include "handoff/LaunchAgentInstaller.h"
+#include "handoff/ReplayItem.h"
+#include "platform/Platform.h"
+#include "tools/welcomer/story/ReplayReason.h"
+#include "tools/welcomer/terminal/Failure.h"
+
+namespace welcomer::tool {
+
+namespace {
+
+// A command that is to be given for the same user.
+std::string suggested(const std::string& command, const Caller& caller) {
+    return "`welcomer " + command + (caller.user.empty() ? "" : " --user " + caller.user) + "`";
+}
+
+CommandFailure cannotTell(std::int32_t status) {
+    return CommandFailure("cannot tell whether a replay item is waiting for the next login already: " +
+                          platform::credentialStatusText(status) + storingAdvice(status));
+}
+
+} // namespace
+
+WaitingHandOver waitingHandOver() {
+    const platform::Platform& platform = platform::current();
+    WaitingHandOver found;
+    found.itemStatus =
+        platform.credentialStore
+            .findItem(kReplayItemService, kReplayItemAccount, platform::CredentialWish::Presence)
+            .status;
+    found.agentPath = launchAgentPath(platform.processIdentity.homeDirectory());
+    found.hasAgent = platform.fileSystem.exists(found.agentPath);
+    return found;
+}
+
+void refuseWhereSomethingIsWaiting(const Caller& caller) {
+    const WaitingHandOver waiting = waitingHandOver();
+    const std::string cancelling = suggested("setup --cancel", caller);
+    if (waiting.hasItem() && waiting.hasAgent) {
+        throw CommandFailure("a replay item is waiting for the next login already; " + cancelling +
+                             " takes it back");
+    }
+    if (waiting.hasItem()) {
+        throw CommandFailure("a replay item is waiting, but no agent will start for it at the next login; " +
+                             suggested("replay arm", caller) + " installs the agent, " + cancelling +
+                             " removes the item");
+    }
+    if (waiting.itemStatus != platform::kCredentialItemNotFound && !caller.storesLocally) {
+        throw cannotTell(waiting.itemStatus);
+    }
+    if (waiting.hasAgent) {
+        throw CommandFailure("the agent is installed already: " + waiting.agentPath + "; " + cancelling +
+                             " removes it");
+    }
+}
+
+bool armAgent(const KeptLog& log, platform::ResourceBundle& bundle) {
+    const WaitingHandOver waiting = waitingHandOver();
+    if (waiting.itemStatus == platform::kCredentialItemNotFound) {
+        throw CommandFailure("no replay item is waiting for which the agent could be installed");
+    }
+    if (!waiting.hasItem()) {
+        throw cannotTell(waiting.itemStatus);
+    }
+    if (!waiting.hasAgent && !installLaunchAgent(bundle)) {
+        throw CommandFailure("cannot install the agent: " + log.reason());
+    }
+    return !waiting.hasAgent;
+}
+
+WaitingHandOver cancelHandOver(const KeptLog& log) {
+    const WaitingHandOver waiting = waitingHandOver();
+    const bool hasNoItem = waiting.itemStatus == platform::kCredentialItemNotFound;
+    if (hasNoItem && !waiting.hasAgent) {
+        throw CommandFailure("nothing is waiting for the next login");
+    }
+    // An agent without an item ends at once; an item without an agent would be in every setup's way.
+    if (!hasNoItem && !WLDeleteNimbusReplayKeychainItem()) {
+        throw CommandFailure("cannot delete the replay item: " + replayReason(log));
+    }
+    if (waiting.hasAgent) {
+        const platform::Outcome removed = platform::current().fileSystem.remove(waiting.agentPath);
+        if (!removed) {
+            throw CommandFailure(removed.error.message);
+        }
+    }
+    return waiting;
+}
+
+} // namespace welcomer::tool
