@@ -7,6 +7,7 @@
 import json
 import os
 import pathlib
+import pwd
 import shutil
 import subprocess
 import sys
@@ -45,6 +46,7 @@ class SetupExample(unittest.TestCase):
 
     def setUp(self):
         self.root = pathlib.Path(tempfile.mkdtemp(dir=self.work))
+        (self.root / pwd.getpwuid(os.getuid()).pw_dir.lstrip("/")).mkdir(parents=True)
         plugins = self.root / PLUGINS
         plugins.mkdir(parents=True)
         for plugin in (pathlib.Path(BUILD) / "plugins").glob("*.ncdplugin"):
