@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
 """The example of a setup application, built by a stranger against the installed library and run below a root of its own.
 
-    setup_example_test.py BUILD_DIR LIBDIR GENERATOR CXX SANITIZERS
+    setup_example_test.py BUILD_DIR GENERATOR CXX SANITIZERS
 """
 
 import json
@@ -14,7 +14,7 @@ import sys
 import tempfile
 import unittest
 
-BUILD, LIBDIR, GENERATOR, CXX, SANITIZE = sys.argv[1:6]
+BUILD, GENERATOR, CXX, SANITIZE = sys.argv[1:5]
 EXAMPLE = pathlib.Path(__file__).resolve().parents[2] / "examples" / "setup"
 PLUGINS = "System/Library/CoreServices/FirstRunPlugins"
 BUNDLE = "usr/share/welcomer/setup-bundle"
