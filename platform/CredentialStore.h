@@ -1,5 +1,5 @@
 // Generic-password items: a secret with a service, an account and a label. At most one item exists for a
-// service and an account together.
+// service and an account together. Any thread, all of this.
 
 #pragma once
 
@@ -42,7 +42,7 @@ enum CredentialStatus : std::int32_t {
     kCredentialNoHome = 22,     // the user has no home folder that it could lie in
 };
 
-// The text of a result code, for people; of a time-out, it says which operation that was. Any thread.
+// The text of a result code, for people; of a time-out, it says which operation that was.
 std::string credentialStatusText(std::int32_t status);
 
 // What came of a change to a store. Compares as its status does.
@@ -55,11 +55,11 @@ struct CredentialOutcome {
     bool operator==(std::int32_t other) const { return status == other; }
 };
 
-// The text of an outcome, for people: that of its status, and its detail. Any thread.
+// The text of an outcome, for people: that of its status, and its detail.
 std::string credentialOutcomeText(const CredentialOutcome& outcome);
 
 // Whether a result code says that there is a service, or may be one, that could not be asked: what it holds
-// is not known. Any thread.
+// is not known.
 bool credentialServiceWasNotAsked(std::int32_t status);
 
 // A program that may read an item without a prompt.
@@ -104,7 +104,7 @@ class CredentialItemReference {
   public:
     virtual ~CredentialItemReference() = default;
 
-    // Where it was found. Any thread.
+    // Where it was found.
     virtual CredentialStoreDescription store() const = 0;
 };
 
@@ -125,10 +125,9 @@ class CredentialStore {
 
     // Makes a reference to a trusted application from its path, which is absolute.
     //  result  the status; `application` is written on success only
-    // Any thread.
     virtual std::int32_t createTrustedApplication(const std::string& path, TrustedApplication& application);
 
-    // Makes an access object. `access` is written on success only. Any thread.
+    // Makes an access object. `access` is written on success only.
     virtual std::int32_t createAccess(const std::string& description,
                                       std::vector<TrustedApplication> trustedApplications,
                                       CredentialAccess& access);
@@ -137,20 +136,19 @@ class CredentialStore {
     // existing item with the same service and account in any store of the search list is not replaced: the
     // call then fails with kCredentialDuplicateItem.
     //  data  the secret, any bytes, none included
-    // Any thread and any process; may block while another process changes the store.
+    // Any process; may block while another one changes the store.
     virtual CredentialOutcome createItem(const CredentialItem& item, const std::string& data) = 0;
 
     // Finds the item with this service and account in the search list; the newest, where there is more than
-    // one all the same. Any thread.
+    // one all the same.
     virtual CredentialFinding findItem(const std::string& service, const std::string& account,
                                        CredentialWish wish) = 0;
 
-    // Deletes an item, and with it every other one that the look-up has found by its service and account. Any
-    // thread.
+    // Deletes an item, and with it every other one that the look-up has found by its service and account.
     virtual std::int32_t deleteItem(const CredentialItemReference& reference) = 0;
 
     // What would keep an item from being created, as far as can be told without writing anything: for
-    // reports. Any thread.
+    // reports.
     virtual CredentialOutcome examine() { return {}; }
 };
 

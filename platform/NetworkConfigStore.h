@@ -168,17 +168,18 @@ class NetworkConfigConnection : public NetworkConfigHandle {
     virtual void synchronize() = 0;
 };
 
+// Any thread.
 class NetworkConfigStore {
   public:
     virtual ~NetworkConfigStore() = default;
 
     // Opens a connection under a name, which is for people who look for the origin of a change.
     //  result  never null; what cannot be read shows when it is used
-    // Any thread; may read files and ask the kernel.
+    // May read files and ask the kernel.
     virtual std::shared_ptr<NetworkConfigConnection> open(const std::string& name) = 0;
 
-    // All interfaces of the machine but the loopback, in the platform's order; an entry may be null. Any
-    // thread; asks the kernel.
+    // All interfaces of the machine but the loopback, in the platform's order; an entry may be null. Asks
+    // the kernel.
     virtual std::vector<std::shared_ptr<NetworkInterface>> copyInterfaces() = 0;
 };
 
