@@ -112,11 +112,13 @@ class CheckLayers(unittest.TestCase):
 
     def test_a_tools_rooms_include_what_is_below_them(self):
         tool = "tools/welcomer"
-        files = {f"{tool}/{room}/A.h": "" for room in ("terminal", "cli", "story", "commands")}
+        files = {f"{tool}/{room}/A.h": "" for room in ("terminal", "cli", "login", "story", "commands")}
         def use(room):
             return f'#include "{tool}/{room}/A.h"\n'
         self.assertEqual(self.findings({**files, f"{tool}/main.cpp": use("commands") + use("terminal"),
-                                        f"{tool}/story/B.cpp": use("story") + use("cli") + use("terminal")}), [])
+                                        f"{tool}/login/B.cpp": use("cli"),
+                                        f"{tool}/story/B.cpp": use("story") + use("login") + use("cli") + use("terminal")}), [])
+        self.assert_one({**files, f"{tool}/login/B.cpp": use("story")}, "room story/ is not below login/")
         self.assert_one({**files, f"{tool}/terminal/B.cpp": use("cli")}, "room cli/ is not below terminal/")
         self.assert_one({**files, f"{tool}/cli/B.cpp": use("commands")}, "room commands/ is not below cli/")
         self.assert_one({**files, f"{tool}/other/B.cpp": use("cli")}, "tools/welcomer/other is none of the rooms")

@@ -1,7 +1,5 @@
 #include "tools/launch-agents/UserManagerStarter.h"
 
-#include "propertylist/Characters.h"
-
 #include <chrono>
 #include <cstdint>
 #include <functional>
@@ -58,11 +56,6 @@ bool hasEnded(std::string_view subState) {
     return subState == "exited" || subState == "failed";
 }
 
-bool isPlainInUnitName(char character) {
-    return isLetterOrDigit(character) || character == '.' || character == '_' || character == '-' ||
-           character == ':';
-}
-
 // Adds what the service runs. "no-env-expand": a dollar sign in an argument is one.
 void appendCommand(bus::Call& call, const LaunchAgent& agent) {
     call.open('r', "sv").append("s", "ExecStartEx").open('v', "a(sasas)").open('a', "(sasas)");
@@ -71,19 +64,6 @@ void appendCommand(bus::Call& call, const LaunchAgent& agent) {
 }
 
 } // namespace
-
-std::string unitName(std::string_view label) {
-    std::string name = "welcomer-agent-";
-    for (const char character : label) {
-        if (isPlainInUnitName(character)) {
-            name += character;
-        } else {
-            name += "\\x";
-            appendHex(name, static_cast<unsigned char>(character));
-        }
-    }
-    return name + ".service";
-}
 
 bool UserManagerStarter::_waitForUserManager(sd_bus* bus) {
     // Signals are asked for before the first look, so that none is missed between the two.

@@ -3,18 +3,14 @@
 #pragma once
 
 #include "tools/launch-agents/AgentStarter.h"
+#include "tools/shared/AgentUnit.h"
 #include "tools/shared/BusCall.h"
 
 #include <memory>
 #include <optional>
 #include <string>
-#include <string_view>
 
 namespace welcomer::launch {
-
-// The name of the unit that an agent with this label runs as: "welcomer-agent-LABEL.service", with what a
-// unit's name cannot hold written as "\xNN".
-std::string unitName(std::string_view label);
 
 // Each agent is a transient service of its own, which stays when it has ended, however it ended, so that its
 // status can be asked: as "active (exited)" or "failed", until the user manager ends or a later login starts

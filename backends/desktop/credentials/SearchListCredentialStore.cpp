@@ -113,7 +113,7 @@ platform::CredentialFinding SearchListCredentialStore::findItem(const std::strin
         found = std::move(local);
         std::swap(ofService, ofLocal);
     }
-    if (wish != platform::CredentialWish::Presence) {
+    if (ofService.item) {
         found.reference = std::make_unique<Reference>(std::move(ofService), std::move(ofLocal));
     }
     return found;

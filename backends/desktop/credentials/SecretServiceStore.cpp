@@ -125,7 +125,8 @@ Status takeCreated(SecretServiceQuestion& question, GVariant* answer, std::strin
 Status take(SecretServiceQuestion& question, const SearchResult& items, platform::CredentialWish wish,
             platform::CredentialFinding& found) {
     Status status = platform::kCredentialSuccess;
-    if (items.unlocked.empty()) {
+    // Whether there is one, and what of it shows while it is locked, is no reason to ask anybody.
+    if (items.unlocked.empty() && wish != platform::CredentialWish::Presence) {
         status = question.unlock(items.locked);
     }
     if (status != platform::kCredentialSuccess) {
@@ -238,7 +239,7 @@ platform::CredentialFinding SecretServiceStore::findItem(const std::string& serv
         status = search(question, service, account, items);
     }
     platform::CredentialFinding found;
-    if (status == platform::kCredentialSuccess && wish != platform::CredentialWish::Presence) {
+    if (status == platform::kCredentialSuccess) {
         status = take(question, items, wish, found);
         found.reference = std::make_unique<platform::KeyedItemReference>(
             platform::CredentialStoreDescription{

@@ -132,7 +132,7 @@ platform::CredentialFinding LocalCredentialStore::findItem(const std::string& se
     if (result && found == items.end()) {
         result.status = platform::kCredentialItemNotFound;
     }
-    if (!result || wish == platform::CredentialWish::Presence) {
+    if (!result) {
         return result;
     }
     result.item = credentialItemAttributes(*found);

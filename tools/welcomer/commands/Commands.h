@@ -6,6 +6,8 @@
 
 namespace welcomer::tool {
 
+void addStatusCommand(CommandLine& commandLine);
+void addLogCommand(CommandLine& commandLine);
 void addTryCommand(CommandLine& commandLine);
 void addSetupCommand(CommandLine& commandLine);
 void addAccountCommands(CommandLine& commandLine);
@@ -20,9 +22,10 @@ void addNetworkCommands(CommandLine& commandLine);
 
 // In the order in which --help shows them.
 inline constexpr CommandAdder kCommands[] = {
-    {addTryCommand, true},       {addSetupCommand, true},   {addAccountCommands, true},
-    {addServicesCommands, true}, {addReplayCommands, true}, {addPluginsCommands, false},
-    {addStateCommands, true},    {addSyncCommands, true},   {addSwitchCommands, false},
-    {addNetworkCommands, false}, {addDoctorCommand, false}};
+    {addStatusCommand, true},  {addLogCommand, false},      {addTryCommand, true},
+    {addSetupCommand, true},   {addAccountCommands, true},  {addServicesCommands, true},
+    {addReplayCommands, true}, {addPluginsCommands, false}, {addStateCommands, true},
+    {addSyncCommands, true},   {addSwitchCommands, false},  {addNetworkCommands, false},
+    {addDoctorCommand, false}};
 
 } // namespace welcomer::tool

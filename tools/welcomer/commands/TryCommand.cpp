@@ -1,6 +1,7 @@
 // welcomer try: the whole story, from the setup to the end of the second login, in a fresh folder.
 
 #include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/login/LoginPicture.h"
 #include "tools/welcomer/story/Story.h"
 #include "tools/welcomer/story/TemporaryFolder.h"
 
@@ -11,15 +12,20 @@ namespace welcomer::tool {
 
 namespace {
 
-Report tellInFolder(Session& session, bool timeLapse, InterruptionGuard& guard) {
+struct TryArguments {
+    bool timeLapse = false;
+    std::string picture;
+};
+
+Report tellInFolder(Session& session, bool timeLapse, InterruptionGuard& guard, LoginRecord& firstLogin) {
     if (session.options.rootGiven) {
-        return tellStory(session, timeLapse, session.options.root, guard);
+        return tellStory(session, timeLapse, session.options.root, guard, firstLogin);
     }
     const TemporaryFolder temporary;
-    return tellStory(session, timeLapse, temporary.path(), guard);
+    return tellStory(session, timeLapse, temporary.path(), guard, firstLogin);
 }
 
-Report tryStory(Session& session, bool timeLapse) {
+Report tryStory(Session& session, const TryArguments& arguments) {
     const Options& options = session.options;
     if (options.rootGiven && options.root == "/") {
         throw UsageError("--root: the story needs a folder of its own, not the machine's own root");
@@ -27,7 +33,14 @@ Report tryStory(Session& session, bool timeLapse) {
     // Before anything is made that an interruption would leave behind.
     InterruptionGuard guard;
     try {
-        Report report = tellInFolder(session, timeLapse, guard);
+        LoginRecord firstLogin;
+        Report report = tellInFolder(session, arguments.timeLapse, guard, firstLogin);
+        if (!arguments.picture.empty()) {
+            writePicture(arguments.picture,
+                         drawLogin(firstLogin, {"The first login of " + firstLogin.account(),
+                                                arguments.timeLapse ? "on simulated time" : ""}));
+            report.line("").line("The first login is drawn in " + arguments.picture + ".");
+        }
         if (!report.failure) {
             report.line("").line(options.rootGiven ? options.root + " is left as it is."
                                                    : "The temporary folder is removed.");
@@ -42,12 +55,16 @@ Report tryStory(Session& session, bool timeLapse) {
 } // namespace
 
 void addTryCommand(CommandLine& commandLine) {
-    const auto timeLapse = std::make_shared<bool>(false);
+    const auto arguments = std::make_shared<TryArguments>();
     CLI::App& command = commandLine.addCommand(
         "try", "Walk the whole story in a fresh folder (or below --root), from the setup to the second login",
-        [timeLapse](Session& session) { return tryStory(session, *timeLapse); });
-    command.add_flag("--time-lapse", *timeLapse,
+        [arguments](Session& session) { return tryStory(session, *arguments); });
+    command.add_flag("--time-lapse", arguments->timeLapse,
                      "Run the agent on simulated time: the two minutes pass at once");
+    command
+        .add_option("--picture", arguments->picture,
+                    "Draw the timeline of the first login in this file, as SVG")
+        ->type_name("FILE");
 }
 
 } // namespace welcomer::tool

@@ -4,8 +4,10 @@
 #include "handoff/LaunchAgentFile.h"
 #include "handoff/ReplayItem.h"
 #include "plugins/WLNimbusDelegatePlugins.h"
+#include "tools/welcomer/login/AgentTexts.h"
+#include "tools/welcomer/login/LoginRecord.h"
+#include "tools/welcomer/login/LoginReport.h"
 #include "tools/welcomer/story/AgentProcess.h"
-#include "tools/welcomer/story/DelegateReport.h"
 #include "tools/welcomer/story/ExampleFiles.h"
 #include "tools/welcomer/story/ExampleSetup.h"
 #include "tools/welcomer/story/FolderCopy.h"
@@ -15,9 +17,7 @@
 #include "tools/welcomer/terminal/ProgressLine.h"
 
 #include <chrono>
-#include <iomanip>
 #include <optional>
-#include <sstream>
 #include <string>
 #include <vector>
 
@@ -27,7 +27,6 @@ namespace {
 
 namespace fs = std::filesystem;
 
-constexpr const char* kLingerLine = "delaying exit by two minutes";
 constexpr std::chrono::seconds kLinger{120};
 
 std::string wholeSeconds(std::chrono::nanoseconds duration) {
@@ -42,9 +41,9 @@ struct Setup {
 };
 
 // One login, as it was seen from outside.
-struct Login {
+struct SeenLogin {
     std::vector<AgentLogRecord> log;
-    DelegateReport report;
+    LoginRecord record;
     AgentEnd end;
     std::chrono::steady_clock::time_point started = std::chrono::steady_clock::now();
     std::optional<std::chrono::steady_clock::time_point> lingering; // since when
@@ -69,7 +68,7 @@ class Story {
           _installed(_owner->platform()),
           _home(_owner->platform().processIdentity.homeDirectory()) {}
 
-    Report tell() {
+    Report tell(LoginRecord& firstLogin) {
         _prepare();
         _say("");
         _say("Setup, before the first login:");
@@ -77,7 +76,8 @@ class Story {
         _say("");
         _say(_timeLapse ? "First login, on simulated time (which stands still while plug-ins work):"
                         : "First login:");
-        const Login first = _login();
+        const SeenLogin first = _login();
+        firstLogin = first.record;
         _say("");
         _say("What is left on disk:");
         const LeftOnDisk left = _look();
@@ -86,7 +86,7 @@ class Story {
         _say("Second login. No launch agent is left that would start the agent.");
         _say("Started all the same, it has nothing to do:");
         const FolderSnapshot before(_root);
-        const Login second = _login();
+        const SeenLogin second = _login();
         const std::vector<std::string> changes = before.changesUntilNow();
         _say("  The second login has changed " +
              (changes.empty() ? std::string("nothing.") : changes.front()));
@@ -186,18 +186,18 @@ class Story {
         return setup;
     }
 
-    Login _login() {
-        Login login;
+    SeenLogin _login() {
+        SeenLogin login;
         ProgressLine progress;
         AgentListener listener;
         listener.record = [&](const AgentLogRecord& record) {
             progress.clear();
             login.log.push_back(record);
-            login.report.read(record.message);
+            login.record.read(record.time, record.message);
             _showRecord(record);
-            if (record.message == kLingerLine) {
+            if (record.message == agenttext::kLinger) {
                 login.lingering = std::chrono::steady_clock::now();
-                _showDelegates(login.report);
+                _showDelegates(login.record);
                 if (_timeLapse || !progress.visible()) {
                     _say(_timeLapse ? "  Lingering: the two minutes pass at once on simulated time."
                                     : "  Lingering for two minutes ...");
@@ -248,12 +248,7 @@ class Story {
         _say(std::string("  who can sign in    ") + kExampleAccount);
     }
 
-    void _showRecord(const AgentLogRecord& record) {
-        std::ostringstream line;
-        line << std::setw(11) << std::fixed << std::setprecision(3)
-             << std::chrono::duration<double>(record.time).count() << "  " << record.message;
-        _say(line.str());
-    }
+    void _showRecord(const AgentLogRecord& record) { _say(timedLine(record.time, record.message)); }
 
     void _showServices(const Json& services) {
         Report report;
@@ -262,24 +257,24 @@ class Story {
         _session.printer.tell(report);
     }
 
-    void _showDelegates(const DelegateReport& report) {
+    void _showDelegates(const LoginRecord& record) {
         TextTable table({"DELEGATE", "OUTCOME", "SECONDS"}, "  ");
-        for (const DelegateOutcome& delegate : report.delegates()) {
+        for (const DelegateOutcome& delegate : record.delegates()) {
             table.addRow(
-                {delegate.identifier, delegate.outcome, delegate.seconds.empty() ? "-" : delegate.seconds});
+                {delegate.identifier, delegate.text(), delegate.seconds.empty() ? "-" : delegate.seconds});
         }
         _session.printer.tell(Report().line("").table(std::move(table)).line(""));
     }
 
-    void _showProgress(ProgressLine& progress, const Login& login) const {
+    void _showProgress(ProgressLine& progress, const SeenLogin& login) const {
         const auto now = std::chrono::steady_clock::now();
         if (login.lingering && !_timeLapse) {
             const std::chrono::duration<double> passed = now - *login.lingering;
             progress.show("  Lingering " + ProgressLine::bar(passed / kLinger) + " " +
                           wholeSeconds(now - *login.lingering) + " of " + wholeSeconds(kLinger) + " s");
-        } else if (!login.lingering && login.report.working() > 0) {
-            progress.show("  " + std::to_string(login.report.working()) + " of " +
-                          std::to_string(login.report.delegates().size()) + " delegates at work, " +
+        } else if (!login.lingering && login.record.working() > 0) {
+            progress.show("  " + std::to_string(login.record.working()) + " of " +
+                          std::to_string(login.record.delegates().size()) + " delegates at work, " +
                           wholeSeconds(now - login.started) + " s");
         }
     }
@@ -295,12 +290,12 @@ class Story {
         return log;
     }
 
-    static Json _asJson(const Login& login) {
+    static Json _asJson(const SeenLogin& login) {
         Json delegates = Json::array();
-        for (const DelegateOutcome& delegate : login.report.delegates()) {
+        for (const DelegateOutcome& delegate : login.record.delegates()) {
             delegates.push_back(
                 {{"identifier", delegate.identifier},
-                 {"outcome", delegate.outcome},
+                 {"outcome", delegate.text()},
                  {"seconds", delegate.seconds.empty() ? Json() : Json(std::stod(delegate.seconds))}});
         }
         return {{"log", _asJson(login.log)},
@@ -308,7 +303,7 @@ class Story {
                 {"exitStatus", login.end.exitStatus ? Json(*login.end.exitStatus) : Json()}};
     }
 
-    static std::optional<std::string> _failure(const Login& first, const Login& second,
+    static std::optional<std::string> _failure(const SeenLogin& first, const SeenLogin& second,
                                                const LeftOnDisk& left,
                                                const std::vector<std::string>& changes) {
         if (!first.end.succeeded()) {
@@ -345,8 +340,9 @@ class Story {
 
 } // namespace
 
-Report tellStory(Session& session, bool timeLapse, const fs::path& root, InterruptionGuard& guard) {
-    return Story(session, timeLapse, root, guard).tell();
+Report tellStory(Session& session, bool timeLapse, const fs::path& root, InterruptionGuard& guard,
+                 LoginRecord& firstLogin) {
+    return Story(session, timeLapse, root, guard).tell(firstLogin);
 }
 
 } // namespace welcomer::tool

@@ -3,6 +3,7 @@
 #pragma once
 
 #include "tools/welcomer/cli/Tool.h"
+#include "tools/welcomer/login/LoginRecord.h"
 #include "tools/welcomer/terminal/InterruptionGuard.h"
 
 #include <filesystem>
@@ -10,11 +11,12 @@
 namespace welcomer::tool {
 
 // Tells people the story while it goes on.
-//  timeLapse  the agent runs on simulated time
-//  root       the folder of the machine
-//  result     the document, with a failure where a login did not do its part
+//  timeLapse   the agent runs on simulated time
+//  root        the folder of the machine
+//  firstLogin  receives what happened at the first login
+//  result      the document, with a failure where a login did not do its part
 // Throws CommandFailure where it cannot go on, and Interrupted. Main thread, no other thread running.
 Report tellStory(Session& session, bool timeLapse, const std::filesystem::path& root,
-                 InterruptionGuard& guard);
+                 InterruptionGuard& guard, LoginRecord& firstLogin);
 
 } // namespace welcomer::tool

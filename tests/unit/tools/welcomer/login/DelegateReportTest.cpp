@@ -1,4 +1,4 @@
-#include "tools/welcomer/story/DelegateReport.h"
+#include "tools/welcomer/login/DelegateReport.h"
 
 #include <gtest/gtest.h>
 
@@ -9,11 +9,11 @@ namespace {
 std::vector<std::string> report(std::initializer_list<const char*> lines) {
     DelegateReport report;
     for (const char* line : lines) {
-        report.read(line);
+        report.read({}, line);
     }
     std::vector<std::string> rows;
     for (const DelegateOutcome& delegate : report.delegates()) {
-        rows.push_back(delegate.identifier + "|" + delegate.outcome + "|" + delegate.seconds);
+        rows.push_back(delegate.identifier + "|" + delegate.text() + "|" + delegate.seconds);
     }
     return rows;
 }
@@ -65,11 +65,11 @@ TEST(DelegateReport, LinesThatOnlyResembleAnOutcomeChangeNothing) {
 TEST(DelegateReport, DelegatesAtWorkAreCounted) {
     DelegateReport report;
     EXPECT_EQ(report.working(), 0U);
-    report.read("setting up a.b");
-    report.read("setting up c.d");
-    report.read("no cached response for e.f");
+    report.read({}, "setting up a.b");
+    report.read({}, "setting up c.d");
+    report.read({}, "no cached response for e.f");
     EXPECT_EQ(report.working(), 2U);
-    report.read("c.d setup: completed (1.000 seconds)");
+    report.read({}, "c.d setup: completed (1.000 seconds)");
     EXPECT_EQ(report.working(), 1U);
 }
 
