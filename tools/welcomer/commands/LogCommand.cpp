@@ -1,5 +1,6 @@
 // welcomer log: what the agent and what starts it have logged at the last logins, or draw.
 
+#include "backends/posix/PasswordEntry.h"
 #include "platform/Platform.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
@@ -11,10 +12,8 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
-#include <cerrno>
 #include <iostream>
 #include <memory>
-#include <pwd.h>
 #include <span>
 #include <system_error>
 #include <thread>
@@ -54,14 +53,14 @@ void nameUser(LoginQuery& query, const std::string& name) {
     if (::geteuid() != 0) {
         throw CommandFailure("--user: only root can ask for another user's log");
     }
-    errno = 0;
-    const passwd* const entry = ::getpwnam(name.c_str());
-    if (!entry) {
+    int error = 0;
+    const auto user = posix::passwordEntryNamed(name, error);
+    if (!user) {
         throw CommandFailure("--user: there is no user " + name +
-                             (errno == 0 ? "" : ": " + std::generic_category().message(errno)));
+                             (error == 0 ? "" : ": " + std::generic_category().message(error)));
     }
-    query.userID = entry->pw_uid;
-    query.userName = name;
+    query.userID = user->userID;
+    query.userName = user->name;
 }
 
 LoginQuery queryFor(const Options& options, const LogArguments& arguments) {

@@ -1,5 +1,6 @@
 // welcomer status: what waits for the next login, what the last one did, and what is to be done.
 
+#include "backends/posix/PasswordEntry.h"
 #include "platform/CredentialStore.h"
 #include "platform/Platform.h"
 #include "tools/welcomer/cli/Tool.h"
@@ -11,6 +12,8 @@
 #include "tools/welcomer/story/ServiceStates.h"
 
 #include <CLI/CLI.hpp>
+#include <memory>
+#include <optional>
 #include <utility>
 
 namespace welcomer::tool {
@@ -147,11 +150,23 @@ LoginQuery queryOfCaller(const Options& options) {
 } // namespace
 
 void addStatusCommand(CommandLine& commandLine) {
-    commandLine.addCommand(
+    // Of another user, the log is read by root, who may.
+    const auto readBefore = std::make_shared<std::optional<LastLogin>>();
+    CLI::App& command = commandLine.addCommand(
         "status",
         "Show what waits for the next login, what the last one did, and what is to be done; exit status 0: "
         "nothing is, 1: something is",
-        [](Session& session) { return showStatus(lastLogin(queryOfCaller(session.options))); });
+        [readBefore](Session& session) {
+            return showStatus(*readBefore ? **readBefore : lastLogin(queryOfCaller(session.options)));
+        });
+    commandLine.addUserOption(command);
+    commandLine.addPreparation(command, [readBefore](const Options& options) {
+        int error = 0;
+        if (const auto user = posix::passwordEntryNamed(options.user, error)) {
+            *readBefore =
+                lastLogin({.root = options.root, .userID = user->userID, .userName = user->name});
+        }
+    });
 }
 
 } // namespace welcomer::tool

@@ -2,6 +2,9 @@
 
 #pragma once
 
+#include "agent/wlnimbussetup.h"
+#include "handoff/ReplayItem.h"
+
 #include <optional>
 #include <string_view>
 
@@ -12,11 +15,12 @@ inline constexpr std::string_view kBegin = "Self destructing...";
 inline constexpr std::string_view kNoAccountName = "Failed to get account name attribute";
 inline constexpr std::string_view kNoAccount = "Failed to retrieve SK_Account";
 inline constexpr std::string_view kLinger = "delaying exit by two minutes";
-inline constexpr std::string_view kEnd = "exiting";
+inline constexpr std::string_view kEnd = kAgentExitingMessage;
 
 // What lines begin with; something follows.
 inline constexpr std::string_view kFileStays = "Failed to remove wlnimbussetup plist for ";
-inline constexpr std::string_view kItemNotFound = "Failed to find replay keychain item: ";
+inline constexpr std::string_view kItemNotFound =
+    std::string_view(kReplayItemNotFoundMessage).substr(0, std::string_view(kReplayItemNotFoundMessage).size() - 2);
 inline constexpr std::string_view kItemUnreadable = "Failed to deserialize replayable data length: ";
 inline constexpr std::string_view kItemStays = "Failed to delete replay keychain item: ";
 inline constexpr std::string_view kAccountName = "Enabling post-login services for account ";
