@@ -44,7 +44,11 @@ class ThroughPkexec(ForOthersTest):
         rules = cls.root / "etc/polkit-1/rules.d"
         rules.mkdir(parents=True)
         (rules / "10-first-run.rules").write_text(RULE)
+        (cls.root / "etc/pam.d").mkdir()
+        (cls.root / "etc/pam.d/polkit-1").write_text("".join(
+            f"{kind} required pam_permit.so\n" for kind in ("auth", "account", "session")))
         (cls.root / "run/dbus").mkdir()
+        (cls.root / "var/run").symlink_to("../run")
         cls.daemon(["/usr/bin/dbus-daemon", "--system", "--nofork", "--nopidfile", "--nosyslog"])
         cls.machine.wait_for((cls.root / "run/dbus/system_bus_socket").exists, "the system bus")
         cls.daemon([POLKITD, "--no-debug"])
@@ -95,6 +99,7 @@ class ThroughPkexec(ForOthersTest):
         before = self.outside()
         self.fails(self.pkexec("setup", "--answers", "-"), 2, "through pkexec a setup is for another user: --user NAME")
         self.fails(self.pkexec("setup", "--cancel"), 2, "--user NAME")
+        self.fails(self.pkexec("setup", "--user", OTHER, "account", "list"), 2, "account")
         for option in (("--bundle", "/usr/local/share/welcomer/setup-bundle"), ("--root", "/tmp")):
             self.fails(self.set_up(*option), 2, "through pkexec there is no --root, no --bundle")
         self.fails(self.pkexec("setup", "--user", OTHER, "--answers", "/etc/passwd"), 2, "no file for --answers but -")

@@ -2,7 +2,6 @@
 
 #include "backends/posix/BecomeUser.h"
 #include "backends/posix/RootFolder.h"
-#include "platform/Path.h"
 #include "tools/welcomer/cli/AskedDirectory.h"
 #include "tools/welcomer/terminal/Failure.h"
 
@@ -29,28 +28,6 @@ CommandFailure systemFailure(const std::string& what) {
 bool isLoginShell(const std::string& shell) {
     const std::string name = shell.substr(shell.rfind('/') + 1);
     return name != "nologin" && name != "false";
-}
-
-posix::PasswordEntry userNamed(const std::string& name) {
-    if (::geteuid() != 0) {
-        throw CommandFailure("--user: only root can act for another user");
-    }
-    int error = 0;
-    const auto user = posix::passwordEntryNamed(name, error);
-    if (!user) {
-        throw CommandFailure("--user: there is no user " + name +
-                             (error == 0 ? "" : ": " + std::generic_category().message(error)));
-    }
-    if (user->userID == 0) {
-        throw UsageError("--user: " + name + " is root, who needs no such option");
-    }
-    if (!isLoginShell(user->shell)) {
-        throw CommandFailure("--user: the user " + name + " cannot log in: the shell is " + user->shell);
-    }
-    if (!user->home.starts_with('/')) {
-        throw CommandFailure("--user: the user " + name + " has no home folder");
-    }
-    return *user;
 }
 
 // In the new process.
@@ -96,9 +73,30 @@ int statusOf(pid_t process) {
 
 } // namespace
 
-int runAsUser(const std::string& name, const std::string& root, const PlatformFactory& buildPlatform,
+posix::PasswordEntry userToActFor(const std::string& name) {
+    if (::geteuid() != 0) {
+        throw CommandFailure("--user: only root can act for another user");
+    }
+    int error = 0;
+    const auto user = posix::passwordEntryNamed(name, error);
+    if (!user) {
+        throw CommandFailure("--user: there is no user " + name +
+                             (error == 0 ? "" : ": " + std::generic_category().message(error)));
+    }
+    if (user->userID == 0) {
+        throw UsageError("--user: " + name + " is root, who needs no such option");
+    }
+    if (!isLoginShell(user->shell)) {
+        throw CommandFailure("--user: the user " + name + " cannot log in: the shell is " + user->shell);
+    }
+    if (!user->home.starts_with('/')) {
+        throw CommandFailure("--user: the user " + name + " has no home folder");
+    }
+    return *user;
+}
+
+int runAsUser(const posix::PasswordEntry& user, const std::string& root, const PlatformFactory& buildPlatform,
               const std::function<int(platform::SignInDirectory&)>& command) {
-    const posix::PasswordEntry user = userNamed(name);
     std::array<int, 2> sockets = {-1, -1};
     if (::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, sockets.data()) != 0) {
         throw systemFailure("--user");

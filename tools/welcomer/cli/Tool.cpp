@@ -143,15 +143,19 @@ int runCommand(const Command& command, const Options& options, const PlatformFac
 
 int runChosen(const CommandLine& commandLine, Options& options, const PlatformFactory& buildPlatform) {
     settleRoot(options);
+    std::optional<posix::PasswordEntry> user;
+    if (!options.user.empty()) {
+        user = userToActFor(options.user);
+        options.storesLocally = true;
+    }
     if (commandLine.chosenPreparation()) {
         commandLine.chosenPreparation()(options);
     }
     const Command& command = commandLine.chosen();
-    if (options.user.empty()) {
+    if (!user) {
         return runCommand(command, options, buildPlatform);
     }
-    options.storesLocally = true;
-    return runAsUser(options.user, options.root, buildPlatform, [&](platform::SignInDirectory& directory) {
+    return runAsUser(*user, options.root, buildPlatform, [&](platform::SignInDirectory& directory) {
         return runCommand(command, options, buildPlatform, &directory);
     });
 }
