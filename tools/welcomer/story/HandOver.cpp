@@ -71,7 +71,7 @@ bool armAgent(const KeptLog& log, platform::ResourceBundle& bundle) {
 }
 
 WaitingHandOver cancelHandOver(const KeptLog& log) {
-    const WaitingHandOver waiting = waitingHandOver();
+    WaitingHandOver waiting = waitingHandOver();
     const bool hasNoItem = waiting.itemStatus == platform::kCredentialItemNotFound;
     if (hasNoItem && !waiting.hasAgent) {
         throw CommandFailure("nothing is waiting for the next login");
