@@ -18,7 +18,8 @@ struct Libmnl {
     decltype(&::mnl_cb_run) cbRun = nullptr;
 };
 
-// The library, loaded at the first call; null where it is not there, or lacks one of these. Any thread.
-const Libmnl* libmnl();
+// The library, loaded at the first call. Throws std::runtime_error with the loader's reason where it is not there or lacks
+// one of these: an installation that is not whole is not a machine without a network. Any thread.
+const Libmnl& libmnl();
 
 } // namespace welcomer::posix

@@ -22,7 +22,7 @@ int showMessage(const nlmsghdr* message, void* take) {
 } // namespace
 
 void NetlinkSocket::Close::operator()(mnl_socket* socket) const {
-    libmnl()->socketClose(socket);
+    libmnl().socketClose(socket);
 }
 
 int NetlinkSocket::ask(NetlinkRequest& request, const Take& take) {
@@ -45,15 +45,15 @@ int NetlinkSocket::_exchange(nlmsghdr& request, const Take& take) {
     }
     request.nlmsg_seq = ++_sequence;
     int result =
-        libmnl()->socketSendto(_socket.get(), &request, request.nlmsg_len) < 0 ? MNL_CB_ERROR : MNL_CB_OK;
+        libmnl().socketSendto(_socket.get(), &request, request.nlmsg_len) < 0 ? MNL_CB_ERROR : MNL_CB_OK;
     while (result == MNL_CB_OK) {
-        const ssize_t size = libmnl()->socketRecvfrom(_socket.get(), _buffer.data(), _buffer.size());
+        const ssize_t size = libmnl().socketRecvfrom(_socket.get(), _buffer.data(), _buffer.size());
         if (size < 0 && errno == EINTR) {
             continue; // a signal; a list that has changed meanwhile is told in a message
         }
         result = size < 0 ? MNL_CB_ERROR
-                          : libmnl()->cbRun(_buffer.data(), static_cast<std::size_t>(size), _sequence, 0,
-                                            showMessage, const_cast<Take*>(&take));
+                          : libmnl().cbRun(_buffer.data(), static_cast<std::size_t>(size), _sequence, 0,
+                                           showMessage, const_cast<Take*>(&take));
     }
     const int error = result == MNL_CB_ERROR ? errno : 0;
     if (error != 0) {
@@ -66,20 +66,17 @@ int NetlinkSocket::_open() {
     if (_socket) {
         return 0;
     }
-    const Libmnl* const mnl = libmnl();
-    if (!mnl) {
-        return ELIBACC;
-    }
-    _socket.reset(mnl->socketOpen2(_protocol, SOCK_CLOEXEC));
-    if (!_socket || mnl->socketBind(_socket.get(), 0, MNL_SOCKET_AUTOPID) != 0) {
+    const Libmnl& mnl = libmnl();
+    _socket.reset(mnl.socketOpen2(_protocol, SOCK_CLOEXEC));
+    if (!_socket || mnl.socketBind(_socket.get(), 0, MNL_SOCKET_AUTOPID) != 0) {
         const int error = errno;
         _socket.reset();
         return error;
     }
     int on = 1;
     // Has the kernel heed filters; one that cannot lists more, which is looked through where it is asked.
-    mnl->socketSetsockopt(_socket.get(), NETLINK_GET_STRICT_CHK, &on, sizeof on);
-    ::setsockopt(mnl->socketGetFd(_socket.get()), SOL_SOCKET, SO_RCVTIMEO, &kPatience, sizeof kPatience);
+    mnl.socketSetsockopt(_socket.get(), NETLINK_GET_STRICT_CHK, &on, sizeof on);
+    ::setsockopt(mnl.socketGetFd(_socket.get()), SOL_SOCKET, SO_RCVTIMEO, &kPatience, sizeof kPatience);
     _buffer.resize(kBufferSize);
     return 0;
 }

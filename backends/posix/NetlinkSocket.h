@@ -15,7 +15,7 @@ namespace welcomer::posix {
 
 // A connection to the kernel, made when it is first used, in the network namespace of that time, by libmnl, which is
 // loaded then: a program that asks nothing starts without it. One thread at a time. Results are 0 or the
-// system's error number, ELIBACC where that library is not there.
+// system's error number. Throws std::runtime_error where that library is not there.
 class NetlinkSocket {
   public:
     using Take = std::function<void(const nlmsghdr& message)>;
