@@ -6,16 +6,20 @@ find_package(Threads REQUIRED)
 target_link_libraries(welcomer-headers INTERFACE Threads::Threads ${CMAKE_DL_LIBS})
 target_include_directories(welcomer-headers INTERFACE
     "${PROJECT_SOURCE_DIR}" "${PROJECT_BINARY_DIR}") # generated/
-# Short-lived programs: what they call is bound in one go, and their relocations are few pages to read.
+# Short-lived programs: what they call is bound in one go, and their relocations are few pages to read. The library is bound
+# as it is called: of what all of it calls, the agent needs a part, and binding the rest is a tenth of its start.
 include(CheckLinkerFlag)
 check_linker_flag(CXX -Wl,-z,pack-relative-relocs WELCOMER_PACKS_RELOCATIONS)
-target_link_options(welcomer-headers INTERFACE -Wl,-z,now
+target_link_options(welcomer-headers INTERFACE
+    $<IF:$<STREQUAL:$<TARGET_PROPERTY:TYPE>,SHARED_LIBRARY>,-Wl$<COMMA>-z$<COMMA>lazy,-Wl$<COMMA>-z$<COMMA>now>
     $<$<BOOL:${WELCOMER_PACKS_RELOCATIONS}>:-Wl,-z,pack-relative-relocs>)
 
 # The version script says what is exported; the compiler does not hide it. What the library calls of its own is bound when
 # it is linked, so that nothing in a program takes its place, and no look-up is left for the loader.
 set_target_properties(welcomer PROPERTIES CXX_VISIBILITY_PRESET default)
-target_compile_options(welcomer PRIVATE -fno-semantic-interposition)
+target_compile_options(welcomer PRIVATE -fno-semantic-interposition
+    # Else each constant of a header is looked for in the whole process at every start.
+    $<$<CXX_COMPILER_ID:GNU>:-fno-gnu-unique>)
 set(WELCOMER_SOVERSION 0)
 set(WELCOMER_VERSION_SCRIPT "${PROJECT_BINARY_DIR}/generated/welcomer.map")
 configure_file("${CMAKE_CURRENT_LIST_DIR}/welcomer.map.in" "${WELCOMER_VERSION_SCRIPT}" @ONLY)
