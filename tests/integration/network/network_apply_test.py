@@ -272,11 +272,12 @@ class OrdinaryUser(SpaceTest):
     def setUp(self):
         super().setUp()
         self.here.connect("eth7", self.there, "eth0")
-        self.program = self.folder / "welcomer"  # the build folder may be the superuser's alone
-        shutil.copy(PROGRAM, self.program)
+        # The build folder may be the superuser's alone.
+        for name in ("bin", "lib"):
+            (self.folder / name).mkdir()
+        self.program = shutil.copy(PROGRAM, self.folder / "bin/welcomer")
+        shutil.copy(BUILD / "lib/libwelcomer.so.0", self.folder / "lib")
         shutil.copytree(BUILD / "tool-bundle", self.folder / "tool-bundle")
-        (self.folder / "bin").mkdir()
-        self.program = shutil.move(self.program, self.folder / "bin/welcomer")
         self.folder.chmod(0o755)
         self.succeeds(self.call("apply", *MANUAL, "--warning-type", "3"))
         self.before = self.stored.read_bytes()

@@ -14,7 +14,7 @@ import subprocess
 import unittest
 from pathlib import Path
 
-from tool_test import PROGRAM, ToolTest
+from tool_test import BUILD, PROGRAM, ToolTest
 
 IS_SUPERUSER = os.geteuid() == 0
 ORDINARY_USER = "nobody"
@@ -27,8 +27,11 @@ class OrdinaryUserTest(ToolTest):
 
     def setUp(self):
         super().setUp()
-        self.program = self.folder / "welcomer"
-        shutil.copy(PROGRAM, self.program)  # the build folder may be the superuser's alone
+        # The build folder may be the superuser's alone.
+        for name in ("bin", "lib"):
+            (self.folder / name).mkdir()
+        self.program = shutil.copy(PROGRAM, self.folder / "bin/welcomer")
+        shutil.copy(BUILD / "lib/libwelcomer.so.0", self.folder / "lib")
         self.user = {}
         if IS_SUPERUSER:
             entry = pwd.getpwnam(ORDINARY_USER)
