@@ -16,6 +16,9 @@ set(WELCOMER_ONLINE_ACCOUNT_PROVIDER "owncloud" CACHE STRING
 set(WELCOMER_ONLINE_ACCOUNT_SERVER "https://services.nimbus.example/" CACHE STRING
     "The address of the server that these accounts are made with: a URL")
 
+# Where packages put plug-ins, which may make no folders at the top.
+set(WELCOMER_PLUGIN_FOLDER "${CMAKE_INSTALL_FULL_LIBDIR}/welcomer/plugins")
+
 # welcomer_read_configuration(VARIABLE COUNT PATTERN): checks a list and gives its entries as C++ string literals.
 function(welcomer_read_configuration variable count pattern)
     set(values ${${variable}})

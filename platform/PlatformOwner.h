@@ -4,6 +4,7 @@
 
 #include "platform/BackendReport.h"
 #include "platform/Platform.h"
+#include "platform/SettingsReport.h"
 
 #include <string>
 #include <vector>
@@ -57,6 +58,9 @@ class PlatformOwner {
     // The folder that plug-ins are found in now, in the place of platform::kPluginDirectory or that itself: a path
     // of the system, below the root.
     virtual std::string pluginFolder() const = 0;
+
+    // What the backends themselves are set to, and where each value comes from. May read files.
+    virtual platform::SettingsReport settings() = 0;
 };
 
 } // namespace welcomer

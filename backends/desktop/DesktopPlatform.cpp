@@ -4,7 +4,6 @@
 #include "backends/local/accounts/LocalAccountService.h"
 #include "backends/posix/FileLock.h"
 #include "backends/posix/RootFolder.h"
-#include "generated/WelcomerConfiguration.h"
 
 #include <memory>
 
@@ -67,8 +66,11 @@ DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
                          : posix::FileLock(root, posix::userLockPath(libraries.front(), kOnlineAccountsLock));
           }},
           _modules),
-      _accountService(_accountSurroundings(options.root), {std::string(configuration::kOnlineAccountProvider),
-                                                           std::string(configuration::kOnlineAccountServer)}),
+      _accountService(_accountSurroundings(options.root),
+                      [this] {
+                          return OnlineAccountServer{_local.setting(local::Setting::OnlineAccountProvider),
+                                                     _local.setting(local::Setting::OnlineAccountServer)};
+                      }),
       _preferenceStore(_local.platform().preferenceStore, _modules),
       _nameServers(_modules),
       _kernelConfigStore(posix::RootFolder(options.root), &_nameServers),

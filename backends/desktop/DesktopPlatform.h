@@ -30,6 +30,7 @@ class DesktopPlatform final : public PlatformOwner {
     platform::SignInDirectory& signInDirectory() override { return _local.signInDirectory(); }
     std::vector<platform::BackendReport> backendReports() override;
     std::string pluginFolder() const override { return _local.pluginFolder(); }
+    platform::SettingsReport settings() override { return _local.settings(); }
 
   private:
     OnlineAccountSurroundings _accountSurroundings(const std::string& root);

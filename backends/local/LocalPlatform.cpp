@@ -16,6 +16,7 @@ Interface& chosen(Interface* replacement, std::type_identity_t<Interface>& servi
 
 LocalPlatform::LocalPlatform(const PlatformOptions& options)
     : _root(options.root),
+      _settings(_root, chosen(options.systemLog, _systemLog)),
       _resourceBundles(_root, options.mainBundle),
       _preferenceStore(_root, _processIdentity, chosen(options.systemLog, _systemLog)),
       _signInDirectory(chosen(options.signInDirectory, _nimbusDirectory)),

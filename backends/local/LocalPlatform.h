@@ -10,6 +10,7 @@
 #include "backends/local/LocalProcessIdentity.h"
 #include "backends/local/LocalProcessLauncher.h"
 #include "backends/local/LocalResourceBundles.h"
+#include "backends/local/LocalSettings.h"
 #include "backends/local/LocalSystemLog.h"
 #include "backends/local/LocalSystemVersionInfo.h"
 #include "backends/local/accounts/LocalAccountDirectory.h"
@@ -36,11 +37,16 @@ class LocalPlatform final : public PlatformOwner {
     platform::SignInDirectory& signInDirectory() override { return _signInDirectory; }
     std::vector<platform::BackendReport> backendReports() override;
     std::string pluginFolder() const override { return _pluginFolder.serving(); }
+    platform::SettingsReport settings() override { return _settings.report(); }
+
+    // The value of a setting, for the backends beside these; see LocalSettings.
+    const std::string& setting(Setting setting) { return _settings.value(setting); }
 
   private:
     const posix::RootFolder _root;
     LocalSystemLog _systemLog;
-    const PluginFolder _pluginFolder{_root};
+    LocalSettings _settings;
+    const PluginFolder _pluginFolder{_root, [this] { return _settings.value(Setting::PluginFolder); }};
     LocalFileSystem _fileSystem{_root, _pluginFolder};
     LocalProcessIdentity _processIdentity{_root};
     LocalCredentialStore _credentialStore{_root, _processIdentity};

@@ -1,5 +1,6 @@
 #include "backends/local/PluginFolder.h"
 
+#include "generated/WelcomerConfiguration.h"
 #include "platform/PluginDirectory.h"
 
 #include <string_view>
@@ -7,16 +8,16 @@
 
 namespace welcomer::local {
 
-PluginFolder::PluginFolder(posix::RootFolder root, std::string packages)
+PluginFolder::PluginFolder(posix::RootFolder root, Packages packages)
     : _root(std::move(root)),
       _packages(std::move(packages)) {}
 
-std::string PluginFolder::defaultFolder() {
-    return WELCOMER_PLUGIN_FOLDER;
+std::string PluginFolder::builtIn() {
+    return std::string(configuration::kPluginFolder);
 }
 
 std::string PluginFolder::serving() const {
-    return _root.exists(platform::kPluginDirectory) ? platform::kPluginDirectory : _packages;
+    return _root.exists(platform::kPluginDirectory) ? platform::kPluginDirectory : _packages();
 }
 
 std::string PluginFolder::located(const std::string& path) const {

@@ -4,6 +4,7 @@
 
 #include "backends/posix/RootFolder.h"
 
+#include <functional>
 #include <string>
 
 namespace welcomer::local {
@@ -12,11 +13,13 @@ namespace welcomer::local {
 // may put plug-ins into serves in its place. Asked anew each time. Any thread.
 class PluginFolder {
   public:
-    //  packages  that folder, a path of the system
-    explicit PluginFolder(posix::RootFolder root, std::string packages = defaultFolder());
+    using Packages = std::function<std::string()>;
 
-    // Where this build's installation has it.
-    static std::string defaultFolder();
+    //  packages  gives that folder, a path of the system; asked only where it serves
+    explicit PluginFolder(posix::RootFolder root, Packages packages = builtIn);
+
+    // The one of this build, which a machine's settings may change.
+    static std::string builtIn();
 
     // Which of the two serves now, a path of the system.
     std::string serving() const;
@@ -26,7 +29,7 @@ class PluginFolder {
 
   private:
     const posix::RootFolder _root;
-    const std::string _packages;
+    const Packages _packages;
 };
 
 } // namespace welcomer::local

@@ -33,7 +33,7 @@ struct OnlineAccountBackend {
                                                        posts, embedded.log);
                                                },
                                                preferenceStore, time.runLoops, time.dispatchQueues, center},
-            cloud);
+            [server = cloud] { return server; });
     }
 
     const std::function<desktop::OnlineAccounts*()> online;

@@ -40,7 +40,7 @@ bool isText(const std::optional<PropertyList>& value) {
 
 struct OnlineAccountService::Switches {
     const std::function<OnlineAccounts*()> onlineAccounts;
-    const OnlineAccountServer server;
+    const std::function<OnlineAccountServer()> server;
 
     std::optional<std::vector<OnlineAccount>> list() const {
         OnlineAccounts* const accounts = onlineAccounts();
@@ -49,11 +49,13 @@ struct OnlineAccountService::Switches {
 
     // The online account that has the switch of a cloud account's service.
     std::optional<OnlineAccount> find(const std::string& name, OnlineFeature feature) const {
-        const std::string provider = feature == OnlineFeature::Mail ? kMailProvider : server.providerType;
         std::optional<OnlineAccount> found;
         std::optional<std::vector<OnlineAccount>> all = list();
-        for (std::size_t i = 0; all && i < all->size(); ++i) {
-            OnlineAccount& account = (*all)[i];
+        if (!all || all->empty()) {
+            return found;
+        }
+        const std::string provider = feature == OnlineFeature::Mail ? kMailProvider : server().providerType;
+        for (OnlineAccount& account : *all) {
             if (account.identity == name && account.switchOf(feature).isKnown() &&
                 (!found || (account.providerType == provider && found->providerType != provider))) {
                 found = std::move(account);
@@ -65,9 +67,13 @@ struct OnlineAccountService::Switches {
     // Whether the online accounts are served and the cloud account has none.
     bool lack(const std::string& name) const {
         const auto all = list();
-        return all && std::none_of(all->begin(), all->end(), [&](const OnlineAccount& account) {
-                   return account.identity == name && account.providerType == server.providerType;
-               });
+        if (!all) {
+            return false;
+        }
+        const std::string provider = server().providerType;
+        return std::none_of(all->begin(), all->end(), [&](const OnlineAccount& account) {
+            return account.identity == name && account.providerType == provider;
+        });
     }
 
     // What cannot be switched is in the account file all the same.
@@ -77,9 +83,16 @@ struct OnlineAccountService::Switches {
         }
     }
 
-    bool makeOnce(const NewOnlineAccount& account) const {
+    // On the cloud service's own server.
+    bool makeOnce(NewOnlineAccount account) const {
         OnlineAccounts* const accounts = onlineAccounts();
-        return accounts && accounts->makeOnce(account);
+        if (!accounts) {
+            return false;
+        }
+        OnlineAccountServer own = server();
+        account.providerType = std::move(own.providerType);
+        account.serverAddress = std::move(own.address);
+        return accounts->makeOnce(account);
     }
 };
 
@@ -170,7 +183,7 @@ class OnlineAccountService::SignIn final : public platform::NotificationCenter,
            const std::string& username, const std::string& password)
         : _surroundings(surroundings),
           _switches(std::move(switches)),
-          _account{_switches->server.providerType, username, password, _switches->server.address, {}},
+          _account{"", username, password, "", {}},
           _embedded(surroundings.makeEmbedded(*this)) {}
 
     void start(const PropertyList::Dictionary& delegateRequest) {
@@ -229,7 +242,8 @@ class OnlineAccountService::SignIn final : public platform::NotificationCenter,
     std::atomic<bool> _isOver{false};
 };
 
-OnlineAccountService::OnlineAccountService(OnlineAccountSurroundings surroundings, OnlineAccountServer server)
+OnlineAccountService::OnlineAccountService(OnlineAccountSurroundings surroundings,
+                                           std::function<OnlineAccountServer()> server)
     : _surroundings(std::move(surroundings)),
       _switches(std::make_shared<Switches>(Switches{_surroundings.onlineAccounts, std::move(server)})),
       _embedded(_surroundings.makeEmbedded(_surroundings.notificationCenter)) {}

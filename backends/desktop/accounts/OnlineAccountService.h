@@ -55,7 +55,8 @@ inline constexpr char kOnlineAccountsDomain[] = "com.corvid.welcomer.onlineaccou
 // Where nobody serves them there are no differences. Nothing of this shows an interface.
 class OnlineAccountService final : public platform::AccountService, public platform::AccountManager {
   public:
-    OnlineAccountService(OnlineAccountSurroundings surroundings, OnlineAccountServer server);
+    //  server  asked only where there are online accounts
+    OnlineAccountService(OnlineAccountSurroundings surroundings, std::function<OnlineAccountServer()> server);
     ~OnlineAccountService() override;
 
     platform::AccountManager& sharedManager() override { return *this; }

@@ -23,14 +23,16 @@ int main(int argumentCount, char** arguments) {
                                                                      return posix::FileLock(
                                                                          root, "/online-accounts/lock");
                                                                  }});
-    desktop::OnlineAccountService service({[&] { return module.service(); },
-                                           [&](platform::NotificationCenter& posts) {
-                                               return std::make_unique<local::LocalAccountService>(
-                                                   root, identity, time.runLoops, time.dispatchQueues, posts,
-                                                   log);
-                                           },
-                                           preferenceStore, time.runLoops, time.dispatchQueues, center},
-                                          {"owncloud", "http://127.0.0.1:9/"});
+    desktop::OnlineAccountService service(
+        {[&] { return module.service(); },
+         [&](platform::NotificationCenter& posts) {
+             return std::make_unique<local::LocalAccountService>(root, identity, time.runLoops,
+                                                                 time.dispatchQueues, posts, log);
+         },
+         preferenceStore, time.runLoops, time.dispatchQueues, center},
+        [] {
+            return desktop::OnlineAccountServer{"owncloud", "http://127.0.0.1:9/"};
+        });
     const bool isOn = std::string(arguments[4]) == "on";
     const auto account = service.accountForID(arguments[2], true);
     const auto entry = account ? account->serviceForID(arguments[3]) : nullptr;

@@ -1,0 +1,65 @@
+#include "backends/local/LocalSettings.h"
+
+#include "backends/posix/FileContent.h"
+#include "generated/WelcomerConfiguration.h"
+
+#include <cerrno>
+#include <ranges>
+#include <string_view>
+#include <system_error>
+
+namespace welcomer::local {
+
+namespace {
+
+// By Setting.
+constexpr std::array<std::string_view, kSettingCount> kBuiltIn = {
+    configuration::kOnlineAccountProvider, configuration::kOnlineAccountServer, configuration::kPluginFolder};
+
+} // namespace
+
+const std::string& LocalSettings::value(Setting setting) {
+    std::call_once(_isRead, [this] { _read(); });
+    return _report.settings[static_cast<std::size_t>(setting)].value;
+}
+
+platform::SettingsReport LocalSettings::report() {
+    std::call_once(_isRead, [this] { _read(); });
+    return _report;
+}
+
+void LocalSettings::_read() {
+    for (std::size_t i = 0; i < kSettingCount; ++i) {
+        _report.settings.push_back({nameOf(static_cast<Setting>(i)), std::string(kBuiltIn[i]), "the build"});
+    }
+    for (const char* const path : kSettingsFiles | std::views::reverse) {
+        _readFile(path);
+    }
+    for (const std::string& problem : _report.problems) {
+        _log.write(platform::kErrorPriority, problem);
+    }
+}
+
+void LocalSettings::_readFile(const char* path) {
+    std::string content;
+    const int error = posix::readFile(_root, path, content, kMaximumSettingsSize);
+    if (error == ENOENT || error == ENOTDIR) {
+        return;
+    }
+    if (error != 0) {
+        _report.problems.push_back(std::string(path) + ": " + std::generic_category().message(error));
+        return;
+    }
+    const SettingsText read = readSettings(content);
+    for (std::size_t i = 0; i < kSettingCount; ++i) {
+        if (read.values[i]) {
+            _report.settings[i].value = *read.values[i];
+            _report.settings[i].origin = path;
+        }
+    }
+    for (const std::string& problem : read.problems) {
+        _report.problems.push_back(std::string(path) + ", " + problem);
+    }
+}
+
+} // namespace welcomer::local
