@@ -1,6 +1,10 @@
 #include "tools/welcomer/cli/Tool.h"
 
 #include "tools/welcomer/cli/AsUser.h"
+#include "tools/welcomer/cli/Definition.h"
+#include "tools/welcomer/cli/HelpCommands.h"
+#include "tools/welcomer/cli/HelpText.h"
+#include "tools/welcomer/cli/Suggestion.h"
 #include "tools/welcomer/terminal/Printable.h"
 
 #include <CLI/CLI.hpp>
@@ -23,6 +27,7 @@ int fail(const std::string& reason, int status) {
 // What every level of the command line has in common.
 void configure(CLI::App& app) {
     app.fallthrough(); // the options for every command may stand before and after it
+    app.get_formatter()->column_width(kHelpColumn);
     app.get_formatter()->label("SUBCOMMAND", "COMMAND");
     app.get_formatter()->label("SUBCOMMANDS", "COMMAND");
     app.get_formatter()->label("REQUIRED", "(required)");
@@ -46,14 +51,31 @@ const CLI::App& namedLast(const CLI::App& app) {
     return named.empty() ? app : namedLast(*named.front());
 }
 
+// The options that are known at this level, those of the levels above among them.
+std::vector<std::string> optionsAt(const CLI::App& level) {
+    std::vector<std::string> names =
+        level.get_parent() ? optionsAt(*level.get_parent()) : std::vector<std::string>();
+    for (const OptionDefinition& option : definitionOf(level).options) {
+        names.insert(names.end(), option.names.begin(), option.names.end());
+    }
+    return names;
+}
+
 // What is wrong with the arguments at this level.
 std::string explain(const CLI::ParseError& error, const CLI::App& app, const CLI::App& level) {
+    const std::vector<std::string> unknown = app.remaining(true); // they fall through to the top
+    const std::string first = unknown.empty() ? "" : unknown.front().substr(0, unknown.front().find('='));
+    const bool isOption = first.starts_with('-');
+    const std::string meant =
+        didYouMean(first, isOption ? optionsAt(level) : namesBelow(definitionOf(level)));
     const bool needsCommand = level.get_require_subcommand_min() > 0;
     if (!needsCommand || !dynamic_cast<const CLI::RequiredError*>(&error)) {
-        return error.what();
+        return error.what() + (isOption && dynamic_cast<const CLI::ExtrasError*>(&error) ? meant : "");
     }
-    const std::vector<std::string> unknown = app.remaining(true); // they fall through to the top
-    return unknown.empty() ? "a command is needed" : "there is no command " + unknown.front();
+    if (first.empty()) {
+        return "a command is needed";
+    }
+    return (isOption ? "there is no option " : "there is no command ") + first + meant;
 }
 
 void addGlobalOptions(CLI::App& app, Options& options) {
@@ -78,7 +100,7 @@ std::optional<int> parse(CLI::App& app, int argc, char** argv) {
         std::cout << version.what() << '\n';
         return kExitSuccess;
     } catch (const CLI::CallForHelp&) {
-        std::cout << app.help();
+        std::cout << wrapHelp(app.help(), terminalWidth(STDOUT_FILENO));
         return kExitSuccess;
     } catch (const CLI::ParseError& error) {
         const CLI::App& level = namedLast(app);
@@ -235,6 +257,8 @@ int runTool(int argc, char** argv, const PlatformFactory& buildPlatform,
         commandLine.setNeedsHome(adder.needsHome);
         adder.add(commandLine);
     }
+    commandLine.setNeedsHome(false);
+    addHelpCommands(app, commandLine);
     if (const auto status = parse(app, argc, argv)) {
         return *status;
     }

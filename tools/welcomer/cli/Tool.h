@@ -10,8 +10,11 @@
 #include "tools/welcomer/terminal/Password.h"
 
 #include <functional>
+#include <map>
 #include <span>
 #include <string>
+#include <utility>
+#include <vector>
 
 namespace CLI {
 class App;
@@ -83,6 +86,12 @@ class CommandLine {
     // Gives a command the option `--password-fd`.
     static void addPasswordOption(CLI::App& command, PasswordSource& source);
 
+    // Says what can stand where the command line takes this value, such as "USER": for completions.
+    //  values  may fail: they are as good as none then
+    using ValueSource = std::function<std::vector<std::string>(Session&)>;
+    void offerValues(const std::string& name, ValueSource values) { _offered[name] = std::move(values); }
+    const std::map<std::string, ValueSource>& offeredValues() const { return _offered; }
+
     // The command that the arguments chose, with its full name.
     const Command& chosen() const { return _chosen; }
     const Preparation& chosenPreparation() const { return _chosenPreparation; } // or none
@@ -92,6 +101,7 @@ class CommandLine {
     CLI::App& _app;
     Options& _options;
     bool _needsHome = false;
+    std::map<std::string, ValueSource> _offered;
     Command _chosen;
     Preparation _chosenPreparation;
     std::string _chosenName;

@@ -14,6 +14,7 @@
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cerrno>
+#include <iterator>
 #include <memory>
 #include <set>
 
@@ -151,6 +152,17 @@ Report list(Session& session) {
                                   {"LOGGED IN", "loggedIn"}});
 }
 
+// Whoever has an account or can sign in, as far as the user can see.
+std::vector<std::string> knownNames(Session& session) {
+    std::vector<std::string> names = session.accountDirectory.accounts();
+    if (const auto users = session.accountDirectory.users()) {
+        std::ranges::copy_if(*users, std::back_inserter(names), [&](const std::string& name) {
+            return std::ranges::find(names, name) == names.end();
+        });
+    }
+    return names;
+}
+
 Report status(Session& /*session*/) {
     const auto account = WLLoggedInNimbusAccount();
     const std::vector<std::string> enabled = enabledServices(serviceStates(account.get()));
@@ -266,6 +278,7 @@ void addRemove(CommandLine& commandLine, CLI::App& group) {
 
 void addAccountCommands(CommandLine& commandLine) {
     CLI::App& group = commandLine.addGroup("account", "The user's cloud accounts, and who can sign in");
+    commandLine.offerValues("USER", knownNames);
     addAdd(commandLine, group);
     commandLine.addUserOption(
         commandLine.addCommand(group, "list", "Show the accounts, and who can sign in", list));

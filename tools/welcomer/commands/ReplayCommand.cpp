@@ -103,7 +103,7 @@ void addStore(CommandLine& commandLine, CLI::App& group) {
         "Store the replay item and install the agent for the next login, as a setup application does",
         [arguments](Session& session) { return store(session, *arguments); });
     command.add_option("--account", arguments->account, "The user's cloud account name")
-        ->type_name("NAME")
+        ->type_name("USER")
         ->required();
     command
         .add_option("--file", arguments->file,

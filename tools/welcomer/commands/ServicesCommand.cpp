@@ -60,6 +60,12 @@ Report list(Session& /*session*/) {
         {{"SERVICE", "service"}, {"PHASE", "phase"}, {"DELAYED", "delayed"}, {"IDENTIFIER", "identifier"}});
 }
 
+std::vector<std::string> serviceNames(Session& /*session*/) {
+    std::vector<std::string> names;
+    std::ranges::transform(serviceCatalogue(), std::back_inserter(names), &CatalogueEntry::name);
+    return names;
+}
+
 std::vector<std::string> selectedServices(const std::vector<std::string>& names) {
     if (names.empty()) {
         return WLNimbusAllSetupServiceIDs();
@@ -113,6 +119,7 @@ void addServicesCommands(CommandLine& commandLine) {
     commandLine.addCommand(group, "list", "Show every service with the phase in which setup enables it",
                            list);
 
+    commandLine.offerValues("SERVICE", serviceNames);
     const auto arguments = std::make_shared<EnableArguments>();
     CLI::App& command = commandLine.addCommand(
         group, "enable",
@@ -129,7 +136,7 @@ void addServicesCommands(CommandLine& commandLine) {
         .add_option("--select", arguments->selected,
                     "A service that the user kept selected, by name or identifier; may be given several "
                     "times. Without it every service is selected.")
-        ->type_name("ID")
+        ->type_name("SERVICE")
         ->expected(1)
         ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
 }

@@ -10,6 +10,7 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
+#include <iterator>
 #include <memory>
 #include <optional>
 
@@ -26,6 +27,12 @@ Key keyNamed(const std::string& name) {
         throw UsageError("the record has no key " + name);
     }
     return *found;
+}
+
+std::vector<std::string> keyNames(Session& /*session*/) {
+    std::vector<std::string> names;
+    std::ranges::transform(WLPerUserState::keys(), std::back_inserter(names), &Key::name);
+    return names;
 }
 
 bool flagIn(const std::string& value, const std::string& key) {
@@ -119,6 +126,7 @@ Report recordSeen(Session& session, const std::string& setup) {
 void addStateCommands(CommandLine& commandLine) {
     CLI::App& group = commandLine.addGroup("state", "The user's record of what setup has done and shown");
     commandLine.addCommand(group, "show", "Show the record", show);
+    commandLine.offerValues("KEY", keyNames);
 
     const auto key = std::make_shared<std::string>();
     const auto value = std::make_shared<std::string>();

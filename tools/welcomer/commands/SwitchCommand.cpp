@@ -60,12 +60,17 @@ void addSwitchCommands(CommandLine& commandLine) {
         commandLine.addGroup("switch", "The cloud service's environment that the resolver is pointed to");
     commandLine.addCommand(group, "list", "List the environments; a star marks the current one", list);
     commandLine.addCommand(group, "show", "Show the current environment", show);
+    commandLine.offerValues("ENVIRONMENT", [](Session& /*session*/) {
+        return SwitchController::sharedController().availableServers();
+    });
     const auto name = std::make_shared<std::string>();
     CLI::App& selector = commandLine.addCommand(
         group, "select",
         "Point the resolver at an environment; every file in /etc/resolver is replaced. For the superuser",
         [=](Session& session) { return select(session, *name); });
-    selector.add_option("name", *name, "The environment's name, or Prod")->type_name("NAME")->required();
+    selector.add_option("name", *name, "The environment's name, or Prod")
+        ->type_name("ENVIRONMENT")
+        ->required();
 }
 
 } // namespace welcomer::tool
