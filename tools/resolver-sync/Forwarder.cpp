@@ -1,6 +1,7 @@
 #include "tools/resolver-sync/Forwarder.h"
 
 #include "platform/Platform.h"
+#include "tools/shared/ForwarderProgram.h"
 
 #include <arpa/inet.h>
 #include <cerrno>
@@ -21,8 +22,6 @@ namespace welcomer::resolver {
 namespace {
 
 using namespace std::chrono_literals;
-
-constexpr const char* kProgram = "/usr/sbin/dnsmasq";
 
 platform::Outcome failure(int number, const std::string& what) {
     return platform::Outcome::failure({number, what + ": " + std::generic_category().message(number)});
@@ -75,7 +74,7 @@ platform::Outcome Forwarder::_writeServers(const Overrides& overrides) const {
 }
 
 platform::Outcome Forwarder::_start() {
-    std::vector<std::string> arguments{kProgram,
+    std::vector<std::string> arguments{kForwarderProgram,
                                        "--keep-in-foreground",
                                        "--conf-file=/dev/null",
                                        "--pid-file=",
@@ -100,11 +99,12 @@ platform::Outcome Forwarder::_start() {
     ::sigemptyset(&none);
     ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGMASK);
     ::posix_spawnattr_setsigmask(&attributes, &none);
-    const int number = ::posix_spawn(&_process, kProgram, nullptr, &attributes, pointers.data(), environ);
+    const int number =
+        ::posix_spawn(&_process, kForwarderProgram, nullptr, &attributes, pointers.data(), environ);
     ::posix_spawnattr_destroy(&attributes);
     if (number != 0) {
         _process = 0;
-        return failure(number, std::string("failed to start ") + kProgram);
+        return failure(number, std::string("failed to start ") + kForwarderProgram);
     }
     return platform::Outcome::success();
 }
@@ -142,7 +142,7 @@ platform::Outcome Forwarder::waitUntilReady() {
     }
     ::close(socket);
     return ready ? platform::Outcome::success()
-                 : platform::Outcome::failure({0, std::string(kProgram) + " does not answer"});
+                 : platform::Outcome::failure({0, std::string(kForwarderProgram) + " does not answer"});
 }
 
 void Forwarder::stop() {

@@ -2,6 +2,7 @@
 
 #include "platform/Path.h"
 #include "platform/Platform.h"
+#include "tools/shared/ForwarderProgram.h"
 #include "tools/shared/RunningMark.h"
 
 #include <sstream>
@@ -63,19 +64,28 @@ BackendReport resolverReport(const std::string& root) {
     const auto report = [](const std::string& backend, const std::string& reason, const std::string& advice) {
         return BackendReport{"resolver overrides", backend, reason, advice};
     };
+    const bool hasForwarder = platform::current().fileSystem.exists(resolver::kForwarderProgram);
+    const std::string forwarderToo = hasForwarder ? "" : "; install dnsmasq-base, which it needs";
     const resolver::RunningState service = resolver::readRunningMark(above + resolver::kRunningMark);
     if (!somebodyListensOn(above + kResolverSocket)) {
         return report("none", "systemd-resolved does not run: the overrides have no effect",
                       service.runs ? "install and start systemd-resolved"
-                                   : "install and start systemd-resolved, and enable welcomer-resolver-sync");
+                                   : "install and start systemd-resolved, and enable welcomer-resolver-sync" +
+                                         forwarderToo);
     }
     if (!service.runs) {
         return report("none", "welcomer-resolver-sync does not run: the overrides have no effect",
-                      "systemctl enable --now welcomer-resolver-sync");
+                      "systemctl enable --now welcomer-resolver-sync" + forwarderToo);
     }
     if (!service.trouble.empty()) {
         return report("none", "welcomer-resolver-sync cannot route the overrides: " + service.trouble,
                       "see the system log of welcomer-resolver-sync; its forwarder is dnsmasq");
+    }
+    if (!hasForwarder) {
+        return report("none",
+                      std::string("welcomer-resolver-sync cannot route the overrides: there is no ") +
+                          resolver::kForwarderProgram,
+                      "install dnsmasq-base");
     }
     if (!namesAreLookedUpThroughTheResolver()) {
         return report(
