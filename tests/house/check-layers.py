@@ -24,6 +24,7 @@ FLOORS = {
     "state": 6,
     "agent": 6,
     "tools": 7,
+    "examples": 7,
 }
 # What the rooms beside the floors may include, besides themselves. A room's name is a path; the longest that fits counts.
 SIDES = {
@@ -33,7 +34,7 @@ SIDES = {
     "backends/local": {"platform", "propertylist", "backends/posix", "backends/network"},
     "backends/desktop": {"platform", "propertylist", "backends/posix", "backends/network", "backends/local"},
     "backends/simulated": {"platform", "propertylist"},
-    "examples": {"sdk"},
+    "examples/plugins": {"sdk"},
 }
 # Lies beside its rooms and below them: how a program asks for a platform.
 ASKED = {"backends/Backends.h"}
@@ -45,7 +46,7 @@ TOOL_ROOMS = {"tools/welcomer": ["terminal", "cli", "login", "story", "checks", 
 # Free to include everything: nothing includes them.
 TESTS = {"tests"}
 # The only files, besides tests and the backends themselves, that may choose a backend, and what is offered to them.
-PROGRAMS = re.compile(r"^(agent/main\.cpp|tools/[^/]+/main\.cpp)$")
+PROGRAMS = re.compile(r"^(agent/main\.cpp|tools/[^/]+/main\.cpp|examples/setup/[^/]+\.cpp)$")
 OFFERED = re.compile(r"^backends/(Backends|StoredNetwork|UnexpectedEnd|simulated/.+)\.h$")
 
 # What of the backends tools may use, too: the one base on the kernel, and addresses as text.

@@ -1,12 +1,7 @@
 #include "tools/welcomer/checks/HandOverCheck.h"
 
-#include "handoff/LaunchAgentFile.h"
-#include "handoff/ReplayItem.h"
 #include "platform/Platform.h"
-#include "propertylist/Lookup.h"
-#include "propertylist/PropertyListReader.h"
-
-#include <optional>
+#include "tools/welcomer/login/WaitingSetup.h"
 
 namespace welcomer::tool {
 
@@ -14,34 +9,22 @@ namespace {
 
 constexpr char kSubject[] = "next login";
 
-// Why the launch agent could not start the agent; empty when it could.
-std::string troubleOf(const std::string& launchAgent) {
-    platform::FileSystem& files = platform::current().fileSystem;
-    const auto text = files.readText(launchAgent);
-    const auto read = readPropertyList(text.value_or(""));
-    const auto arguments = read.value ? textsIn(*read.value, "ProgramArguments") : std::nullopt;
-    if (!arguments || arguments->empty()) {
-        return launchAgent + " does not say what to start";
-    }
-    return files.exists(arguments->front()) ? "" : "there is no program " + arguments->front();
-}
-
-Finding withItem(const std::string& launchAgent) {
-    if (!platform::current().fileSystem.exists(launchAgent)) {
+Finding withItem(const WaitingSetup& waiting) {
+    if (!waiting.hasAgent) {
         return {
             kSubject, Verdict::Wrong, "a replay item waits, and no agent will start for it",
             "install the agent with: welcomer replay arm; or drop the setup with: welcomer setup --cancel"};
     }
-    const std::string trouble = troubleOf(launchAgent);
-    if (!trouble.empty()) {
-        return {kSubject, Verdict::Wrong, "a replay item waits, but " + trouble,
-                "install the agent anew with: welcomer replay arm"};
+    if (!waiting.agentProblem.empty()) {
+        return {kSubject, Verdict::Wrong,
+                "a replay item waits, but the agent's file starts no agent: " + waiting.agentProblem,
+                "remove " + waiting.agentPath + ", and install the agent anew with: welcomer replay arm"};
     }
     return {kSubject, Verdict::Right, "a replay item waits, and the agent will start for it"};
 }
 
-Finding withoutItem(const std::string& launchAgent) {
-    if (!platform::current().fileSystem.exists(launchAgent)) {
+Finding withoutItem(const WaitingSetup& waiting) {
+    if (!waiting.hasAgent) {
         return {kSubject, Verdict::Right, "nothing waits"};
     }
     return {kSubject, Verdict::Wrong, "the agent will start, and find no replay item",
@@ -51,26 +34,21 @@ Finding withoutItem(const std::string& launchAgent) {
 } // namespace
 
 Finding checkHandOver() {
-    const platform::Platform& platform = platform::current();
-    std::string home;
     try {
-        home = platform.processIdentity.homeDirectory();
+        platform::current().processIdentity.homeDirectory();
     } catch (const platform::Exception& exception) {
         return {kSubject, Verdict::Unknown, exception.what()};
     }
-    const std::int32_t status =
-        platform.credentialStore
-            .findItem(kReplayItemService, kReplayItemAccount, platform::CredentialWish::Presence)
-            .status;
-    const std::string launchAgent = launchAgentPath(home);
-    if (status == platform::kCredentialSuccess) {
-        return withItem(launchAgent);
+    const WaitingSetup waiting = findWaitingSetup();
+    if (waiting.hasItem()) {
+        return withItem(waiting);
     }
-    if (status == platform::kCredentialItemNotFound) {
-        return withoutItem(launchAgent);
+    if (waiting.itemStatus == platform::kCredentialItemNotFound) {
+        return withoutItem(waiting);
     }
     return {kSubject, Verdict::Unknown,
-            "whether a replay item waits cannot be told: " + platform::credentialStatusText(status)};
+            "whether a replay item waits cannot be told: " +
+                platform::credentialStatusText(waiting.itemStatus)};
 }
 
 } // namespace welcomer::tool

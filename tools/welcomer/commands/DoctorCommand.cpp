@@ -2,9 +2,9 @@
 
 #include "platform/Path.h"
 #include "platform/Platform.h"
-#include "plugins/WLNimbusDelegatePlugins.h"
 #include "tools/welcomer/checks/CodeFolders.h"
 #include "tools/welcomer/checks/HandOverCheck.h"
+#include "tools/welcomer/checks/LastLoginCheck.h"
 #include "tools/welcomer/checks/PluginCheck.h"
 #include "tools/welcomer/checks/UnitCheck.h"
 #include "tools/welcomer/cli/Tool.h"
@@ -42,14 +42,6 @@ BackendReport userManagerReport() {
             "log in to a session with systemd, so that each launch agent is a service of its own"};
 }
 
-// The folder that plug-ins are looked for in.
-std::string pluginFolder(const SettingsReport& settings) {
-    const auto found = std::ranges::find(settings.settings, "PluginFolder", &platform::SettingReport::name);
-    const bool isStoodInFor =
-        !platform::current().fileSystem.exists(kPluginDirectory) && found != settings.settings.end();
-    return isStoodInFor ? found->value : kPluginDirectory;
-}
-
 // Overrides that somebody has made and that have no effect.
 Findings checkOverrides(const BackendReport& resolver) {
     const auto overrides = platform::current().fileSystem.list("/etc/resolver");
@@ -73,12 +65,12 @@ Examination lookAtAll(Session& session) {
     Examination seen{owner->backendReports(), owner->settings(), "", {}};
     seen.backends.push_back(userManagerReport());
     seen.backends.push_back(resolverReport(session.options.root));
-    seen.pluginFolder = pluginFolder(seen.settings);
+    seen.pluginFolder = owner->pluginFolder();
 
     const auto add = [&](const Findings& more) {
         seen.findings.insert(seen.findings.end(), more.begin(), more.end());
     };
-    add({checkHandOver()});
+    add({checkHandOver(), checkLastLogin(session.options.root)});
     add(checkPlugins(session.options, seen.pluginFolder));
     add({checkLoadedCode()}); // the services have been asked, and their modules are loaded
     add(checkUnits(session.options.root == "/"));

@@ -192,7 +192,7 @@ void prepare(const Options& options, SetupArguments& arguments) {
 }
 
 Report cancel(Session& session) {
-    const WaitingHandOver there = cancelHandOver(session.log);
+    const WaitingSetup there = cancelHandOver(session.log);
     const bool hadItem = there.hasItem();
     return Report(
         {{"item", hadItem}, {"agent", there.hasAgent}},

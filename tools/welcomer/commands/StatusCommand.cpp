@@ -6,9 +6,8 @@
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/login/Advice.h"
-#include "tools/welcomer/login/LoginLog.h"
+#include "tools/welcomer/login/LastLogin.h"
 #include "tools/welcomer/login/LoginReport.h"
-#include "tools/welcomer/login/RunningAgent.h"
 #include "tools/welcomer/story/ServiceStates.h"
 
 #include <CLI/CLI.hpp>
@@ -19,25 +18,6 @@
 namespace welcomer::tool {
 
 namespace {
-
-// What is known of the last login.
-struct LastLogin {
-    std::string source;
-    std::string note;
-    std::optional<Login> login = {};
-    bool isRunning = false; // its agent
-};
-
-LastLogin lastLogin(const LoginQuery& query) {
-    FoundLogins found = findLogins(query);
-    LastLogin last{std::move(found.source), std::move(found.note)};
-    if (!found.logins.empty()) {
-        last.login = std::move(found.logins.back());
-        last.isRunning = last.login->hasAgent && record(*last.login).end() == LoginRecord::End::Unfinished &&
-                         agentRuns(query.root, query.userID);
-    }
-    return last;
-}
 
 // What is known of the item.
 std::string itemText(const WaitingSetup& waiting) {
@@ -118,7 +98,7 @@ void addLastLogin(Report& report, const LastLogin& last) {
 
 Report showStatus(const LastLogin& last) {
     const WaitingSetup waiting = findWaitingSetup();
-    const std::vector<Finding> found = findings(waiting, last.login, last.isRunning);
+    const std::vector<ToDo> found = whatIsToDo(waiting, last.login, last.isRunning);
     Report report;
     report.document = {{"waiting", toJson(waiting)}, {"lastLogin", nullptr}, {"toDo", Json::array()}};
     if (last.login) {
@@ -131,7 +111,7 @@ Report showStatus(const LastLogin& last) {
     report.line("They fit:    " + fitText(waiting));
     addLastLogin(report, last);
     report.line(found.empty() ? "Nothing is to be done." : "To be done:");
-    for (const Finding& each : found) {
+    for (const ToDo& each : found) {
         report.document["toDo"].push_back({{"what", each.what}, {"advice", each.advice}});
         report.line("  " + each.what).line("    advice: " + each.advice);
     }
@@ -140,11 +120,6 @@ Report showStatus(const LastLogin& last) {
                                            : std::to_string(found.size()) + " things are to be done";
     }
     return report;
-}
-
-LoginQuery queryOfCaller(const Options& options) {
-    platform::ProcessIdentity& identity = platform::current().processIdentity;
-    return {.root = options.root, .userID = identity.effectiveUserID(), .userName = identity.loginName()};
 }
 
 } // namespace
@@ -157,14 +132,13 @@ void addStatusCommand(CommandLine& commandLine) {
         "Show what waits for the next login, what the last one did, and what is to be done; exit status 0: "
         "nothing is, 1: something is",
         [readBefore](Session& session) {
-            return showStatus(*readBefore ? **readBefore : lastLogin(queryOfCaller(session.options)));
+            return showStatus(*readBefore ? **readBefore : lastLogin(queryOfCaller(session.options.root)));
         });
     commandLine.addUserOption(command);
     commandLine.addPreparation(command, [readBefore](const Options& options) {
         int error = 0;
         if (const auto user = posix::passwordEntryNamed(options.user, error)) {
-            *readBefore =
-                lastLogin({.root = options.root, .userID = user->userID, .userName = user->name});
+            *readBefore = lastLogin({.root = options.root, .userID = user->userID, .userName = user->name});
         }
     });
 }

@@ -19,7 +19,7 @@ std::string whyItStayed(const std::optional<LoginRecord>& record) {
                : "";
 }
 
-void judgeWaiting(std::vector<Finding>& found, const WaitingSetup& waiting,
+void judgeWaiting(std::vector<ToDo>& found, const WaitingSetup& waiting,
                   const std::optional<LoginRecord>& record) {
     const std::string both =
         "welcomer replay arm installs the agent; welcomer setup --cancel gives the setup up";
@@ -59,7 +59,7 @@ std::string adviceOn(std::string_view failure) {
     return "welcomer log shows what came before it";
 }
 
-void judgeDelegates(std::vector<Finding>& found, const LoginRecord& record, bool isRunning) {
+void judgeDelegates(std::vector<ToDo>& found, const LoginRecord& record, bool isRunning) {
     using Kind = DelegateOutcome::Kind;
     for (const DelegateOutcome& delegate : record.delegates()) {
         if (delegate.kind != Kind::Completed && delegate.kind != Kind::NoResponse &&
@@ -70,7 +70,7 @@ void judgeDelegates(std::vector<Finding>& found, const LoginRecord& record, bool
     }
 }
 
-void judgeServices(std::vector<Finding>& found, const LoginRecord& record, bool isRunning) {
+void judgeServices(std::vector<ToDo>& found, const LoginRecord& record, bool isRunning) {
     using Kind = ServiceOutcome::Kind;
     for (const ServiceOutcome& service : record.services()) {
         if (service.kind == Kind::Refused || (service.kind == Kind::PutOff && !isRunning)) {
@@ -81,7 +81,7 @@ void judgeServices(std::vector<Finding>& found, const LoginRecord& record, bool 
     }
 }
 
-void judgeEnd(std::vector<Finding>& found, const LoginRecord& record) {
+void judgeEnd(std::vector<ToDo>& found, const LoginRecord& record) {
     if (record.end() == LoginRecord::End::Broken) {
         found.push_back({"the agent was " + record.endReason(),
                          "welcomer plugins list shows the plug-in's file; take it "
@@ -95,9 +95,8 @@ void judgeEnd(std::vector<Finding>& found, const LoginRecord& record) {
 
 } // namespace
 
-std::vector<Finding> findings(const WaitingSetup& waiting, const std::optional<Login>& login,
-                              bool isRunning) {
-    std::vector<Finding> found;
+std::vector<ToDo> whatIsToDo(const WaitingSetup& waiting, const std::optional<Login>& login, bool isRunning) {
+    std::vector<ToDo> found;
     const auto agents = login && login->hasAgent ? std::optional(record(*login)) : std::nullopt;
     judgeWaiting(found, waiting, agents);
     if (login && !login->hasAgent) {

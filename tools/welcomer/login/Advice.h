@@ -13,7 +13,7 @@
 namespace welcomer::tool {
 
 // One thing that is not as it should be. Both are one line.
-struct Finding {
+struct ToDo {
     std::string what;
     std::string advice;
 };
@@ -22,6 +22,6 @@ struct Finding {
 // count any more where another setup waits.
 //  login      the last one, or none
 //  isRunning  whether its agent still runs
-std::vector<Finding> findings(const WaitingSetup& waiting, const std::optional<Login>& login, bool isRunning);
+std::vector<ToDo> whatIsToDo(const WaitingSetup& waiting, const std::optional<Login>& login, bool isRunning);
 
 } // namespace welcomer::tool

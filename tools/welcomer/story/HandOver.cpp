@@ -1,11 +1,12 @@
 #include "tools/welcomer/story/HandOver.h"
 
-#include "handoff/LaunchAgentFile.h"
 #include "handoff/LaunchAgentInstaller.h"
 #include "handoff/ReplayItem.h"
 #include "platform/Platform.h"
 #include "tools/welcomer/story/ReplayReason.h"
 #include "tools/welcomer/terminal/Failure.h"
+
+#include <cstdint>
 
 namespace welcomer::tool {
 
@@ -23,20 +24,8 @@ CommandFailure cannotTell(std::int32_t status) {
 
 } // namespace
 
-WaitingHandOver waitingHandOver() {
-    const platform::Platform& platform = platform::current();
-    WaitingHandOver found;
-    found.itemStatus =
-        platform.credentialStore
-            .findItem(kReplayItemService, kReplayItemAccount, platform::CredentialWish::Presence)
-            .status;
-    found.agentPath = launchAgentPath(platform.processIdentity.homeDirectory());
-    found.hasAgent = platform.fileSystem.exists(found.agentPath);
-    return found;
-}
-
 void refuseWhereSomethingIsWaiting(const Caller& caller) {
-    const WaitingHandOver waiting = waitingHandOver();
+    const WaitingSetup waiting = findWaitingSetup();
     const std::string cancelling = suggested("setup --cancel", caller);
     if (waiting.hasItem() && waiting.hasAgent) {
         throw CommandFailure("a replay item is waiting for the next login already; " + cancelling +
@@ -57,7 +46,7 @@ void refuseWhereSomethingIsWaiting(const Caller& caller) {
 }
 
 bool armAgent(const KeptLog& log, platform::ResourceBundle& bundle) {
-    const WaitingHandOver waiting = waitingHandOver();
+    const WaitingSetup waiting = findWaitingSetup();
     if (waiting.itemStatus == platform::kCredentialItemNotFound) {
         throw CommandFailure("no replay item is waiting for which the agent could be installed");
     }
@@ -70,15 +59,16 @@ bool armAgent(const KeptLog& log, platform::ResourceBundle& bundle) {
     return !waiting.hasAgent;
 }
 
-WaitingHandOver cancelHandOver(const KeptLog& log) {
-    WaitingHandOver waiting = waitingHandOver();
+WaitingSetup cancelHandOver(const KeptLog& log) {
+    WaitingSetup waiting = findWaitingSetup();
     const bool hasNoItem = waiting.itemStatus == platform::kCredentialItemNotFound;
     if (hasNoItem && !waiting.hasAgent) {
         throw CommandFailure("nothing is waiting for the next login");
     }
     // An agent without an item ends at once; an item without an agent would be in every setup's way.
-    if (!hasNoItem && !WLDeleteNimbusReplayKeychainItem()) {
-        throw CommandFailure("cannot delete the replay item: " + replayReason(log));
+    std::int32_t status = platform::kCredentialSuccess;
+    if (!hasNoItem && !WLDeleteNimbusReplayKeychainItem(status)) {
+        throw CommandFailure("cannot delete the replay item: " + replayReason(log, status));
     }
     if (waiting.hasAgent) {
         const platform::Outcome removed = platform::current().fileSystem.remove(waiting.agentPath);

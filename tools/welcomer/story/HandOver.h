@@ -2,11 +2,10 @@
 
 #pragma once
 
-#include "platform/CredentialStore.h"
 #include "platform/ResourceBundle.h"
 #include "tools/welcomer/cli/KeptLog.h"
+#include "tools/welcomer/login/WaitingSetup.h"
 
-#include <cstdint>
 #include <string>
 
 namespace welcomer::tool {
@@ -16,18 +15,6 @@ struct Caller {
     std::string user;           // whom `--user` names; empty: the caller
     bool storesLocally = false; // what the keyring does not tell is no obstacle then
 };
-
-// A hand-over needs both: the replay item and the agent's file.
-struct WaitingHandOver {
-    std::int32_t itemStatus = platform::kCredentialItemNotFound; // success: an item waits
-    std::string agentPath;
-    bool hasAgent = false; // the agent's file is there
-
-    bool hasItem() const { return itemStatus == platform::kCredentialSuccess; }
-};
-
-// Asks the credential store, which may block, and looks for the file. Throws where the user has no home.
-WaitingHandOver waitingHandOver();
 
 // Refuses to begin a setup where a hand-over, or half of one, is waiting already, or where that cannot be
 // told: with CommandFailure, which says how that is mended.
@@ -43,6 +30,6 @@ bool armAgent(const KeptLog& log, platform::ResourceBundle& bundle);
 // neither; where the item cannot be removed the file stays, too.
 //  log     where the reason is read
 //  result  what there was
-WaitingHandOver cancelHandOver(const KeptLog& log);
+WaitingSetup cancelHandOver(const KeptLog& log);
 
 } // namespace welcomer::tool

@@ -30,7 +30,7 @@ Login loginOf(std::initializer_list<const char*> lines) {
 Texts whats(const WaitingSetup& setup, const std::optional<Login>& login = std::nullopt,
             bool isRunning = false) {
     Texts texts;
-    for (const Finding& each : findings(setup, login, isRunning)) {
+    for (const ToDo& each : whatIsToDo(setup, login, isRunning)) {
         EXPECT_NE(each.advice, "");
         EXPECT_EQ(each.what.find('\n'), std::string::npos);
         texts.push_back(each.what);
