@@ -46,7 +46,9 @@ class LocalPlatform final : public PlatformOwner {
     const posix::RootFolder _root;
     LocalSystemLog _systemLog;
     LocalSettings _settings;
-    const PluginFolder _pluginFolder{_root, [this] { return _settings.value(Setting::PluginFolder); }};
+    const PluginFolder _pluginFolder{_root, [this] {
+                                         return _settings.value(Setting::PluginFolder);
+                                     }};
     LocalFileSystem _fileSystem{_root, _pluginFolder};
     LocalProcessIdentity _processIdentity{_root};
     LocalCredentialStore _credentialStore{_root, _processIdentity};

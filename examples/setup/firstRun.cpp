@@ -54,10 +54,11 @@ void setUp(const std::string& account, const std::string& password, const std::s
 
     // 1 The server checks the password and answers each delegate's part of the request.
     NimbusTesselDelegate delegate;
-    if (!delegate.signInWithUsernameAndPasswordAdditionalDelegatesOmittingDelegatesError(account, password, {},
-                                                                                         {}, nullptr)) {
-        throw std::runtime_error(delegate.needsRepair() ? "the account needs the user's attention on the web"
-                                                        : "the server does not accept this name and password");
+    if (!delegate.signInWithUsernameAndPasswordAdditionalDelegatesOmittingDelegatesError(account, password,
+                                                                                         {}, {}, nullptr)) {
+        throw std::runtime_error(delegate.needsRepair()
+                                     ? "the account needs the user's attention on the web"
+                                     : "the server does not accept this name and password");
     }
 
     // 2 What the next login needs is put together before anything is set up.

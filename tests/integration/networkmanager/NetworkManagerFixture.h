@@ -137,7 +137,8 @@ class NetworkManagerTest : public testing::Test {
     local::LocalNetworkConfigStore kernelStore{posix::RootFolder(root.path())};
     local::LocalNetworkStateStore kernelStateStore{posix::RootFolder(root.path())};
     local::LocalHostReachability kernelReachability;
-    desktop::DesktopNetwork network{{kernelStore, kernelStateStore, kernelReachability}, {nullptr, kNetworkModules}};
+    desktop::DesktopNetwork network{{kernelStore, kernelStateStore, kernelReachability},
+                                    {nullptr, kNetworkModules}};
     platform::NetworkConfigStore& store = network.configStore();
     platform::NetworkStateStore& stateStore = network.stateStore();
     platform::HostReachability& reachability = network.hostReachability();

@@ -29,7 +29,8 @@ std::vector<ToolFolders> toolFolders() {
         return {};
     }
     const fs::path built = programs.parent_path();
-    return {{programs / WELCOMER_DATA_FROM_PROGRAMS, programs / WELCOMER_EXAMPLES_FROM_PROGRAMS}, {built, built}};
+    return {{programs / WELCOMER_DATA_FROM_PROGRAMS, programs / WELCOMER_EXAMPLES_FROM_PROGRAMS},
+            {built, built}};
 }
 
 std::string findToolBundle() {

@@ -20,7 +20,8 @@ inline constexpr std::string_view kEnd = kAgentExitingMessage;
 // What lines begin with; something follows.
 inline constexpr std::string_view kFileStays = "Failed to remove wlnimbussetup plist for ";
 inline constexpr std::string_view kItemNotFound =
-    std::string_view(kReplayItemNotFoundMessage).substr(0, std::string_view(kReplayItemNotFoundMessage).size() - 2);
+    std::string_view(kReplayItemNotFoundMessage)
+        .substr(0, std::string_view(kReplayItemNotFoundMessage).size() - 2);
 inline constexpr std::string_view kItemUnreadable = "Failed to deserialize replayable data length: ";
 inline constexpr std::string_view kItemStays = "Failed to delete replay keychain item: ";
 inline constexpr std::string_view kAccountName = "Enabling post-login services for account ";

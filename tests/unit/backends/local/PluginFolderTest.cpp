@@ -25,7 +25,9 @@ class PluginFolderTest : public testing::Test {
 
     TemporaryRoot root;
     const posix::RootFolder below{root.path()};
-    const PluginFolder folder{below, [] { return std::string(kPackages); }};
+    const PluginFolder folder{below, [] {
+                                  return std::string(kPackages);
+                              }};
     LocalFileSystem files{below, folder};
     LocalPluginBundle bundles{below, folder};
 };
