@@ -1,7 +1,10 @@
 #include "tools/welcomer/checks/LastLoginCheck.h"
 
+#include "platform/CredentialStore.h"
 #include "tools/welcomer/login/Advice.h"
 #include "tools/welcomer/login/LastLogin.h"
+
+#include <vector>
 
 namespace welcomer::tool {
 
@@ -18,9 +21,9 @@ Finding checkLastLogin(const std::string& root) {
                                              last.note.empty() ? "there is no log to read" : last.note}
                                    : Finding{kSubject, Verdict::Right, "the log has none with a setup"};
     }
-    // What waits now is another check's matter.
-    const std::vector<ToDo> left =
-        whatIsToDo({.itemStatus = platform::kCredentialItemNotFound}, last.login, last.isRunning);
+    WaitingSetup none; // what waits now is another check's matter
+    none.itemStatus = platform::kCredentialItemNotFound;
+    const std::vector<ToDo> left = whatIsToDo(none, last.login, last.isRunning);
     if (left.empty()) {
         return {kSubject, Verdict::Right,
                 last.isRunning ? "its agent is running" : "nothing is left to be done"};
