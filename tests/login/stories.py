@@ -113,7 +113,7 @@ class Newcomer:
                       for name in ("SubState", "Result", "ExecMainStatus")]
         if self.story.is_offered_again:
             booted.wait_for(self.launch_agent.exists, "the agent's file")
-        self.services_after_first = self.services(session)
+            self.services_after_first = self.services(session)
         session.end()
         self.launch_agent_at_end = self.launch_agent.exists()
         self.records_at_end = self.machine.records("wlnimbussetup", self.name)
