@@ -3,8 +3,8 @@
 #include "backends/posix/FileContent.h"
 #include "generated/WelcomerConfiguration.h"
 
+#include <algorithm>
 #include <cerrno>
-#include <ranges>
 #include <string_view>
 #include <system_error>
 
@@ -32,9 +32,8 @@ void LocalSettings::_read() {
     for (std::size_t i = 0; i < kSettingCount; ++i) {
         _report.settings.push_back({nameOf(static_cast<Setting>(i)), std::string(kBuiltIn[i]), "the build"});
     }
-    for (const char* const path : kSettingsFiles | std::views::reverse) {
-        _readFile(path);
-    }
+    std::for_each(kSettingsFiles.rbegin(), kSettingsFiles.rend(),
+                  [this](const char* path) { _readFile(path); });
     for (const std::string& problem : _report.problems) {
         _log.write(platform::kErrorPriority, problem);
     }

@@ -11,7 +11,6 @@
 #include <fstream>
 #include <iterator>
 #include <memory>
-#include <ranges>
 #include <sstream>
 #include <unistd.h>
 
@@ -84,7 +83,8 @@ std::string withTables(const std::filesystem::path& path, const std::string& tab
 Report writeHelp(const CommandDefinition& program, const CommandLine& commandLine,
                  const std::filesystem::path& folder, const std::filesystem::path& parts) {
     std::set<std::string> offered;
-    std::ranges::copy(commandLine.offeredValues() | std::views::keys, std::inserter(offered, offered.end()));
+    std::ranges::transform(commandLine.offeredValues(), std::inserter(offered, offered.end()),
+                           [](const auto& each) { return each.first; });
     write(folder / "welcomer.bash", withTables(parts / "welcomer.bash.in", bashTables(program, offered)));
     write(folder / "_welcomer", withTables(parts / "_welcomer.in", zshTables(program, offered)));
     write(folder / "welcomer.fish", withTables(parts / "welcomer.fish.in", fishTables(program, offered)));
