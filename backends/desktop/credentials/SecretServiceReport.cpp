@@ -62,6 +62,7 @@ bool reportSecretService(platform::BackendReport& report) {
     report.backend = "Secret Service";
     if (name == BusName::Startable) {
         report.reason = "it does not run; the session bus starts it when it is needed";
+        report.startsWhenAsked = true;
     } else {
         reportRunning(question, report);
     }

@@ -33,11 +33,16 @@ Finding withoutItem(const WaitingSetup& waiting) {
 
 } // namespace
 
-Finding checkHandOver() {
+Finding checkHandOver(const platform::BackendReport& credentials) {
     try {
         platform::current().processIdentity.homeDirectory();
     } catch (const platform::Exception& exception) {
         return {kSubject, Verdict::Unknown, exception.what()};
+    }
+    if (credentials.startsWhenAsked) {
+        return {kSubject, Verdict::Unknown,
+                "whether a replay item waits cannot be told: the keyring does not run",
+                "to start it and ask: welcomer status"};
     }
     const WaitingSetup waiting = findWaitingSetup();
     if (waiting.hasItem()) {

@@ -2,11 +2,13 @@
 
 #pragma once
 
+#include "platform/BackendReport.h"
 #include "tools/welcomer/checks/Finding.h"
 
 namespace welcomer::tool {
 
-// Of the user who asks. Asks nobody to unlock a keyring. Main thread.
-Finding checkHandOver();
+// Of the user who asks. Asks nobody to unlock a keyring, and starts none. Main thread.
+//  credentials  how the credential store is served
+Finding checkHandOver(const platform::BackendReport& credentials);
 
 } // namespace welcomer::tool

@@ -70,7 +70,8 @@ Examination lookAtAll(Session& session) {
     const auto add = [&](const Findings& more) {
         seen.findings.insert(seen.findings.end(), more.begin(), more.end());
     };
-    add({checkHandOver(), checkLastLogin(session.options.root)});
+    const auto credentials = std::ranges::find(seen.backends, "CredentialStore", &BackendReport::interface);
+    add({checkHandOver(*credentials), checkLastLogin(session.options.root)});
     add(checkPlugins(session.options, seen.pluginFolder));
     add({checkLoadedCode()}); // the services have been asked, and their modules are loaded
     add(checkUnits(session.options.root == "/"));

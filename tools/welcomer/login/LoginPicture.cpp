@@ -176,7 +176,7 @@ class Picture {
     // Those that share a queue stand together, the others by themselves.
     void _drawDelegates() {
         std::vector<DelegateOutcome> delegates = _record.delegates();
-        const auto others = std::ranges::stable_partition(delegates, isMessaging).begin();
+        const auto others = std::stable_partition(delegates.begin(), delegates.end(), isMessaging);
         const double top = _y;
         for (auto each = delegates.begin(); each != others; ++each) {
             _drawDelegate(*each);
