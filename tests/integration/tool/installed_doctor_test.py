@@ -111,16 +111,20 @@ class NextLogin(DoctorTest):
     def test_an_agent_whose_program_is_gone_is_not(self):
         self.store()
         self.program.unlink()
-        self.assertEqual(self.wrong(), [("next login", "a replay item waits, but there is no program /"
-                                         f"{self.program.relative_to(self.root)}")])
+        self.assertEqual(self.wrong(), [("next login", "a replay item waits, but the agent's file starts no agent: "
+                                         f"the program that it names is not there: /{self.program.relative_to(self.root)}")])
 
     def test_a_launch_agent_that_starts_nothing_is_not(self):
         self.store()
-        for content in (b"", plistlib.dumps({"ProgramArguments": []})):
+        for content, why in ((b"", "it is no property list: byte 0: the data is empty"),
+                             (plistlib.dumps({"RunAtLoad": True, "ProgramArguments": []}),
+                              "the program that it names is not there: none"),
+                             (plistlib.dumps({"ProgramArguments": ["/bin/sh"]}),
+                              "it does not say that it starts at the login")):
             (self.home / LAUNCH_AGENT).write_bytes(content)
             [(subject, text)] = self.wrong()
             self.assertEqual(subject, "next login")
-            self.assertTrue(text.endswith(f"{HOME}/{LAUNCH_AGENT} does not say what to start"), text)
+            self.assertEqual(text, f"a replay item waits, but the agent's file starts no agent: {why}")
 
 
 class Plugins(DoctorTest):

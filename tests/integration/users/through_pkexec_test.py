@@ -42,12 +42,12 @@ class ThroughPkexec(ForOthersTest):
         assert (actions / f"{ACTION}.policy").exists()
         machine.mount(actions, cls.root / "usr/share/polkit-1/actions", None, machine.MS_BIND)
         rules = cls.root / "etc/polkit-1/rules.d"
-        rules.mkdir(parents=True)
+        rules.mkdir(parents=True, exist_ok=True)
         (rules / "10-first-run.rules").write_text(RULE)
-        (cls.root / "etc/pam.d").mkdir()
+        (cls.root / "etc/pam.d").mkdir(exist_ok=True)
         (cls.root / "etc/pam.d/polkit-1").write_text("".join(
             f"{kind} required pam_permit.so\n" for kind in ("auth", "account", "session")))
-        (cls.root / "run/dbus").mkdir()
+        (cls.root / "run/dbus").mkdir(exist_ok=True)
         (cls.root / "var/run").symlink_to("../run")
         cls.daemon(["/usr/bin/dbus-daemon", "--system", "--nofork", "--nopidfile", "--nosyslog"])
         cls.machine.wait_for((cls.root / "run/dbus/system_bus_socket").exists, "the system bus")
