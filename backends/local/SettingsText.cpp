@@ -16,8 +16,8 @@ constexpr std::size_t kMaximumAddress = 1024; // bytes
 
 bool consistsOf(std::string_view text, std::initializer_list<std::string_view> characters) {
     return std::ranges::all_of(text, [&](char each) {
-        return std::ranges::any_of(characters,
-                                   [&](std::string_view set) { return set.find(each) != set.npos; });
+        return std::ranges::any_of(
+            characters, [&](std::string_view set) { return set.find(each) != std::string_view::npos; });
     });
 }
 
