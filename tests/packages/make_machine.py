@@ -38,7 +38,8 @@ def run(*command):
 
 
 def make(folder):
-    run("debootstrap", "--variant=minbase", f"--include={','.join(SYSTEM)}", RELEASE, str(folder), archive())
+    # What it mounts in there goes with its own namespace.
+    run("unshare", "--mount", "debootstrap", "--variant=minbase", f"--include={','.join(SYSTEM)}", RELEASE, str(folder), archive())
     # Like this one, the machine may reach the network through a proxy, for as long as it is made.
     shutil.copy("/etc/resolv.conf", folder / "etc/resolv.conf")
     shutil.copytree("/etc/apt/apt.conf.d", folder / "etc/apt/apt.conf.d", dirs_exist_ok=True)

@@ -39,6 +39,10 @@ Finding checkHandOver(const platform::BackendReport& credentials) {
     } catch (const platform::Exception& exception) {
         return {kSubject, Verdict::Unknown, exception.what()};
     }
+    if (credentials.backend == "none") {
+        return {kSubject, Verdict::Unknown,
+                "whether a replay item waits cannot be told: " + credentials.reason};
+    }
     if (credentials.startsWhenAsked) {
         return {kSubject, Verdict::Unknown,
                 "whether a replay item waits cannot be told: the keyring does not run",
