@@ -54,6 +54,7 @@ std::string readUntil(int descriptor, Clock::time_point end, std::string& text) 
 //  result  0 or the system's error number
 int start(const std::vector<std::string>& command, int output, pid_t& process) {
     std::vector<char*> arguments;
+    arguments.reserve(command.size() + 1);
     for (const std::string& argument : command) {
         arguments.push_back(const_cast<char*>(argument.c_str()));
     }
