@@ -127,7 +127,8 @@ std::string namesAlone(const Lines& lines) {
 std::string namesWithDescriptions(const Lines& lines) {
     std::string text;
     for (const auto& [name, description] : lines) {
-        text += (text.empty() ? "" : "\n") + name + ":" + description;
+        text += text.empty() ? "" : "\n";
+        text.append(name).append(":").append(description);
     }
     return text;
 }
