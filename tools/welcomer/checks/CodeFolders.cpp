@@ -85,8 +85,9 @@ Finding checkLoadedCode() {
     for (const std::string& file : files) {
         const std::string stranger = strangerWhoMayChange("/", file, true);
         if (!stranger.empty()) {
-            return {"programs", Verdict::Wrong, "code is loaded from " + file + ", and " + stranger,
-                    "install the packages anew, or give it back to root"};
+            std::string text = "code is loaded from ";
+            text.append(file).append(", and ").append(stranger);
+            return {"programs", Verdict::Wrong, text, "install the packages anew, or give it back to root"};
         }
     }
     return {"programs", Verdict::Right,
