@@ -18,11 +18,14 @@ if(NOT CMAKE_BUILD_TYPE AND NOT CMAKE_CONFIGURATION_TYPES)
     set(CMAKE_BUILD_TYPE RelWithDebInfo CACHE STRING "" FORCE)
 endif()
 
-# A second build of the same sources costs little where ccache is installed.
+# A second build of the same sources costs little where ccache is installed, whatever folder they lie in then: what is built
+# names its sources from their top.
+add_compile_options("-ffile-prefix-map=${CMAKE_SOURCE_DIR}=.")
 find_program(WELCOMER_CCACHE ccache)
 if(WELCOMER_CCACHE AND NOT CMAKE_CXX_COMPILER_LAUNCHER)
     # Precompiled headers are cached, too, once these are no reason against it.
-    set(CMAKE_C_COMPILER_LAUNCHER env CCACHE_SLOPPINESS=pch_defines,time_macros "${WELCOMER_CCACHE}")
+    set(CMAKE_C_COMPILER_LAUNCHER env "CCACHE_BASEDIR=${CMAKE_SOURCE_DIR}" CCACHE_SLOPPINESS=pch_defines,time_macros
+                                      "${WELCOMER_CCACHE}")
     set(CMAKE_CXX_COMPILER_LAUNCHER "${CMAKE_C_COMPILER_LAUNCHER}")
 endif()
 
