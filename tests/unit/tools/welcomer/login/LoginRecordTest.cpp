@@ -126,10 +126,10 @@ TEST_F(LoginRecordTest, EveryOutcomeOfAService) {
     fake.accountService.servicesOfNewAccounts = {
         {platform::kSKServiceIDContacts, {}},
         {platform::kSKServiceIDCalendars, {}},
-        {platform::kSKServiceIDBookMarks, {.canBeEnabled = false}},
+        {platform::kSKServiceIDBookMarks, {.canBeEnabled = false, .properties = {}}},
         {platform::kSKServiceIDMail,
-         {.properties = {{platform::kSKPropertyMailEmailAddress, "anna@example.org"}}}},
-        {platform::kSKServiceIDNotes, {.canBeEnabled = false}}};
+         {.canBeEnabled = true, .properties = {{platform::kSKPropertyMailEmailAddress, "anna@example.org"}}}},
+        {platform::kSKServiceIDNotes, {.canBeEnabled = false, .properties = {}}}};
     putItem({});
     const LoginRecord record = run();
     const std::string refused = " cannot be enabled on this machine for this user.";
