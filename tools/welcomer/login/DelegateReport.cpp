@@ -3,6 +3,7 @@
 #include "tools/welcomer/login/AgentTexts.h"
 
 #include <algorithm>
+#include <charconv>
 
 namespace welcomer::tool {
 
@@ -11,6 +12,15 @@ namespace {
 using namespace agenttext;
 using Kind = DelegateOutcome::Kind;
 
+// What the agent prints: digits, perhaps with a dot. Whoever may write to a syslog file may write anything else.
+bool areSeconds(std::string_view text) {
+    double value = 0;
+    const char* const end = text.data() + text.size();
+    const auto [position, error] = std::from_chars(text.data(), end, value);
+    return error == std::errc() && position == end &&
+           text.find_first_not_of("0123456789.") == std::string_view::npos;
+}
+
 bool readException(DelegateOutcome& delegate, std::string_view line) {
     const auto rest =
         after(line, std::string(kDelegateRaised) + delegate.identifier + std::string(kSecondsBegin));
@@ -18,7 +28,7 @@ bool readException(DelegateOutcome& delegate, std::string_view line) {
     const auto reason = end == std::string_view::npos
                             ? std::nullopt
                             : after(rest->substr(end), std::string(kSecondsEnd) + ": ");
-    if (!reason) {
+    if (!reason || !areSeconds(rest->substr(0, end))) {
         return false;
     }
     delegate.seconds = rest->substr(0, end);
@@ -37,7 +47,7 @@ bool readAnswer(DelegateOutcome& delegate, std::string_view line) {
     const auto seconds = begin == std::string_view::npos
                              ? std::nullopt
                              : between(answer->substr(begin), kSecondsBegin, kSecondsEnd);
-    if (!seconds) {
+    if (!seconds || !areSeconds(*seconds)) {
         return false;
     }
     delegate.seconds = *seconds;

@@ -35,6 +35,17 @@ TEST(DelegateReport, AnErrorThatLooksLikeTheSecondsIsKeptWhole) {
               Rows{"a.b|gave up (5.000 seconds) twice|9.500"});
 }
 
+TEST(DelegateReport, SecondsThatAreNoNumberAreNoOutcome) {
+    for (const std::string seconds :
+         {"many", "", "-1", "1.2.3", "inf", "0x1", "1e3", "1 2", std::string(400, '9').c_str()}) {
+        const std::string answer = "a.b setup: completed (" + seconds + " seconds)";
+        const std::string exception =
+            "exception in setup response for plugin a.b (" + seconds + " seconds): boom: it broke";
+        EXPECT_EQ(report({"setting up a.b", answer.c_str(), exception.c_str()}), Rows{"a.b|working|"})
+            << seconds;
+    }
+}
+
 TEST(DelegateReport, AnExceptionIsAnOutcome) {
     EXPECT_EQ(report({"setting up a.b",
                       "exception in setup response for plugin a.b (0.100 seconds): boom: it broke"}),
