@@ -18,7 +18,7 @@ Finding withItem(const WaitingSetup& waiting) {
     if (!waiting.agentProblem.empty()) {
         return {kSubject, Verdict::Wrong,
                 "a replay item waits, but the agent's file starts no agent: " + waiting.agentProblem,
-                "remove " + waiting.agentPath + ", and install the agent anew with: welcomer replay arm"};
+                "install the agent anew with: welcomer replay arm"};
     }
     return {kSubject, Verdict::Right, "a replay item waits, and the agent will start for it"};
 }

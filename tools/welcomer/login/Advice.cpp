@@ -27,7 +27,7 @@ void judgeWaiting(std::vector<ToDo>& found, const WaitingSetup& waiting,
         found.push_back({"an item waits, but no agent will start for it" + whyItStayed(record), both});
     } else if (waiting.hasAgent && !waiting.agentProblem.empty()) {
         found.push_back({"the agent's file starts no agent: " + waiting.agentProblem,
-                         "remove " + waiting.agentPath + "; then " + both});
+                         waiting.hasItem() ? both : "welcomer setup --cancel removes it"});
     } else if (waiting.hasAgent && waiting.itemStatus == platform::kCredentialItemNotFound) {
         found.push_back({"the agent will start, but there is no item for it",
                          "welcomer setup --cancel removes the agent's file"});

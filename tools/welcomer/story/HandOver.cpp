@@ -17,6 +17,13 @@ std::string suggested(const std::string& command, const Caller& caller) {
     return "`welcomer " + command + (caller.user.empty() ? "" : " --user " + caller.user) + "`";
 }
 
+void removeAgent(const WaitingSetup& waiting) {
+    const platform::Outcome removed = platform::current().fileSystem.remove(waiting.agentPath);
+    if (!removed) {
+        throw CommandFailure(removed.error.message);
+    }
+}
+
 CommandFailure cannotTell(std::int32_t status) {
     return CommandFailure("cannot tell whether a replay item is waiting for the next login already: " +
                           platform::credentialStatusText(status) + storingAdvice(status));
@@ -53,10 +60,16 @@ bool armAgent(const KeptLog& log, platform::ResourceBundle& bundle) {
     if (!waiting.hasItem()) {
         throw cannotTell(waiting.itemStatus);
     }
-    if (!waiting.hasAgent && !installLaunchAgent(bundle)) {
+    if (waiting.hasAgent && waiting.agentProblem.empty()) {
+        return false;
+    }
+    if (waiting.hasAgent) {
+        removeAgent(waiting); // what is there is never replaced
+    }
+    if (!installLaunchAgent(bundle)) {
         throw CommandFailure("cannot install the agent: " + log.reason());
     }
-    return !waiting.hasAgent;
+    return true;
 }
 
 WaitingSetup cancelHandOver(const KeptLog& log) {
@@ -71,10 +84,7 @@ WaitingSetup cancelHandOver(const KeptLog& log) {
         throw CommandFailure("cannot delete the replay item: " + replayReason(log, status));
     }
     if (waiting.hasAgent) {
-        const platform::Outcome removed = platform::current().fileSystem.remove(waiting.agentPath);
-        if (!removed) {
-            throw CommandFailure(removed.error.message);
-        }
+        removeAgent(waiting);
     }
     return waiting;
 }

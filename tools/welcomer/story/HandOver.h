@@ -20,8 +20,9 @@ struct Caller {
 // told: with CommandFailure, which says how that is mended.
 void refuseWhereSomethingIsWaiting(const Caller& caller);
 
-// Installs the agent for an item that waits, unless it is there. Throws CommandFailure where no item waits,
-// where that cannot be told, and with the reason where the agent cannot be installed.
+// Installs the agent for an item that waits, unless it is there; a file that starts no agent makes way. Throws
+// CommandFailure where no item waits, where that cannot be told, and with the reason where the agent cannot be
+// installed.
 //  log     where that reason is read
 //  result  whether it had to be installed
 bool armAgent(const KeptLog& log, platform::ResourceBundle& bundle);
