@@ -79,7 +79,14 @@ Findings checkPlugins(const Options& options, const std::string& folder) {
         return {{kSubject, Verdict::Right, "there are none: no folder " + folder}};
     }
     Findings findings{{kSubject, Verdict::Right, "they are in " + folder}};
+    const std::size_t before = findings.size();
     addStrangers(findings, options.root, folder);
+    if (findings.size() > before) {
+        findings.push_back(
+            {kSubject, Verdict::Unknown,
+             "they are not loaded: what others may change would run with the rights of this process"});
+        return findings;
+    }
     const Findings loaded = loadAll(options);
     findings.insert(findings.end(), loaded.begin(), loaded.end());
     return findings;
