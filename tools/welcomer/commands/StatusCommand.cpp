@@ -1,8 +1,8 @@
 // welcomer status: what waits for the next login, what the last one did, and what is to be done.
 
-#include "backends/posix/PasswordEntry.h"
 #include "platform/CredentialStore.h"
 #include "platform/Platform.h"
+#include "tools/welcomer/cli/AsUser.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/login/Advice.h"
@@ -136,9 +136,9 @@ void addStatusCommand(CommandLine& commandLine) {
         });
     commandLine.addUserOption(command);
     commandLine.addPreparation(command, [readBefore](const Options& options) {
-        int error = 0;
-        if (const auto user = posix::passwordEntryNamed(options.user, error)) {
-            *readBefore = lastLogin({.root = options.root, .userID = user->userID, .userName = user->name});
+        if (!options.user.empty()) {
+            const posix::PasswordEntry user = userToActFor(options.user);
+            *readBefore = lastLogin({.root = options.root, .userID = user.userID, .userName = user.name});
         }
     });
 }
