@@ -31,9 +31,12 @@ constexpr char kNamesKey[] = "Names";
 
 constexpr std::uint32_t kLongestMessage = 64U << 20U; // bytes
 
-bool sendAll(int socket, const char* bytes, std::size_t size) {
+// Has all of these bytes sent or received.
+//  step  does so with as many of them as go at once
+template <class Byte, class Step>
+bool transfer(Byte* bytes, std::size_t size, Step step) {
     while (size > 0) {
-        const ssize_t count = ::send(socket, bytes, size, MSG_NOSIGNAL);
+        const ssize_t count = step(bytes, size);
         if (count < 0 && errno == EINTR) {
             continue;
         }
@@ -46,19 +49,15 @@ bool sendAll(int socket, const char* bytes, std::size_t size) {
     return true;
 }
 
+bool sendAll(int socket, const char* bytes, std::size_t size) {
+    return transfer(bytes, size, [socket](const char* rest, std::size_t length) {
+        return ::send(socket, rest, length, MSG_NOSIGNAL);
+    });
+}
+
 bool receiveAll(int socket, char* bytes, std::size_t size) {
-    while (size > 0) {
-        const ssize_t count = ::recv(socket, bytes, size, 0);
-        if (count < 0 && errno == EINTR) {
-            continue;
-        }
-        if (count <= 0) {
-            return false;
-        }
-        bytes += count;
-        size -= static_cast<std::size_t>(count);
-    }
-    return true;
+    return transfer(bytes, size,
+                    [socket](char* rest, std::size_t length) { return ::recv(socket, rest, length, 0); });
 }
 
 // What cannot be written is sent as nothing.
