@@ -30,9 +30,11 @@ FLOORS = {
 SIDES = {
     "backends": {"platform", "propertylist", "backends/posix", "backends/local", "backends/desktop"},
     "backends/posix": {"platform", "propertylist"},
+    "backends/bus": {"platform"},
     "backends/network": {"platform", "propertylist"},
     "backends/local": {"platform", "propertylist", "backends/posix", "backends/network"},
-    "backends/desktop": {"platform", "propertylist", "backends/posix", "backends/network", "backends/local"},
+    "backends/desktop": {"platform", "propertylist", "backends/posix", "backends/bus", "backends/network",
+                         "backends/local"},
     "backends/simulated": {"platform", "propertylist"},
     "examples/plugins": {"sdk"},
 }
@@ -49,8 +51,8 @@ TESTS = {"tests"}
 PROGRAMS = re.compile(r"^(agent/main\.cpp|tools/[^/]+/main\.cpp|examples/setup/[^/]+\.cpp)$")
 OFFERED = re.compile(r"^backends/(Backends|StoredNetwork|UnexpectedEnd|simulated/.+)\.h$")
 
-# What of the backends tools may use, too: the one base on the kernel, and addresses as text.
-FOR_TOOLS = re.compile(r"^backends/(posix/[^/]+|network/IPv4Text)\.h$")
+# What of the backends tools may use, too: the bases on the kernel and on the bus, and addresses as text.
+FOR_TOOLS = re.compile(r"^backends/(posix/[^/]+|bus/[^/]+|network/IPv4Text)\.h$")
 
 SOURCES = {".h", ".hpp", ".c", ".cpp"}
 INCLUDE = re.compile(r'^\s*#\s*include\s*([<"])([^>"]+)[>"]')

@@ -77,12 +77,14 @@ bool UserManagerStarter::_waitForUserManager(sd_bus* bus) {
 }
 
 std::unique_ptr<UserManagerStarter> UserManagerStarter::connect(const std::string& runtimeFolder) {
-    bus::Bus bus = bus::openSessionBus();
+    bus::Bus bus = bus::openSessionBus(kUserManager.limit);
     if (bus && bus::isRunning(bus.get(), kUserManager)) {
         return std::unique_ptr<UserManagerStarter>(new UserManagerStarter(std::move(bus)));
     }
     // A session may have a bus of its own, which the user manager is not on.
-    bus = runtimeFolder.starts_with('/') ? bus::openBusAt("unix:path=" + runtimeFolder + "/bus") : nullptr;
+    bus = runtimeFolder.starts_with('/')
+              ? bus::openBusAt("unix:path=" + runtimeFolder + "/bus", kUserManager.limit)
+              : nullptr;
     if (bus &&
         (::sd_booted() > 0 ? _waitForUserManager(bus.get()) : bus::isRunning(bus.get(), kUserManager))) {
         return std::unique_ptr<UserManagerStarter>(new UserManagerStarter(std::move(bus)));

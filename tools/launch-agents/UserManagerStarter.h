@@ -2,9 +2,9 @@
 
 #pragma once
 
+#include "backends/bus/BusCall.h"
 #include "tools/launch-agents/AgentStarter.h"
 #include "tools/shared/AgentUnit.h"
-#include "tools/shared/BusCall.h"
 
 #include <memory>
 #include <optional>

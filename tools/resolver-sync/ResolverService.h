@@ -2,8 +2,8 @@
 
 #pragma once
 
+#include "backends/bus/BusCall.h"
 #include "platform/Error.h"
-#include "tools/shared/BusCall.h"
 
 #include <cstdint>
 #include <functional>

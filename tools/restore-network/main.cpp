@@ -4,9 +4,9 @@
 
 #include "backends/Backends.h"
 #include "backends/StoredNetwork.h"
+#include "backends/bus/BusCall.h"
 #include "log/PCLogManager.h"
 #include "text/ProgramOptions.h"
-#include "tools/shared/BusCall.h"
 
 #include <chrono>
 #include <string>
@@ -20,7 +20,7 @@ constexpr bus::Peer kNetworkManager = {"org.freedesktop.NetworkManager", "/org/f
                                        "org.freedesktop.NetworkManager", std::chrono::seconds(10)};
 
 bool networkManagerRuns() {
-    const bus::Bus bus = bus::openSystemBus();
+    const bus::Bus bus = bus::openSystemBus(kNetworkManager.limit);
     return bus && bus::isRunning(bus.get(), kNetworkManager);
 }
 

@@ -1,22 +1,19 @@
 #include "handoff/LaunchAgentFile.h"
 #include "tools/shared/AgentUnit.h"
+#include "tools/shared/Journal.h"
 #include "tools/welcomer/login/LoginLog.h"
 
 #include <algorithm>
 #include <filesystem>
-#include <memory>
 #include <system_error>
-#include <systemd/sd-journal.h>
 #include <utility>
 
 namespace welcomer::tool {
 
 namespace {
 
-struct CloseJournal {
-    void operator()(sd_journal* journal) const { ::sd_journal_close(journal); }
-};
-using Journal = std::unique_ptr<sd_journal, CloseJournal>;
+using journal::Journal;
+using journal::match;
 
 Journal openJournal(const std::string& root) {
     sd_journal* journal = nullptr;
@@ -40,11 +37,6 @@ FolderState stateOf(const std::filesystem::path& folder) {
     return error == std::errc::permission_denied ? FolderState::Hidden : FolderState::WithoutFiles;
 }
 
-void match(sd_journal* journal, const std::string& field, const std::string& value) {
-    const std::string wanted = field + "=" + value;
-    ::sd_journal_add_match(journal, wanted.data(), wanted.size());
-}
-
 // The lines of one user's agent and of its launcher, and all that comes from the agent's unit.
 void matchLogins(sd_journal* journal, std::uint32_t userID) {
     match(journal, "_UID", std::to_string(userID));
@@ -57,12 +49,7 @@ void matchLogins(sd_journal* journal, std::uint32_t userID) {
 
 // A field of the current entry; empty where it has none.
 std::string field(sd_journal* journal, const std::string& name) {
-    const void* data = nullptr;
-    std::size_t size = 0;
-    if (::sd_journal_get_data(journal, name.c_str(), &data, &size) < 0 || size <= name.size()) {
-        return "";
-    }
-    return {static_cast<const char*>(data) + name.size() + 1, size - name.size() - 1};
+    return journal::field(journal, name).value_or("");
 }
 
 LogLine currentLine(sd_journal* journal) {

@@ -1,4 +1,4 @@
-// Calls to services on a bus, for the tools: connections, one call, and who has a name.
+// Calls to services on a bus, without GLib: connections, one call, and who has a name.
 
 #pragma once
 
@@ -34,12 +34,15 @@ struct DropMessage {
 };
 using Message = std::unique_ptr<sd_bus_message, DropMessage>;
 
-// The bus of the session that this process runs in, the machine's own, or the one at an address.
+// The bus of the session that this process runs in, the machine's own, or the one at an address, once it has let
+// us in.
+//  limit   how long that may take
+//  why     receives the error's number and text where there is none; may be null
 //  result  null where there is none
 // One thread for each bus, as for all that is done on it.
-Bus openSessionBus();
-Bus openSystemBus();
-Bus openBusAt(const std::string& address);
+Bus openSessionBus(std::chrono::microseconds limit, platform::Error* why = nullptr);
+Bus openSystemBus(std::chrono::microseconds limit, platform::Error* why = nullptr);
+Bus openBusAt(const std::string& address, std::chrono::microseconds limit, platform::Error* why = nullptr);
 
 // One call of a method. Starts nobody. Its arguments are added in their order; what cannot be added is told
 // when the call is sent.
@@ -62,6 +65,9 @@ class Call {
     //  result  the error's number and text
     platform::Outcome send(Message* answer = nullptr);
 
+    // Whether the peer or the bus has answered with the error of this name.
+    bool hasFailedWith(const char* name) const { return _errorName == name; }
+
   private:
     // Keeps the first failure.
     Call& _note(int result);
@@ -70,9 +76,11 @@ class Call {
     const std::uint64_t _microseconds;
     Message _message;
     int _result;
+    std::string _errorName; // empty where nobody has named one
 };
 
 // Whether a peer runs; not, where the bus does not answer.
-bool isRunning(sd_bus* bus, const Peer& peer);
+//  why  receives the error's number and text in that case; may be null
+bool isRunning(sd_bus* bus, const Peer& peer, platform::Error* why = nullptr);
 
 } // namespace welcomer::bus

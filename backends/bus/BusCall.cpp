@@ -1,5 +1,7 @@
-#include "tools/shared/BusCall.h"
+#include "backends/bus/BusCall.h"
 
+#include <algorithm>
+#include <cerrno>
 #include <cstdarg>
 #include <system_error>
 #include <systemd/sd-bus.h>
@@ -7,6 +9,44 @@
 namespace welcomer::bus {
 
 namespace {
+
+using std::chrono::microseconds;
+
+platform::Error errorOf(int result) {
+    return {-result, std::generic_category().message(-result)};
+}
+
+// Waits until a bus has let us in: a call would wait for that without a limit.
+int waitUntilReady(sd_bus* bus, microseconds limit) {
+    using std::chrono::steady_clock;
+    const auto end = steady_clock::now() + limit;
+    int result = 0;
+    while ((result = sd_bus_is_ready(bus)) == 0) {
+        result = sd_bus_process(bus, nullptr);
+        if (result == 0) {
+            const auto left = std::chrono::duration_cast<microseconds>(end - steady_clock::now()).count();
+            result = left <= 0 ? -ETIMEDOUT : sd_bus_wait(bus, static_cast<std::uint64_t>(left));
+        }
+        if (result < 0) {
+            break;
+        }
+    }
+    return result;
+}
+
+//  result  of opening it
+//  opened  owned; null where that has failed
+Bus whenReady(int result, sd_bus* opened, microseconds limit, platform::Error* why) {
+    Bus bus(opened);
+    result = result < 0 ? result : waitUntilReady(opened, limit);
+    if (result >= 0) {
+        return bus;
+    }
+    if (why) {
+        *why = errorOf(result);
+    }
+    return nullptr;
+}
 
 // The error of one call, freed at its end.
 class CallError {
@@ -18,9 +58,11 @@ class CallError {
 
     sd_bus_error* get() { return &_error; }
 
+    std::string name() const { return _error.name ? _error.name : ""; }
+
     // What went wrong in a call with this negative result.
     platform::Error asError(int result) const {
-        return {-result, _error.message ? _error.message : std::generic_category().message(-result)};
+        return _error.message ? platform::Error{-result, _error.message} : errorOf(result);
     }
 
   private:
@@ -30,37 +72,37 @@ class CallError {
 } // namespace
 
 void CloseBus::operator()(sd_bus* bus) const {
-    sd_bus_flush_close_unref(bus);
+    sd_bus_close_unref(bus); // every call has waited for its answer: nothing is left to be sent
 }
 
 void DropMessage::operator()(sd_bus_message* message) const {
     sd_bus_message_unref(message);
 }
 
-Bus openSessionBus() {
+Bus openSessionBus(microseconds limit, platform::Error* why) {
     sd_bus* bus = nullptr;
-    return sd_bus_open_user(&bus) < 0 ? nullptr : Bus(bus);
+    const int result = sd_bus_open_user(&bus);
+    return whenReady(result, bus, limit, why);
 }
 
-Bus openSystemBus() {
+Bus openSystemBus(microseconds limit, platform::Error* why) {
     sd_bus* bus = nullptr;
-    return sd_bus_open_system(&bus) < 0 ? nullptr : Bus(bus);
+    const int result = sd_bus_open_system(&bus);
+    return whenReady(result, bus, limit, why);
 }
 
-Bus openBusAt(const std::string& address) {
-    sd_bus* made = nullptr;
-    if (sd_bus_new(&made) < 0) {
-        return nullptr;
-    }
-    Bus bus(made);
-    const bool connected = sd_bus_set_address(made, address.c_str()) >= 0 &&
-                           sd_bus_set_bus_client(made, 1) >= 0 && sd_bus_start(made) >= 0;
-    return connected ? std::move(bus) : nullptr;
+Bus openBusAt(const std::string& address, microseconds limit, platform::Error* why) {
+    sd_bus* bus = nullptr;
+    int result = sd_bus_new(&bus);
+    result = result < 0 ? result : sd_bus_set_address(bus, address.c_str());
+    result = result < 0 ? result : sd_bus_set_bus_client(bus, 1);
+    result = result < 0 ? result : sd_bus_start(bus);
+    return whenReady(result, bus, limit, why);
 }
 
 Call::Call(sd_bus* bus, const Peer& peer, const char* method)
     : _bus(bus),
-      _microseconds(static_cast<std::uint64_t>(peer.limit.count())) {
+      _microseconds(static_cast<std::uint64_t>(std::max(peer.limit, microseconds(1)).count())) { // 0: its own
     sd_bus_message* made = nullptr;
     _result = sd_bus_message_new_method_call(bus, &made, peer.name, peer.path, peer.interface, method);
     _message.reset(made);
@@ -108,6 +150,7 @@ platform::Outcome Call::send(Message* answer) {
     sd_bus_message* received = nullptr;
     _note(_result < 0 ? _result : sd_bus_call(_bus, _message.get(), _microseconds, error.get(), &received));
     Message owned(received);
+    _errorName = error.name();
     if (_result < 0) {
         return platform::Outcome::failure(error.asError(_result));
     }
@@ -117,13 +160,16 @@ platform::Outcome Call::send(Message* answer) {
     return platform::Outcome::success();
 }
 
-bool isRunning(sd_bus* bus, const Peer& peer) {
+bool isRunning(sd_bus* bus, const Peer& peer, platform::Error* why) {
     const Peer busItself = {"org.freedesktop.DBus", "/org/freedesktop/DBus", "org.freedesktop.DBus",
                             peer.limit};
     Message answer;
+    const platform::Outcome asked = Call(bus, busItself, "NameHasOwner").append("s", peer.name).send(&answer);
+    if (!asked && why) {
+        *why = asked.error;
+    }
     int hasOwner = 0;
-    return Call(bus, busItself, "NameHasOwner").append("s", peer.name).send(&answer) &&
-           sd_bus_message_read(answer.get(), "b", &hasOwner) >= 0 && hasOwner != 0;
+    return asked && sd_bus_message_read(answer.get(), "b", &hasOwner) >= 0 && hasOwner != 0;
 }
 
 } // namespace welcomer::bus
