@@ -13,7 +13,10 @@ from pathlib import Path
 import figures
 import plugins_section
 
-AGENT = "/usr/local/libexec/wlnimbussetup"
+TOP = Path(__file__).resolve().parents[2]
+AGENT = "/usr/libexec/wlnimbussetup"
+TOOL = "/usr/bin/welcomer"
+BUNDLE = "/usr/share/welcomer/setup-bundle"
 
 
 def measure(build, tables):
@@ -21,6 +24,14 @@ def measure(build, tables):
     result = subprocess.run([sys.executable, __file__, str(build)], check=True, stdout=subprocess.PIPE, text=True)
     for kind, arguments in json.loads(result.stdout):
         getattr(tables, kind)(*arguments)
+
+
+def packages_of(build):
+    """The packages with programs and what they need, which are built where they are not there yet."""
+    folder = build / "packages"
+    subprocess.run([sys.executable, "-B", TOP / "tests/packages/build_packages.py", folder], check=True, stdout=sys.stderr)
+    names = ("libwelcomer0", "welcomer", "welcomer-desktop")
+    return [next(folder.glob(f"{name}_*.deb")) for name in names]
 
 
 def status_field(status, field):
@@ -36,13 +47,13 @@ def replay_with(delegates, filler=0):
 
 
 class BenchMachine:
-    """A root folder with the installed programs and a real system log."""
+    """A root folder with what the packages hold and a real system log."""
 
     def __init__(self, build, folder, plugin_count=0):
         import machine
 
         self.machine = machine.Machine(folder)
-        self.machine.install(build)
+        self._unpack(packages_of(build))
         for name in ("empty-program", "process-pair"):
             shutil.copy(build / "bench" / name, self.machine.root / "tmp" / name)
         if plugin_count:
@@ -50,14 +61,27 @@ class BenchMachine:
         self.machine.start_system_log()
         self.session = []  # what makes a command one of the user's session, if there is one
 
+    def _unpack(self, packages):
+        """The packages' files over the machine's own, and the loader's knowledge of their libraries."""
+        import machine
+
+        unpacked, work = (self.machine.root / "unpacked" / name for name in ("files", "work"))
+        for folder in (unpacked, work):
+            folder.mkdir(parents=True)
+        for package in packages:
+            subprocess.run(["dpkg-deb", "--extract", package, unpacked], check=True)
+        machine.mount("overlay", self.machine.root / "usr", "overlay", 0,
+                      f"lowerdir=/usr,upperdir={unpacked}/usr,workdir={work}")
+        subprocess.run(["ldconfig", "-r", self.machine.root], check=True)
+
     def store(self, replay):
         path = self.machine.root / "tmp" / "replay.plist"
         path.write_bytes(replay)
         path.chmod(0o644)
         agents = self.machine.home / "Library" / "LaunchAgents"
         shutil.rmtree(agents, ignore_errors=True)
-        result = self.machine.run([*self.session, "/usr/local/bin/welcomer", "replay", "store", "--account", "bench",
-                                   "--file", "/tmp/replay.plist", "--bundle", "/usr/local/share/welcomer/setup-bundle"],
+        result = self.machine.run([*self.session, TOOL, "replay", "store", "--account", "bench", "--file", "/tmp/replay.plist",
+                                   "--bundle", BUNDLE],
                                   user=True, timeout=120)
         if result.returncode:
             raise RuntimeError(result.stderr)
@@ -129,5 +153,5 @@ def figures_of(bench):
 
 
 if __name__ == "__main__":
-    sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "tests" / "support"))
+    sys.path.insert(0, str(TOP / "tests" / "support"))
     inside(Path(sys.argv[1]))

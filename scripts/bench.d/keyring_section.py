@@ -98,7 +98,7 @@ def figures_of(session):
              *session.pair([agent_section.AGENT], status=1), 1.0, "ms")]
     session.store(agent_section.replay_with(DELEGATES))
     rows.append(("`welcomer replay show` from the keyring", "`secret-tool lookup` of the same item",
-                 *session.pair(["/usr/local/bin/welcomer", "replay", "show"], status=0), 1.2, "ms"))
+                 *session.pair([agent_section.TOOL, "replay", "show"], status=0), 1.2, "ms"))
     agent, _ = session.lingering()
     time.sleep(15)  # two services are turned on ten seconds after the others
     rows.append(("proportional memory (PSS) of the lingering agent in a desktop session, ten plug-ins", "goa-daemon, idle",
