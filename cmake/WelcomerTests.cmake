@@ -23,7 +23,7 @@ function(welcomer_precompile_tests)
     target_compile_options(test-beginnings PRIVATE ${options})
     target_precompile_headers(test-beginnings PRIVATE
         <algorithm> <chrono> <functional> <map> <memory> <optional> <string> <thread> <utility> <vector>
-        <gtest/gtest.h> "${PROJECT_SOURCE_DIR}/platform/Platform.h")
+        <gtest/gtest.h> <platform/Platform.h>)
 endfunction()
 
 # welcomer_add_test(NAME sources... [LIBRARIES ...] [LABELS ...] [RESOURCE_LOCK ...])
