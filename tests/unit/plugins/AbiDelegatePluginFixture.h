@@ -5,8 +5,8 @@
 #include "plugins/AbiDelegatePlugin.h"
 #include "plugins/PropertyListHandles.h"
 #include "tests/unit/plugins/InProcessPlugin.h"
+#include "tests/unit/plugins/Thrown.h"
 
-#include <functional>
 #include <gtest/gtest.h>
 #include <string>
 #include <vector>
@@ -26,18 +26,6 @@ class AbiDelegatePluginTest : public testing::Test {
 
     const wl_delegate_plugin_descriptor* principalClass() {
         return AbiDelegatePlugin::principalClass(plugin.exportAs<0>(), reason);
-    }
-
-    // What a call throws; a failure when that is of another kind than callers may expect, or nothing.
-    static std::string thrown(const std::function<void()>& call) {
-        try {
-            call();
-        } catch (const DelegatePluginException& exception) {
-            return exception.what();
-        } catch (...) {
-            ADD_FAILURE() << "threw something else";
-        }
-        return "nothing thrown";
     }
 
     WLFirstRunDelegateConfiguration::CompletionHandler handler() {

@@ -5,9 +5,9 @@
 #include "plugins/AbiDelegatePlugin.h"
 #include "plugins/WLNimbusDelegatePlugins.h"
 #include "tests/fakes/FakePlatform.h"
+#include "tests/unit/plugins/Thrown.h"
 
 #include <dlfcn.h>
-#include <functional>
 #include <future>
 #include <gtest/gtest.h>
 #include <memory>
@@ -38,17 +38,6 @@ class PluginLibraries : public testing::Test {
         EXPECT_EQ(fake.systemLog.lines(), Strings{});
         EXPECT_EQ(plugins.size(), 1U);
         return plugins.at(0);
-    }
-
-    static std::string thrown(const std::function<void()>& call) {
-        try {
-            call();
-        } catch (const DelegatePluginException& exception) {
-            return exception.what();
-        } catch (...) {
-            ADD_FAILURE() << "threw something else";
-        }
-        return "nothing thrown";
     }
 
     // The outcomes that a plug-in's handler gave; kept by the handler.

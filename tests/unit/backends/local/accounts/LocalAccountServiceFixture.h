@@ -13,16 +13,13 @@
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeProcessIdentity.h"
 #include "tests/fakes/FakeSystemLog.h"
+#include "tests/support/ChildProcess.h"
 
-#include <cerrno>
 #include <chrono>
-#include <functional>
 #include <gtest/gtest.h>
 #include <memory>
 #include <string>
 #include <sys/stat.h>
-#include <sys/wait.h>
-#include <unistd.h>
 #include <vector>
 
 namespace welcomer {
@@ -84,20 +81,6 @@ class LocalAccountServiceTest : public testing::Test {
         struct stat status = {};
         EXPECT_EQ(::stat(root.locate(path).c_str(), &status), 0);
         return status.st_mode & 07777U;
-    }
-
-    static pid_t start(const std::function<int()>& block) {
-        const pid_t child = ::fork();
-        if (child == 0) {
-            ::_exit(block());
-        }
-        return child;
-    }
-    static int waitFor(pid_t child) {
-        int status = 0;
-        while (::waitpid(child, &status, 0) < 0 && errno == EINTR) {
-        }
-        return status;
     }
 
     TemporaryRoot root;

@@ -8,14 +8,11 @@
 #include "tests/fakes/FakeFileSystem.h"
 #include "tests/fakes/FakeProcessIdentity.h"
 #include "tests/fakes/FakeSystemLog.h"
+#include "tests/support/ChildProcess.h"
 
-#include <cerrno>
-#include <functional>
 #include <gtest/gtest.h>
 #include <string>
 #include <sys/stat.h>
-#include <sys/wait.h>
-#include <unistd.h>
 #include <vector>
 
 namespace welcomer {
@@ -49,22 +46,6 @@ class LocalPreferenceStoreTest : public testing::Test {
         local::LocalPreferenceStore other(posix::RootFolder(root.path()), identity, log);
         other.setValue(key, value, kDomain);
         return other.synchronise(kDomain);
-    }
-
-    // Runs a block in a process of its own; its result is that process's exit status.
-    pid_t start(const std::function<int()>& block) {
-        const pid_t child = ::fork();
-        if (child == 0) {
-            ::_exit(block());
-        }
-        return child;
-    }
-
-    static int waitFor(pid_t child) {
-        int status = 0;
-        while (::waitpid(child, &status, 0) < 0 && errno == EINTR) {
-        }
-        return status;
     }
 
     TemporaryRoot root;
