@@ -155,7 +155,7 @@ class InstalledAgent(unittest.TestCase):
                 for name in ("/libgio-", "/libgoa-", "/libsecret-"):
                     self.assertNotIn(name, login.libraries)
 
-    def test_without_a_session_bus_no_library_of_one_is_loaded(self):
+    def test_of_the_desktops_libraries_the_run_loops_alone_is_loaded(self):
         for login in self.logins:
             with self.subTest(login.name):
                 self.assertIn("/libglib-2.0.so", login.libraries)
