@@ -99,6 +99,11 @@ class AdministeredTest(StoryTest):
     def test_the_second_login_starts_nothing(self):
         self.assert_second_login_starts_nothing()
 
+    def test_the_doctor_hears_of_the_unit_from_the_user_manager(self):
+        for newcomer in self.seen.newcomers:
+            self.assertEqual([(each["state"], each["text"]) for each in newcomer.doctor["checks"] if each["subject"] == "units"],
+                             [("right", "the user's unit welcomer-launch-agents.service starts agents at a login")])
+
     def test_no_file_in_a_home_is_anybody_elses(self):
         for newcomer in self.seen.newcomers:
             self.assertEqual(newcomer.foreign_files, "")

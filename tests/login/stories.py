@@ -131,6 +131,7 @@ class Newcomer:
         self.starter_records = [record[2] for record in self.machine.records("welcomer-launch-agents", self.name)]
         self.services_after_login = self.services(session)
         self.replay_after_login = self.replay(session)
+        self.doctor = json.loads(session.run([TOOL, "--json", "doctor"]).stdout)
         session.end()
         self.launch_agent_after_second = self.launch_agent.exists()
 
