@@ -11,6 +11,7 @@ import shutil
 import signal
 import sys
 import tempfile
+import time
 import unittest
 import xml.etree.ElementTree as ElementTree
 from pathlib import Path
@@ -67,6 +68,41 @@ class Seeing(unittest.TestCase):
         self.agents.append(self.machine.start(self.program, user=True, **options))
         self.machine.wait_for(lambda: self.lines().count(expected) > before, f"the line {expected!r}")
         return self.agents[-1]
+
+    def follow_two_logins(self, between):
+        self.store()
+        followed = self.root / "tmp/followed"
+        with open(followed, "w") as out:
+            follower = self.machine.start([TOOL, "--json", "log", "--follow"], user=True, stdout=out)
+        self.agents.append(follower)
+        self.wait_until_it_sleeps(follower)
+        self.log_in("delaying exit by two minutes")
+        self.machine.wait_for(lambda: "delaying exit" in followed.read_text(), "the followed line")
+        self.wait_until_it_sleeps(follower)
+        between()
+        self.assertEqual(self.machine.run(["/usr/bin/logger", "-t", "other", "hello"], user=True).returncode, 0)
+        self.wait_until_it_sleeps(follower)
+        self.assertNotIn("hello", followed.read_text())
+        self.log_in("exiting").wait(timeout=60)  # which finds no item any more
+        self.machine.wait_for(lambda: '"exiting"' in followed.read_text(), "the followed end")
+        follower.send_signal(signal.SIGINT)
+        self.assertEqual(follower.wait(timeout=60), -signal.SIGINT)
+        lines = [json.loads(line)["message"] for line in followed.read_text().splitlines()]
+        second = lines.index("Self destructing...", 1)
+        self.assertEqual((lines[0], lines[-1]), ("Self destructing...", "exiting"))
+        for login in (lines[:second], lines[second:]):
+            self.assertEqual(len(login), len(set(login)))
+
+    def wait_until_it_sleeps(self, process):
+        """Returns when the process has not been awake for a while, not even to look around."""
+        status = self.root / f"proc/{process.pid}/status"
+
+        def sleeps():
+            before = [line for line in status.read_text().splitlines() if "ctxt_switches" in line]
+            time.sleep(2)
+            return before == [line for line in status.read_text().splitlines() if "ctxt_switches" in line]
+
+        self.machine.wait_for(sleeps, "the follower's sleep")
 
     def lines(self):
         """The messages of all logins, as root is shown them."""
@@ -149,6 +185,17 @@ class SyslogFile(Seeing):
         self.assertEqual([each.name for each in (self.root / "tmp").glob("*.svg*")], ["login.svg"])
         self.assertEqual(self.tool("log", "--picture", "/var/log/login.svg").returncode, 1)
 
+    def test_lines_are_followed_into_the_file_that_is_begun_anew(self):
+        file = self.root / "var/log/syslog"
+        self.machine.run(["/usr/bin/logger", "-t", "other", "the first line"])
+        self.machine.wait_for(file.exists, "the file")
+
+        def begin_anew():
+            file.rename(self.root / "var/log/syslog.1")
+            self.machine._daemons[-1].send_signal(signal.SIGHUP)
+
+        self.follow_two_logins(begin_anew)
+
     def test_a_file_that_only_administrators_read_is_said_in_one_line(self):
         self.store()
         self.log_in("delaying exit by two minutes")
@@ -204,18 +251,7 @@ class PersistentJournal(Journal):
         self.assertRegex(self.tool("log", "--user", "root").stderr, "only root can ask")
 
     def test_lines_are_followed_as_they_come(self):
-        self.store()
-        followed = self.root / "tmp/followed"
-        with open(followed, "w") as out:
-            follower = self.machine.start([TOOL, "--json", "log", "--follow"], user=True, stdout=out)
-        self.agents.append(follower)
-        self.log_in("delaying exit by two minutes")
-        self.machine.wait_for(lambda: "delaying exit" in followed.read_text(), "the followed line")
-        follower.send_signal(signal.SIGINT)
-        self.assertEqual(follower.wait(timeout=60), -signal.SIGINT)
-        lines = [json.loads(line)["message"] for line in followed.read_text().splitlines()]
-        self.assertEqual(lines[0], "Self destructing...")
-        self.assertEqual(len(lines), len(set(lines)))
+        self.follow_two_logins(lambda: None)
 
 
 class JournalOfAUnit(Journal):

@@ -4,6 +4,7 @@
 #include "platform/Platform.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/login/LogWatch.h"
 #include "tools/welcomer/login/LoginLog.h"
 #include "tools/welcomer/login/LoginPicture.h"
 #include "tools/welcomer/login/LoginReport.h"
@@ -27,7 +28,7 @@ namespace {
 using namespace std::chrono_literals;
 
 constexpr std::size_t kAllSince = 1000; // logins
-constexpr auto kBetweenLooks = 500ms;
+constexpr auto kTogether = 100ms;       // what comes within it is read at once
 
 struct LogArguments {
     std::size_t last = 0; // 0: not given
@@ -89,16 +90,21 @@ std::string noLogins(const FoundLogins& found, const LoginQuery& query) {
     return found.note.empty() ? "the log has no login of " + query.userName : found.note;
 }
 
-Report showLog(const LoginQuery& query) {
-    const FoundLogins found = findLogins(query);
-    Report report;
-    report.document = {{"user", query.userName},
-                       {"source", found.source.empty() ? Json() : Json(found.source)},
-                       {"note", found.note.empty() ? Json() : Json(found.note)},
-                       {"logins", Json::array()}};
+FoundLogins findReadable(const LoginQuery& query) {
+    FoundLogins found = findLogins(query);
     if (found.source.empty()) {
         throw CommandFailure(noLogins(found, query));
     }
+    return found;
+}
+
+Report showLog(const LoginQuery& query) {
+    const FoundLogins found = findReadable(query);
+    Report report;
+    report.document = {{"user", query.userName},
+                       {"source", found.source},
+                       {"note", found.note.empty() ? Json() : Json(found.note)},
+                       {"logins", Json::array()}};
     if (found.logins.empty()) {
         return report.line("No logins: " + noLogins(found, query) + ".");
     }
@@ -150,12 +156,19 @@ class Follower {
     Follower follower(session);
     std::size_t wanted = query.last;
     query.last = std::max<std::size_t>(query.last, 2); // one may end while the next one begins
-    for (;; std::this_thread::sleep_for(kBetweenLooks), wanted = query.last) {
-        const FoundLogins found = findLogins(query);
-        if (found.source.empty()) {
-            throw CommandFailure(noLogins(found, query));
+    std::unique_ptr<LogWatch> watch;
+    std::string watched;
+    for (;;) {
+        const FoundLogins found = findReadable(query);
+        if (watched != found.source) {
+            watched = found.source;
+            watch = watchLog(query, watched);
+            continue; // what has come before is read once more
         }
         follower.show(std::span(found.logins).last(std::min(wanted, found.logins.size())));
+        wanted = query.last;
+        watch->wait();
+        std::this_thread::sleep_for(kTogether);
     }
 }
 

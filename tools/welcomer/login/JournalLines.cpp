@@ -1,10 +1,13 @@
 #include "handoff/LaunchAgentFile.h"
 #include "tools/shared/AgentUnit.h"
 #include "tools/shared/Journal.h"
-#include "tools/welcomer/login/LoginLog.h"
+#include "tools/welcomer/login/LogWatch.h"
+#include "tools/welcomer/terminal/Failure.h"
 
 #include <algorithm>
 #include <filesystem>
+#include <limits>
+#include <memory>
 #include <system_error>
 #include <utility>
 
@@ -68,7 +71,47 @@ LogLine currentLine(sd_journal* journal) {
     return line;
 }
 
+class JournalWatch : public LogWatch {
+  public:
+    explicit JournalWatch(const LoginQuery& query) : _journal(openJournal(query.root)) {
+        if (!_journal) {
+            throw CommandFailure("the journal cannot be followed");
+        }
+        matchLogins(_journal.get(), query.userID);
+        // What comes stands behind the last entry, or behind the beginning.
+        ::sd_journal_seek_tail(_journal.get());
+        if (::sd_journal_previous(_journal.get()) <= 0) {
+            ::sd_journal_seek_head(_journal.get());
+        }
+    }
+
+    void wait() override {
+        while (!_hasMore()) {
+            const int woken = ::sd_journal_wait(_journal.get(), std::numeric_limits<std::uint64_t>::max());
+            if (woken < 0) {
+                throw CommandFailure("the journal cannot be followed: " +
+                                     std::generic_category().message(-woken));
+            }
+        }
+    }
+
+  private:
+    bool _hasMore() {
+        bool more = false;
+        while (::sd_journal_next(_journal.get()) > 0) {
+            more = true;
+        }
+        return more;
+    }
+
+    Journal _journal;
+};
+
 } // namespace
+
+std::unique_ptr<LogWatch> watchJournal(const LoginQuery& query) {
+    return std::make_unique<JournalWatch>(query);
+}
 
 SourceLines readJournal(const LoginQuery& query) {
     const std::filesystem::path root = query.root;
@@ -76,7 +119,7 @@ SourceLines readJournal(const LoginQuery& query) {
     const FolderState inMemory = stateOf(root / "run/log/journal");
     SourceLines source{.isThere =
                            onDisk != FolderState::WithoutFiles || inMemory != FolderState::WithoutFiles,
-                       .name = "journal"};
+                       .name = kJournalName};
     const Journal journal = source.isThere ? openJournal(query.root) : nullptr;
     if (!journal) {
         return source;

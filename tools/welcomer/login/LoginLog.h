@@ -4,6 +4,7 @@
 
 #include "tools/welcomer/login/LoginLines.h"
 
+#include <array>
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
@@ -13,6 +14,11 @@
 #include <vector>
 
 namespace welcomer::tool {
+
+inline constexpr const char* kJournalName = "journal";
+
+// Where syslog daemons write, by custom.
+inline constexpr std::array kSyslogFiles{"/var/log/syslog", "/var/log/messages", "/var/log/user.log"};
 
 // What is wanted.
 struct LoginQuery {

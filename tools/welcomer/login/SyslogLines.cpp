@@ -22,8 +22,6 @@ using namespace std::chrono;
 // What is read of one file, from its end.
 constexpr off_t kMostOfAFile = off_t{8} * 1024 * 1024;
 
-constexpr std::array kFiles{"/var/log/syslog", "/var/log/messages", "/var/log/user.log"};
-
 constexpr std::array<std::string_view, 12> kMonths{"Jan", "Feb", "Mar", "Apr", "May", "Jun",
                                                    "Jul", "Aug", "Sep", "Oct", "Nov", "Dec"};
 
@@ -231,7 +229,7 @@ std::optional<LogLine> readSyslogLine(std::string_view line, microseconds now) {
 SourceLines readSyslogFile(const LoginQuery& query, microseconds now) {
     const posix::RootFolder root(query.root);
     SourceLines source;
-    for (const char* path : kFiles) {
+    for (const char* path : kSyslogFiles) {
         const posix::FileDescriptor file = root.open(path, O_RDONLY | O_NONBLOCK);
         if (!file && errno == ENOENT) {
             continue;
