@@ -3,6 +3,7 @@
 #include "backends/posix/AtomicFile.h"
 #include "backends/posix/RootFolder.h"
 #include "plugins/DelegateIdentifiers.h"
+#include "tools/welcomer/login/AgentTexts.h"
 #include "tools/welcomer/login/PictureStyle.h"
 #include "tools/welcomer/login/SVGDrawing.h"
 #include "tools/welcomer/login/TimeScale.h"
@@ -31,8 +32,9 @@ constexpr double kLeft = 190; // of the times
 constexpr double kRight = 930;
 constexpr double kRow = 26;
 constexpr double kBar = 16;
-constexpr std::size_t kNameColumns = 24;
-constexpr std::size_t kReasonColumns = 48;
+constexpr std::size_t kNameColumns = 20;
+constexpr std::size_t kReasonColumns = 64;
+constexpr double kLegendColumn = 182;
 
 std::string inSeconds(Time time, int decimals) {
     std::ostringstream text;
@@ -43,6 +45,14 @@ std::string inSeconds(Time time, int decimals) {
 // A name without what those of its kind have in common.
 std::string_view shortName(std::string_view identifier) {
     return identifier.substr(identifier.rfind('.') + 1);
+}
+
+// Why a service is not on, without its name, which stands before its row.
+std::string whyNotOn(const ServiceOutcome& service) {
+    const std::string text = service.text();
+    return std::string(
+        agenttext::after(text, std::string(agenttext::kServiceRefused) + service.identifier + "' ")
+            .value_or(text));
 }
 
 bool isMessaging(const DelegateOutcome& delegate) {
@@ -167,7 +177,10 @@ class Picture {
             if (settled > begin) {
                 _drawing.line("putoff", begin, middle, settled, middle);
             }
-            _drawing.path(isOn ? "completed mark" : "refused mark", settled, middle, isOn ? kDiamond : kBang);
+            _drawing.path(isOn ? "service mark" : "refused mark", settled, middle, isOn ? kDiamond : kBang);
+        }
+        if (!isOn) {
+            _drawBeside(cutTo(whyNotOn(service), kReasonColumns), begin - 6, settled);
         }
         _drawing.endGroup();
         _y += 17;
@@ -261,6 +274,7 @@ class Picture {
         _y += 44;
     }
 
+    // What an outcome's bar and mark are, and in a second row what else there is.
     void _drawLegend() {
         double x = 20;
         for (const auto& [kind, name] : kLegend) {
@@ -273,7 +287,17 @@ class Picture {
             }
             _drawing.path(std::string(look.className) + " mark", x + 40, _y - 3, look.mark);
             _drawing.text("quiet", x + 54, _y + 1, name);
-            x += 182;
+            x += kLegendColumn;
+        }
+        _y += 22;
+        _drawing.rectangle("begins", 20, _y - 9, 26, 12, 3);
+        _drawing.path("service mark", 20 + kLegendColumn + 40, _y - 3, kDiamond);
+        _drawing.line("putoff", 20 + 2 * kLegendColumn, _y - 3, 20 + 2 * kLegendColumn + 40, _y - 3);
+        _drawing.path("queue", 20 + 3 * kLegendColumn + 36, _y - 9, "M4 0H0V12H4");
+        int column = 0;
+        for (const char* const name : {"the agent begins", "service enabled", "service put off",
+                                       "one queue, one call after the other"}) {
+            _drawing.text("quiet", 74 + kLegendColumn * column++, _y + 1, name);
         }
     }
 

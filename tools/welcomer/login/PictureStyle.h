@@ -64,12 +64,13 @@ text { fill: #1f2328; }
 .name { text-anchor: end; font-weight: 600; }
 .small { font-size: 11px; font-weight: 400; }
 .inside, .beside { font-size: 11px; }
+.beside { stroke: #ffffff; stroke-width: 4; stroke-linejoin: round; paint-order: stroke; }
 .before { text-anchor: end; }
 .begins { fill: #b9c2cc; }
 .waits { fill: #9cc3ea; }
 .lingers { fill: #dde7f1; }
 .end { stroke: #1f2328; stroke-width: 3; }
-.completed { fill: #1a7f4b; }
+.completed, .service { fill: #1a7f4b; }
 .refused { fill: #c77700; }
 .raised { fill: #c62f2f; }
 .never { fill: #e9ddf7; stroke: #7a4fb5; stroke-width: 1.5; stroke-dasharray: 5 3; }
@@ -88,11 +89,12 @@ text { fill: #1f2328; }
 .page { fill: #14181d; }
 text { fill: #e6edf3; }
 .quiet, .time { fill: #9aa5b1; }
+.beside { stroke: #14181d; }
 .begins { fill: #4b5661; }
 .waits { fill: #2f5f92; }
 .lingers { fill: #243447; }
 .end { stroke: #e6edf3; }
-.completed { fill: #3fb57a; }
+.completed, .service { fill: #3fb57a; }
 .refused { fill: #e5a13a; }
 .raised { fill: #f0645f; }
 .never { fill: #33264a; stroke: #b692ea; }

@@ -87,11 +87,14 @@ TEST(LoginPicture, ServicesAreMarksAndThoseOfSetupAreNone) {
                   {3s, "Enabling Nimbus service 'x.calendars'"},
                   {4s, "exiting"}}),
         {"Login", ""});
-    EXPECT_EQ(drawn(picture, "completed mark"), 3U);
-    EXPECT_EQ(drawn(picture, "putoff"), 1U);
+    EXPECT_EQ(drawn(picture, "service mark"), 3U); // with the one in the legend
+    EXPECT_EQ(drawn(picture, "completed mark"), 1U);
+    EXPECT_EQ(drawn(picture, "putoff"), 2U);
     EXPECT_EQ(drawn(picture, "never putoff"), 1U);
     EXPECT_EQ(drawn(picture, "refused mark"), 2U);
     EXPECT_EQ(count(picture, "locator"), 0U);
+    EXPECT_EQ(count(picture, ">cannot be enabled on this machine for this user.</text>"), 1U);
+    EXPECT_EQ(count(picture, ">put off, and not enabled</text>"), 1U);
 }
 
 TEST(LoginPicture, TheTwoOfOneQueueStandTogether) {
@@ -99,10 +102,10 @@ TEST(LoginPicture, TheTwoOfOneQueueStandTogether) {
                                                     {0s, "setting up com.corvid.other"},
                                                     {0s, "setting up com.corvid.vidlink"}}),
                                           {"Login", ""});
-    EXPECT_EQ(drawn(picture, "queue"), 1U);
+    EXPECT_EQ(drawn(picture, "queue"), 2U); // with the one in the legend
     EXPECT_LT(picture.find("vidlink: "), picture.find("other: "));
     EXPECT_EQ(drawn(drawLogin(recordOf({{0s, "setting up com.corvid.chatter"}}), {"Login", ""}), "queue"),
-              0U);
+              1U);
 }
 
 TEST(LoginPicture, TextsFromElsewhereAreEscaped) {
