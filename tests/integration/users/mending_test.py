@@ -42,6 +42,31 @@ class Mending(ForOthersTest):
                 self.assertEqual(json.loads(self.succeeds(tool("replay", "show", "--json")))["account"], "anna")
                 self.succeeds(tool("setup", "--cancel"))
 
+    def test_a_file_that_starts_no_agent_makes_way_for_one_that_does(self):
+        for tool, named in self.ways():
+            self.succeeds(self.set_up(OTHER))
+            whole = self.launch_agent(OTHER).read_bytes()
+            definition = plistlib.loads(whole)
+            for broken in (b"", plistlib.dumps({**definition, "ProgramArguments": ["/gone"]}),
+                           plistlib.dumps({**definition, "RunAtLoad": False})):
+                with self.subTest(named, broken=broken):
+                    self.launch_agent(OTHER).write_bytes(broken)
+                    self.assertEqual(json.loads(self.succeeds(tool("replay", "arm", "--json"))), {"installed": True})
+                    self.assertEqual(self.launch_agent(OTHER).read_bytes(), whole)
+                    self.assertEqual(self.launch_agent(OTHER).stat().st_uid, OTHER_ID)
+                    self.assertTrue(json.loads(self.succeeds(tool("status", "--json")))["waiting"]["fit"])
+            self.start_what_is_armed()
+
+    def start_what_is_armed(self):
+        """As the login does: the agent takes the item, and its file goes."""
+        agent = self.machine.start(plistlib.loads(self.launch_agent(OTHER).read_bytes())["ProgramArguments"], user=OTHER_ID)
+        try:
+            gone = lambda: self.tool("replay", "show", user=OTHER_ID).returncode == 1
+            self.machine.wait_for(lambda: not self.launch_agent(OTHER).exists() and gone(), "the agent's beginning")
+        finally:
+            agent.kill()
+            agent.wait()
+
     def test_a_hand_over_is_taken_back(self):
         for tool, named in self.ways():
             with self.subTest(named):

@@ -96,9 +96,10 @@ void addLastLogin(Report& report, const LastLogin& last) {
     addRecord(report, seen, last.isRunning);
 }
 
-Report showStatus(const LastLogin& last) {
+//  user  whom root asks for, or empty
+Report showStatus(const LastLogin& last, const std::string& user) {
     const WaitingSetup waiting = findWaitingSetup();
-    const std::vector<ToDo> found = whatIsToDo(waiting, last.login, last.isRunning);
+    const std::vector<ToDo> found = whatIsToDo(waiting, last.login, last.isRunning, user);
     Report report;
     report.document = {{"waiting", toJson(waiting)}, {"lastLogin", nullptr}, {"toDo", Json::array()}};
     if (last.login) {
@@ -132,7 +133,8 @@ void addStatusCommand(CommandLine& commandLine) {
         "Show what waits for the next login, what the last one did, and what is to be done; exit status 0: "
         "nothing is, 1: something is",
         [readBefore](Session& session) {
-            return showStatus(*readBefore ? **readBefore : lastLogin(queryOfCaller(session.options.root)));
+            return showStatus(*readBefore ? **readBefore : lastLogin(queryOfCaller(session.options.root)),
+                              session.options.user);
         });
     commandLine.addUserOption(command);
     commandLine.addPreparation(command, [readBefore](const Options& options) {

@@ -93,9 +93,20 @@ void judgeEnd(std::vector<ToDo>& found, const LoginRecord& record) {
     }
 }
 
-} // namespace
+// The commands of an advice, to be given for another user.
+std::string adviceFor(const std::string& user, std::string advice) {
+    for (const std::string command :
+         {"welcomer replay arm", "welcomer replay show", "welcomer replay delete", "welcomer setup --cancel",
+          "welcomer account list", "welcomer account services", "welcomer services enable", "welcomer log"}) {
+        for (std::size_t at = advice.find(command); at != std::string::npos;
+             at = advice.find(command, at + command.size())) {
+            advice.insert(at + command.size(), " --user " + user);
+        }
+    }
+    return advice;
+}
 
-std::vector<ToDo> whatIsToDo(const WaitingSetup& waiting, const std::optional<Login>& login, bool isRunning) {
+std::vector<ToDo> judge(const WaitingSetup& waiting, const std::optional<Login>& login, bool isRunning) {
     std::vector<ToDo> found;
     const auto agents = login && login->hasAgent ? std::optional(record(*login)) : std::nullopt;
     judgeWaiting(found, waiting, agents);
@@ -118,6 +129,17 @@ std::vector<ToDo> whatIsToDo(const WaitingSetup& waiting, const std::optional<Lo
     }
     if (!isRunning) {
         judgeEnd(found, *agents);
+    }
+    return found;
+}
+
+} // namespace
+
+std::vector<ToDo> whatIsToDo(const WaitingSetup& waiting, const std::optional<Login>& login, bool isRunning,
+                             const std::string& user) {
+    std::vector<ToDo> found = judge(waiting, login, isRunning);
+    for (ToDo& each : found) {
+        each.advice = user.empty() ? each.advice : adviceFor(user, each.advice);
     }
     return found;
 }

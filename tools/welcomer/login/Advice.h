@@ -22,6 +22,8 @@ struct ToDo {
 // count any more where another setup waits.
 //  login      the last one, or none
 //  isRunning  whether its agent still runs
-std::vector<ToDo> whatIsToDo(const WaitingSetup& waiting, const std::optional<Login>& login, bool isRunning);
+//  user       whom root asks for, or empty: the commands that are advised are then for that user
+std::vector<ToDo> whatIsToDo(const WaitingSetup& waiting, const std::optional<Login>& login, bool isRunning,
+                             const std::string& user = "");
 
 } // namespace welcomer::tool

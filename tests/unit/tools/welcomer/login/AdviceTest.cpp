@@ -58,6 +58,25 @@ TEST(Advice, AnAgentWithoutAnItemOrThatCannotStart) {
               Texts{"the agent's file starts no agent: it cannot be read"});
 }
 
+TEST(Advice, WhoAsksForAnotherUserIsToldTheCommandsForThatUser) {
+    const auto advices = [](const WaitingSetup& setup, const std::optional<Login>& login) {
+        Texts texts;
+        for (const ToDo& each : whatIsToDo(setup, login, false, "anna")) {
+            texts.push_back(each.advice);
+        }
+        return texts;
+    };
+    EXPECT_EQ(advices(waiting(true, false), std::nullopt),
+              Texts{"welcomer replay arm --user anna installs the agent; welcomer setup --cancel --user anna "
+                    "gives the setup up"});
+    const Login login =
+        loginOf({"Self destructing...", "Nimbus service 'x' cannot be enabled on this machine for this user.",
+                 "exiting"});
+    EXPECT_EQ(advices(waiting(false, false), login),
+              Texts{"welcomer account services --user anna shows whether it can be enabled by now, welcomer "
+                    "services enable --user anna --phase post enables it"});
+}
+
 TEST(Advice, AKeyringThatCannotBeAsked) {
     WaitingSetup setup = waiting(false, false);
     setup.itemStatus = platform::kCredentialNoBus;
