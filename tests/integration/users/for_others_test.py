@@ -220,6 +220,30 @@ class SettingUp(ForOthersTest):
         services = json.loads(self.succeeds(self.tool("account", "services", "--json", "--user", OTHER)))
         self.assertEqual(services["account"], "anna")
 
+    def test_the_record_and_the_services_of_another_user(self):
+        self.add_anna()
+        before = self.outside()
+        record = lambda *asked, **options: json.loads(self.succeeds(self.tool("state", "show", "--json", *asked, **options)))
+        key = "DidSeeCloudSetup"
+        self.assertEqual((record("--user", OTHER)["loaded"], record("--user", OTHER)["state"][key]), (True, False))
+        self.succeeds(self.tool("state", "set", key, "true", "--user", OTHER))
+        self.assertEqual(record("--user", OTHER), record(user=OTHER_ID))
+        self.assertTrue(record(user=OTHER_ID)["state"][key])
+        self.assertFalse(record("--user", machine.USER)["state"][key])
+        self.succeeds(self.tool("state", "remove", key, "--user", OTHER))
+        self.assertFalse(record(user=OTHER_ID)["state"][key])
+        self.succeeds(self.tool("state", "seen", "cloud", "--user", OTHER))
+        self.assertTrue(record(user=OTHER_ID)["state"][key])
+        self.fails(self.tool("state", "seen", "cloud"), 1, "the superuser's record is not loaded")
+
+        self.succeeds(self.tool("account", "sign-in", "anna", "--user", OTHER))
+        self.succeeds(self.tool("services", "enable", "--account", "anna", "--phase", "pre", "--user", OTHER))
+        services = json.loads(self.succeeds(self.tool("account", "services", "--json", user=OTHER_ID)))["services"]
+        self.assertIn("documents", {each["service"] for each in services if each["enabled"]})
+        self.assertEqual(self.outside(), before)
+        for path in self.homes[OTHER].rglob("*"):
+            self.assertEqual(path.lstat().st_uid, OTHER_ID, path)
+
 
 class Rights(ForOthersTest):
     def links(self, user):

@@ -139,6 +139,7 @@ void addServicesCommands(CommandLine& commandLine) {
         ->type_name("SERVICE")
         ->expected(1)
         ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
+    commandLine.addUserOption(command);
 }
 
 } // namespace welcomer::tool

@@ -125,7 +125,7 @@ Report recordSeen(Session& session, const std::string& setup) {
 
 void addStateCommands(CommandLine& commandLine) {
     CLI::App& group = commandLine.addGroup("state", "The user's record of what setup has done and shown");
-    commandLine.addCommand(group, "show", "Show the record", show);
+    commandLine.addUserOption(commandLine.addCommand(group, "show", "Show the record", show));
     commandLine.offerValues("KEY", keyNames);
 
     const auto key = std::make_shared<std::string>();
@@ -134,17 +134,20 @@ void addStateCommands(CommandLine& commandLine) {
                                               [=](Session& session) { return set(session, *key, *value); });
     setter.add_option("key", *key, "The value's key")->type_name("KEY")->required();
     setter.add_option("value", *value, "A text, or true or false for a flag")->type_name("VALUE")->required();
+    commandLine.addUserOption(setter);
 
     CLI::App& remover =
         commandLine.addCommand(group, "remove", "Remove one value of the record; a flag becomes false",
                                [=](Session& session) { return remove(session, *key); });
     remover.add_option("key", *key, "The value's key")->type_name("KEY")->required();
+    commandLine.addUserOption(remover);
 
     const auto setup = std::make_shared<std::string>();
     CLI::App& seen = commandLine.addCommand(
         group, "seen", "Record that the cloud or the sync setup was seen, at the running system's version",
         [=](Session& session) { return recordSeen(session, *setup); });
     seen.add_option("setup", *setup, "cloud or sync")->required()->check(CLI::IsMember({"cloud", "sync"}));
+    commandLine.addUserOption(seen);
 }
 
 } // namespace welcomer::tool
