@@ -44,8 +44,12 @@ class DoctorTest(unittest.TestCase):
         return path
 
     def run_tool(self, *arguments):
+        # Plug-ins that the tests make tell by this file that they were loaded.
+        self.trace = self.root / "loaded"
+        self.trace.unlink(missing_ok=True)
         return subprocess.run([PREFIX / "bin/welcomer", "--root", self.root, *map(str, arguments)], capture_output=True,
-                              text=True, timeout=100, stdin=subprocess.DEVNULL, check=False)
+                              text=True, timeout=100, stdin=subprocess.DEVNULL, check=False,
+                              env={**os.environ, "TRACE_OF_LOADING": str(self.trace)})
 
     def doctor(self, failure=None):
         """The doctor's document, which ends with this failure."""
@@ -153,8 +157,22 @@ class Plugins(DoctorTest):
         self.assertEqual(subject, "plug-ins")
         self.assertRegex(text, "^the plug-ins cannot be loaded")
 
-    def test_what_others_may_write_is_not(self):
-        plugin = self.install(OWN_PLUGINS / "TalkingPlugin.ncdplugin")
+    def assert_loaded(self):
+        self.assertIn("all load: 1", self.right("plug-ins"))
+        self.assertTrue(self.trace.exists())
+
+    def assert_stranger(self, text):
+        """That the doctor finds this wrong, and does not have strangers' code loaded."""
+        document = self.doctor("one thing is wrong")
+        self.assertEqual([(each["state"], each["text"]) for each in document["checks"] if each["subject"] == "plug-ins"],
+                         [("right", f"they are in /{SYSTEM_FOLDER}"), ("wrong", text),
+                          ("unknown", "they are not loaded: what others may change would run with the rights of this "
+                           "process")])
+        self.assertFalse(self.trace.exists())
+
+    def test_what_others_may_write_is_not_and_is_not_loaded(self):
+        plugin = self.install(OWN_PLUGINS / "TracingPlugin.ncdplugin")
+        self.assert_loaded()
         shown = self.root
         for path, mode, text in ((self.plugins, 0o777, f"everybody may write {shown}/{SYSTEM_FOLDER}"),
                                  (self.plugins, 0o1777, f"everybody may write {shown}/{SYSTEM_FOLDER}"),
@@ -162,18 +180,18 @@ class Plugins(DoctorTest):
                                  (self.root / "System", 0o777, f"everybody may write {shown}/System")):
             before = path.stat().st_mode
             path.chmod(mode)
-            self.assertEqual(self.wrong(), [("plug-ins", text)])
+            self.assert_stranger(text)
             path.chmod(before)
-        self.doctor()
+        self.assert_loaded()
 
     @unittest.skipIf(os.geteuid() != 0, "giving files to others needs root")
-    def test_what_belongs_to_others_is_not(self):
-        plugin = self.install(OWN_PLUGINS / "TalkingPlugin.ncdplugin")
+    def test_what_belongs_to_others_is_not_and_is_not_loaded(self):
+        plugin = self.install(OWN_PLUGINS / "TracingPlugin.ncdplugin")
         os.chown(plugin, 12345, 0)
-        self.assertEqual(self.wrong(), [("plug-ins", f"{plugin} belongs to user 12345")])
+        self.assert_stranger(f"{plugin} belongs to user 12345")
         os.chown(plugin, 0, 12345)
         plugin.chmod(0o664)
-        self.assertEqual(self.wrong(), [("plug-ins", f"group 12345 may write {plugin}")])
+        self.assert_stranger(f"group 12345 may write {plugin}")
 
 
 class Programs(DoctorTest):
