@@ -42,7 +42,9 @@ class WithoutLibmnl(unittest.TestCase):
         self.assertEqual(self.machine.run([TOOL, "--version"]).returncode, 0)
         result = self.machine.run([AGENT], user=True)
         self.assertEqual((result.returncode, result.stderr), (0, ""))
-        self.assertEqual(self.machine.log_records("wlnimbussetup")[-1][2], "exiting")
+        # The log daemon may still be about to write it.
+        self.machine.wait_for(
+            lambda: [text for _, _, text in self.machine.log_records("wlnimbussetup")][-1:] == ["exiting"], "the last line")
 
 
 if __name__ == "__main__":
