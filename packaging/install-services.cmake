@@ -1,4 +1,4 @@
-# Run by `cmake --install`, which has the last word on the prefix, and so on the paths in these files.
+# Run by `cmake --install` for each WELCOMER_COMPONENT; it has the last word on the prefix, and so on the paths in these files.
 #   PREFIX/lib             for the prefixes /usr and /usr/local this is on the search paths of systemd and its helpers
 #   WELCOMER_SYSTEM_UNITS  where units of the system go, when that is not PREFIX/lib/systemd/system
 #   /etc                   for what is looked for nowhere below /usr/local: with that prefix, and what sessions start with
@@ -42,17 +42,18 @@ macro(install_service_file name destination)
     file(INSTALL "${WELCOMER_INSTALLED}/${installed}" DESTINATION "${destination}")
 endmacro()
 
-install_service_file(welcomer-launch-agents.service "${WELCOMER_LIB}/systemd/user")
-install_service_file(welcomer-launch-agents.desktop "${WELCOMER_AUTOSTART}")
-install_service_file(user.preset "${WELCOMER_LIB}/systemd/user-preset" 80-welcomer.preset)
-
-install_service_file(welcomer-restore-network.service "${WELCOMER_SYSTEM_UNITS}")
-install_service_file(system.preset "${WELCOMER_LIB}/systemd/system-preset" 80-welcomer.preset)
-
-install_service_file(welcomer-resolver-sync.service "${WELCOMER_SYSTEM_UNITS}")
-install_service_file(resolver-sync.preset "${WELCOMER_LIB}/systemd/system-preset" 80-welcomer-resolver-sync.preset)
-install_service_file(resolver-sync.sysusers "${WELCOMER_LIB}/sysusers.d" welcomer-resolver-sync.conf)
-install_service_file(resolver-sync.tmpfiles "${WELCOMER_LIB}/tmpfiles.d" welcomer-resolver-sync.conf)
-install_service_file(resolver-sync.rules "${WELCOMER_POLKIT_RULES}" welcomer-resolver-sync.rules)
+if(WELCOMER_COMPONENT STREQUAL "resolver-sync")
+    install_service_file(welcomer-resolver-sync.service "${WELCOMER_SYSTEM_UNITS}")
+    install_service_file(resolver-sync.preset "${WELCOMER_LIB}/systemd/system-preset" 80-welcomer-resolver-sync.preset)
+    install_service_file(resolver-sync.sysusers "${WELCOMER_LIB}/sysusers.d" welcomer-resolver-sync.conf)
+    install_service_file(resolver-sync.tmpfiles "${WELCOMER_LIB}/tmpfiles.d" welcomer-resolver-sync.conf)
+    install_service_file(resolver-sync.rules "${WELCOMER_POLKIT_RULES}" welcomer-resolver-sync.rules)
+else()
+    install_service_file(welcomer-launch-agents.service "${WELCOMER_LIB}/systemd/user")
+    install_service_file(welcomer-launch-agents.desktop "${WELCOMER_AUTOSTART}")
+    install_service_file(user.preset "${WELCOMER_LIB}/systemd/user-preset" 80-welcomer.preset)
+    install_service_file(welcomer-restore-network.service "${WELCOMER_SYSTEM_UNITS}")
+    install_service_file(system.preset "${WELCOMER_LIB}/systemd/system-preset" 80-welcomer.preset)
+endif()
 
 file(REMOVE_RECURSE "${WELCOMER_INSTALLED}")
