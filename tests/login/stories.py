@@ -5,18 +5,15 @@ import configparser
 import json
 import plistlib
 import time
-from pathlib import Path
 
 import booted_machine as booted
-
-SUPPORT = Path(__file__).resolve().parents[1] / "support"
 
 TOOL = "/usr/bin/welcomer"
 LABEL = "com.corvid.welcomer.nimbussetup.user"
 UNIT = f"welcomer-agent-{LABEL}.service"
 PASSWORD, KEYRING_PASSWORD = "correct horse", "battery staple"
 SERVICE = "com.corvid.nimbus.service."
-SECRETS, ONLINE_ACCOUNTS = "org.freedesktop.secrets", "org.gnome.OnlineAccounts"
+ONLINE_ACCOUNTS = "org.gnome.OnlineAccounts"
 PRE_LOGIN = {"photo-stream", "account-sync", "locator", "documents"}
 POST_LOGIN = {"contacts", "calendars", "bookmarks", "reminders", "mail", "notes"}
 # How long the plug-ins take, where nothing else is to happen meanwhile.
@@ -172,21 +169,19 @@ class Story:
         if self.packages:
             self.machine.install(self.packages)
         self.machine.must(["sh", "-ec", ENABLE_PLUGINS])
-        for name in ("notifications.py", "prompter.py"):
-            (self.machine.root / "usr/local/bin" / name).write_bytes((SUPPORT / name).read_bytes())
 
     # What is different.
 
     def prepare_setup(self, session):
         """The services of the session in which the setup application runs."""
-        self.start_keyring(session)
+        session.start_keyring(KEYRING_PASSWORD)
         self.start_online_accounts(session)
 
     def prepare_login(self, session):
         """The services that the user's desktop has started when it is up."""
-        self.start_keyring(session)
+        session.start_keyring(KEYRING_PASSWORD)
         self.start_online_accounts(session)
-        self.notifications = self.start_script(session, "notifications.py")
+        self.notifications = session.start_script("notifications.py")
 
     def meanwhile(self, newcomer, session):
         """Called when the agent has begun."""
@@ -194,33 +189,9 @@ class Story:
     def look_afterwards(self, newcomer):
         """What else is to be seen, after both logins."""
 
-    # The services.
-
-    def start_script(self, session, name, *arguments):
-        """A script of the tests' own as the user; returns the file of what it prints, once it is ready."""
-        printed = f"home/{session.user}/.{name}.printed"
-        session.start(name, "/usr/bin/python3", "-B", f"/usr/local/bin/{name}", *arguments, printed=f"/{printed}")
-        printed = self.machine.root / printed
-        booted.wait_for(lambda: printed.exists() and "ready\n" in printed.read_text(), name)
-        return printed
-
-    def start_keyring(self, session, unlocked=True):
-        session.start("keyring", "gnome-keyring-daemon", "--foreground", "--components=secrets",
-                      "--unlock" if unlocked else "--start", written=KEYRING_PASSWORD.encode())
-        locked = ["gdbus", "call", "--session", "-d", SECRETS, "-o", "/org/freedesktop/secrets/collection/login", "-m",
-                  "org.freedesktop.DBus.Properties.Get", "org.freedesktop.Secret.Collection", "Locked"]
-        self.wait_for_name(session, SECRETS)
-        booted.wait_for(lambda: f"<{str(not unlocked).lower()}>" in session.run(locked).stdout, "the keyring")
-
     def start_online_accounts(self, session):
         session.start("online-accounts", "/usr/libexec/goa-daemon")
-        self.wait_for_name(session, ONLINE_ACCOUNTS)
-
-    def wait_for_name(self, session, name):
-        # Asked of the bus itself, which starts nobody for it.
-        asked = ["gdbus", "call", "--session", "-d", "org.freedesktop.DBus", "-o", "/", "-m",
-                 "org.freedesktop.DBus.NameHasOwner", name]
-        booted.wait_for(lambda: "true" in session.run(asked).stdout, name)
+        session.wait_for_name(ONLINE_ACCOUNTS)
 
 
 class Administered(Story):
@@ -248,8 +219,8 @@ class Locked(Story):
     """The keyring is locked, and the user answers when it asks."""
 
     def prepare_login(self, session):
-        self.start_keyring(session, unlocked=False)
-        self.prompts = self.start_script(session, "prompter.py", "ok", KEYRING_PASSWORD)
+        session.start_keyring(KEYRING_PASSWORD, unlocked=False)
+        self.prompts = session.start_script("prompter.py", "ok", KEYRING_PASSWORD)
         self.start_online_accounts(session)
 
     def look_afterwards(self, newcomer):
@@ -262,8 +233,8 @@ class LockedForGood(Locked):
     is_offered_again = True
 
     def prepare_login(self, session):
-        self.start_keyring(session, unlocked=False)
-        self.prompts = self.start_script(session, "prompter.py", "silent")
+        session.start_keyring(KEYRING_PASSWORD, unlocked=False)
+        self.prompts = session.start_script("prompter.py", "silent")
 
 
 class WithoutKeyring(Story):

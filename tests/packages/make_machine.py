@@ -15,10 +15,12 @@ from pathlib import Path
 
 RELEASE = "bookworm"
 # What a machine with users needs.
-SYSTEM = "systemd systemd-sysv libpam-systemd dbus dbus-user-session polkitd pkexec iproute2 python3".split()
+SYSTEM = "systemd systemd-sysv libpam-systemd dbus dbus-user-session polkitd pkexec iproute2 procps python3".split()
 # What the packages depend on, and what the tests start as a desktop would.
 PACKAGES = """libedit2 libmnl0 libnm0 libsecret-1-0 psmisc dnsmasq-base
     gnome-keyring gnome-online-accounts libglib2.0-bin python3-gi""".split()
+# What a test installs, if it is to be there: the package files wait where apt keeps those that it has fetched.
+FETCHED = ["systemd-resolved"]
 
 
 def archive():
@@ -37,6 +39,13 @@ def run(*command):
         sys.exit(f"make_machine: {command[0]} failed:\n" + "\n".join((done.stdout + done.stderr).splitlines()[-15:]))
 
 
+def apt_get(folder, *arguments):
+    run("unshare", "--mount", "--pid", "--fork", "--kill-child", "sh", "-ec",
+        'mount --make-rprivate / && mount -t proc proc "$0/proc" && mount -t tmpfs tmpfs "$0/tmp"'
+        ' && DEBIAN_FRONTEND=noninteractive exec chroot "$0" apt-get -qq --no-install-recommends "$@"',
+        str(folder), *arguments)
+
+
 def make(folder):
     # What it mounts in there goes with its own namespace.
     run("unshare", "--mount", "debootstrap", "--variant=minbase", f"--include={','.join(SYSTEM)}", RELEASE, str(folder), archive())
@@ -44,13 +53,11 @@ def make(folder):
     shutil.copy("/etc/resolv.conf", folder / "etc/resolv.conf")
     shutil.copytree("/etc/apt/apt.conf.d", folder / "etc/apt/apt.conf.d", dirs_exist_ok=True)
     (folder / "etc/dpkg/dpkg.cfg.d/unsafe-io").write_text("force-unsafe-io\n")
-    run("unshare", "--mount", "--pid", "--fork", "--kill-child", "sh", "-ec",
-        'mount --make-rprivate / && mount -t proc proc "$0/proc" && mount -t tmpfs tmpfs "$0/tmp"'
-        ' && DEBIAN_FRONTEND=noninteractive exec chroot "$0" apt-get install -qq --no-install-recommends "$@"',
-        str(folder), *PACKAGES)
-    for name in ("var/cache/apt/archives", "var/lib/apt/lists"):
-        shutil.rmtree(folder / name)
-        (folder / name / "partial").mkdir(parents=True)
+    apt_get(folder, "install", *PACKAGES)
+    apt_get(folder, "clean")
+    apt_get(folder, "install", "--download-only", *FETCHED)
+    shutil.rmtree(folder / "var/lib/apt/lists")
+    (folder / "var/lib/apt/lists/partial").mkdir(parents=True)
     (folder / "etc/resolv.conf").write_text("")
 
 
@@ -59,7 +66,7 @@ def main():
         os.execvp("sudo", ["sudo", "-n", sys.executable, "-B", *sys.argv])
     folder = Path(sys.argv[1])
     mark = folder.with_suffix(".made")
-    recipe = " ".join([RELEASE, *SYSTEM, *PACKAGES])
+    recipe = " ".join([RELEASE, *SYSTEM, *PACKAGES, *FETCHED])
     if mark.exists() and mark.read_text(encoding="utf-8") == recipe:
         return
     mark.unlink(missing_ok=True)

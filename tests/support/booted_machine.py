@@ -51,6 +51,7 @@ exec unshare --cgroup --mount --propagation private sh -ec '
 # A target that brings the desktop's own up, as a desktop's session does.
 SESSION = "test-session.target"
 SESSION_UNIT = "[Unit]\nDescription=A desktop session\nBindsTo=graphical-session.target\n"
+SECRETS = "org.freedesktop.secrets"
 
 
 def enter_namespaces():
@@ -85,15 +86,16 @@ class BootedMachine:
         self.root = self._folder / "root"
         machine.mount("overlay", self.root, "overlay", 0,
                       f"lowerdir={base},upperdir={self._folder}/changes,workdir={self._folder}/work")
-        self._write("etc/systemd/user/" + SESSION, SESSION_UNIT)
+        self.write("etc/systemd/user/" + SESSION, SESSION_UNIT)
         # Who logs out is gone at once, with all of their processes.
-        self._write("etc/systemd/logind.conf.d/test.conf", "[Login]\nUserStopDelaySec=0\n")
+        self.write("etc/systemd/logind.conf.d/test.conf", "[Login]\nUserStopDelaySec=0\n")
         self._cgroups = self._folder / "cgroups"
         machine.mount("none", self._cgroups, "cgroup2")
         self._cgroup = self._cgroups / f"welcomer-machine-{os.getpid()}-{os.urandom(4).hex()}"
         self._process = None
 
-    def _write(self, name, text):
+    def write(self, name, text):
+        """A file of the machine's, by its path there without the first slash."""
         (self.root / name).parent.mkdir(parents=True, exist_ok=True)
         (self.root / name).write_text(text, encoding="utf-8")
 
@@ -165,28 +167,36 @@ class BootedMachine:
     def user_id(self, name):
         return int(self.must(["id", "-u", name]))
 
+    def journal(self, *matches):
+        """The texts of the journal that fit, in their order."""
+        return self.must(["journalctl", "--quiet", "--output=cat", *matches]).splitlines()
+
+    def enter_network(self):
+        """Has the calling thread, and what it starts, be in the machine's network."""
+        machine.enter_network(self._first)
+
+    def reboot(self):
+        """Returns when the system is up again."""
+        self._switch_off()
+        self.boot()
+
     def shut_down(self):
         """Ends every process of the machine and lets go of its files."""
         if self._process:
-            # This one has the machine switch off: units are stopped in their order.
-            if self._process.poll() is None:
-                os.kill(self._first, signal.SIGRTMIN + 4)
-            try:
-                self._process.wait(timeout=60)
-            finally:
-                self._process.kill()
-                self._process.wait()
-            wait_for(self._remove_cgroups, "the end of the machine's processes")
+            self._switch_off()
         machine.unmount(self._folder)
         self._folder.rmdir()
 
-    def _remove_cgroups(self):
+    def _switch_off(self):
+        # This signal has the machine switch off: units are stopped in their order.
+        if self._process.poll() is None:
+            os.kill(self._first, signal.SIGRTMIN + 4)
         try:
-            for folder, _, _ in sorted(os.walk(self._cgroup), reverse=True):
-                os.rmdir(folder)
-        except OSError:
-            return False
-        return True
+            self._process.wait(timeout=60)
+        finally:
+            self._process.kill()
+            self._process.wait()
+        wait_for(lambda: machine.remove_cgroups(self._cgroup), "the end of the machine's processes")
 
 
 class Session:
@@ -220,6 +230,30 @@ class Session:
 
     def systemctl(self, *arguments, check=True):
         return self.run(["systemctl", "--user", *arguments], check=check)
+
+    def start_script(self, name, *arguments):
+        """A script of the tests' own; returns the file of what it prints, once it is ready."""
+        (self.machine.root / "usr/local/bin" / name).write_bytes((Path(__file__).parent / name).read_bytes())
+        printed = self.machine.root / "home" / self.user / f".{name}.printed"
+        printed.unlink(missing_ok=True)  # of an earlier login
+        self.start(name, "/usr/bin/python3", "-B", f"/usr/local/bin/{name}", *arguments,
+                   printed=f"/home/{self.user}/{printed.name}")
+        wait_for(lambda: printed.exists() and "ready\n" in printed.read_text(), name)
+        return printed
+
+    def start_keyring(self, password, unlocked=True):
+        self.start("keyring", "gnome-keyring-daemon", "--foreground", "--components=secrets",
+                   "--unlock" if unlocked else "--start", written=password.encode())
+        locked = ["gdbus", "call", "--session", "-d", SECRETS, "-o", "/org/freedesktop/secrets/collection/login", "-m",
+                  "org.freedesktop.DBus.Properties.Get", "org.freedesktop.Secret.Collection", "Locked"]
+        self.wait_for_name(SECRETS)
+        wait_for(lambda: f"<{str(not unlocked).lower()}>" in self.run(locked).stdout, "the keyring")
+
+    def wait_for_name(self, name):
+        # Asked of the bus itself, which starts nobody for it.
+        asked = ["gdbus", "call", "--session", "-d", "org.freedesktop.DBus", "-o", "/", "-m",
+                 "org.freedesktop.DBus.NameHasOwner", name]
+        wait_for(lambda: "true" in self.run(asked).stdout, name)
 
     def start_desktop(self):
         """The desktop comes up; returns when everything that it wants at once is there."""

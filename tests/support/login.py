@@ -87,16 +87,7 @@ class Login:
         if self.manager:
             self.manager.terminate()
             self.manager.wait(timeout=60)
-            machine.Machine.wait_for(lambda: self._remove_cgroups(), "the end of the login's processes")
+            machine.Machine.wait_for(lambda: machine.remove_cgroups(self._cgroup), "the end of the login's processes")
+            machine.unmount(self._cgroups)
+            self._cgroups.rmdir()
         subprocess.run(["rm", "-rf", str(self.runtime)], check=True)
-
-    def _remove_cgroups(self):
-        """Whether every cgroup of the login is gone: one goes once its last process has ended."""
-        try:
-            for folder, _, _ in sorted(os.walk(self._cgroup), reverse=True):
-                os.rmdir(folder)
-        except OSError:
-            return False
-        machine.unmount(self._cgroups)
-        self._cgroups.rmdir()
-        return True

@@ -11,7 +11,7 @@ import sys
 import time
 from pathlib import Path
 
-CLONE_NEWNS, CLONE_NEWPID = 0x00020000, 0x20000000
+CLONE_NEWNET = 0x40000000
 MNT_DETACH = 2
 MS_BIND, MS_REC, MS_PRIVATE, MS_RDONLY, MS_REMOUNT = 0x1000, 0x4000, 0x40000, 0x1, 0x20
 
@@ -43,6 +43,24 @@ def unmount(target):
     if _libc.umount2(str(target).encode(), MNT_DETACH) != 0:
         number = ctypes.get_errno()
         raise OSError(number, f"umount {target}: {os.strerror(number)}")
+
+
+def enter_network(process):
+    """Has the calling thread, and what it starts, be in the network of another process."""
+    with open(f"/proc/{process}/ns/net", "rb") as namespace:
+        if _libc.setns(namespace.fileno(), CLONE_NEWNET) != 0:
+            number = ctypes.get_errno()
+            raise OSError(number, f"entering the network of {process}: {os.strerror(number)}")
+
+
+def remove_cgroups(top):
+    """Removes a cgroup and those below it. False while there is one with a process: it goes once the last one has ended."""
+    try:
+        for folder, _, _ in sorted(os.walk(top), reverse=True):
+            os.rmdir(folder)
+    except OSError:
+        return False
+    return True
 
 
 class Machine:

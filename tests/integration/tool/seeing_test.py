@@ -286,16 +286,8 @@ class JournalOfAUnit(Journal):
             process.kill()
             process.wait()
         self.enter(self.root / "sys/fs/cgroup" / self.own.lstrip("/"))
-        self.machine.wait_for(self.remove_cgroups, "the end of the test's processes")
+        self.machine.wait_for(lambda: machine.remove_cgroups(self.top), "the end of the test's processes")
         super().tearDown()
-
-    def remove_cgroups(self):
-        try:
-            for folder, _, _ in sorted(os.walk(self.top), reverse=True):
-                os.rmdir(folder)
-        except OSError:
-            return False
-        return True
 
     def test_what_a_program_of_the_unit_says_is_of_that_login(self):
         self.store()

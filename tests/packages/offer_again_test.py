@@ -1,26 +1,24 @@
 #!/usr/bin/env python3
 """The installed agent at logins where its item cannot be asked for: it is offered again, and never acts twice.
 
-Each story is a machine of its own with a real systemd, a real journal and a real keyring, side by side with the others,
-since the keyring's user has two minutes to answer.
+Each story is a machine of its own with a real keyring, side by side with the others, since the keyring's user has two
+minutes to answer.
 
-usage: offer_again_test.py BUILD_DIR
+usage: offer_again_test.py MACHINE PACKAGES
+    MACHINE   the minimal system that make_machine.py has made
+    PACKAGES  the folder of the packages that are installed on it
 """
 
 import concurrent.futures
-import os
 import plistlib
-import shutil
 import sys
-import tempfile
 import unittest
 from pathlib import Path
 
-sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "support"))
-import booted  # noqa: E402
-import machine  # noqa: E402
+sys.path.insert(0, str(Path(__file__).resolve().parents[1] / "support"))
+import booted_machine as booted  # noqa: E402
 
-TOOL, BUNDLE = "/usr/local/bin/welcomer", "/usr/local/share/welcomer/setup-bundle"
+USER, BUNDLE = "newcomer", "/usr/share/welcomer/setup-bundle"
 LABEL = "com.corvid.welcomer.nimbussetup.user"
 UNIT, STARTER = f"welcomer-agent-{LABEL}.service", "welcomer-launch-agents.service"
 PASSWORD, ACCOUNT = "battery staple", "newcomer@nimbus.example"
@@ -29,7 +27,7 @@ UNANSWERED = "the prompt of the keyring was not answered in time"
 SILENT = "the keyring could not be asked for the item: no answer within 10 seconds"
 BEGIN, END, ACTS = "Self destructing...", "exiting", "Killing onlineaccounts"
 
-BUILD = None
+MACHINE, PACKAGES = None, ()
 STORIES = {}
 
 
@@ -41,70 +39,53 @@ class Story:
     """A machine whose user has an item in the keyring and an agent that waits for the next login."""
 
     def __init__(self):
-        self.folder = Path(tempfile.mkdtemp(prefix="offer-again-"))
-        self.machine = booted.BootedMachine(self.folder / "machine", with_keyring=True)
-        self.agent_file = self.machine.home / f"Library/LaunchAgents/{LABEL}.plist"
+        self.machine = booted.BootedMachine(MACHINE)
+        self.agent_file = self.machine.root / "home" / USER / f"Library/LaunchAgents/{LABEL}.plist"
         self.seen = []
 
     def run(self):
         try:
-            self.machine.install(BUILD)
-            self.machine.enable_for_users(STARTER)
             self.prepare()
             self.machine.boot()
+            self.machine.install(PACKAGES)
+            self.machine.add_user(USER)
             self.set_up()
             self.tell()
-            self.journal = "\n".join(self.machine.journal())
+            self.everything = "\n".join(self.machine.journal())
         finally:
-            self.machine.stop()
-            shutil.rmtree(self.folder)
+            self.machine.shut_down()
         return self
 
     def prepare(self):
         """What is different about the machine."""
 
     def set_up(self):
-        (self.machine.root / "tmp/replay.plist").write_bytes(plistlib.dumps({"delegatesResponseDict": {"delegates": {}}}))
-        login = booted.BootedLogin(self.machine)
-        self.start_keyring(login)
-        self.tool(login, "replay", "store", "--account", ACCOUNT, "--file", "/tmp/replay.plist", "--bundle", BUNDLE)
+        item = self.machine.root / "home" / USER / "replay.plist"
+        item.write_bytes(plistlib.dumps({"delegatesResponseDict": {"delegates": {}}}))
+        login = booted.Session(self.machine, USER)
+        login.start_keyring(PASSWORD)
+        self.tool(login, "replay", "store", "--account", ACCOUNT, "--file", f"/home/{USER}/{item.name}", "--bundle", BUNDLE)
         self.definition = self.agent_file.read_bytes()
         login.end()
 
     def tool(self, login, *arguments):
-        done = login.run([TOOL, *arguments])
+        done = login.run(["welcomer", *arguments])
         if done.returncode != 0:
             raise AssertionError(f"the tool failed: {done}")
         return done.stdout
 
-    def start_keyring(self, login, unlocked=True, prompter=None):
-        """As a service of the login, which ends with it."""
-        start = "--unlock" if unlocked else "--start"
-        command = f"printf '{PASSWORD}' | exec gnome-keyring-daemon --foreground --components=secrets {start}"
-        login.run(["/usr/bin/systemd-run", "--user", "--unit=keyring", "/bin/sh", "-c", command])
-        locked = ["gdbus", "call", "--session", "-d", "org.freedesktop.secrets", "-o",
-                  "/org/freedesktop/secrets/collection/login", "-m", "org.freedesktop.DBus.Properties.Get",
-                  "org.freedesktop.Secret.Collection", "Locked"]
-        self.machine.wait_for(lambda: f"<{str(not unlocked).lower()}>" in login.run(locked).stdout, "the keyring")
+    def log_in(self, unlocked=True, prompter=None, hang=False):
+        login = booted.Session(self.machine, USER)
+        login.start_keyring(PASSWORD, unlocked)
         if prompter:
-            (self.machine.root / "tmp/prompter.py").write_bytes(
-                (Path(__file__).resolve().parents[2] / "support/prompter.py").read_bytes())
-            login.run(["/usr/bin/systemd-run", "--user", "--unit=prompter", "/usr/bin/python3", "-B", "/tmp/prompter.py",
-                       prompter])
-            named = ["gdbus", "call", "--session", "-d", "org.freedesktop.DBus", "-o", "/", "-m",
-                     "org.freedesktop.DBus.NameHasOwner", "org.gnome.keyring.SystemPrompter"]
-            self.machine.wait_for(lambda: "true" in login.run(named).stdout, "the prompter")
-
-    def log_in(self, hang=False, **keyring):
-        login = booted.BootedLogin(self.machine)
-        self.start_keyring(login, **keyring)
+            login.start_script("prompter.py", prompter)
         if hang:
-            login.systemctl("kill", "--signal=STOP", "keyring.service")
-        login.start_session()
+            login.systemctl("kill", "--signal=STOP", "test-keyring.service")
+        login.start_desktop()
         return login
 
     def until_the_starter_has_ended(self, login):
-        self.machine.wait_for(lambda: self.property(login, STARTER, "SubState") == "exited", "the starter's end", 200)
+        booted.wait_for(lambda: self.property(login, STARTER, "SubState") == "exited", "the starter's end", 200)
 
     def property(self, login, unit, name):
         return login.systemctl("show", unit, f"--property={name}", "--value").stdout.strip()
@@ -130,9 +111,9 @@ class Story:
 
     def item(self):
         """The account of the replay item, where there is one."""
-        login = booted.BootedLogin(self.machine)
-        self.start_keyring(login)
-        shown = login.run([TOOL, "replay", "show"])
+        login = booted.Session(self.machine, USER)
+        login.start_keyring(PASSWORD)
+        shown = login.run(["welcomer", "replay", "show"])
         login.end()
         return ACCOUNT in shown.stdout
 
@@ -144,8 +125,8 @@ class NeverUnlocked(Story):
         for hang in (False, False, True, False):
             self.whole_login(hang=hang, unlocked=hang)
         self.item_is_left = self.item()
-        login = booted.BootedLogin(self.machine)
-        login.start_session()
+        login = booted.Session(self.machine, USER)
+        login.start_desktop()
         self.until_the_starter_has_ended(login)
         self.end(login)
 
@@ -156,8 +137,8 @@ class SilentThenOpen(Story):
     def tell(self):
         self.whole_login(unlocked=False, prompter="silent")
         login = self.log_in()
-        self.machine.wait_for(lambda: "delaying exit by two minutes" in self.machine.journal("-t", "wlnimbussetup"),
-                              "the agent's work")
+        booted.wait_for(lambda: "delaying exit by two minutes" in self.machine.journal("-t", "wlnimbussetup"),
+                        "the agent's work")
         self.end(login)
         self.item_is_left = self.item()
         login = self.log_in()
@@ -169,16 +150,16 @@ class WithoutAJournal(Story):
     """The user may read nothing of a journal that is in memory alone."""
 
     def prepare(self):
-        self.machine.add_to("etc/systemd/journald.conf.d", "[Journal]\nStorage=volatile\n", "volatile.conf")
+        self.machine.write("etc/systemd/journald.conf.d/volatile.conf", "[Journal]\nStorage=volatile\n")
 
     def tell(self):
         self.whole_login(unlocked=False)
         self.item_is_left = self.item()
-        self.machine.systemctl("start", "user@0.service")
-        as_system_user = ["/usr/bin/env", "XDG_RUNTIME_DIR=/run/user/0", "/usr/bin/systemctl", "--user"]
-        self.machine.run([*as_system_user, "start", STARTER])
-        self.of_a_system_user = self.machine.run(
-            [*as_system_user, "show", STARTER, "--property=ActiveState,ConditionResult"]).stdout.split()
+        login = booted.Session(self.machine, "root")
+        login.systemctl("start", STARTER)
+        shown = login.systemctl("show", STARTER, "--property=ActiveState,ConditionResult")
+        self.of_a_system_user = shown.stdout.split()
+        login.end()
 
 
 class Otherwise(Story):
@@ -186,18 +167,18 @@ class Otherwise(Story):
 
     def tell(self):
         login = self.log_in(unlocked=False, prompter="silent")
-        self.machine.wait_for(lambda: BEGIN in self.machine.journal("-t", "wlnimbussetup"), "the agent's start")
+        booted.wait_for(lambda: BEGIN in self.machine.journal("-t", "wlnimbussetup"), "the agent's start")
         for line in ("Failed to find replay keychain item: 8", END):  # another program's, under the agent's name
             login.run(["/usr/bin/logger", "-t", "wlnimbussetup", line])
         login.systemctl("kill", "--signal=KILL", UNIT)
         self.until_the_starter_has_ended(login)
         self.end(login)
         self.agent_file.write_bytes(self.definition)
-        os.chown(self.agent_file, machine.UID, machine.UID)
-        login = booted.BootedLogin(self.machine)
-        self.start_keyring(login)
+        self.machine.must(["chown", f"{USER}:{USER}", f"/home/{USER}/Library/LaunchAgents/{LABEL}.plist"])
+        login = booted.Session(self.machine, USER)
+        login.start_keyring(PASSWORD)
         self.tool(login, "replay", "delete")
-        login.start_session()
+        login.start_desktop()
         self.until_the_starter_has_ended(login)
         self.end(login)
 
@@ -212,7 +193,7 @@ class OfferAgainTest(unittest.TestCase):
         seen = story.seen
         self.assertEqual([login["lines"] for login in seen[:4]],
                          [[BEGIN, f"Failed to find replay keychain item: {status}", END] for status in (8, 8, 15, 8)],
-                         story.journal)
+                         story.everything)
         lines = [offered(1, LOCKED), offered(2, LOCKED), offered(3, SILENT),
                  f"Launch agent {LABEL} is not offered once more: {LOCKED}"]
         for number in range(4):
@@ -256,9 +237,8 @@ class OfferAgainTest(unittest.TestCase):
 
 
 if __name__ == "__main__":
-    machine.enter_namespaces()
-    machine.mount("proc", "/proc", "proc")
-    BUILD = sys.argv[1]
+    booted.enter_namespaces()
+    MACHINE, PACKAGES = sys.argv[1], booted.package_files(sys.argv[2])
     kinds = (SilentThenOpen, NeverUnlocked, WithoutAJournal, Otherwise)
     with concurrent.futures.ThreadPoolExecutor(len(kinds)) as pool:
         STORIES.update({kind: pool.submit(lambda each: each().run(), kind) for kind in kinds})

@@ -1,23 +1,54 @@
 #!/usr/bin/env python3
 """The installed unit that puts the stored network configuration to use when a machine starts.
 
-usage: restore_network_test.py BUILD_DIR
+usage: restore_network_test.py MACHINE PACKAGES
+    MACHINE   the minimal system that make_machine.py has made
+    PACKAGES  the folder of the packages that are installed on it
 """
 
 import plistlib
-import shutil
-import subprocess
 import sys
-import tempfile
 import unittest
 from pathlib import Path
 
-sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "support"))
-import booted  # noqa: E402
-import machine  # noqa: E402
+sys.path.insert(0, str(Path(__file__).resolve().parents[1] / "support"))
+import booted_machine as booted  # noqa: E402
 
 UNIT = "welcomer-restore-network.service"
-PROGRAM = "/usr/local/libexec/welcomer-restore-network"
+PROGRAM = "/usr/libexec/welcomer-restore-network"
+# The machine's network devices, which it finds when it starts.
+DEVICES = """[Unit]
+DefaultDependencies=no
+Before=network-pre.target
+
+[Service]
+Type=oneshot
+RemainAfterExit=yes
+ExecStart=ip link add eth7 type veth peer name p-eth7
+ExecStart=ip link add eth8 type veth peer name p-eth8
+ExecStart=ip link set p-eth7 up
+ExecStart=ip link set p-eth8 up
+
+[Install]
+WantedBy=sysinit.target
+"""
+# Whoever has the name is it, as far as anybody else can tell.
+NAME = "org.freedesktop.NetworkManager"
+NAME_OWNER = f"""[Unit]
+After=dbus.socket
+Before={UNIT}
+Requires=dbus.socket
+
+[Service]
+Type=dbus
+BusName={NAME}
+ExecStart=/usr/bin/python3 -c 'import gi; from gi.repository import Gio, GLib; \
+Gio.bus_own_name(Gio.BusType.SYSTEM, "{NAME}", 0, None, None, None); GLib.MainLoop().run()'
+
+[Install]
+WantedBy=multi-user.target
+"""
+NAME_POLICY = f'<busconfig><policy user="root"><allow own="{NAME}"/></policy></busconfig>'
 
 
 def service(device, address=None, enabled=True, router=None, dns=None):
@@ -31,46 +62,49 @@ def service(device, address=None, enabled=True, router=None, dns=None):
 
 
 class RestoreNetwork(unittest.TestCase):
-    build = None
+    base, packages = None, ()
+
+    @classmethod
+    def setUpClass(cls):
+        cls.machine = booted.BootedMachine(cls.base)
+        cls.addClassCleanup(cls.machine.shut_down)
+        cls.machine.boot()
+        cls.machine.install(cls.packages)
+        cls.machine.write("etc/systemd/system/devices.service", DEVICES)
+        cls.machine.must(["systemctl", "enable", "devices.service"])
 
     def setUp(self):
-        self.folder = Path(tempfile.mkdtemp(prefix="restore-network-"))
-        self.addCleanup(shutil.rmtree, self.folder)
-        self.machine = booted.BootedMachine(self.folder / "machine")
-        self.addCleanup(self.machine.stop)
-        self.machine.install(self.build)
         self.resolver = self.machine.root / "etc/resolv.conf"
         self.resolver.write_text("# of the machine\n", encoding="ascii")
-        for device in ("eth7", "eth8"):
-            subprocess.run(["ip", "link", "add", device, "type", "veth", "peer", "name", f"p-{device}"], check=True)
-            self.addCleanup(subprocess.run, ["ip", "link", "delete", device], check=False, capture_output=True)
-            subprocess.run(["ip", "link", "set", f"p-{device}", "up"], check=True)
 
     def boot(self, *services):
-        folder = self.machine.root / "var/lib/welcomer"
-        folder.mkdir(parents=True)
+        stored = self.machine.root / "var/lib/welcomer/network.plist"
+        stored.parent.mkdir(exist_ok=True)
+        stored.unlink(missing_ok=True)
         if services:
-            (folder / "network.plist").write_bytes(plistlib.dumps({
+            stored.write_bytes(plistlib.dumps({
                 "CurrentSet": "automatic", "Sets": {"automatic": {"Services": [each["Device"] for each in services]}},
                 "Services": {each["Device"]: each for each in services}}))
-        done = self.machine.run(["/usr/bin/systemctl", "preset", UNIT])
-        self.assertEqual(done.returncode, 0, done)
-        self.machine.boot()
+        self.earlier = len(self.all_records())  # the kernel's boot stays the same one, to the journal too
+        self.machine.reboot()
 
     def ip(self, *arguments):
-        return subprocess.run(["ip", "-4", *arguments], check=True, capture_output=True, text=True).stdout
+        return self.machine.must(["ip", "-4", *arguments])
 
     def state(self):
-        return self.machine.systemctl("show", UNIT, "--property=ActiveState,Result,ConditionResult").stdout.splitlines()
+        return self.machine.must(["systemctl", "show", UNIT, "--property=ActiveState,Result,ConditionResult"]).splitlines()
+
+    def all_records(self):
+        return self.machine.journal("--identifier=welcomer-restore-network")
 
     def records(self):
-        return self.machine.journal("-t", "welcomer-restore-network")
+        return self.all_records()[self.earlier:]
 
     def test_what_is_stored_and_enabled_is_in_use_after_the_boot(self):
         self.boot(service("eth7", "192.0.2.7", router="192.0.2.1", dns=["192.0.2.53"]),
                   service("eth8", "198.51.100.8", enabled=False))
         self.assertEqual(sorted(self.state()), ["ActiveState=active", "ConditionResult=yes", "Result=success"],
-                         self.machine.journal("-u", UNIT))
+                         self.machine.journal(f"--unit={UNIT}"))
         self.assertIn("inet 192.0.2.7/24 ", self.ip("address", "show", "dev", "eth7"))
         self.assertIn("default via 192.0.2.1 dev eth7", self.ip("route"))
         self.assertIn("nameserver 192.0.2.53\n", self.resolver.read_text())
@@ -92,16 +126,12 @@ class RestoreNetwork(unittest.TestCase):
         self.assertEqual(self.ip("address", "show", "dev", "eth7"), "")
 
     def test_where_networkmanager_runs_it_is_left_to_that(self):
-        # Whoever has the name is it, as far as anybody else can tell.
-        (self.machine.root / "usr/local/lib/systemd/system/name.service").write_text(
-            "[Unit]\nAfter=dbus.socket\nBefore=welcomer-restore-network.service\nRequires=dbus.socket\n"
-            "[Service]\nType=dbus\nBusName=org.freedesktop.NetworkManager\n"
-            "ExecStart=/usr/bin/python3 -c 'import gi; from gi.repository import Gio, GLib; "
-            "Gio.bus_own_name(Gio.BusType.SYSTEM, \"org.freedesktop.NetworkManager\", 0, None, None, None); "
-            "GLib.MainLoop().run()'\n[Install]\nWantedBy=multi-user.target\n", encoding="ascii")
-        self.machine.run(["/usr/bin/systemctl", "enable", "name.service"])
+        self.machine.write("etc/dbus-1/system.d/name.conf", NAME_POLICY)
+        self.machine.write("etc/systemd/system/name.service", NAME_OWNER)
+        self.machine.must(["systemctl", "enable", "name.service"])
+        self.addCleanup(self.machine.must, ["systemctl", "disable", "name.service"])
         self.boot(service("eth7", "192.0.2.7"))
-        self.assertEqual(self.machine.systemctl("is-active", "name.service", check=False).stdout.strip(), "active")
+        self.assertEqual(self.machine.run(["systemctl", "is-active", "name.service"]).stdout.strip(), "active")
         self.assertEqual(sorted(self.state()), ["ActiveState=active", "ConditionResult=yes", "Result=success"])
         self.assertEqual(self.ip("address", "show", "dev", "eth7"), "")
 
@@ -112,7 +142,6 @@ class RestoreNetwork(unittest.TestCase):
 
 
 if __name__ == "__main__":
-    machine.enter_namespaces()
-    machine.mount("proc", "/proc", "proc")
-    RestoreNetwork.build = sys.argv.pop(1)
-    unittest.main(verbosity=2)
+    booted.enter_namespaces()
+    RestoreNetwork.base, RestoreNetwork.packages = sys.argv[1], booted.package_files(sys.argv[2])
+    unittest.main(argv=sys.argv[:1], verbosity=2)
