@@ -9,6 +9,7 @@ import json
 import os
 import signal
 import subprocess
+import sys
 import tempfile
 import time
 from pathlib import Path
@@ -22,6 +23,7 @@ mount --make-rprivate /
 echo $$ >"$2/cgroup.procs"
 exec unshare --cgroup --mount --propagation private sh -ec '
     cd "$1"
+    python=$2 start=$3
     mount -t proc proc proc
     # What it would set there is the kernel, which all machines share.
     mount --bind proc/sys proc/sys
@@ -41,11 +43,21 @@ exec unshare --cgroup --mount --propagation private sh -ec '
     ln -s pts/ptmx dev/ptmx
     ln -s /proc/self/fd dev/fd
     hostname machine
-    mkdir -p mnt
-    pivot_root . mnt
-    umount -l mnt
-    exec env -i container=lxc PATH=/usr/sbin:/usr/bin:/sbin:/bin /lib/systemd/systemd --show-status=no
-' sh "$1"
+    exec env -i container=lxc PATH=/usr/sbin:/usr/bin:/sbin:/bin "$python" -c "$start"
+' sh "$1" "$3" "$4"
+"""
+# The folder that it is in becomes the root of the mount namespace, which in a chroot lies outside of it: whoever enters the
+# machine is to be in there, and in a chroot nobody could make a user namespace.
+START = """
+import ctypes, os
+library = ctypes.CDLL(None, use_errno=True)
+here, outside = os.open(".", os.O_RDONLY), os.open("/proc/self/ns/mnt", os.O_RDONLY)
+assert library.setns(outside, 0x20000) == 0, os.strerror(ctypes.get_errno())
+os.fchdir(here)
+assert library.mount(b".", b"/", None, 0x2000, None) == 0, os.strerror(ctypes.get_errno())
+os.chroot(".")
+os.closerange(3, 20)
+os.execv("/lib/systemd/systemd", ["/lib/systemd/systemd", "--show-status=no"])
 """
 
 # A target that brings the desktop's own up, as a desktop's session does.
@@ -105,7 +117,7 @@ class BootedMachine:
         with open(self._folder / "console", "ab") as console:
             self._process = subprocess.Popen(
                 ["unshare", "--mount", "--pid", "--net", "--uts", "--ipc", "--fork", "--kill-child", "sh", "-c", BOOT, "sh",
-                 str(self.root), str(self._cgroup)],
+                 str(self.root), str(self._cgroup), sys.executable, START],
                 stdin=subprocess.DEVNULL, stdout=console, stderr=console)
         children = Path(f"/proc/{self._process.pid}/task/{self._process.pid}/children")
         wait_for(lambda: self._alive() and children.read_text().split(), "the machine's first process")
