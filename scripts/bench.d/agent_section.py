@@ -14,9 +14,10 @@ import figures
 import plugins_section
 
 TOP = Path(__file__).resolve().parents[2]
-AGENT = "/usr/libexec/wlnimbussetup"
-TOOL = "/usr/bin/welcomer"
-BUNDLE = "/usr/share/welcomer/setup-bundle"
+AGENT = "/usr/local/libexec/wlnimbussetup"
+TOOL = "/usr/local/bin/welcomer"
+LIBRARIES = "/usr/local/lib"
+BUNDLE = "/usr/local/share/welcomer/setup-bundle"
 
 
 def measure(build, tables):
@@ -24,14 +25,6 @@ def measure(build, tables):
     result = subprocess.run([sys.executable, __file__, str(build)], check=True, stdout=subprocess.PIPE, text=True)
     for kind, arguments in json.loads(result.stdout):
         getattr(tables, kind)(*arguments)
-
-
-def packages_of(build):
-    """The packages with programs and what they need, which are built where they are not there yet."""
-    folder = build / "packages"
-    subprocess.run([sys.executable, "-B", TOP / "tests/packages/build_packages.py", folder], check=True, stdout=sys.stderr)
-    names = ("libwelcomer0", "welcomer", "welcomer-desktop")
-    return [next(folder.glob(f"{name}_*.deb")) for name in names]
 
 
 def status_field(status, field):
@@ -47,13 +40,14 @@ def replay_with(delegates, filler=0):
 
 
 class BenchMachine:
-    """A root folder with what the packages hold and a real system log."""
+    """A root folder with the installed programs and a real system log."""
 
     def __init__(self, build, folder, plugin_count=0):
         import machine
 
         self.machine = machine.Machine(folder)
-        self._unpack(packages_of(build))
+        self.machine.install(build)
+        self._use_loader_cache()
         for name in ("empty-program", "process-pair"):
             shutil.copy(build / "bench" / name, self.machine.root / "tmp" / name)
         if plugin_count:
@@ -61,18 +55,11 @@ class BenchMachine:
         self.machine.start_system_log()
         self.session = []  # what makes a command one of the user's session, if there is one
 
-    def _unpack(self, packages):
-        """The packages' files over the machine's own, and the loader's knowledge of their libraries."""
-        import machine
-
-        unpacked, work = (self.machine.root / "unpacked" / name for name in ("files", "work"))
-        for folder in (unpacked, work):
-            folder.mkdir(parents=True)
-        for package in packages:
-            subprocess.run(["dpkg-deb", "--extract", package, unpacked], check=True)
-        machine.mount("overlay", self.machine.root / "usr", "overlay", 0,
-                      f"lowerdir=/usr,upperdir={unpacked}/usr,workdir={work}")
-        subprocess.run(["ldconfig", "-r", self.machine.root], check=True)
+    def _use_loader_cache(self):
+        """As the packages have it: the loader's cache knows the library, and no program looks for it beside itself."""
+        for program in (AGENT, TOOL):
+            subprocess.run(["patchelf", "--remove-rpath", self.machine.root / program[1:]], check=True)
+        subprocess.run(["ldconfig", "-r", self.machine.root, LIBRARIES], check=True)
 
     def store(self, replay):
         path = self.machine.root / "tmp" / "replay.plist"
