@@ -3,8 +3,11 @@
 import concurrent.futures
 import configparser
 import json
+import os
 import plistlib
+import signal
 import time
+from pathlib import Path
 
 import booted_machine as booted
 
@@ -99,12 +102,11 @@ class Newcomer:
         session = booted.Session(self.machine, self.name)
         self.story.prepare_login(session)
         session.start_desktop()
-        started = time.monotonic()
         shown = session.systemctl("show", UNIT, "--property=MainPID,SubState").stdout
         self.seen = dict(line.split("=", 1) for line in shown.splitlines())
         self.story.meanwhile(self, session)
         booted.wait_for(lambda: self.texts()[-1:] == ["exiting"], "the agent's end", seconds=400)
-        self.seconds = time.monotonic() - started
+        self.seconds = self.machine.seconds_between_records("wlnimbussetup", self.name)
         booted.wait_for(lambda: "running" not in self.agent_units(session), "the end of the agent's unit")
         self.ended = [session.systemctl("show", UNIT, f"--property={name}", "--value").stdout.strip()
                       for name in ("SubState", "Result", "ExecMainStatus")]
@@ -256,8 +258,33 @@ class BusDies(Story):
 
     delays = {"com.corvid.chatter": 8, "com.corvid.deskmate": 8}
 
+    def prepare_login(self, session):
+        super().prepare_login(session)
+        # The agent is stopped as soon as it works, so that nothing is a matter of how fast this test is.
+        self.stopper = concurrent.futures.ThreadPoolExecutor(1).submit(self._stop_agent_at_work)
+
+    def _stop_agent_at_work(self):
+        def works():
+            agent = self.machine.process_of("wlnimbussetup")
+            try:
+                return agent if agent and "/Deskmate.ncdplugin" in Path(f"/proc/{agent}/maps").read_text() else None
+            except OSError:
+                return None  # it has ended
+
+        end = time.monotonic() + 120
+        while not (agent := works()):
+            if time.monotonic() > end:
+                raise TimeoutError("waited for an agent that has loaded its plug-ins")
+            time.sleep(0.005)
+        os.kill(agent, signal.SIGSTOP)
+        return agent
+
     def meanwhile(self, newcomer, session):
-        booted.wait_for(lambda: "setting up com.corvid.deskmate" in newcomer.texts(), "the plug-ins' start")
+        agent = self.stopper.result()
+        while "setting up com.corvid.deskmate" not in newcomer.texts():
+            os.kill(agent, signal.SIGCONT)
+            time.sleep(0.05)
+            os.kill(agent, signal.SIGSTOP)
         process = session.systemctl("show", "dbus.service", "--property=MainPID", "--value").stdout.strip()
         bus_runs = lambda: self.machine.run(["test", "-e", f"/proc/{process}"]).returncode == 0
         self.bus_ran = bus_runs()
@@ -265,6 +292,7 @@ class BusDies(Story):
         # With the socket goes the bus; the socket alone would start another one.
         session.systemctl("stop", "dbus.socket")
         booted.wait_for(lambda: not bus_runs(), "the end of the bus")
+        os.kill(agent, signal.SIGCONT)
 
     def look_afterwards(self, newcomer):
         accounts = plistlib.loads((newcomer.home / "Library/Accounts/Accounts.plist").read_bytes())["Accounts"]

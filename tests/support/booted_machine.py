@@ -169,12 +169,31 @@ class BootedMachine:
         """An ordinary user with a home folder."""
         self.must(["useradd", "--create-home", "--shell", "/bin/sh", name])
 
-    def records(self, program, user=None):
-        """The journal's records of one program so far, in their order: (facility, priority, text)."""
+    def _entries(self, program, user):
         match = [f"_UID={self.user_id(user)}"] if user else []
         lines = self.must(["journalctl", "--quiet", "--output=json", f"SYSLOG_IDENTIFIER={program}", *match]).splitlines()
-        found = map(json.loads, lines)
-        return [(int(record["SYSLOG_FACILITY"]), int(record["PRIORITY"]), record["MESSAGE"]) for record in found]
+        return list(map(json.loads, lines))
+
+    def records(self, program, user=None):
+        """The journal's records of one program so far, in their order: (facility, priority, text)."""
+        return [(int(entry["SYSLOG_FACILITY"]), int(entry["PRIORITY"]), entry["MESSAGE"])
+                for entry in self._entries(program, user)]
+
+    def seconds_between_records(self, program, user=None):
+        """How long it took one program from its first record in the journal to its last one so far."""
+        times = [int(entry["__MONOTONIC_TIMESTAMP"]) for entry in self._entries(program, user)]
+        return (times[-1] - times[0]) / 1e6
+
+    def process_of(self, program):
+        """The number that a process of the machine which runs a program has here, or None."""
+        for processes in self._cgroup.rglob("cgroup.procs"):
+            for number in processes.read_text().split():
+                try:
+                    if os.readlink(f"/proc/{number}/exe").endswith(f"/{program}"):
+                        return int(number)
+                except OSError:
+                    pass  # it has ended
+        return None
 
     def user_id(self, name):
         return int(self.must(["id", "-u", name]))
