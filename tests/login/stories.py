@@ -265,26 +265,23 @@ class BusDies(Story):
 
     def _stop_agent_at_work(self):
         def works():
-            agent = self.machine.process_of("wlnimbussetup")
-            try:
-                return agent if agent and "/Deskmate.ncdplugin" in Path(f"/proc/{agent}/maps").read_text() else None
-            except OSError:
-                return None  # it has ended
+            self.agent = self.machine.process_of("wlnimbussetup")
+            return self.agent and "/Deskmate.ncdplugin" in Path(f"/proc/{self.agent}/maps").read_text()
 
-        end = time.monotonic() + 120
-        while not (agent := works()):
-            if time.monotonic() > end:
-                raise TimeoutError("waited for an agent that has loaded its plug-ins")
-            time.sleep(0.005)
-        os.kill(agent, signal.SIGSTOP)
-        return agent
+        booted.wait_for(works, "an agent that has loaded its plug-ins", 120, between=0.005)
+        os.kill(self.agent, signal.SIGSTOP)
+
+    def _has_begun_with_deskmate(self, newcomer):
+        if "setting up com.corvid.deskmate" in newcomer.texts():
+            return True
+        os.kill(self.agent, signal.SIGCONT)
+        time.sleep(0.05)
+        os.kill(self.agent, signal.SIGSTOP)
+        return False
 
     def meanwhile(self, newcomer, session):
-        agent = self.stopper.result()
-        while "setting up com.corvid.deskmate" not in newcomer.texts():
-            os.kill(agent, signal.SIGCONT)
-            time.sleep(0.05)
-            os.kill(agent, signal.SIGSTOP)
+        self.stopper.result()
+        booted.wait_for(lambda: self._has_begun_with_deskmate(newcomer), "the plug-ins' start")
         process = session.systemctl("show", "dbus.service", "--property=MainPID", "--value").stdout.strip()
         bus_runs = lambda: self.machine.run(["test", "-e", f"/proc/{process}"]).returncode == 0
         self.bus_ran = bus_runs()
@@ -292,7 +289,7 @@ class BusDies(Story):
         # With the socket goes the bus; the socket alone would start another one.
         session.systemctl("stop", "dbus.socket")
         booted.wait_for(lambda: not bus_runs(), "the end of the bus")
-        os.kill(agent, signal.SIGCONT)
+        os.kill(self.agent, signal.SIGCONT)
 
     def look_afterwards(self, newcomer):
         accounts = plistlib.loads((newcomer.home / "Library/Accounts/Accounts.plist").read_bytes())["Accounts"]

@@ -77,13 +77,13 @@ def package_files(folder):
     return sorted(path for path in Path(folder).glob("*.deb") if "-dbgsym_" not in path.name)
 
 
-def wait_for(condition, what, seconds=60):
-    """Waits until something is so. Asking costs a process on the machine: not too often."""
+def wait_for(condition, what, seconds=60, between=0.2):
+    """Waits until something is so. Asking mostly costs a process on the machine: not too often."""
     end = time.monotonic() + seconds
     while not condition():
         if time.monotonic() > end:
             raise TimeoutError(f"waited {seconds} seconds for {what}")
-        time.sleep(0.2)
+        time.sleep(between)
 
 
 class BootedMachine:
@@ -186,13 +186,13 @@ class BootedMachine:
 
     def process_of(self, program):
         """The number that a process of the machine which runs a program has here, or None."""
-        for processes in self._cgroup.rglob("cgroup.procs"):
-            for number in processes.read_text().split():
-                try:
+        for folder, _, _ in os.walk(self._cgroup):
+            try:
+                for number in Path(folder, "cgroup.procs").read_text().split():
                     if os.readlink(f"/proc/{number}/exe").endswith(f"/{program}"):
                         return int(number)
-                except OSError:
-                    pass  # it has ended
+            except OSError:
+                pass  # the process or the whole cgroup has ended
         return None
 
     def user_id(self, name):
