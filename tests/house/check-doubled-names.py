@@ -7,23 +7,18 @@ Of two tests with one name, only the second one runs. Prints one line per findin
 """
 
 import ast
-import os
 import sys
-from pathlib import Path
+
+import house
 
 DEFINITIONS = (ast.FunctionDef, ast.AsyncFunctionDef, ast.ClassDef)
 
 
-def python_files(tree):
-    for folder, folders, names in os.walk(tree):
-        folders[:] = [name for name in folders if not name.startswith((".", "build", "_build"))]
-        for path in (Path(folder, name) for name in names):
-            if path.suffix == ".py":
-                yield path
-            elif not path.suffix and path.is_file():
-                with path.open("rb") as file:
-                    if file.readline().startswith(b"#!/usr/bin/env python3"):
-                        yield path
+def is_python(path):
+    if path.suffix or not path.is_file():
+        return path.suffix == ".py"
+    with path.open("rb") as file:
+        return file.readline().startswith(b"#!/usr/bin/env python3")
 
 
 def adds_to_another(definition):
@@ -46,16 +41,10 @@ def doubled_names(tree):
 
 
 def findings(tree):
-    for path in sorted(python_files(tree)):
+    for path in filter(is_python, house.files(tree)):
         for line, name in doubled_names(ast.parse(path.read_bytes())):
             yield f"{path.relative_to(tree).as_posix()}:{line}: another {name} stands above it, and is hidden"
 
 
-def main():
-    found = list(findings(Path(sys.argv[1] if len(sys.argv) > 1 else ".")))
-    print("\n".join(found) if found else "no name hides another one")
-    return 1 if found else 0
-
-
 if __name__ == "__main__":
-    sys.exit(main())
+    sys.exit(house.report(findings, "no name hides another one"))

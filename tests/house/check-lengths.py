@@ -7,23 +7,14 @@ Prints one line per finding and exits 1 when there is any. A function is known b
 line is a brace alone, and its first one the nearest line above that stands as far to the left.
 """
 
-import os
 import re
 import sys
-from pathlib import Path
+
+import house
 
 FILE_LINES = 400
 FUNCTION_LINES = 50
 SUFFIXES = {".c", ".cpp", ".h", ".hpp", ".py"}
-
-
-def source_files(tree):
-    for folder, folders, names in os.walk(tree):
-        folders[:] = [name for name in folders if not name.startswith((".", "build", "_build"))]
-        for name in names:
-            path = Path(folder, name)
-            if path.suffix in SUFFIXES:
-                yield path
 
 
 def indentation(line):
@@ -48,7 +39,9 @@ def long_functions(lines):
 
 
 def findings(tree):
-    for path in sorted(source_files(tree)):
+    for path in house.files(tree):
+        if path.suffix not in SUFFIXES:
+            continue
         name = path.relative_to(tree).as_posix()
         lines = path.read_text(encoding="utf-8").splitlines()
         if len(lines) > FILE_LINES:
@@ -58,11 +51,5 @@ def findings(tree):
                 yield f"{name}:{begin + 1}: a function of {count} lines, of at most {FUNCTION_LINES}"
 
 
-def main():
-    found = list(findings(Path(sys.argv[1] if len(sys.argv) > 1 else ".")))
-    print("\n".join(found) if found else "no file and no function is too long")
-    return 1 if found else 0
-
-
 if __name__ == "__main__":
-    sys.exit(main())
+    sys.exit(house.report(findings, "no file and no function is too long"))

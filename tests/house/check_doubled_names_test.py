@@ -1,24 +1,16 @@
 #!/usr/bin/env python3
 """The check of doubled names finds what it is there to find."""
 
-import importlib.util
-import tempfile
 import unittest
-from pathlib import Path
 
-HERE = Path(__file__).resolve().parent
-loader = importlib.util.spec_from_file_location("check_doubled_names", HERE / "check-doubled-names.py")
-check_doubled_names = importlib.util.module_from_spec(loader)
-loader.loader.exec_module(check_doubled_names)
+import house
+
+check_doubled_names = house.load("check-doubled-names")
 
 
 class CheckDoubledNames(unittest.TestCase):
     def findings(self, text, name="a_test.py"):
-        with tempfile.TemporaryDirectory() as folder:
-            path = Path(folder, name)
-            path.parent.mkdir(parents=True, exist_ok=True)
-            path.write_text(text, encoding="utf-8")
-            return list(check_doubled_names.findings(Path(folder)))
+        return house.findings_in(check_doubled_names.findings, {name: text})
 
     def test_a_test_that_hides_another_is_found(self):
         text = "class A:\n    def test_b(self):\n        pass\n\n    def test_b(self):\n        pass\n"

@@ -1,26 +1,16 @@
 #!/usr/bin/env python3
 """The layer check finds what it is there to find."""
 
-import importlib.util
-import tempfile
 import unittest
-from pathlib import Path
 
-HERE = Path(__file__).resolve().parent
-loader = importlib.util.spec_from_file_location("check_layers", HERE / "check-layers.py")
-check_layers = importlib.util.module_from_spec(loader)
-loader.loader.exec_module(check_layers)
+import house
+
+check_layers = house.load("check-layers")
 
 
 class CheckLayers(unittest.TestCase):
     def findings(self, files):
-        with tempfile.TemporaryDirectory() as folder:
-            tree = Path(folder)
-            for name, text in files.items():
-                path = tree / name
-                path.parent.mkdir(parents=True, exist_ok=True)
-                path.write_text(text, encoding="utf-8")
-            return check_layers.check(tree)[0]
+        return house.findings_in(lambda tree: check_layers.check(tree)[0], files)
 
     def assert_one(self, files, text):
         findings = self.findings(files)

@@ -1,24 +1,16 @@
 #!/usr/bin/env python3
 """The check of lengths finds what it is there to find."""
 
-import importlib.util
-import tempfile
 import unittest
-from pathlib import Path
 
-HERE = Path(__file__).resolve().parent
-loader = importlib.util.spec_from_file_location("check_lengths", HERE / "check-lengths.py")
-check_lengths = importlib.util.module_from_spec(loader)
-loader.loader.exec_module(check_lengths)
+import house
+
+check_lengths = house.load("check-lengths")
 
 
 class CheckLengths(unittest.TestCase):
     def findings(self, name, text):
-        with tempfile.TemporaryDirectory() as folder:
-            path = Path(folder, name)
-            path.parent.mkdir(parents=True, exist_ok=True)
-            path.write_text(text, encoding="utf-8")
-            return list(check_lengths.findings(Path(folder)))
+        return house.findings_in(check_lengths.findings, {name: text})
 
     def test_a_file_of_400_lines_is_not_too_long(self):
         for name in ("log/A.cpp", "tests/a_test.py"):
