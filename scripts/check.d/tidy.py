@@ -9,6 +9,7 @@ file for each, in the user's cache.
 """
 
 import concurrent.futures
+import functools
 import hashlib
 import json
 import os
@@ -42,11 +43,9 @@ def dependencies(folder, arguments):
     return [Path(folder) / name for name in shlex.split(done.stdout.replace("\\\n", " "))[1:]]
 
 
-def digest_of(path, known={}):
-    """Of a file's bytes. Most headers are those of many sources."""
-    if path not in known:
-        known[path] = hashlib.sha256(path.read_bytes()).digest()
-    return known[path]
+@functools.cache  # most headers are those of many sources
+def digest_of(path):
+    return hashlib.sha256(path.read_bytes()).digest()
 
 
 def key_of(command, surroundings):
@@ -62,7 +61,7 @@ def key_of(command, surroundings):
 
 
 def look_at(path, build, command, surroundings):
-    """What clang-tidy has to say; nothing about what is clean."""
+    """What clang-tidy has to say: nothing about what is clean; None where it was not asked."""
     key = key_of(command, surroundings)
     mark = key and CLEAN / key
     if mark and mark.exists():
@@ -70,8 +69,8 @@ def look_at(path, build, command, surroundings):
         return None
     done = subprocess.run([TIDY, "-p", build, "--quiet", *SHALLOW, path], capture_output=True, text=True)
     if done.returncode != 0:
-        return done.stdout + done.stderr
-    if mark and not done.stdout.strip():
+        return f"{path}: {TIDY} ended with {done.returncode}\n{done.stdout}{done.stderr}"
+    if mark and not done.stdout:
         mark.touch()
     return done.stdout
 
@@ -89,7 +88,7 @@ def main():
     with concurrent.futures.ThreadPoolExecutor(os.cpu_count()) as pool:
         for said in pool.map(lambda path: look_at(path, build, known.get(path), surroundings), files):
             looked += said is not None
-            if said and said.strip():
+            if said:
                 failed += 1
                 print(said, flush=True)
     print(f"tidy: {len(files)} files, {looked} of them looked at, {failed} with findings")
