@@ -1,6 +1,5 @@
 #include "backends/bus/BusCall.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <cstdarg>
 #include <system_error>
@@ -10,22 +9,28 @@ namespace welcomer::bus {
 
 namespace {
 
-using std::chrono::microseconds;
+using std::chrono::nanoseconds;
+
+// As sd-bus takes a limit, for which 0 is none.
+std::uint64_t wholeMicroseconds(nanoseconds limit) {
+    const auto count = std::chrono::ceil<std::chrono::microseconds>(limit).count();
+    return count > 0 ? static_cast<std::uint64_t>(count) : 1;
+}
 
 platform::Error errorOf(int result) {
     return {-result, std::generic_category().message(-result)};
 }
 
 // Waits until a bus has let us in: a call would wait for that without a limit.
-int waitUntilReady(sd_bus* bus, microseconds limit) {
+int waitUntilReady(sd_bus* bus, nanoseconds limit) {
     using std::chrono::steady_clock;
     const auto end = steady_clock::now() + limit;
     int result = 0;
     while ((result = sd_bus_is_ready(bus)) == 0) {
         result = sd_bus_process(bus, nullptr);
         if (result == 0) {
-            const auto left = std::chrono::duration_cast<microseconds>(end - steady_clock::now()).count();
-            result = left <= 0 ? -ETIMEDOUT : sd_bus_wait(bus, static_cast<std::uint64_t>(left));
+            const nanoseconds left = end - steady_clock::now();
+            result = left <= nanoseconds(0) ? -ETIMEDOUT : sd_bus_wait(bus, wholeMicroseconds(left));
         }
         if (result < 0) {
             break;
@@ -36,7 +41,7 @@ int waitUntilReady(sd_bus* bus, microseconds limit) {
 
 //  result  of opening it
 //  opened  owned; null where that has failed
-Bus whenReady(int result, sd_bus* opened, microseconds limit, platform::Error* why) {
+Bus whenReady(int result, sd_bus* opened, nanoseconds limit, platform::Error* why) {
     Bus bus(opened);
     result = result < 0 ? result : waitUntilReady(opened, limit);
     if (result >= 0) {
@@ -79,19 +84,19 @@ void DropMessage::operator()(sd_bus_message* message) const {
     sd_bus_message_unref(message);
 }
 
-Bus openSessionBus(microseconds limit, platform::Error* why) {
+Bus openSessionBus(nanoseconds limit, platform::Error* why) {
     sd_bus* bus = nullptr;
     const int result = sd_bus_open_user(&bus);
     return whenReady(result, bus, limit, why);
 }
 
-Bus openSystemBus(microseconds limit, platform::Error* why) {
+Bus openSystemBus(nanoseconds limit, platform::Error* why) {
     sd_bus* bus = nullptr;
     const int result = sd_bus_open_system(&bus);
     return whenReady(result, bus, limit, why);
 }
 
-Bus openBusAt(const std::string& address, microseconds limit, platform::Error* why) {
+Bus openBusAt(const std::string& address, nanoseconds limit, platform::Error* why) {
     sd_bus* bus = nullptr;
     int result = sd_bus_new(&bus);
     result = result < 0 ? result : sd_bus_set_address(bus, address.c_str());
@@ -102,7 +107,7 @@ Bus openBusAt(const std::string& address, microseconds limit, platform::Error* w
 
 Call::Call(sd_bus* bus, const Peer& peer, const char* method)
     : _bus(bus),
-      _microseconds(static_cast<std::uint64_t>(std::max(peer.limit, microseconds(1)).count())) { // 0: its own
+      _microseconds(wholeMicroseconds(peer.limit)) {
     sd_bus_message* made = nullptr;
     _result = sd_bus_message_new_method_call(bus, &made, peer.name, peer.path, peer.interface, method);
     _message.reset(made);
@@ -161,10 +166,9 @@ platform::Outcome Call::send(Message* answer) {
 }
 
 bool isRunning(sd_bus* bus, const Peer& peer, platform::Error* why) {
-    const Peer busItself = {"org.freedesktop.DBus", "/org/freedesktop/DBus", "org.freedesktop.DBus",
-                            peer.limit};
     Message answer;
-    const platform::Outcome asked = Call(bus, busItself, "NameHasOwner").append("s", peer.name).send(&answer);
+    const platform::Outcome asked =
+        Call(bus, kBusPeer.within(peer.limit), "NameHasOwner").append("s", peer.name).send(&answer);
     if (!asked && why) {
         *why = asked.error;
     }

@@ -2,6 +2,7 @@
 
 #pragma once
 
+#include "backends/bus/Peer.h"
 #include "platform/Error.h"
 
 #include <chrono>
@@ -15,14 +16,6 @@ struct sd_bus;
 struct sd_bus_message;
 
 namespace welcomer::bus {
-
-// A service's object on a bus, as every call takes it.
-struct Peer {
-    const char* name;
-    const char* path;
-    const char* interface;
-    std::chrono::microseconds limit; // how long each call may take
-};
 
 struct CloseBus {
     void operator()(sd_bus* bus) const;
@@ -40,9 +33,9 @@ using Message = std::unique_ptr<sd_bus_message, DropMessage>;
 //  why     receives the error's number and text where there is none; may be null
 //  result  null where there is none
 // One thread for each bus, as for all that is done on it.
-Bus openSessionBus(std::chrono::microseconds limit, platform::Error* why = nullptr);
-Bus openSystemBus(std::chrono::microseconds limit, platform::Error* why = nullptr);
-Bus openBusAt(const std::string& address, std::chrono::microseconds limit, platform::Error* why = nullptr);
+Bus openSessionBus(std::chrono::nanoseconds limit, platform::Error* why = nullptr);
+Bus openSystemBus(std::chrono::nanoseconds limit, platform::Error* why = nullptr);
+Bus openBusAt(const std::string& address, std::chrono::nanoseconds limit, platform::Error* why = nullptr);
 
 // One call of a method. Starts nobody. Its arguments are added in their order; what cannot be added is told
 // when the call is sent.

@@ -45,8 +45,7 @@ bool waitUntil(sd_bus* bus, const std::function<bool()>& holds,
 bus::Message propertyOf(sd_bus* bus, const std::string& unit, const char* property,
                         const char* interface = "org.freedesktop.systemd1.Unit") {
     bus::Message answer;
-    const bus::Peer peer = {kUserManager.name, unit.c_str(), "org.freedesktop.DBus.Properties",
-                            kUserManager.limit};
+    const bus::Peer peer = kUserManager.at(unit.c_str()).as("org.freedesktop.DBus.Properties");
     const platform::Outcome asked =
         bus::Call(bus, peer, "Get").append("ss", interface, property).send(&answer);
     return asked ? std::move(answer) : nullptr;

@@ -13,8 +13,7 @@ namespace {
 // Whoever does not run it resolves names in another way, and is to go on doing so: no call starts it.
 constexpr bus::Peer kResolver = {"org.freedesktop.resolve1", "/org/freedesktop/resolve1",
                                  "org.freedesktop.resolve1.Manager", std::chrono::seconds(25)};
-constexpr bus::Peer kIntrospection = {kResolver.name, kResolver.path, "org.freedesktop.DBus.Introspectable",
-                                      kResolver.limit};
+constexpr bus::Peer kIntrospection = kResolver.as("org.freedesktop.DBus.Introspectable");
 constexpr bus::Peer kServiceManager = {"org.freedesktop.systemd1", "/org/freedesktop/systemd1",
                                        "org.freedesktop.systemd1.Manager", std::chrono::seconds(25)};
 

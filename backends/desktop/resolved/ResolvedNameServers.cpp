@@ -33,9 +33,7 @@ void append(bus::Call& call, const std::string& server) {
 
 //  end  when the answer has to be there
 bus::Call setLinkDNS(sd_bus* bus, Clock::time_point end, int link, const std::vector<std::string>& servers) {
-    bus::Peer resolver = kResolver;
-    resolver.limit = std::chrono::duration_cast<std::chrono::microseconds>(end - Clock::now());
-    bus::Call call(bus, resolver, "SetLinkDNS");
+    bus::Call call(bus, kResolver.within(end - Clock::now()), "SetLinkDNS");
     call.append("i", link).open('a', "(iay)");
     for (const std::string& server : servers) {
         append(call, server);

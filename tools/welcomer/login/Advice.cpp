@@ -12,6 +12,9 @@ namespace welcomer::tool {
 
 namespace {
 
+// In an advice, behind a command that can be given for another user.
+constexpr std::string_view kUser = "{user}";
+
 // Why the last login has left the item where it is; empty where it did not say so.
 std::string whyItStayed(const std::optional<LoginRecord>& record) {
     return record && record->itemStatus() && *record->itemStatus() != platform::kCredentialItemNotFound
@@ -22,15 +25,15 @@ std::string whyItStayed(const std::optional<LoginRecord>& record) {
 void judgeWaiting(std::vector<ToDo>& found, const WaitingSetup& waiting,
                   const std::optional<LoginRecord>& record) {
     const std::string both =
-        "welcomer replay arm installs the agent; welcomer setup --cancel gives the setup up";
+        "welcomer replay arm{user} installs the agent; welcomer setup --cancel{user} gives the setup up";
     if (waiting.hasItem() && !waiting.hasAgent) {
         found.push_back({"an item waits, but no agent will start for it" + whyItStayed(record), both});
     } else if (waiting.hasAgent && !waiting.agentProblem.empty()) {
         found.push_back({"the agent's file starts no agent: " + waiting.agentProblem,
-                         waiting.hasItem() ? both : "welcomer setup --cancel removes it"});
+                         waiting.hasItem() ? both : "welcomer setup --cancel{user} removes it"});
     } else if (waiting.hasAgent && waiting.itemStatus == platform::kCredentialItemNotFound) {
         found.push_back({"the agent will start, but there is no item for it",
-                         "welcomer setup --cancel removes the agent's file"});
+                         "welcomer setup --cancel{user} removes the agent's file"});
     }
     if (!waiting.hasItem() && waiting.itemStatus != platform::kCredentialItemNotFound) {
         found.push_back(
@@ -42,11 +45,11 @@ void judgeWaiting(std::vector<ToDo>& found, const WaitingSetup& waiting,
 // What can be done about a failure that the agent logged.
 std::string adviceOn(std::string_view failure) {
     constexpr std::array<std::pair<std::string_view, const char*>, 7> kAdvice{
-        {{agenttext::kItemUnreadable, "welcomer setup --cancel removes the item; then set up again"},
-         {agenttext::kItemStays,
-          "welcomer replay show says whether it is still there, welcomer replay delete removes it"},
+        {{agenttext::kItemUnreadable, "welcomer setup --cancel{user} removes the item; then set up again"},
+         {agenttext::kItemStays, "welcomer replay show{user} says whether it is still there, welcomer replay "
+                                 "delete{user} removes it"},
          {agenttext::kNoAccount,
-          "welcomer account list shows the accounts; sign in, then welcomer services enable"},
+          "welcomer account list{user} shows the accounts; sign in, then welcomer services enable{user}"},
          {agenttext::kNotKilled, "install the program killall (Debian's package psmisc)"},
          {agenttext::kFileStays, "see who may write to the folder Library/LaunchAgents in the home folder"},
          {agenttext::kPluginRefused, "welcomer plugins list shows its file; ask who makes it"},
@@ -56,7 +59,7 @@ std::string adviceOn(std::string_view failure) {
             return advice;
         }
     }
-    return "welcomer log shows what came before it";
+    return "welcomer log{user} shows what came before it";
 }
 
 void judgeDelegates(std::vector<ToDo>& found, const LoginRecord& record, bool isRunning) {
@@ -74,9 +77,10 @@ void judgeServices(std::vector<ToDo>& found, const LoginRecord& record, bool isR
     using Kind = ServiceOutcome::Kind;
     for (const ServiceOutcome& service : record.services()) {
         if (service.kind == Kind::Refused || (service.kind == Kind::PutOff && !isRunning)) {
-            found.push_back({service.identifier + ": " + service.text(),
-                             "welcomer account services shows whether it can be enabled by now, welcomer "
-                             "services enable --phase post enables it"});
+            found.push_back(
+                {service.identifier + ": " + service.text(),
+                 "welcomer account services{user} shows whether it can be enabled by now, welcomer "
+                 "services enable{user} --phase post enables it"});
         }
     }
 }
@@ -93,15 +97,12 @@ void judgeEnd(std::vector<ToDo>& found, const LoginRecord& record) {
     }
 }
 
-// The commands of an advice, to be given for another user.
+// An advice with its commands for whoever is asked for.
 std::string adviceFor(const std::string& user, std::string advice) {
-    for (const std::string command :
-         {"welcomer replay arm", "welcomer replay show", "welcomer replay delete", "welcomer setup --cancel",
-          "welcomer account list", "welcomer account services", "welcomer services enable", "welcomer log"}) {
-        for (std::size_t at = advice.find(command); at != std::string::npos;
-             at = advice.find(command, at + command.size())) {
-            advice.insert(at + command.size(), " --user " + user);
-        }
+    const std::string option = user.empty() ? "" : " --user " + user;
+    for (std::size_t at = advice.find(kUser); at != std::string::npos;
+         at = advice.find(kUser, at + option.size())) {
+        advice.replace(at, kUser.size(), option);
     }
     return advice;
 }
@@ -139,7 +140,7 @@ std::vector<ToDo> whatIsToDo(const WaitingSetup& waiting, const std::optional<Lo
                              const std::string& user) {
     std::vector<ToDo> found = judge(waiting, login, isRunning);
     for (ToDo& each : found) {
-        each.advice = user.empty() ? each.advice : adviceFor(user, each.advice);
+        each.advice = adviceFor(user, each.advice);
     }
     return found;
 }
