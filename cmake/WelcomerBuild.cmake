@@ -19,8 +19,9 @@ if(NOT CMAKE_BUILD_TYPE AND NOT CMAKE_CONFIGURATION_TYPES)
 endif()
 
 # A second build of the same sources costs little where ccache is installed, whatever folder they lie in then: what is built
-# names its sources from their top.
-add_compile_options("-ffile-prefix-map=${CMAKE_SOURCE_DIR}=.")
+# names its sources as a build folder inside of them does. That is what ccache calls them, too, so that what is built with it
+# and without is the same.
+add_compile_options("-ffile-prefix-map=${CMAKE_SOURCE_DIR}=..")
 find_program(WELCOMER_CCACHE ccache)
 if(WELCOMER_CCACHE AND NOT CMAKE_CXX_COMPILER_LAUNCHER)
     # Precompiled headers are cached, too, once these are no reason against it.

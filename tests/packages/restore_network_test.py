@@ -48,6 +48,13 @@ Gio.bus_own_name(Gio.BusType.SYSTEM, "{NAME}", 0, None, None, None); GLib.MainLo
 [Install]
 WantedBy=multi-user.target
 """
+# Takes connections, and answers none: accepted ones wait in the kernel.
+SILENT_BUS = """import socket, sys, time
+listener = socket.socket(socket.AF_UNIX)
+listener.bind(sys.argv[1])
+listener.listen()
+time.sleep(300)
+"""
 NAME_POLICY = f'<busconfig><policy user="root"><allow own="{NAME}"/></policy></busconfig>'
 
 
@@ -134,6 +141,17 @@ class RestoreNetwork(unittest.TestCase):
         self.assertEqual(self.machine.run(["systemctl", "is-active", "name.service"]).stdout.strip(), "active")
         self.assertEqual(sorted(self.state()), ["ActiveState=active", "ConditionResult=yes", "Result=success"])
         self.assertEqual(self.ip("address", "show", "dev", "eth7"), "")
+
+    def test_a_bus_that_answers_nobody_keeps_nothing_from_being_used(self):
+        self.boot(service("eth7", "192.0.2.7"))
+        self.ip("address", "flush", "dev", "eth7")
+        self.machine.must(["systemd-run", "--unit=silent-bus", "python3", "-c", SILENT_BUS, "/run/silent-bus"])
+        self.addCleanup(self.machine.must, ["systemctl", "stop", "silent-bus"])
+        booted.wait_for(lambda: "/run/silent-bus" in self.machine.must(["ss", "--listening", "--unix"]), "the bus")
+        done = self.machine.run([PROGRAM], environment={"DBUS_SYSTEM_BUS_ADDRESS": "unix:path=/run/silent-bus"},
+                                timeout=60)
+        self.assertEqual((done.returncode, done.stdout, done.stderr), (0, "", ""))
+        self.assertIn("inet 192.0.2.7/24 ", self.ip("address", "show", "dev", "eth7"))
 
     def test_another_argument_is_a_mistake(self):
         refused = self.machine.run([PROGRAM, "now"])

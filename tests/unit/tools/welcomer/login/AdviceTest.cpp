@@ -66,15 +66,34 @@ TEST(Advice, WhoAsksForAnotherUserIsToldTheCommandsForThatUser) {
         }
         return texts;
     };
-    EXPECT_EQ(advices(waiting(true, false), std::nullopt),
-              Texts{"welcomer replay arm --user anna installs the agent; welcomer setup --cancel --user anna "
-                    "gives the setup up"});
-    const Login login =
-        loginOf({"Self destructing...", "Nimbus service 'x' cannot be enabled on this machine for this user.",
-                 "exiting"});
-    EXPECT_EQ(advices(waiting(false, false), login),
-              Texts{"welcomer account services --user anna shows whether it can be enabled by now, welcomer "
-                    "services enable --user anna --phase post enables it"});
+    const std::string both =
+        "welcomer replay arm --user anna installs the agent; welcomer setup --cancel --user anna gives the "
+        "setup up";
+    EXPECT_EQ(advices(waiting(true, false), std::nullopt), Texts{both});
+    EXPECT_EQ(advices(waiting(true, true, "it cannot be read"), std::nullopt), Texts{both});
+    EXPECT_EQ(advices(waiting(false, true, "it cannot be read"), std::nullopt),
+              Texts{"welcomer setup --cancel --user anna removes it"});
+    EXPECT_EQ(advices(waiting(false, true), std::nullopt),
+              Texts{"welcomer setup --cancel --user anna removes the agent's file"});
+
+    const auto advice = [&](const char* failure) {
+        const Texts texts =
+            advices(waiting(false, false), loginOf({"Self destructing...", failure, "exiting"}));
+        return texts.size() == 1 ? texts.front() : testing::PrintToString(texts);
+    };
+    EXPECT_EQ(advice("Nimbus service 'x' cannot be enabled on this machine for this user."),
+              "welcomer account services --user anna shows whether it can be enabled by now, welcomer "
+              "services enable --user anna --phase post enables it");
+    EXPECT_EQ(advice("Failed to deserialize replayable data length: 3"),
+              "welcomer setup --cancel --user anna removes the item; then set up again");
+    EXPECT_EQ(advice("Failed to delete replay keychain item: 8"),
+              "welcomer replay show --user anna says whether it is still there, welcomer replay delete "
+              "--user anna removes it");
+    EXPECT_EQ(advice("Failed to retrieve SK_Account"),
+              "welcomer account list --user anna shows the accounts; sign in, then welcomer services enable "
+              "--user anna");
+    EXPECT_EQ(advice("exception in wlnimbussetup: boom"),
+              "welcomer log --user anna shows what came before it");
 }
 
 TEST(Advice, AKeyringThatCannotBeAsked) {

@@ -36,8 +36,8 @@ TEST(DelegateReport, AnErrorThatLooksLikeTheSecondsIsKeptWhole) {
 }
 
 TEST(DelegateReport, SecondsThatAreNoNumberAreNoOutcome) {
-    for (const std::string seconds :
-         {"many", "", "-1", "1.2.3", "inf", "0x1", "1e3", "1 2", std::string(400, '9').c_str()}) {
+    for (const std::string& seconds : std::vector<std::string>{"many", "", "-1", "1.2.3", "inf", "0x1", "1e3",
+                                                               "1 2", std::string(400, '9')}) {
         const std::string answer = "a.b setup: completed (" + seconds + " seconds)";
         const std::string exception =
             "exception in setup response for plugin a.b (" + seconds + " seconds): boom: it broke";
