@@ -101,31 +101,31 @@ Report writeHelp(const CommandDefinition& program, const CommandLine& commandLin
 
 void addHiddenCommands(CLI::App& app, CommandLine& commandLine) {
     const auto kind = std::make_shared<std::string>();
-    CLI::App& lister = commandLine.addCommand(
+    CommandLevel lister = commandLine.addCommand(
         "list-values", "List what the command line takes in the place of a name, such as USER",
         [kind, &commandLine](Session& session) { return listValues(session, commandLine, *kind); });
-    lister.add_option("name", *kind, "The name, as the help shows it")->required();
-    lister.group("");
+    lister.option("name", *kind, "The name, as the help shows it").required();
+    lister.hide();
 
     const auto folder = std::make_shared<std::string>();
     const auto parts = std::make_shared<std::string>();
-    CLI::App& writer =
+    CommandLevel writer =
         commandLine.addCommand("write-help", "Write the manual pages and the completions",
                                [folder, parts, &app, &commandLine](Session& /*session*/) {
                                    return writeHelp(definitionOf(app), commandLine, *folder, *parts);
                                });
-    writer.add_option("folder", *folder, "Where to write them")->required();
-    writer.add_option("parts", *parts, "The folder of what is written by hand")->required();
-    writer.group("");
+    writer.option("folder", *folder, "Where to write them").required();
+    writer.option("parts", *parts, "The folder of what is written by hand").required();
+    writer.hide();
 }
 
 } // namespace
 
 void addHelpCommands(CLI::App& app, CommandLine& commandLine) {
     const auto names = std::make_shared<std::vector<std::string>>();
-    CLI::App& command = commandLine.addCommand("help", "Explain a command, or show them all",
-                                               [names, &app](Session&) { return help(app, *names); });
-    command.add_option("command", *names, "The command, such as: state set")->type_name(kCommandValue);
+    CommandLevel command = commandLine.addCommand("help", "Explain a command, or show them all",
+                                                  [names, &app](Session&) { return help(app, *names); });
+    command.option("command", *names, "The command, such as: state set").called(kCommandValue);
     commandLine.offerValues(kCommandValue, [&app](Session&) { return namesBelow(definitionOf(app)); });
     addHiddenCommands(app, commandLine);
 }

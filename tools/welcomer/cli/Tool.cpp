@@ -184,61 +184,62 @@ int runChosen(const CommandLine& commandLine, Options& options, const PlatformFa
 
 } // namespace
 
-CLI::App& CommandLine::addGroup(const std::string& name, const std::string& description) {
+CommandLevel CommandLine::addGroup(const std::string& name, const std::string& description) {
     CLI::App& group = addLevel(_app, name, description);
     group.require_subcommand(1);
-    return group;
+    return CommandLevel(group);
 }
 
-CLI::App& CommandLine::addCommand(const std::string& name, const std::string& description, Command command) {
-    return addCommand(_app, name, description, std::move(command));
+CommandLevel CommandLine::addCommand(const std::string& name, const std::string& description,
+                                     Command command) {
+    return addCommand(CommandLevel(_app), name, description, std::move(command));
 }
 
-CLI::App& CommandLine::addCommand(CLI::App& group, const std::string& name, const std::string& description,
-                                  Command command) {
+CommandLevel CommandLine::addCommand(CommandLevel group, const std::string& name,
+                                     const std::string& description, Command command) {
     if (_needsHome) {
         command = [command = std::move(command)](Session& session) {
             platform::current().processIdentity.homeDirectory(); // throws where there is none
             return command(session);
         };
     }
-    CLI::App& added = addLevel(group, name, description);
+    CLI::App& added = addLevel(group.level(), name, description);
     added.callback([this, &added, command = std::move(command)] {
         _chosen = command;
         _chosenName = fullName(added);
     });
-    return added;
+    return CommandLevel(added);
 }
 
-void CommandLine::addLocalOption(CLI::App& command) {
-    command.add_flag("--local", _options.storesLocally,
-                     "Store the replay item in the user's local file, whatever keyring there is; the agent "
-                     "finds it there");
+void CommandLine::addLocalOption(CommandLevel command) {
+    command.flag("--local", _options.storesLocally,
+                 "Store the replay item in the user's local file, whatever keyring there is; the agent "
+                 "finds it there");
 }
 
-CLI::Option& CommandLine::addUserOption(CLI::App& command) {
-    return *command
-                .add_option("--user", _options.user,
-                            "Act for this user of the machine, who logs in later; only root can. The user's "
-                            "keyring is "
-                            "not there: what is stored goes to the user's local file")
-                ->type_name("NAME")
-                ->check([](const std::string& name) {
-                    return std::string(name.empty() ? "the user's name is empty" : "");
-                });
+CommandOption CommandLine::addUserOption(CommandLevel command) {
+    return command
+        .option("--user", _options.user,
+                "Act for this user of the machine, who logs in later; only root can. The user's "
+                "keyring is "
+                "not there: what is stored goes to the user's local file")
+        .called("NAME")
+        .checked([](const std::string& name) {
+            return std::string(name.empty() ? "the user's name is empty" : "");
+        });
 }
 
-void CommandLine::addPreparation(CLI::App& command, Preparation preparation) {
-    command.parse_complete_callback(
+void CommandLine::addPreparation(CommandLevel command, Preparation preparation) {
+    command.level().parse_complete_callback(
         [this, preparation = std::move(preparation)] { _chosenPreparation = preparation; });
 }
 
-void CommandLine::addPasswordOption(CLI::App& command, PasswordSource& source) {
+void CommandLine::addPasswordOption(CommandLevel command, PasswordSource& source) {
     command
-        .add_option("--password-fd", source,
-                    "Read the password, one line, from this open descriptor instead of the terminal")
-        ->type_name("N")
-        ->check(CLI::NonNegativeNumber);
+        .option("--password-fd", source,
+                "Read the password, one line, from this open descriptor instead of the terminal")
+        .called("N")
+        .notNegative();
 }
 
 int runTool(int argc, char** argv, const PlatformFactory& buildPlatform,

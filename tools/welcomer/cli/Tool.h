@@ -3,6 +3,7 @@
 #pragma once
 
 #include "platform/AccountDirectory.h"
+#include "tools/welcomer/cli/CommandLevel.h"
 #include "tools/welcomer/cli/KeptLog.h"
 #include "tools/welcomer/cli/PlatformFactory.h"
 #include "tools/welcomer/cli/Report.h"
@@ -15,11 +16,6 @@
 #include <string>
 #include <utility>
 #include <vector>
-
-namespace CLI {
-class App;
-class Option;
-} // namespace CLI
 
 namespace welcomer::tool {
 
@@ -60,31 +56,31 @@ class CommandLine {
     CommandLine(CLI::App& app, Options& options) : _app(app), _options(options) {}
 
     // A group of commands, such as `replay`: it is called with one of the commands below it.
-    CLI::App& addGroup(const std::string& name, const std::string& description);
+    CommandLevel addGroup(const std::string& name, const std::string& description);
 
     // A command below the program or a group.
     //  command  what it does; runs after the whole command line has been read
     //  result   the place for its options
-    CLI::App& addCommand(const std::string& name, const std::string& description, Command command);
-    CLI::App& addCommand(CLI::App& group, const std::string& name, const std::string& description,
-                         Command command);
+    CommandLevel addCommand(const std::string& name, const std::string& description, Command command);
+    CommandLevel addCommand(CommandLevel group, const std::string& name, const std::string& description,
+                            Command command);
 
     // Whether the commands that are added next need a home folder: where the user has none, they end with one
     // line that says so.
     void setNeedsHome(bool needsHome) { _needsHome = needsHome; }
 
     // Gives a command the option `--local`, which has the platform store new credentials in the local store.
-    void addLocalOption(CLI::App& command);
+    void addLocalOption(CommandLevel command);
 
     // Gives a command the option `--user`, which has another user do its work (AsUser.h). That user has no
     // session, so that new credentials go to the local store.
-    CLI::Option& addUserOption(CLI::App& command);
+    CommandOption addUserOption(CommandLevel command);
 
     // Gives a command something to do first.
-    void addPreparation(CLI::App& command, Preparation preparation);
+    void addPreparation(CommandLevel command, Preparation preparation);
 
     // Gives a command the option `--password-fd`.
-    static void addPasswordOption(CLI::App& command, PasswordSource& source);
+    static void addPasswordOption(CommandLevel command, PasswordSource& source);
 
     // Says what can stand where the command line takes this value, such as "USER": for completions.
     //  values  may fail: they are as good as none then

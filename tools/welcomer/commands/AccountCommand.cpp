@@ -11,7 +11,6 @@
 #include "tools/welcomer/story/SetupFlow.h"
 #include "tools/welcomer/terminal/Password.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cerrno>
 #include <iterator>
@@ -232,52 +231,51 @@ Report signOut(Session& session) {
                   (account.empty() ? "The account" : account) + " is signed out.");
 }
 
-void addAdd(CommandLine& commandLine, CLI::App& group) {
+void addAdd(CommandLine& commandLine, CommandLevel group) {
     const auto arguments = std::make_shared<AddArguments>();
-    CLI::App& command =
+    CommandLevel command =
         commandLine.addCommand(group, "add",
                                "Let somebody sign in: adds a user to the machine's directory of users, which "
                                "stands for the server",
                                [arguments](Session& session) { return add(session, *arguments); });
-    command.add_option("user", arguments->user, "The user's name")->type_name("USER")->required();
-    command.add_option("--mail", arguments->mailAddress, "The address of the account's mail service")
-        ->type_name("ADDRESS");
+    command.option("user", arguments->user, "The user's name").called("USER").required();
+    command.option("--mail", arguments->mailAddress, "The address of the account's mail service")
+        .called("ADDRESS");
     command
-        .add_option("--alias", arguments->aliases,
-                    "An alias that is offered for video calling and messaging; may be given several times")
-        ->type_name("A")
-        ->expected(1)
-        ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
+        .option("--alias", arguments->aliases,
+                "An alias that is offered for video calling and messaging; may be given several times")
+        .called("A")
+        .repeated();
     CommandLine::addPasswordOption(command, arguments->password);
 }
 
-void addSignIn(CommandLine& commandLine, CLI::App& group) {
+void addSignIn(CommandLine& commandLine, CommandLevel group) {
     const auto arguments = std::make_shared<SignInArguments>();
-    CLI::App& command =
+    CommandLevel command =
         commandLine.addCommand(group, "sign-in", "Sign in to an account, without enabling any service",
                                [arguments](Session& session) { return signIn(session, *arguments); });
-    command.add_option("user", arguments->user, "The user's name")->type_name("USER")->required();
+    command.option("user", arguments->user, "The user's name").called("USER").required();
     CommandLine::addPasswordOption(command, arguments->password);
     commandLine.addUserOption(command);
 }
 
-void addRemove(CommandLine& commandLine, CLI::App& group) {
+void addRemove(CommandLine& commandLine, CommandLevel group) {
     const auto arguments = std::make_shared<RemoveArguments>();
-    CLI::App& command =
+    CommandLevel command =
         commandLine.addCommand(group, "remove", "Remove an account with the states of its services",
                                [arguments](Session& session) { return remove(session, *arguments); });
-    command.add_option("account", arguments->name, "The account's name")->type_name("NAME")->required();
-    CLI::Option* const fromDirectory =
-        command.add_flag("--from-directory", arguments->fromDirectory,
-                         "Remove what `account add` has added instead: nobody of that name can sign in any "
-                         "more, and accounts stay");
+    command.option("account", arguments->name, "The account's name").called("NAME").required();
+    const CommandOption fromDirectory =
+        command.flag("--from-directory", arguments->fromDirectory,
+                     "Remove what `account add` has added instead: nobody of that name can sign in any "
+                     "more, and accounts stay");
     commandLine.addUserOption(command).excludes(fromDirectory);
 }
 
 } // namespace
 
 void addAccountCommands(CommandLine& commandLine) {
-    CLI::App& group = commandLine.addGroup("account", "The user's cloud accounts, and who can sign in");
+    CommandLevel group = commandLine.addGroup("account", "The user's cloud accounts, and who can sign in");
     commandLine.offerValues("USER", knownNames);
     addAdd(commandLine, group);
     commandLine.addUserOption(
@@ -290,10 +288,9 @@ void addAccountCommands(CommandLine& commandLine) {
     addRemove(commandLine, group);
 
     const auto user = std::make_shared<std::string>();
-    CLI::App& services = commandLine.addCommand(group, "services", "Show the services of an account",
-                                                [user](Session&) { return showServices(*user); });
-    services.add_option("user", *user, "The account; without it the one that is logged in")
-        ->type_name("USER");
+    CommandLevel services = commandLine.addCommand(group, "services", "Show the services of an account",
+                                                   [user](Session&) { return showServices(*user); });
+    services.option("user", *user, "The account; without it the one that is logged in").called("USER");
     commandLine.addUserOption(services);
 }
 

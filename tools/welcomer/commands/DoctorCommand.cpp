@@ -11,7 +11,6 @@
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/commands/ResolverReport.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cstdlib>
 #include <vector>

@@ -11,8 +11,8 @@
 #include "tools/welcomer/login/RunningAgent.h"
 #include "tools/welcomer/login/Since.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
+#include <cstdint>
 #include <iostream>
 #include <memory>
 #include <span>
@@ -31,7 +31,7 @@ constexpr std::size_t kAllSince = 1000; // logins
 constexpr auto kTogether = 100ms;       // what comes within it is read at once
 
 struct LogArguments {
-    std::size_t last = 0; // 0: not given
+    std::uint64_t last = 0; // 0: not given
     std::string since;
     std::string user;
     std::string picture;
@@ -202,29 +202,25 @@ Report runLog(Session& session, const LogArguments& arguments) {
 
 void addLogCommand(CommandLine& commandLine) {
     const auto arguments = std::make_shared<LogArguments>();
-    CLI::App& command = commandLine.addCommand(
+    CommandLevel command = commandLine.addCommand(
         "log", "Show what the agent logged at the last login, with the times since its start",
         [arguments](Session& session) { return runLog(session, *arguments); });
+    command.option("--last", arguments->last, "Show that many logins, the last ones; 1 unless told otherwise")
+        .called("N")
+        .within(1, 1000);
     command
-        .add_option("--last", arguments->last,
-                    "Show that many logins, the last ones; 1 unless told otherwise")
-        ->type_name("N")
-        ->check(CLI::Range(std::size_t{1}, std::size_t{1000}));
+        .option("--since", arguments->since,
+                "Show the logins since then: \"2026-11-22 11:06\", 11:06, yesterday, or 2h for two hours ago")
+        .called("TIME");
+    command.option("--user", arguments->user, "Show the logins of another user; only root can")
+        .called("NAME");
+    const CommandOption following =
+        command.flag("--follow", arguments->follow,
+                     "Show lines as they come, until Ctrl-C; with --json one object on each line");
     command
-        .add_option(
-            "--since", arguments->since,
-            "Show the logins since then: \"2026-11-22 11:06\", 11:06, yesterday, or 2h for two hours ago")
-        ->type_name("TIME");
-    command.add_option("--user", arguments->user, "Show the logins of another user; only root can")
-        ->type_name("NAME");
-    CLI::Option* const following =
-        command.add_flag("--follow", arguments->follow,
-                         "Show lines as they come, until Ctrl-C; with --json one object on each line");
-    command
-        .add_option("--picture", arguments->picture,
-                    "Draw the timeline of the last login in this file, as SVG")
-        ->type_name("FILE")
-        ->excludes(following);
+        .option("--picture", arguments->picture, "Draw the timeline of the last login in this file, as SVG")
+        .called("FILE")
+        .excludes(following);
 }
 
 } // namespace welcomer::tool

@@ -7,7 +7,6 @@
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/terminal/WaitingLine.h"
 
-#include <CLI/CLI.hpp>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -172,46 +171,42 @@ Report registerServices(Session& session) {
     return report;
 }
 
-void addApplyCommand(CommandLine& commandLine, CLI::App& group) {
+void addApplyCommand(CommandLine& commandLine, CommandLevel group) {
     const auto settings = std::make_shared<Settings>();
-    CLI::App& command = commandLine.addCommand(group, "apply",
-                                               "Configure the network of this machine, also with --root, as "
-                                               "the user chooses, and check that it works",
-                                               [=](Session& session) { return apply(session, *settings); });
-    command.add_option("--choice", settings->choice, "lan, wifi or no; only lan configures anything")
-        ->required()
-        ->check(CLI::IsMember({kUserChoiceLAN, kUserChoiceWiFi, kUserChoiceNoInternet}));
+    CommandLevel command =
+        commandLine.addCommand(group, "apply",
+                               "Configure the network of this machine, also with --root, as "
+                               "the user chooses, and check that it works",
+                               [=](Session& session) { return apply(session, *settings); });
+    command.option("--choice", settings->choice, "lan, wifi or no; only lan configures anything")
+        .required()
+        .oneOf({kUserChoiceLAN, kUserChoiceWiFi, kUserChoiceNoInternet});
     command
-        .add_option("--method", settings->method,
-                    "Manual, Manual DHCP, DHCP or BootP; DHCP when none is given")
-        ->check(CLI::IsMember({kConfigurationMethodManual, kConfigurationMethodManualDHCP,
-                               kConfigurationMethodDHCP, kConfigurationMethodBootP}));
-    command.add_option("--ip", settings->address, "The address")->type_name("A");
-    command.add_option("--subnet", settings->subnetMask, "The subnet mask, such as 255.255.255.0")
-        ->type_name("M");
-    command.add_option("--router", settings->router, "The router; none when it is left out")->type_name("R");
-    command.add_option("--dns", settings->dns, "A DNS server; may be given several times")
-        ->type_name("A")
-        ->allow_extra_args(false);
-    command.add_option("--dhcp-client-id", settings->dhcpClientID, "The DHCP client ID")->type_name("ID");
+        .option("--method", settings->method, "Manual, Manual DHCP, DHCP or BootP; DHCP when none is given")
+        .oneOf({kConfigurationMethodManual, kConfigurationMethodManualDHCP, kConfigurationMethodDHCP,
+                kConfigurationMethodBootP});
+    command.option("--ip", settings->address, "The address").called("A");
+    command.option("--subnet", settings->subnetMask, "The subnet mask, such as 255.255.255.0").called("M");
+    command.option("--router", settings->router, "The router; none when it is left out").called("R");
+    command.option("--dns", settings->dns, "A DNS server; may be given several times").called("A").repeated();
+    command.option("--dhcp-client-id", settings->dhcpClientID, "The DHCP client ID").called("ID");
     command
-        .add_option(
-            "--warning-type", settings->warningType,
-            "0: configure and check nothing; 1: wait for the internet; 2: fail; others: check nothing")
-        ->type_name("N")
-        ->check([](const std::string& text) {
+        .option("--warning-type", settings->warningType,
+                "0: configure and check nothing; 1: wait for the internet; 2: fail; others: check nothing")
+        .called("N")
+        .checked([](const std::string& text) {
             return std::string(text.starts_with('-') ? "a warning type cannot be negative" : "");
         })
-        ->capture_default_str();
-    command.add_option("--wait", settings->wait, "How long to wait for the internet")
-        ->type_name("SECONDS")
-        ->capture_default_str();
+        .showsDefault();
+    command.option("--wait", settings->wait, "How long to wait for the internet")
+        .called("SECONDS")
+        .showsDefault();
 }
 
 } // namespace
 
 void addNetworkCommands(CommandLine& commandLine) {
-    CLI::App& group =
+    CommandLevel group =
         commandLine.addGroup("network", "The network: what it is configured to, and whether it works");
     commandLine.addCommand(group, "show", "Show what the primary connection is configured to now", show);
     commandLine.addCommand(group, "ports", "List the network ports of this machine", listPorts);

@@ -5,8 +5,6 @@
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
 
-#include <CLI/CLI.hpp>
-
 namespace welcomer::tool {
 
 namespace {
@@ -38,7 +36,7 @@ Report listPlugins(Session& /*session*/) {
 } // namespace
 
 void addPluginsCommands(CommandLine& commandLine) {
-    CLI::App& group = commandLine.addGroup("plugins", "The delegate plug-ins of this machine");
+    CommandLevel group = commandLine.addGroup("plugins", "The delegate plug-ins of this machine");
     commandLine.addCommand(
         group, "list",
         "Load every plug-in and show its identifier, its file, and its state: loaded, or why "

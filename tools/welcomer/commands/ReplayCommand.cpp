@@ -11,7 +11,6 @@
 #include "tools/welcomer/story/ReplayReason.h"
 #include "tools/welcomer/story/SetupBundle.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
 
 namespace welcomer::tool {
@@ -96,35 +95,32 @@ Report arm(Session& session, const std::string& bundle) {
                                                      : "The agent is installed already for the next login.");
 }
 
-void addStore(CommandLine& commandLine, CLI::App& group) {
+void addStore(CommandLine& commandLine, CommandLevel group) {
     const auto arguments = std::make_shared<StoreArguments>();
-    CLI::App& command = commandLine.addCommand(
+    CommandLevel command = commandLine.addCommand(
         group, "store",
         "Store the replay item and install the agent for the next login, as a setup application does",
         [arguments](Session& session) { return store(session, *arguments); });
-    command.add_option("--account", arguments->account, "The user's cloud account name")
-        ->type_name("USER")
-        ->required();
+    command.option("--account", arguments->account, "The user's cloud account name")
+        .called("USER")
+        .required();
+    command.option("--file", arguments->file, "The replay object, a property list of any format; - for stdin")
+        .called("PLIST")
+        .required();
     command
-        .add_option("--file", arguments->file,
-                    "The replay object, a property list of any format; - for stdin")
-        ->type_name("PLIST")
-        ->required();
-    command
-        .add_option(
-            "--bundle", arguments->bundle,
-            "The setup application's bundle; like every path of the system it is looked up below --root")
-        ->type_name("DIR")
-        ->required();
+        .option("--bundle", arguments->bundle,
+                "The setup application's bundle; like every path of the system it is looked up below --root")
+        .called("DIR")
+        .required();
     commandLine.addLocalOption(command);
     commandLine.addUserOption(command);
     commandLine.addPreparation(command,
                                [arguments](const Options& options) { prepareStore(options, *arguments); });
 }
 
-void addArm(CommandLine& commandLine, CLI::App& group) {
+void addArm(CommandLine& commandLine, CommandLevel group) {
     const auto bundle = std::make_shared<std::string>();
-    CLI::App& command = commandLine.addCommand(
+    CommandLevel command = commandLine.addCommand(
         group, "arm", "Install the agent for a replay item that waits, for which none would start",
         [bundle](Session& session) { return arm(session, *bundle); });
     addBundleOption(command, *bundle);
@@ -136,7 +132,7 @@ void addArm(CommandLine& commandLine, CLI::App& group) {
 } // namespace
 
 void addReplayCommands(CommandLine& commandLine) {
-    CLI::App& group =
+    CommandLevel group =
         commandLine.addGroup("replay", "The replay item, which waits for the agent of the next login");
     addStore(commandLine, group);
     addArm(commandLine, group);

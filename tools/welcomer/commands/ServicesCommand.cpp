@@ -9,7 +9,6 @@
 #include "tools/welcomer/story/ServiceStates.h"
 #include "tools/welcomer/terminal/WaitingLine.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
 #include <mutex>
@@ -115,30 +114,29 @@ Report enable(Session& session, const EnableArguments& arguments) {
 } // namespace
 
 void addServicesCommands(CommandLine& commandLine) {
-    CLI::App& group = commandLine.addGroup("services", "The services of the cloud account");
+    CommandLevel group = commandLine.addGroup("services", "The services of the cloud account");
     commandLine.addCommand(group, "list", "Show every service with the phase in which setup enables it",
                            list);
 
     commandLine.offerValues("SERVICE", serviceNames);
     const auto arguments = std::make_shared<EnableArguments>();
-    CLI::App& command = commandLine.addCommand(
+    CommandLevel command = commandLine.addCommand(
         group, "enable",
         "Enable an account's services of one phase and wait for those that are enabled later; what is "
         "decided about each is shown as it is logged. An account that is missing is made.",
         [arguments](Session& session) { return enable(session, *arguments); });
-    command.add_option("--account", arguments->account, "The cloud account")->type_name("USER")->required();
-    command.add_option("--phase", arguments->phase, "pre: before the first login; post: after it")
-        ->required()
-        ->check(CLI::IsMember({"pre", "post"}));
-    command.add_option("--only", arguments->only, "kvs: documents and data alone, whatever else is given")
-        ->check(CLI::IsMember({"kvs"}));
+    command.option("--account", arguments->account, "The cloud account").called("USER").required();
+    command.option("--phase", arguments->phase, "pre: before the first login; post: after it")
+        .required()
+        .oneOf({"pre", "post"});
+    command.option("--only", arguments->only, "kvs: documents and data alone, whatever else is given")
+        .oneOf({"kvs"});
     command
-        .add_option("--select", arguments->selected,
-                    "A service that the user kept selected, by name or identifier; may be given several "
-                    "times. Without it every service is selected.")
-        ->type_name("SERVICE")
-        ->expected(1)
-        ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
+        .option("--select", arguments->selected,
+                "A service that the user kept selected, by name or identifier; may be given several "
+                "times. Without it every service is selected.")
+        .called("SERVICE")
+        .repeated();
     commandLine.addUserOption(command);
 }
 

@@ -13,7 +13,6 @@
 #include "tools/welcomer/terminal/Password.h"
 #include "tools/welcomer/terminal/Terminal.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cstdlib>
 #include <memory>
@@ -241,27 +240,27 @@ Report setUp(Session& session, const SetupArguments& arguments) {
 
 void addSetupCommand(CommandLine& commandLine) {
     const auto arguments = std::make_shared<SetupArguments>();
-    CLI::App& command = commandLine.addCommand(
+    CommandLevel command = commandLine.addCommand(
         "setup",
         "Set up a cloud account as a setup application does: sign in, choose aliases and services, hand over "
         "to the agent of the next login",
         [arguments](Session& session) { return setUp(session, *arguments); });
     command
-        .add_option(
+        .option(
             "--answers", arguments->answers,
             "Ask nothing but the password: a property list with Account and, where not everything is "
             "wanted, Services (an array of names or identifiers), Aliases (a dictionary from delegate "
             "identifier to an array) and JustTheAccountAndKVS (a boolean); - for stdin, where the password's "
             "line comes first with --password-fd 0")
-        ->type_name("PLIST");
+        .called("PLIST");
     CommandLine::addPasswordOption(command, arguments->password);
     addBundleOption(command, arguments->bundle);
     command
-        .add_flag("--cancel", arguments->cancels,
-                  "Take back what a setup has left for the next login: the replay item and the agent")
-        ->excludes("--answers")
-        ->excludes("--password-fd")
-        ->excludes("--bundle");
+        .flag("--cancel", arguments->cancels,
+              "Take back what a setup has left for the next login: the replay item and the agent")
+        .excludes("--answers")
+        .excludes("--password-fd")
+        .excludes("--bundle");
     commandLine.addLocalOption(command);
     commandLine.addUserOption(command);
     commandLine.addPreparation(command,

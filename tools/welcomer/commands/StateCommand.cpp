@@ -8,7 +8,6 @@
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <iterator>
 #include <memory>
@@ -124,29 +123,30 @@ Report recordSeen(Session& session, const std::string& setup) {
 } // namespace
 
 void addStateCommands(CommandLine& commandLine) {
-    CLI::App& group = commandLine.addGroup("state", "The user's record of what setup has done and shown");
+    CommandLevel group = commandLine.addGroup("state", "The user's record of what setup has done and shown");
     commandLine.addUserOption(commandLine.addCommand(group, "show", "Show the record", show));
     commandLine.offerValues("KEY", keyNames);
 
     const auto key = std::make_shared<std::string>();
     const auto value = std::make_shared<std::string>();
-    CLI::App& setter = commandLine.addCommand(group, "set", "Set one value of the record and store it",
-                                              [=](Session& session) { return set(session, *key, *value); });
-    setter.add_option("key", *key, "The value's key")->type_name("KEY")->required();
-    setter.add_option("value", *value, "A text, or true or false for a flag")->type_name("VALUE")->required();
+    CommandLevel setter =
+        commandLine.addCommand(group, "set", "Set one value of the record and store it",
+                               [=](Session& session) { return set(session, *key, *value); });
+    setter.option("key", *key, "The value's key").called("KEY").required();
+    setter.option("value", *value, "A text, or true or false for a flag").called("VALUE").required();
     commandLine.addUserOption(setter);
 
-    CLI::App& remover =
+    CommandLevel remover =
         commandLine.addCommand(group, "remove", "Remove one value of the record; a flag becomes false",
                                [=](Session& session) { return remove(session, *key); });
-    remover.add_option("key", *key, "The value's key")->type_name("KEY")->required();
+    remover.option("key", *key, "The value's key").called("KEY").required();
     commandLine.addUserOption(remover);
 
     const auto setup = std::make_shared<std::string>();
-    CLI::App& seen = commandLine.addCommand(
+    CommandLevel seen = commandLine.addCommand(
         group, "seen", "Record that the cloud or the sync setup was seen, at the running system's version",
         [=](Session& session) { return recordSeen(session, *setup); });
-    seen.add_option("setup", *setup, "cloud or sync")->required()->check(CLI::IsMember({"cloud", "sync"}));
+    seen.option("setup", *setup, "cloud or sync").required().oneOf({"cloud", "sync"});
     commandLine.addUserOption(seen);
 }
 

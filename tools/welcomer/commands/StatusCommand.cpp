@@ -10,7 +10,6 @@
 #include "tools/welcomer/login/LoginReport.h"
 #include "tools/welcomer/story/ServiceStates.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
 #include <optional>
 #include <utility>
@@ -128,7 +127,7 @@ Report showStatus(const LastLogin& last, const std::string& user) {
 void addStatusCommand(CommandLine& commandLine) {
     // Of another user, the log is read by root, who may.
     const auto readBefore = std::make_shared<std::optional<LastLogin>>();
-    CLI::App& command = commandLine.addCommand(
+    CommandLevel command = commandLine.addCommand(
         "status",
         "Show what waits for the next login, what the last one did, and what is to be done; exit status 0: "
         "nothing is, 1: something is",

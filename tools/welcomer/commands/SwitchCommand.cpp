@@ -4,7 +4,6 @@
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
 
@@ -56,7 +55,7 @@ Report select(Session& session, const std::string& name) {
 } // namespace
 
 void addSwitchCommands(CommandLine& commandLine) {
-    CLI::App& group =
+    CommandLevel group =
         commandLine.addGroup("switch", "The cloud service's environment that the resolver is pointed to");
     commandLine.addCommand(group, "list", "List the environments; a star marks the current one", list);
     commandLine.addCommand(group, "show", "Show the current environment", show);
@@ -64,13 +63,11 @@ void addSwitchCommands(CommandLine& commandLine) {
         return SwitchController::sharedController().availableServers();
     });
     const auto name = std::make_shared<std::string>();
-    CLI::App& selector = commandLine.addCommand(
+    CommandLevel selector = commandLine.addCommand(
         group, "select",
         "Point the resolver at an environment; every file in /etc/resolver is replaced. For the superuser",
         [=](Session& session) { return select(session, *name); });
-    selector.add_option("name", *name, "The environment's name, or Prod")
-        ->type_name("ENVIRONMENT")
-        ->required();
+    selector.option("name", *name, "The environment's name, or Prod").called("ENVIRONMENT").required();
 }
 
 } // namespace welcomer::tool

@@ -9,7 +9,6 @@
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/story/ScenarioHost.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
 #include <optional>
 
@@ -122,21 +121,20 @@ Report decideUpsell(Session& session) {
 } // namespace
 
 void addSyncCommands(CommandLine& commandLine) {
-    CLI::App& group = commandLine.addGroup("sync", "The decisions about sync");
+    CommandLevel group = commandLine.addGroup("sync", "The decisions about sync");
     commandLine.addCommand(group, "upsell",
                            "Decide whether the user is offered the sync setup at this login; stores nothing",
                            decideUpsell);
 
     const auto file = std::make_shared<std::string>();
     const auto checkOnly = std::make_shared<bool>(false);
-    CLI::App& destination = commandLine.addCommand(
+    CommandLevel destination = commandLine.addCommand(
         group, "destination", "Decide where keychain sync goes, for a host whose answers are given",
         [=](Session& session) { return determineDestination(session, *file, *checkOnly); });
-    destination
-        .add_option("--scenario", *file, "The host's answers, a property list of any format; - for stdin")
-        ->type_name("PLIST")
-        ->required();
-    destination.add_flag("--check-only", *checkOnly, "Only check whether a rule skips keychain sync");
+    destination.option("--scenario", *file, "The host's answers, a property list of any format; - for stdin")
+        .called("PLIST")
+        .required();
+    destination.flag("--check-only", *checkOnly, "Only check whether a rule skips keychain sync");
 }
 
 } // namespace welcomer::tool

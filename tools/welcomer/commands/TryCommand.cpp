@@ -5,7 +5,6 @@
 #include "tools/welcomer/story/Story.h"
 #include "tools/welcomer/story/TemporaryFolder.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
 
 namespace welcomer::tool {
@@ -56,15 +55,14 @@ Report tryStory(Session& session, const TryArguments& arguments) {
 
 void addTryCommand(CommandLine& commandLine) {
     const auto arguments = std::make_shared<TryArguments>();
-    CLI::App& command = commandLine.addCommand(
+    CommandLevel command = commandLine.addCommand(
         "try", "Walk the whole story in a fresh folder (or below --root), from the setup to the second login",
         [arguments](Session& session) { return tryStory(session, *arguments); });
-    command.add_flag("--time-lapse", arguments->timeLapse,
-                     "Run the agent on simulated time: the two minutes pass at once");
+    command.flag("--time-lapse", arguments->timeLapse,
+                 "Run the agent on simulated time: the two minutes pass at once");
     command
-        .add_option("--picture", arguments->picture,
-                    "Draw the timeline of the first login in this file, as SVG")
-        ->type_name("FILE");
+        .option("--picture", arguments->picture, "Draw the timeline of the first login in this file, as SVG")
+        .called("FILE");
 }
 
 } // namespace welcomer::tool

@@ -4,18 +4,17 @@
 #include "tools/welcomer/cli/ToolBundle.h"
 #include "tools/welcomer/terminal/Failure.h"
 
-#include <CLI/CLI.hpp>
 #include <filesystem>
 
 namespace welcomer::tool {
 
-void addBundleOption(CLI::App& command, std::string& bundle) {
+void addBundleOption(CommandLevel command, std::string& bundle) {
     command
-        .add_option("--bundle", bundle,
-                    std::string("The setup application's bundle, looked up below --root [the one that comes "
-                                "with the tool; below --root ") +
-                        kSetupBundlePath + "]")
-        ->type_name("DIR");
+        .option("--bundle", bundle,
+                std::string("The setup application's bundle, looked up below --root [the one that comes "
+                            "with the tool; below --root ") +
+                    kSetupBundlePath + "]")
+        .called("DIR");
 }
 
 std::unique_ptr<platform::ResourceBundle> openSetupBundle(const Options& options, const std::string& bundle) {

@@ -14,7 +14,7 @@ namespace welcomer::tool {
 inline constexpr const char* kSetupBundlePath = "/usr/share/welcomer/setup-bundle";
 
 // Gives a command the option `--bundle`.
-void addBundleOption(CLI::App& command, std::string& bundle);
+void addBundleOption(CommandLevel command, std::string& bundle);
 
 // Opens the bundle that `--bundle` names, or without it the one that comes with the tool; below a root that
 // was given, the one at the path above. Throws CommandFailure where there is none.
