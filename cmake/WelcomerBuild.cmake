@@ -18,10 +18,10 @@ if(NOT CMAKE_BUILD_TYPE AND NOT CMAKE_CONFIGURATION_TYPES)
     set(CMAKE_BUILD_TYPE RelWithDebInfo CACHE STRING "" FORCE)
 endif()
 
-# A second build of the same sources costs little where ccache is installed, whatever folder they lie in then: what is built
-# names its sources as a build folder inside of them does. That is what ccache calls them, too, so that what is built with it
-# and without is the same.
-add_compile_options("-ffile-prefix-map=${CMAKE_SOURCE_DIR}=..")
+# What is built names its sources from its build folder, wherever that lies and whatever it is called. That is what ccache
+# calls them, too, so that what is built with it and without is the same, and a second build in another folder costs little.
+# The compiler takes the last map that fits.
+add_compile_options("-ffile-prefix-map=${CMAKE_SOURCE_DIR}=.." "-ffile-prefix-map=${CMAKE_BINARY_DIR}=.")
 find_program(WELCOMER_CCACHE ccache)
 if(WELCOMER_CCACHE AND NOT CMAKE_CXX_COMPILER_LAUNCHER)
     # Precompiled headers are cached, too, once these are no reason against it.
