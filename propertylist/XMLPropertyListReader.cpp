@@ -15,7 +15,11 @@ namespace {
 
 class XMLPropertyListReader {
   public:
-    explicit XMLPropertyListReader(std::string_view bytes) : _scanner(bytes) {}
+    enum class RepeatedKeys { LastCounts, Refused };
+
+    XMLPropertyListReader(std::string_view bytes, RepeatedKeys repeatedKeys)
+        : _scanner(bytes),
+          _repeatedKeys(repeatedKeys) {}
 
     PropertyList readDocument() {
         _scanner.skipProlog();
@@ -105,6 +109,9 @@ class XMLPropertyListReader {
             const XMLTag valueTag = _scanner.readTag();
             if (valueTag.isClosing(XMLElement::Dictionary)) {
                 _scanner.fail(keyTag.start, "a key without a value");
+            }
+            if (_repeatedKeys == RepeatedKeys::Refused && dictionary.contains(key)) {
+                _scanner.fail(keyTag.start, "the key \"" + excerpt(key) + "\" appears twice");
             }
             // Keys mostly come in order, then the place is known.
             dictionary.insert_or_assign(dictionary.end(), std::move(key), _readValue(valueTag));
@@ -202,17 +209,26 @@ class XMLPropertyListReader {
     }
 
     XMLScanner _scanner;
+    const RepeatedKeys _repeatedKeys;
     int _depth = 0; // of dictionaries and arrays around the current place
 };
+
+PropertyListReadResult read(std::string_view bytes, XMLPropertyListReader::RepeatedKeys repeatedKeys) {
+    try {
+        return {XMLPropertyListReader(bytes, repeatedKeys).readDocument(), {}};
+    } catch (const PropertyListReadError& error) {
+        return failureAtLineAndColumn(bytes, error);
+    }
+}
 
 } // namespace
 
 PropertyListReadResult readXMLPropertyList(std::string_view bytes) {
-    try {
-        return {XMLPropertyListReader(bytes).readDocument(), {}};
-    } catch (const PropertyListReadError& error) {
-        return failureAtLineAndColumn(bytes, error);
-    }
+    return read(bytes, XMLPropertyListReader::RepeatedKeys::LastCounts);
+}
+
+PropertyListReadResult readXMLPropertyListWithUniqueKeys(std::string_view bytes) {
+    return read(bytes, XMLPropertyListReader::RepeatedKeys::Refused);
 }
 
 } // namespace welcomer

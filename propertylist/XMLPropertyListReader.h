@@ -19,4 +19,7 @@ namespace welcomer {
 // Errors carry line and column. Any thread; `bytes` is only read during the call.
 PropertyListReadResult readXMLPropertyList(std::string_view bytes);
 
+// The same, but entries with the same key are refused: for what somebody else may have read otherwise on its way.
+PropertyListReadResult readXMLPropertyListWithUniqueKeys(std::string_view bytes);
+
 } // namespace welcomer

@@ -99,6 +99,16 @@ TEST(XMLPropertyListReader, RefusesTextInBooleans) {
     EXPECT_EQ(errorIn("<true>yes</true>"), "1: unexpected text in <true>");
 }
 
+TEST(XMLPropertyListReader, EqualKeysAreRefusedWhereTheyAreToBe) {
+    const auto errorOf = [](const char* content) {
+        return readXMLPropertyListWithUniqueKeys(inPlist(content)).error;
+    };
+    EXPECT_EQ(errorOf("<dict><key>a</key><true/><key>b</key><true/></dict>"), "");
+    EXPECT_EQ(errorOf("<array><dict><key>a</key><true/></dict><dict><key>a</key><true/></dict></array>"), "");
+    EXPECT_EQ(errorOf("<dict><key>a</key><true/><key>&#97;</key><true/></dict>"),
+              "line 1, column 33: the key \"a\" appears twice");
+}
+
 TEST(XMLPropertyListReader, TheLastOfEqualKeysCounts) {
     EXPECT_EQ(readIn("<dict><key>k</key><true/><key>a</key><true/><key>k</key><false/></dict>"),
               PropertyList(PropertyList::Dictionary{{"a", true}, {"k", false}}));
