@@ -29,12 +29,13 @@ FLOORS = {
 # What the rooms beside the floors may include, besides themselves. A room's name is a path; the longest that fits counts.
 SIDES = {
     "backends": {"platform", "propertylist", "backends/posix", "backends/local", "backends/desktop"},
+    "backends/accountserver": {"platform", "propertylist"},
     "backends/posix": {"platform", "propertylist"},
     "backends/bus": {"platform"},
     "backends/network": {"platform", "propertylist"},
     "backends/local": {"platform", "propertylist", "backends/posix", "backends/network"},
-    "backends/desktop": {"platform", "propertylist", "backends/posix", "backends/bus", "backends/network",
-                         "backends/local"},
+    "backends/desktop": {"platform", "propertylist", "backends/accountserver", "backends/posix", "backends/bus",
+                         "backends/network", "backends/local"},
     "backends/simulated": {"platform", "propertylist"},
     "examples/plugins": {"sdk"},
 }
@@ -51,8 +52,9 @@ TESTS = {"tests"}
 PROGRAMS = re.compile(r"^(agent/main\.cpp|tools/[^/]+/main\.cpp|examples/setup/[^/]+\.cpp)$")
 OFFERED = re.compile(r"^backends/(Backends|StoredNetwork|UnexpectedEnd|simulated/.+)\.h$")
 
-# What of the backends tools may use, too: the bases on the kernel and on the bus, and addresses as text.
-FOR_TOOLS = re.compile(r"^backends/(posix/[^/]+|bus/[^/]+|network/IPv4Text)\.h$")
+# What of the backends tools may use, too: the bases on the kernel and on the bus, addresses as text, and what the account
+# server says.
+FOR_TOOLS = re.compile(r"^backends/(posix/[^/]+|bus/[^/]+|network/IPv4Text|accountserver/[^/]+)\.h$")
 
 SOURCES = {".h", ".hpp", ".c", ".cpp"}
 INCLUDE = re.compile(r'^\s*#\s*include\s*([<"])([^>"]+)[>"]')
