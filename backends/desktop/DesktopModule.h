@@ -69,6 +69,12 @@ class DesktopModule {
         return _service ? _service.get() : _local;
     }
 
+    // The desktop's service where it has been made, else null; makes none. Borrowed. Any thread.
+    Interface* madeService() {
+        const std::lock_guard lock(_mutex);
+        return _service.get();
+    }
+
     // Whether there is a module, as far as is known without loading it. Any thread.
     bool isThere() {
         const std::lock_guard lock(_mutex);

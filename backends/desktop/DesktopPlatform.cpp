@@ -5,6 +5,8 @@
 #include "backends/posix/FileLock.h"
 #include "backends/posix/RootFolder.h"
 
+#include <chrono>
+#include <cstdlib>
 #include <memory>
 
 namespace welcomer::desktop {
@@ -13,11 +15,27 @@ namespace {
 
 constexpr char kOnlineAccountsLock[] = "OnlineAccounts";
 
-PlatformOptions withRunLoops(PlatformOptions options, platform::RunLoops& runLoops) {
+// What the local platform stands on, where the program has chosen nothing else.
+PlatformOptions standingOn(PlatformOptions options, platform::RunLoops& runLoops,
+                           platform::SignInDirectory& signIn) {
     if (!options.runLoops) {
         options.runLoops = &runLoops;
     }
+    if (!options.signInDirectory) {
+        options.signInDirectory = &signIn;
+    }
     return options;
+}
+
+// Of who runs the program, as the C library finds it.
+std::string messagesLocale() {
+    for (const char* const name : {"LC_ALL", "LC_MESSAGES", "LANG"}) {
+        const char* const value = std::getenv(name);
+        if (value && *value != '\0') {
+            return value;
+        }
+    }
+    return "";
 }
 
 SearchListCredentialStore::NewItems newItemsOf(const PlatformOptions& options) {
@@ -55,7 +73,9 @@ platform::Platform withDesktop(const platform::Platform& local, platform::Creden
 DesktopPlatform::DesktopPlatform(const PlatformOptions& options)
     : _modules{options.systemLog ? options.systemLog : &_systemLog},
       _runLoops(_modules),
-      _local(withRunLoops(options, _runLoops)),
+      _nimbusDirectory(posix::RootFolder(options.root)),
+      _signIn(_nimbusDirectory, _accountServerArguments(), _modules),
+      _local(standingOn(options, _runLoops, _signIn)),
       _credentialStore(posix::RootFolder(options.root), _local.platform().processIdentity,
                        _local.platform().credentialStore, {}, newItemsOf(options), _modules),
       _onlineAccounts(
@@ -88,9 +108,29 @@ std::vector<platform::BackendReport> DesktopPlatform::backendReports() {
     platform::BackendReport accounts{"AccountService", "account file", "", ""};
     _onlineAccounts.describe(accounts);
     reports.push_back(accounts);
+    if (const auto server = _signIn.report()) {
+        reports.push_back(*server);
+    }
     const std::vector<platform::BackendReport> network = _network.reports();
     reports.insert(reports.end(), network.begin(), network.end());
     return reports;
+}
+
+AccountServerModule::Arguments DesktopPlatform::_accountServerArguments() {
+    const auto seconds = [this](local::Setting setting) {
+        return std::chrono::seconds(std::stoi(_local.setting(setting))); // a number, or it would not be there
+    };
+    return {[this, seconds] {
+                return AccountServerSettings{_local.setting(local::Setting::AccountServer),
+                                             _local.setting(local::Setting::AccountServerAuthority),
+                                             seconds(local::Setting::AccountServerConnectSeconds),
+                                             seconds(local::Setting::AccountServerSeconds)};
+            },
+            [this] {
+                return accountserver::Machine{
+                    _local.productName().value_or(""),
+                    _local.platform().systemVersionInfo.productVersion().value_or(""), messagesLocale()};
+            }};
 }
 
 OnlineAccountSurroundings DesktopPlatform::_accountSurroundings(const std::string& root) {

@@ -8,6 +8,7 @@
 #include "backends/desktop/DesktopNetwork.h"
 #include "backends/desktop/accounts/OnlineAccountService.h"
 #include "backends/desktop/accounts/OnlineAccountsModule.h"
+#include "backends/desktop/accountserver/DesktopSignIn.h"
 #include "backends/desktop/credentials/DesktopCredentialStore.h"
 #include "backends/desktop/preferences/DesktopPreferenceStore.h"
 #include "backends/desktop/resolved/DesktopNameServers.h"
@@ -25,6 +26,11 @@ class DesktopPlatform final : public PlatformOwner {
   public:
     explicit DesktopPlatform(const PlatformOptions& options);
 
+    // Ends what is being asked of the account server.
+    ~DesktopPlatform() override { _signIn.stop(); }
+    DesktopPlatform(const DesktopPlatform&) = delete;
+    DesktopPlatform& operator=(const DesktopPlatform&) = delete;
+
     const platform::Platform& platform() const override { return _platform; }
     platform::AccountDirectory& accountDirectory() override { return _local.accountDirectory(); }
     platform::SignInDirectory& signInDirectory() override { return _local.signInDirectory(); }
@@ -33,12 +39,15 @@ class DesktopPlatform final : public PlatformOwner {
     platform::SettingsReport settings() override { return _local.settings(); }
 
   private:
+    AccountServerModule::Arguments _accountServerArguments();
     OnlineAccountSurroundings _accountSurroundings(const std::string& root);
 
     local::LocalSystemLog _systemLog; // where the program has chosen no other
     const Modules _modules;
     DesktopRunLoops _runLoops;
-    local::LocalPlatform _local; // stands on _runLoops
+    local::NimbusDirectory _nimbusDirectory;
+    DesktopSignIn _signIn;
+    local::LocalPlatform _local; // stands on _runLoops and _signIn
     DesktopCredentialStore _credentialStore;
     DesktopModule<OnlineAccountsModule> _onlineAccounts;
     OnlineAccountService _accountService;

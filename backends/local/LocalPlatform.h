@@ -42,6 +42,9 @@ class LocalPlatform final : public PlatformOwner {
     // The value of a setting, for the backends beside these; see LocalSettings.
     const std::string& setting(Setting setting) { return _settings.value(setting); }
 
+    // What the system is called, or none; see LocalSystemVersionInfo.
+    std::optional<std::string> productName() { return _systemVersionInfo.productName(); }
+
   private:
     const posix::RootFolder _root;
     LocalSystemLog _systemLog;

@@ -13,8 +13,13 @@ namespace welcomer::local {
 namespace {
 
 // By Setting.
-constexpr std::array<std::string_view, kSettingCount> kBuiltIn = {
-    configuration::kOnlineAccountProvider, configuration::kOnlineAccountServer, configuration::kPluginFolder};
+constexpr std::array<std::string_view, kSettingCount> kBuiltIn = {"",
+                                                                  "",
+                                                                  "10",
+                                                                  "30",
+                                                                  configuration::kOnlineAccountProvider,
+                                                                  configuration::kOnlineAccountServer,
+                                                                  configuration::kPluginFolder};
 
 } // namespace
 

@@ -7,8 +7,6 @@ namespace welcomer::local {
 
 namespace {
 
-constexpr std::string_view kAssignment = "VERSION_ID=";
-
 // A value as a shell reads it: within quotes of either kind, and with backslashes before characters that
 // stand for themselves.
 std::string unquoted(std::string_view text) {
@@ -35,21 +33,21 @@ std::string_view trimmed(std::string_view line) {
 
 } // namespace
 
-std::optional<std::string> LocalSystemVersionInfo::productVersion() {
+std::optional<std::string> LocalSystemVersionInfo::_value(std::string_view assignment) {
     std::optional<std::string> text = _fileSystem.readText("/etc/os-release");
     if (!text) {
         text = _fileSystem.readText("/usr/lib/os-release");
     }
-    std::optional<std::string> version; // the last assignment counts
+    std::optional<std::string> value; // the last assignment counts
     std::string_view rest = text ? std::string_view(*text) : std::string_view();
     while (!rest.empty()) {
         const std::string_view line = rest.substr(0, rest.find('\n'));
-        if (line.starts_with(kAssignment)) {
-            version = unquoted(trimmed(line.substr(kAssignment.size())));
+        if (line.starts_with(assignment)) {
+            value = unquoted(trimmed(line.substr(assignment.size())));
         }
         rest.remove_prefix(line.size() == rest.size() ? line.size() : line.size() + 1);
     }
-    return version && version->empty() ? std::nullopt : version;
+    return value && value->empty() ? std::nullopt : value;
 }
 
 } // namespace welcomer::local

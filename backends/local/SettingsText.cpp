@@ -32,26 +32,57 @@ bool isHost(std::string_view text) {
            consistsOf(text.substr(text.size() - 1), {kLetters, kDigits});
 }
 
+// A host, perhaps with a port.
+bool isServer(std::string_view text) {
+    const std::size_t colon = text.find(':');
+    const std::string_view port = colon == std::string_view::npos ? "0" : text.substr(colon + 1);
+    return isHost(text.substr(0, colon)) && !port.empty() && port.size() <= 5 && consistsOf(port, {kDigits});
+}
+
+bool isPath(std::string_view text) {
+    return consistsOf(text, {kLetters, kDigits, "./_~-"});
+}
+
 bool isAddress(std::string_view text) {
     if (text.size() > kMaximumAddress || (!text.starts_with("https://") && !text.starts_with("http://"))) {
         return false;
     }
     text.remove_prefix(text.find("//") + 2);
     const std::size_t slash = text.find('/');
-    if (slash == std::string_view::npos) {
-        return false;
-    }
-    const std::string_view server = text.substr(0, slash);
-    const std::size_t colon = server.find(':');
-    const std::string_view port = colon == std::string_view::npos ? "0" : server.substr(colon + 1);
-    return isHost(server.substr(0, colon)) && !port.empty() && port.size() <= 5 &&
-           consistsOf(port, {kDigits}) && consistsOf(text.substr(slash), {kLetters, kDigits, "./_~-"});
+    return slash != std::string_view::npos && isServer(text.substr(0, slash)) && isPath(text.substr(slash));
 }
 
 bool isFolder(std::string_view text) {
     return text.starts_with('/') && text.size() < PATH_MAX && findInvalidXMLText(text) == std::string::npos &&
            std::ranges::none_of(
                text, [](char each) { return static_cast<unsigned char>(each) < ' ' || each == '\x7f'; });
+}
+
+constexpr std::string_view kHTTPS = "https://";
+constexpr std::string_view kUnix = "unix:";
+constexpr std::size_t kMaximumSocketPath = 107; // bytes; what the system has room for
+
+// Empty for none. Nothing but TLS goes over a network.
+bool isAccountServer(std::string_view text) {
+    if (text.starts_with(kUnix)) {
+        text.remove_prefix(kUnix.size());
+        return isFolder(text) && text.size() <= kMaximumSocketPath;
+    }
+    if (text.empty() || !text.starts_with(kHTTPS) || text.size() > kMaximumAddress) {
+        return text.empty();
+    }
+    text.remove_prefix(kHTTPS.size());
+    const std::size_t slash = std::min(text.find('/'), text.size());
+    return isServer(text.substr(0, slash)) && isPath(text.substr(slash));
+}
+
+bool isFileOrNone(std::string_view text) {
+    return text.empty() || isFolder(text);
+}
+
+bool isSeconds(std::string_view text) {
+    return !text.empty() && text.size() <= 3 && consistsOf(text, {kDigits}) &&
+           consistsOf(text.substr(0, 1), {"123456789"});
 }
 
 // What there is to know of each setting, by Setting.
@@ -61,6 +92,10 @@ struct Kind {
     const char* whatItIs;
 };
 constexpr std::array<Kind, kSettingCount> kKinds = {
+    Kind{"AccountServer", isAccountServer, "https://HOST, perhaps with a port and a path, nor unix:/PATH"},
+    Kind{"AccountServerAuthority", isFileOrNone, "the path of a file, which begins with /"},
+    Kind{"AccountServerConnectSeconds", isSeconds, "a number of seconds from 1 to 999"},
+    Kind{"AccountServerSeconds", isSeconds, "a number of seconds from 1 to 999"},
     Kind{"OnlineAccountProvider", isProvider, "a provider, such as owncloud"},
     Kind{"OnlineAccountServer", isAddress, "an address, such as https://services.example/"},
     Kind{"PluginFolder", isFolder, "the path of a folder, which begins with /"}};

@@ -12,8 +12,16 @@
 namespace welcomer::local {
 
 // What can be set for all users of a machine.
-enum class Setting : std::size_t { OnlineAccountProvider, OnlineAccountServer, PluginFolder };
-inline constexpr std::size_t kSettingCount = 3;
+enum class Setting : std::size_t {
+    AccountServer,
+    AccountServerAuthority,
+    AccountServerConnectSeconds,
+    AccountServerSeconds,
+    OnlineAccountProvider,
+    OnlineAccountServer,
+    PluginFolder
+};
+inline constexpr std::size_t kSettingCount = 7;
 
 // How a setting is called in a settings file. Any thread.
 const char* nameOf(Setting setting);

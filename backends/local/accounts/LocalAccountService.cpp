@@ -1,9 +1,11 @@
 #include "backends/local/accounts/LocalAccountService.h"
 
+#include "backends/posix/SecretText.h"
 #include "platform/Duration.h"
 #include "propertylist/Lookup.h"
 #include "propertylist/PropertyListReadings.h"
 
+#include <optional>
 #include <type_traits>
 #include <utility>
 
@@ -145,14 +147,28 @@ class LocalAccountService::Account final : public platform::CloudAccount {
 
 // One authentication or sign-in that is under way.
 struct LocalAccountService::Operation {
-    std::string username;
-    std::string password;
-    bool isSignIn = false;
-    std::shared_ptr<Accounts> accounts;
+    Operation(std::string user, const std::string& secret, PropertyList::Dictionary request, bool signsIn,
+              std::shared_ptr<Accounts> on)
+        : username(std::move(user)),
+          password(std::in_place, secret),
+          delegateRequest(std::move(request)),
+          isSignIn(signsIn),
+          accounts(std::move(on)) {}
+
+    const std::string username;
+    std::optional<posix::SecretText> password; // none once it has been checked
+    const PropertyList::Dictionary delegateRequest;
+    const bool isSignIn;
+    const std::shared_ptr<Accounts> accounts;
     std::shared_ptr<platform::RunLoop> runLoop;  // of the thread that started it
     std::shared_ptr<platform::RunLoopPort> port; // keeps that loop waiting for the answer
 
-    // On a thread of the global queue.
+    // Each on a thread of the global queue.
+    platform::SignInAnswer ask() {
+        platform::SignInAnswer answer = accounts->directory.answer(username, password->text(), delegateRequest);
+        password.reset();
+        return answer;
+    }
     platform::Notification notification(const platform::SignInAnswer& answer) {
         platform::Notification result{_name(answer.isCompleted), nullptr, answer.contents};
         const auto logIn = [this](PropertyList::Dictionary& content) {
@@ -225,13 +241,13 @@ LocalAccountService::accountForID(const std::optional<PropertyList>& identifier,
 }
 
 void LocalAccountService::authenticate(const std::string& username, const std::string& password,
-                                       const PropertyList::Dictionary& /*delegateRequest*/) {
-    _start(std::make_shared<Operation>(Operation{username, password, false, _accounts, {}, {}}));
+                                       const PropertyList::Dictionary& delegateRequest) {
+    _start(std::make_shared<Operation>(username, password, delegateRequest, false, _accounts));
 }
 
 void LocalAccountService::finishSignIn(const std::string& username, const std::string& password,
-                                       const PropertyList::Dictionary& /*delegateRequest*/) {
-    _start(std::make_shared<Operation>(Operation{username, password, true, _accounts, {}, {}}));
+                                       const PropertyList::Dictionary& delegateRequest) {
+    _start(std::make_shared<Operation>(username, password, delegateRequest, true, _accounts));
 }
 
 void LocalAccountService::markSetupFinished(const std::optional<PropertyList>& /*information*/) {
@@ -254,8 +270,7 @@ void LocalAccountService::_start(const std::shared_ptr<Operation>& operation) {
     };
     platform::DispatchQueue& queue = _dispatchQueues.global();
     queue.async([&queue, operation, deliver, sender = static_cast<const void*>(this)] {
-        const platform::SignInAnswer answer =
-            operation->accounts->directory.answer(operation->username, operation->password);
+        const platform::SignInAnswer answer = operation->ask();
         queue.asyncAfter(platform::nanosecondsOf(answer.delaySeconds), [operation, deliver, sender, answer] {
             platform::Notification notification = operation->notification(answer);
             notification.sender = sender;

@@ -100,20 +100,58 @@ void setMailAddress(PropertyList::Dictionary& services, const PropertyList& addr
 
 } // namespace
 
-platform::SignInAnswer NimbusDirectory::answer(const std::string& username,
-                                               const std::string& password) const {
+NimbusDirectory::Found NimbusDirectory::_find(const std::string& username,
+                                              const std::string& password) const {
     const std::optional<PropertyList::Dictionary> users = _users();
     if (!users) {
-        return accountError(platform::kSKAccountErrorServerUnavailable);
+        return {std::nullopt, accountError(platform::kSKAccountErrorServerUnavailable)};
     }
     const PropertyList* const user = valueIn(*users, username);
     if (!user) {
-        return accountError(platform::kSKAccountErrorUnknownUser);
+        return {std::nullopt, accountError(platform::kSKAccountErrorUnknownUser)};
     }
     if (!isRightPassword(*user, password)) {
-        return accountError(platform::kSKAccountErrorWrongPassword);
+        return {std::nullopt, accountError(platform::kSKAccountErrorWrongPassword)};
     }
-    return answerOf(username, *user);
+    return {*user, {}};
+}
+
+platform::SignInAnswer NimbusDirectory::answer(const std::string& username, const std::string& password,
+                                               const PropertyList::Dictionary& /*delegateRequest*/) const {
+    const Found found = _find(username, password);
+    return found.user ? answerOf(username, *found.user) : found.refusal;
+}
+
+platform::SignInAnswer NimbusDirectory::acceptTerms(const std::string& username, const std::string& password,
+                                                    const PropertyList& terms) const {
+    const Found found = _find(username, password);
+    if (!found.user) {
+        return found.refusal;
+    }
+    platform::SignInAnswer answer{true, {}, 0};
+    const platform::Outcome outcome = _change([&](PropertyList::Dictionary& users, const std::string&) {
+        PropertyList::Dictionary* const user = dictionaryIn(users, username);
+        const PropertyList* const error = valueIn(user, kAccountErrorKey);
+        if (!error || integerIn(*error) != platform::kSKAccountErrorTermsOfService) {
+            return platform::Outcome::success();
+        }
+        const PropertyList* const info = valueIn(user, kAccountErrorInfoKey);
+        if (!info || *info != terms) {
+            answer = accountError(platform::kSKAccountErrorTermsOfService);
+            if (info) {
+                answer.contents.insert_or_assign(platform::kSKPropertyAccountErrorInfo, *info);
+            }
+            return platform::Outcome::success();
+        }
+        user->erase(kAccountErrorKey);
+        user->erase(kAccountErrorInfoKey);
+        return platform::Outcome::success();
+    });
+    if (!outcome) {
+        answer = accountError(platform::kSKAccountErrorServerUnavailable);
+        answer.contents.insert_or_assign(platform::kSKPropertyAccountErrorInfo, outcome.error.message);
+    }
+    return answer;
 }
 
 PropertyList::Dictionary NimbusDirectory::servicesOfNewAccount(const std::string& username) const {

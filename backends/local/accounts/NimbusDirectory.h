@@ -38,9 +38,16 @@ class NimbusDirectory final : public platform::SignInDirectory {
     explicit NimbusDirectory(posix::RootFolder root) : _root(std::move(root)) {}
 
     // Each reads the file anew; one that is damaged counts as one that cannot be read.
-    platform::SignInAnswer answer(const std::string& username, const std::string& password) const override;
+    platform::SignInAnswer answer(const std::string& username, const std::string& password,
+                                  const PropertyList::Dictionary& delegateRequest) const override;
+    std::string server() const override { return ""; }
     PropertyList::Dictionary servicesOfNewAccount(const std::string& username) const override;
     std::optional<std::vector<std::string>> userNames() const override;
+
+    // Takes the account error for the terms of service, with its info, from the user. What is to be accepted
+    // is the info; other terms than that are none.
+    platform::SignInAnswer acceptTerms(const std::string& username, const std::string& password,
+                                       const PropertyList& terms) const override;
 
     // Writes a user. A directory that is made for it is its owner's alone: whoever can read it can try
     // passwords. A damaged one is left as it is. Any thread and any process.
@@ -58,8 +65,14 @@ class NimbusDirectory final : public platform::SignInDirectory {
     using Change = std::function<platform::Outcome(PropertyList::Dictionary&, const std::string&)>;
     platform::Outcome _change(const Change& change) const;
 
-    // What the directory has about a user; none when it cannot be read.
-    std::optional<PropertyList::Dictionary> _users() const;
+    std::optional<PropertyList::Dictionary> _users() const; // none when it cannot be read
+
+    // What the directory has about a user, or why the password opens nothing.
+    struct Found {
+        std::optional<PropertyList> user;
+        platform::SignInAnswer refusal;
+    };
+    Found _find(const std::string& username, const std::string& password) const;
 
     const posix::RootFolder _root;
 };

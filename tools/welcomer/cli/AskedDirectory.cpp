@@ -1,5 +1,6 @@
 #include "tools/welcomer/cli/AskedDirectory.h"
 
+#include "backends/posix/SecretText.h"
 #include "platform/AccountService.h"
 #include "propertylist/Lookup.h"
 #include "propertylist/PropertyListWriter.h"
@@ -19,7 +20,11 @@ namespace {
 constexpr char kQuestionKey[] = "Question";
 constexpr char kUserKey[] = "User";
 constexpr char kPasswordKey[] = "Password";
+constexpr char kRequestKey[] = "Request";
+constexpr char kTermsKey[] = "Terms";
 constexpr char kAnswerQuestion[] = "answer";
+constexpr char kAcceptQuestion[] = "accept";
+constexpr char kServerQuestion[] = "server";
 constexpr char kServicesQuestion[] = "services";
 constexpr char kNamesQuestion[] = "names";
 
@@ -28,6 +33,7 @@ constexpr char kContentsKey[] = "Contents";
 constexpr char kDelayKey[] = "DelaySeconds";
 constexpr char kServicesKey[] = "Services";
 constexpr char kNamesKey[] = "Names";
+constexpr char kServerKey[] = "Server";
 
 constexpr std::uint32_t kLongestMessage = 64U << 20U; // bytes
 
@@ -62,11 +68,13 @@ bool receiveAll(int socket, char* bytes, std::size_t size) {
 
 // What cannot be written is sent as nothing.
 bool sendMessage(int socket, const PropertyList& message) {
-    const std::string bytes = writeXMLPropertyList(message).value_or("");
+    std::string bytes = writeXMLPropertyList(message).value_or("");
     const auto size = static_cast<std::uint32_t>(bytes.size());
-    return bytes.size() <= kLongestMessage &&
-           sendAll(socket, reinterpret_cast<const char*>(&size), sizeof(size)) &&
-           sendAll(socket, bytes.data(), bytes.size());
+    const bool isSent = bytes.size() <= kLongestMessage &&
+                        sendAll(socket, reinterpret_cast<const char*>(&size), sizeof(size)) &&
+                        sendAll(socket, bytes.data(), bytes.size());
+    posix::wipe(bytes); // there may be a password in it
+    return isSent;
 }
 
 // None at the end of all messages, and for one that makes no sense.
@@ -79,7 +87,9 @@ std::optional<PropertyList> receiveMessage(int socket) {
     if (!receiveAll(socket, bytes.data(), bytes.size())) {
         return std::nullopt;
     }
-    return readXMLPropertyList(bytes).value;
+    std::optional<PropertyList> message = readXMLPropertyList(bytes).value;
+    posix::wipe(bytes);
+    return message;
 }
 
 std::string bytesIn(const PropertyList& message, const char* key) {
@@ -95,15 +105,27 @@ PropertyList::Array dataOf(const std::vector<std::string>& texts) {
     return data;
 }
 
+PropertyList::Dictionary written(const platform::SignInAnswer& answer) {
+    return {{kCompletedKey, answer.isCompleted},
+            {kContentsKey, answer.contents},
+            {kDelayKey, answer.delaySeconds}};
+}
+
 PropertyList replyTo(const PropertyList& question, const platform::SignInDirectory& directory) {
     const std::string* const kind = textIn(question, kQuestionKey);
     const std::string user = bytesIn(question, kUserKey);
     PropertyList::Dictionary reply;
     if (kind && *kind == kAnswerQuestion) {
-        const platform::SignInAnswer answer = directory.answer(user, bytesIn(question, kPasswordKey));
-        reply = {{kCompletedKey, answer.isCompleted},
-                 {kContentsKey, answer.contents},
-                 {kDelayKey, answer.delaySeconds}};
+        const posix::SecretText password(bytesIn(question, kPasswordKey));
+        reply = written(directory.answer(
+            user, password.text(),
+            copyOf(dictionaryIn(question, kRequestKey)).value_or(PropertyList::Dictionary())));
+    } else if (kind && *kind == kAcceptQuestion) {
+        const posix::SecretText password(bytesIn(question, kPasswordKey));
+        reply = written(directory.acceptTerms(user, password.text(),
+                                              copyOf(valueIn(question, kTermsKey)).value_or(PropertyList())));
+    } else if (kind && *kind == kServerQuestion) {
+        reply = {{kServerKey, PropertyList::Data{directory.server()}}};
     } else if (kind && *kind == kServicesQuestion) {
         reply = {{kServicesKey, directory.servicesOfNewAccount(user)}};
     } else if (kind && *kind == kNamesQuestion) {
@@ -116,11 +138,29 @@ PropertyList replyTo(const PropertyList& question, const platform::SignInDirecto
 
 } // namespace
 
-platform::SignInAnswer AskedDirectory::answer(const std::string& username,
-                                              const std::string& password) const {
-    const PropertyList reply = _ask({{kQuestionKey, kAnswerQuestion},
-                                     {kUserKey, PropertyList::Data{username}},
-                                     {kPasswordKey, PropertyList::Data{password}}});
+platform::SignInAnswer AskedDirectory::answer(const std::string& username, const std::string& password,
+                                              const PropertyList::Dictionary& delegateRequest) const {
+    return _askWithPassword({{kQuestionKey, kAnswerQuestion},
+                             {kUserKey, PropertyList::Data{username}},
+                             {kRequestKey, delegateRequest}},
+                            password);
+}
+
+platform::SignInAnswer AskedDirectory::acceptTerms(const std::string& username, const std::string& password,
+                                                   const PropertyList& terms) const {
+    return _askWithPassword(
+        {{kQuestionKey, kAcceptQuestion}, {kUserKey, PropertyList::Data{username}}, {kTermsKey, terms}},
+        password);
+}
+
+std::string AskedDirectory::server() const {
+    return bytesIn(_ask({{kQuestionKey, kServerQuestion}}), kServerKey);
+}
+
+platform::SignInAnswer AskedDirectory::_askWithPassword(PropertyList::Dictionary question,
+                                                        const std::string& password) const {
+    question[kPasswordKey] = PropertyList::Data{password};
+    const PropertyList reply = _ask(std::move(question));
     const PropertyList::Dictionary* const contents = dictionaryIn(reply, kContentsKey);
     if (!contents) {
         return {false, {{platform::kSKPropertyAccountError, platform::kSKAccountErrorServerUnavailable}}, 0};

@@ -34,6 +34,10 @@ TEST_F(LocalSettingsTest, WithoutAFileTheBuildsValuesHold) {
     EXPECT_EQ(settings.value(Setting::OnlineAccountProvider), configuration::kOnlineAccountProvider);
     EXPECT_EQ(settings.value(Setting::OnlineAccountServer), configuration::kOnlineAccountServer);
     EXPECT_EQ(settings.value(Setting::PluginFolder), configuration::kPluginFolder);
+    EXPECT_EQ(settings.value(Setting::AccountServer), "");
+    EXPECT_EQ(settings.value(Setting::AccountServerAuthority), "");
+    EXPECT_EQ(settings.value(Setting::AccountServerConnectSeconds), "10");
+    EXPECT_EQ(settings.value(Setting::AccountServerSeconds), "30");
     EXPECT_EQ(
         reported(Setting::PluginFolder),
         (platform::SettingReport{"PluginFolder", std::string(configuration::kPluginFolder), "the build"}));

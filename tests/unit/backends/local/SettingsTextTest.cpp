@@ -81,6 +81,33 @@ TEST(SettingsTextTest, AnAddressHasASchemeAHostAndAPath) {
     EXPECT_EQ(readSettings("OnlineAccountServer=https://a/" + std::string(1015, 'b')).problems.size(), 1U);
 }
 
+TEST(SettingsTextTest, AnAccountServerIsAskedOverTLSOrASocketOfTheMachineAlone) {
+    for (const char* const value :
+         {"", "https://accounts.example", "https://accounts.example:8443/a/b/", "unix:/run/welcomer/socket"}) {
+        EXPECT_EQ(valueIn(readSettings(std::string("AccountServer=") + value), Setting::AccountServer), value);
+    }
+    for (const std::string& value :
+         {std::string("http://accounts.example"), std::string("accounts.example"), std::string("https://"),
+          std::string("https://user@a"), std::string("https://a/?q"), std::string("unix:run/a"),
+          std::string("unix:"), "unix:/" + std::string(107, 'a'), "https://a/" + std::string(1015, 'b')}) {
+        EXPECT_EQ(problemWith("AccountServer=" + value),
+                  "line 1: AccountServer is not https://HOST, perhaps with a port and a path, nor unix:/PATH");
+    }
+    EXPECT_EQ(problemWith("AccountServerAuthority=a"),
+              "line 1: AccountServerAuthority is not the path of a file, which begins with /");
+    EXPECT_EQ(readSettings("AccountServerAuthority=").problems, Texts{});
+}
+
+TEST(SettingsTextTest, SecondsAreAWholeNumberFromOneTo999) {
+    for (const char* const value : {"", "0", "01", "1.5", "-1", "1000", "x"}) {
+        for (const std::string name : {"AccountServerSeconds", "AccountServerConnectSeconds"}) {
+            EXPECT_EQ(problemWith(name + "=" + value),
+                      "line 1: " + name + " is not a number of seconds from 1 to 999");
+        }
+    }
+    EXPECT_EQ(valueIn(readSettings("AccountServerSeconds=999"), Setting::AccountServerSeconds), "999");
+}
+
 TEST(SettingsTextTest, AFolderIsAnAbsolutePathWithoutControlCharacters) {
     for (const std::string& value :
          {std::string(), std::string("a"), std::string("/a\tb"), std::string("/a\x7f"), std::string("/\xff"),

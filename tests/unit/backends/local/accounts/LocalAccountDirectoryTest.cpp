@@ -122,7 +122,7 @@ TYPED_TEST(AccountDirectoryContract, WhereNobodyIsLoggedInNobodyIsSignedOut) {
 class LocalAccountDirectoryTest : public testing::Test {
   protected:
     SignInAnswer answer(const std::string& name, const std::string& password) const {
-        return local::NimbusDirectory(posix::RootFolder(local.root.path())).answer(name, password);
+        return local::NimbusDirectory(posix::RootFolder(local.root.path())).answer(name, password, {});
     }
     mode_t mode(const std::string& path) const {
         struct stat status = {};

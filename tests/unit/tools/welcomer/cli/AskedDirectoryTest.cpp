@@ -16,9 +16,17 @@ namespace {
 using Dictionary = PropertyList::Dictionary;
 
 struct FixedDirectory final : platform::SignInDirectory {
-    platform::SignInAnswer answer(const std::string& username, const std::string& password) const override {
-        return {password == "se\x01\xffret", {{"user", PropertyList::Data{username}}, {"more", more}}, 2.5};
+    platform::SignInAnswer answer(const std::string& username, const std::string& password,
+                                  const Dictionary& delegateRequest) const override {
+        return {password == "se\x01\xffret",
+                {{"user", PropertyList::Data{username}}, {"asked", delegateRequest}, {"more", more}},
+                2.5};
     }
+    platform::SignInAnswer acceptTerms(const std::string& username, const std::string& password,
+                                       const PropertyList& terms) const override {
+        return {password == "se\x01\xffret", {{"user", PropertyList::Data{username}}, {"terms", terms}}, 0};
+    }
+    std::string server() const override { return "https://accounts.example"; }
     Dictionary servicesOfNewAccount(const std::string& username) const override { return {{"of", username}}; }
     std::optional<std::vector<std::string>> userNames() const override { return names; }
 
@@ -57,13 +65,25 @@ class AskedDirectoryTest : public testing::Test {
 TEST_F(AskedDirectoryTest, TheAnswerIsTheOthersWhateverTheNameAndThePasswordAre) {
     const AskedDirectory& client = ask();
     for (const std::string name : {"anna", "an\x01na\xff", ""}) {
-        const platform::SignInAnswer answer = client.answer(name, "se\x01\xffret");
+        const platform::SignInAnswer answer = client.answer(name, "se\x01\xffret", {});
         EXPECT_TRUE(answer.isCompleted);
-        EXPECT_EQ(answer.contents, (Dictionary{{"user", PropertyList::Data{name}}, {"more", 1}}));
+        EXPECT_EQ(answer.contents,
+                  (Dictionary{{"user", PropertyList::Data{name}}, {"asked", Dictionary{}}, {"more", 1}}));
         EXPECT_EQ(answer.delaySeconds, 2.5);
     }
-    EXPECT_FALSE(client.answer("anna", "other").isCompleted);
+    EXPECT_FALSE(client.answer("anna", "other", {}).isCompleted);
     EXPECT_EQ(client.servicesOfNewAccount("anna"), (Dictionary{{"of", "anna"}}));
+}
+
+TEST_F(AskedDirectoryTest, TheRequestTheTermsAndTheServerArePassedOn) {
+    const AskedDirectory& client = ask();
+    const Dictionary request{{"delegates", Dictionary{{"org.example.notes", Dictionary{{"n", 1.5}}}}}};
+    EXPECT_EQ(client.answer("anna", "se\x01\xffret", request).contents.at("asked"), PropertyList(request));
+    const platform::SignInAnswer accepted = client.acceptTerms("anna", "se\x01\xffret", "v2");
+    EXPECT_TRUE(accepted.isCompleted);
+    EXPECT_EQ(accepted.contents, (Dictionary{{"user", PropertyList::Data{"anna"}}, {"terms", "v2"}}));
+    EXPECT_FALSE(client.acceptTerms("anna", "other", 1).isCompleted);
+    EXPECT_EQ(client.server(), "https://accounts.example");
 }
 
 TEST_F(AskedDirectoryTest, NamesNobodyAndNotKnowingThemAreThreeAnswers) {
@@ -77,14 +97,14 @@ TEST_F(AskedDirectoryTest, NamesNobodyAndNotKnowingThemAreThreeAnswers) {
 
 TEST_F(AskedDirectoryTest, ALongAnswerArrivesWhole) {
     directory.more = std::string(3'000'000, 'x');
-    const platform::SignInAnswer answer = ask().answer("anna", "se\x01\xffret");
+    const platform::SignInAnswer answer = ask().answer("anna", "se\x01\xffret", {});
     ASSERT_TRUE(answer.contents.contains("more"));
     EXPECT_EQ(answer.contents.at("more"), directory.more);
 }
 
 TEST_F(AskedDirectoryTest, WhatCannotBeHandedOnIsAServerThatCannotBeAsked) {
     directory.more = "\x01";
-    const platform::SignInAnswer answer = ask().answer("anna", "se\x01\xffret");
+    const platform::SignInAnswer answer = ask().answer("anna", "se\x01\xffret", {});
     EXPECT_FALSE(answer.isCompleted);
     EXPECT_EQ(answer.contents.at(platform::kSKPropertyAccountError),
               PropertyList(platform::kSKAccountErrorServerUnavailable));
@@ -93,7 +113,7 @@ TEST_F(AskedDirectoryTest, WhatCannotBeHandedOnIsAServerThatCannotBeAsked) {
 TEST_F(AskedDirectoryTest, SoIsOneWhoHasGone) {
     answering = posix::FileDescriptor();
     const AskedDirectory client(std::move(asking));
-    EXPECT_EQ(client.answer("anna", "se\x01\xffret").contents.at(platform::kSKPropertyAccountError),
+    EXPECT_EQ(client.answer("anna", "se\x01\xffret", {}).contents.at(platform::kSKPropertyAccountError),
               PropertyList(platform::kSKAccountErrorServerUnavailable));
     EXPECT_EQ(client.userNames(), std::nullopt);
     EXPECT_EQ(client.servicesOfNewAccount("anna"), Dictionary());

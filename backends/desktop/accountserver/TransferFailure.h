@@ -1,0 +1,30 @@
+// What a transfer that came to nothing says to people, so that they know what to do.
+
+#pragma once
+
+#include "backends/desktop/accountserver/AccountServerModule.h"
+
+#include <curl/curl.h>
+#include <string>
+
+namespace welcomer::desktop {
+
+struct TransferFailure {
+    CURLcode code = CURLE_OK;
+    std::string explanation; // libcurl's own, perhaps empty
+    long systemError = 0;    // of connecting, or 0
+    long verifyResult = 0;   // of the certificate, as the TLS library counts; 0 for none
+    bool wasConnected = false;
+    bool isTooLong = false; // the answer
+};
+
+// The server's name for people: "accounts.example:8443", "the socket /run/a".
+std::string shownServer(const AccountServerSettings& settings);
+
+// One line. Any thread.
+std::string explain(const TransferFailure& failure, const AccountServerSettings& settings);
+
+// Whether the same request may come to something else soon, if it has not been sent. Any thread.
+bool mayPass(const TransferFailure& failure);
+
+} // namespace welcomer::desktop
