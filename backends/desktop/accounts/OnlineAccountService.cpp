@@ -1,5 +1,6 @@
 #include "backends/desktop/accounts/OnlineAccountService.h"
 
+#include "backends/posix/SecretText.h"
 #include "propertylist/PropertyListReadings.h"
 
 #include <algorithm>
@@ -230,7 +231,7 @@ class OnlineAccountService::SignIn final : public platform::NotificationCenter,
     }
 
     void _finish(const platform::Notification& notification) {
-        _account.password.clear();
+        posix::wipe(_account.password);
         _surroundings.notificationCenter.post(notification);
         _isOver = true; // an observer that starts the next sign-in must not end this one
     }

@@ -165,7 +165,8 @@ struct LocalAccountService::Operation {
 
     // Each on a thread of the global queue.
     platform::SignInAnswer ask() {
-        platform::SignInAnswer answer = accounts->directory.answer(username, password->text(), delegateRequest);
+        platform::SignInAnswer answer =
+            accounts->directory.answer(username, password->text(), delegateRequest);
         password.reset();
         return answer;
     }

@@ -301,10 +301,20 @@ class SetupAtTerminal(AtTerminal, SetupTest):
         self.start("setup")
         self.answer("account's name: ", "anna")
         self.answer_password("Password for anna: ", PASSWORD)
+        self.answer(r"accepted first:\r\nhttps://nimbus.example/terms\r\nDo you accept them\? \[Y/n\] ", "n")
         rest, status = self.end()
         self.assertEqual(os.waitstatus_to_exitcode(status), 1)
         self.assertIn("the terms of service are to be accepted first (https://nimbus.example/terms)", rest)
         self.assertNotIn("try again", rest)
+
+    def test_terms_of_service_that_are_accepted_are_asked_for_no_more(self):
+        self.change_user(AccountError=3, AccountErrorInfo={"text": "Be kind.", "url": "https://nimbus.example/terms"})
+        self.start("setup")
+        self.answer("account's name: ", "anna")
+        self.answer_password("Password for anna: ", PASSWORD)
+        self.answer(r"accepted first:\r\nBe kind.\r\nhttps://nimbus.example/terms\r\nDo you accept them\? \[Y/n\] ", "y")
+        self.accept_everything()
+        self.assertEqual(self.json("account", "status")["loggedIn"], "anna")
 
     def test_the_end_of_the_input_at_the_password_ends_it_with_the_echo_back(self):
         self.start("setup")

@@ -153,7 +153,8 @@ int runCommand(const Command& command, const Options& options, const PlatformFac
     const platform::ScopedPlatform installed(owner->platform());
     const DamageReport damageReport(owner->platform().preferenceStore);
     ReportPrinter printer(std::cout, STDOUT_FILENO, options.json);
-    Session session{options, buildPlatform, owner->accountDirectory(), log, printer};
+    Session session{options, buildPlatform, owner->accountDirectory(), owner->signInDirectory(),
+                    log,     printer};
     const Report report = command(session);
     printer.print(report);
     std::cout.flush();

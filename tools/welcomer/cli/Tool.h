@@ -3,6 +3,7 @@
 #pragma once
 
 #include "platform/AccountDirectory.h"
+#include "platform/SignInDirectory.h"
 #include "tools/welcomer/cli/CommandLevel.h"
 #include "tools/welcomer/cli/KeptLog.h"
 #include "tools/welcomer/cli/PlatformFactory.h"
@@ -37,9 +38,10 @@ struct Options {
 struct Session {
     const Options& options;
     const PlatformFactory& buildPlatform;
-    platform::AccountDirectory& accountDirectory; // below the chosen root
-    const KeptLog& log;                           // the system's own log lines so far
-    ReportPrinter& printer;                       // for what people are told on the way
+    platform::AccountDirectory& accountDirectory;     // below the chosen root
+    const platform::SignInDirectory& signInDirectory; // whom signing in asks
+    const KeptLog& log;                               // the system's own log lines so far
+    ReportPrinter& printer;                           // for what people are told on the way
 };
 
 // A command's work: it returns what it has to say, and what it throws ends the tool with one line on stderr.

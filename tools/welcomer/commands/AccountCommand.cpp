@@ -184,11 +184,20 @@ Report status(Session& /*session*/) {
 Report signIn(Session& session, const SignInArguments& arguments) {
     refuseEmpty(arguments.user);
     SetupFlow::checkWhoIsLoggedIn(arguments.user);
-    const std::string password = getPassword(arguments.password, "Password for " + arguments.user + ":");
+    const std::string server = session.signInDirectory.server();
+    if (!server.empty()) {
+        session.printer.tell(Report({}, "Asking the account server " + server));
+    }
     SetupFlow flow(session.log, !session.options.verbose);
+    std::string password = getPassword(arguments.password, "Password for " + arguments.user + ":");
+    const WipedAtEnd wiped(password);
     flow.signIn(arguments.user, password);
     flow.complete({}, false); // no service: that is for setup
-    return Report({{"account", arguments.user}, {"signedIn", true}}, arguments.user + " is signed in.");
+    Report report({{"account", arguments.user}, {"signedIn", true}}, arguments.user + " is signed in.");
+    if (!server.empty()) {
+        report.document["server"] = server;
+    }
+    return report;
 }
 
 Report showServices(const std::string& user) {

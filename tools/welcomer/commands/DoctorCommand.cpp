@@ -49,6 +49,14 @@ Findings checkOverrides(const BackendReport& resolver) {
                    : Findings{};
 }
 
+// A server for signing in that does not answer as it should.
+Findings checkAccountServer(const std::vector<BackendReport>& backends) {
+    const auto server = std::ranges::find(backends, "SignInDirectory", &BackendReport::interface);
+    const bool isWrong = server != backends.end() && !server->advice.empty();
+    return isWrong ? Findings{{"account server", Verdict::Wrong, server->reason, server->advice}}
+                   : Findings{};
+}
+
 // What the doctor has seen.
 struct Examination {
     std::vector<BackendReport> backends;
@@ -75,6 +83,7 @@ Examination lookAtAll(Session& session) {
     add({checkLoadedCode()}); // the services have been asked, and their modules are loaded
     add(checkUnits(session.options.root == "/"));
     add(checkOverrides(seen.backends.back()));
+    add(checkAccountServer(seen.backends));
     for (const std::string& problem : seen.settings.problems) {
         add({{kSettingsSubject, Verdict::Wrong, problem, "see welcomer-platform.conf(5)"}});
     }

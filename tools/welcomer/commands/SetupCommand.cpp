@@ -3,6 +3,8 @@
 #include "cloud/WLNimbusServiceCatalogue.h"
 #include "handoff/LaunchAgentFile.h"
 #include "platform/Platform.h"
+#include "propertylist/Lookup.h"
+#include "text/Describe.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/story/HandOver.h"
@@ -65,13 +67,47 @@ std::string askForAccount(Terminal& terminal) {
     return account;
 }
 
+// Shows what is to be accepted and asks whether it is. Of an object people are shown the text and the address
+// in it.
+bool acceptsTerms(Terminal& terminal, const PropertyList& terms) {
+    terminal.say("");
+    terminal.say("The terms of service are to be accepted first:");
+    bool isShown = false;
+    for (const char* const key : {"text", "url"}) {
+        if (const std::string* const line = textIn(terms, key)) {
+            terminal.say(*line);
+            isShown = true;
+        }
+    }
+    if (!isShown) {
+        terminal.say(text::describe(terms));
+    }
+    return terminal.confirm("Do you accept them?");
+}
+
+// Signs in; terms of service that are to be accepted first are offered, once.
+void signInOrAccept(Terminal& terminal, SetupFlow& flow, const platform::SignInDirectory& directory,
+                    const std::string& account, const std::string& password) {
+    try {
+        flow.signIn(account, password);
+    } catch (const SignInFailure& failure) {
+        if (!failure.terms() || !acceptsTerms(terminal, *failure.terms())) {
+            throw;
+        }
+        flow.acceptTerms(directory, *failure.terms());
+        flow.signIn(account, password);
+    }
+}
+
 // Asks at the terminal until somebody is signed in; what may have been mistyped is asked for again.
-std::string signInAtTerminal(Terminal& terminal, SetupFlow& flow, const PasswordSource& source) {
+std::string signInAtTerminal(Terminal& terminal, SetupFlow& flow, const platform::SignInDirectory& directory,
+                             const PasswordSource& source) {
     std::string account = askForAccount(terminal);
     for (int attempt = 1;; ++attempt) {
-        const std::string password = getPassword(source, "Password for " + account + ":");
+        std::string password = getPassword(source, "Password for " + account + ":");
+        const WipedAtEnd wiped(password);
         try {
-            flow.signIn(account, password);
+            signInOrAccept(terminal, flow, directory, account, password);
             return account;
         } catch (const SignInFailure& failure) {
             const bool mayBeMistyped = failure.isWrongPassword() || failure.isUnknownUser();
@@ -139,7 +175,7 @@ void confirm(Terminal& terminal, const std::vector<AliasOffer>& offers, const De
     }
 }
 
-Report result(const Decisions& decisions, SetupFlow& flow) {
+Report result(const Decisions& decisions, SetupFlow& flow, const std::string& server) {
     const auto account =
         platform::current().accountService.sharedManager().accountForID(decisions.account, false);
     const std::vector<ServiceState> states = serviceStates(account.get());
@@ -151,11 +187,13 @@ Report result(const Decisions& decisions, SetupFlow& flow) {
     }
     const std::vector<std::string> delegates = flow.delegates();
     Report report;
-    report.document = {{"account", decisions.account},
-                       {"services", toJson(states)},
-                       {"aliases", decisions.aliases},
-                       {"launchAgent", kLaunchAgentLabel},
-                       {"atNextLogin", {{"services", later}, {"delegates", delegates}}}};
+    report.document = {
+        {"account", decisions.account},     {"server", server.empty() ? Json() : Json(server)},
+        {"services", toJson(states)},       {"aliases", decisions.aliases},
+        {"launchAgent", kLaunchAgentLabel}, {"atNextLogin", {{"services", later}, {"delegates", delegates}}}};
+    if (!server.empty()) {
+        report.document["server"] = server;
+    }
     report.lines({"", decisions.account + " is set up.", ""});
     addServiceTable(report, report.document["services"], "  ");
     return report.lines({"", "At the next login the agent starts, once. It",
@@ -217,14 +255,20 @@ Report setUp(Session& session, const SetupArguments& arguments) {
     if (answers) {
         SetupFlow::checkWhoIsLoggedIn(answers->decisions.account);
         const std::string& account = answers->decisions.account;
-        flow.signIn(account, arguments.firstLine
-                                 ? *arguments.firstLine
-                                 : getPassword(arguments.password, "Password for " + account + ":"));
+        std::string password = arguments.firstLine
+                                   ? *arguments.firstLine
+                                   : getPassword(arguments.password, "Password for " + account + ":");
+        const WipedAtEnd wiped(password);
+        flow.signIn(account, password);
         answers->choose(flow.aliasOffers());
         decisions = answers->decisions;
     } else {
         terminal->say("This sets up your cloud account for the desktop.");
-        decisions.account = signInAtTerminal(*terminal, flow, arguments.password);
+        const std::string server = session.signInDirectory.server();
+        if (!server.empty()) {
+            terminal->say("Your name and password go to the account server " + server);
+        }
+        decisions.account = signInAtTerminal(*terminal, flow, session.signInDirectory, arguments.password);
         const std::vector<AliasOffer> offers = flow.aliasOffers();
         decisions.aliases = chooseAliases(*terminal, offers);
         decisions.services = chooseServices(*terminal);
@@ -233,7 +277,7 @@ Report setUp(Session& session, const SetupArguments& arguments) {
     flow.checkHandOver(decisions.aliases);
     flow.complete(decisions.services, decisions.justTheAccountAndKVS);
     flow.handOver(decisions.aliases, *bundle);
-    return result(decisions, flow);
+    return result(decisions, flow, session.signInDirectory.server());
 }
 
 } // namespace

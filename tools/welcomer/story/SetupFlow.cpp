@@ -7,6 +7,7 @@
 #include "platform/Platform.h"
 #include "plugins/DelegateIdentifiers.h"
 #include "plugins/WLNimbusDelegatesRequest.h"
+#include "propertylist/Lookup.h"
 #include "propertylist/PropertyListReadings.h"
 #include "propertylist/UnwritableValue.h"
 #include "text/Describe.h"
@@ -63,6 +64,12 @@ std::string refusal(const PropertyList::Dictionary& response) {
         return "the server's account error is no number: " + text::describe(*error);
     }
     const PropertyList* information = find(response, platform::kSKPropertyAccountErrorInfo);
+    const std::string* const ownWords = information ? information->string() : nullptr;
+    const bool saysWhy = *code == platform::kSKAccountErrorServerUnavailable ||
+                         *code == platform::kSKAccountErrorWrongPassword;
+    if (ownWords && saysWhy) {
+        return *ownWords; // of a server that is asked over the network
+    }
     return textOf(*code) + (information ? " (" + text::describe(*information) + ")" : "");
 }
 
@@ -79,11 +86,19 @@ void SetupFlow::signIn(const std::string& account, const std::string& password) 
     const StandardOutputGuard guard;
     const WaitingLine waiting("Signing in", _showsWaiting);
     _account = account;
-    _password = password;
+    _password.emplace(password);
     _delegate = std::make_unique<NimbusTesselDelegate>(); // one is meant for one sign-in
     if (!_delegate->signInWithUsernameAndPasswordAdditionalDelegatesOmittingDelegatesError(account, password,
                                                                                            {}, {}, nullptr)) {
         throw _signInFailure();
+    }
+}
+
+void SetupFlow::acceptTerms(const platform::SignInDirectory& directory, const PropertyList& terms) const {
+    const WaitingLine waiting("Accepting the terms of service", _showsWaiting);
+    const platform::SignInAnswer answer = directory.acceptTerms(_account, _password->text(), terms);
+    if (!answer.isCompleted) {
+        throw _failure(answer.contents);
     }
 }
 
@@ -129,10 +144,11 @@ void SetupFlow::complete(const std::vector<std::string>& services, bool justTheA
     const PropertyList::Dictionary setup{{platform::kSKPropertyAccountID, _account}};
     if (!_delegate
              ->completeSetupWithUsernamePasswordNimbusDictionarySelectedServicesJustTheAccountAndKVSWindowError(
-                 _account, _password, setup, services, justTheAccountAndKVS, nullptr, nullptr)) {
+                 _account, _password->text(), setup, services, justTheAccountAndKVS, nullptr, nullptr)) {
         throw CommandFailure("the sign-in could not be completed: " +
                              (reason.empty() ? _log.reason() : reason));
     }
+    _password.reset();
 }
 
 void SetupFlow::handOver(const ChosenAliases& aliases, platform::ResourceBundle& bundle) {
@@ -156,13 +172,20 @@ PropertyList::Dictionary SetupFlow::_replayObject(const ChosenAliases& aliases) 
     return replay;
 }
 
+SignInFailure SetupFlow::_failure(const PropertyList::Dictionary& response) const {
+    const std::optional<std::int64_t> error = accountErrorOf(response);
+    const PropertyList* const info = find(response, platform::kSKPropertyAccountErrorInfo);
+    const bool asksForTerms = error == platform::kSKAccountErrorTermsOfService;
+    return {"cannot sign in " + _account + ": " + refusal(response), error,
+            asksForTerms ? copyOf(info) : std::nullopt};
+}
+
 SignInFailure SetupFlow::_signInFailure() const {
-    const std::string who = "cannot sign in " + _account + ": ";
     const auto& response = _delegate->delegatesResponseDict();
-    if (!response) {
-        return {who + "the server answered with a status other than 0", std::nullopt};
-    }
-    return {who + refusal(*response), accountErrorOf(*response)};
+    return response ? _failure(*response)
+                    : SignInFailure("cannot sign in " + _account +
+                                        ": the server answered with a status other than 0",
+                                    std::nullopt);
 }
 
 const PropertyList* SetupFlow::_response(const std::string& delegate) const {

@@ -2,9 +2,11 @@
 
 #pragma once
 
+#include "backends/posix/SecretText.h"
 #include "cloud/NimbusTesselDelegate.h"
 #include "platform/AccountService.h"
 #include "platform/ResourceBundle.h"
+#include "platform/SignInDirectory.h"
 #include "tools/welcomer/cli/KeptLog.h"
 #include "tools/welcomer/terminal/Failure.h"
 
@@ -13,6 +15,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace welcomer::tool {
@@ -21,9 +24,12 @@ namespace welcomer::tool {
 class SignInFailure : public CommandFailure {
   public:
     //  accountError  what the account service says, or none
-    SignInFailure(const std::string& reason, std::optional<std::int64_t> accountError)
+    //  terms         what is to be accepted, with the account error for the terms of service
+    SignInFailure(const std::string& reason, std::optional<std::int64_t> accountError,
+                  std::optional<PropertyList> terms = std::nullopt)
         : CommandFailure(reason),
-          _accountError(accountError) {}
+          _accountError(accountError),
+          _terms(std::move(terms)) {}
 
     // Whether another password may help.
     bool isWrongPassword() const { return _accountError == platform::kSKAccountErrorWrongPassword; }
@@ -31,8 +37,12 @@ class SignInFailure : public CommandFailure {
     // Whether another name may help.
     bool isUnknownUser() const { return _accountError == platform::kSKAccountErrorUnknownUser; }
 
+    // The terms of service that are to be accepted first, for SetupFlow::acceptTerms(); or none.
+    const std::optional<PropertyList>& terms() const { return _terms; }
+
   private:
     std::optional<std::int64_t> _accountError;
+    std::optional<PropertyList> _terms;
 };
 
 // The aliases that the server offers one of the messaging delegates.
@@ -62,6 +72,11 @@ class SetupFlow {
     // after that.
     void signIn(const std::string& account, const std::string& password);
 
+    // Says that the user who could not sign in has accepted the terms of service. The next step is to sign in
+    // again. Throws SignInFailure.
+    //  terms  as the failure had them
+    void acceptTerms(const platform::SignInDirectory& directory, const PropertyList& terms) const;
+
     // What there is to choose from, by delegate in a fixed order; delegates without a plug-in or a response
     // are left out.
     std::vector<AliasOffer> aliasOffers();
@@ -84,13 +99,14 @@ class SetupFlow {
 
   private:
     PropertyList::Dictionary _replayObject(const ChosenAliases& aliases) const;
+    SignInFailure _failure(const PropertyList::Dictionary& response) const;
     SignInFailure _signInFailure() const;
     const PropertyList* _response(const std::string& delegate) const;
 
     const KeptLog& _log;
     const bool _showsWaiting;
     std::string _account;
-    std::string _password;
+    std::optional<posix::SecretText> _password; // until the sign-in is complete
     std::unique_ptr<NimbusTesselDelegate> _delegate;
 };
 

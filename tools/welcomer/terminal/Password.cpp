@@ -19,6 +19,7 @@ constexpr const char* kInsteadOfTerminal = "--password-fd N";
 std::string readLine(int descriptor) {
     const std::string option = "--password-fd " + std::to_string(descriptor) + ": ";
     std::string line;
+    line.reserve(kLongestPassword + 1); // so that it stays in one place
     for (;;) {
         char byte = 0;
         const ssize_t count = ::read(descriptor, &byte, 1);

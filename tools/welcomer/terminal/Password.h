@@ -2,6 +2,8 @@
 
 #pragma once
 
+#include "backends/posix/SecretText.h"
+
 #include <optional>
 #include <string>
 
@@ -9,6 +11,19 @@ namespace welcomer::tool {
 
 // Where a command's password comes from: a descriptor, or the terminal.
 using PasswordSource = std::optional<int>;
+
+// Wipes a password at the end of its scope.
+class WipedAtEnd {
+  public:
+    //  password  borrowed
+    explicit WipedAtEnd(std::string& password) : _password(password) {}
+    ~WipedAtEnd() { posix::wipe(_password); }
+    WipedAtEnd(const WipedAtEnd&) = delete;
+    WipedAtEnd& operator=(const WipedAtEnd&) = delete;
+
+  private:
+    std::string& _password;
+};
 
 // Gets the password: the descriptor's first line, ended by LF or CR LF, or what is typed. Nothing beyond the
 // line is read.

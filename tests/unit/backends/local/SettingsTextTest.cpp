@@ -82,16 +82,18 @@ TEST(SettingsTextTest, AnAddressHasASchemeAHostAndAPath) {
 }
 
 TEST(SettingsTextTest, AnAccountServerIsAskedOverTLSOrASocketOfTheMachineAlone) {
-    for (const char* const value :
-         {"", "https://accounts.example", "https://accounts.example:8443/a/b/", "unix:/run/welcomer/socket"}) {
-        EXPECT_EQ(valueIn(readSettings(std::string("AccountServer=") + value), Setting::AccountServer), value);
+    for (const char* const value : {"", "https://accounts.example", "https://accounts.example:8443/a/b/",
+                                    "unix:/run/welcomer/socket"}) {
+        EXPECT_EQ(valueIn(readSettings(std::string("AccountServer=") + value), Setting::AccountServer),
+                  value);
     }
     for (const std::string& value :
          {std::string("http://accounts.example"), std::string("accounts.example"), std::string("https://"),
           std::string("https://user@a"), std::string("https://a/?q"), std::string("unix:run/a"),
           std::string("unix:"), "unix:/" + std::string(107, 'a'), "https://a/" + std::string(1015, 'b')}) {
-        EXPECT_EQ(problemWith("AccountServer=" + value),
-                  "line 1: AccountServer is not https://HOST, perhaps with a port and a path, nor unix:/PATH");
+        EXPECT_EQ(
+            problemWith("AccountServer=" + value),
+            "line 1: AccountServer is not https://HOST, perhaps with a port and a path, nor unix:/PATH");
     }
     EXPECT_EQ(problemWith("AccountServerAuthority=a"),
               "line 1: AccountServerAuthority is not the path of a file, which begins with /");
