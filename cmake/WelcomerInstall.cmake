@@ -2,7 +2,7 @@
 # for plug-in authors, each found by find_package(Welcomer) and by pkg-config.
 #
 # Components: `welcomer` the programs and what they need, `desktop` the modules, `library`, `dev` for setup applications,
-# `plugin-dev` for plug-in authors (nothing of it depends on the architecture), `resolver-sync`.
+# `plugin-dev` for plug-in authors (nothing of it depends on the architecture), `resolver-sync`, `account-server`.
 
 include(CMakePackageConfigHelpers)
 

@@ -17,10 +17,16 @@ std::string temporaryName(const std::string& name) {
     return "." + name + ".new";
 }
 
-int writeNewFile(int folder, const std::string& name, std::string_view content, mode_t mode) {
+// Whether a file has this group now, as far as this process may give it away.
+bool giveToGroup(int file, gid_t group) {
+    return group == ::getegid() || ::fchown(file, static_cast<uid_t>(-1), group) == 0 || errno == EPERM ||
+           errno == EINVAL;
+}
+
+int writeNewFile(int folder, const std::string& name, std::string_view content, mode_t mode, gid_t group) {
     const FileDescriptor file(
         ::openat(folder, name.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, mode));
-    if (!file || ::fchmod(file.get(), mode) != 0) {
+    if (!file || !giveToGroup(file.get(), group) || ::fchmod(file.get(), mode) != 0) {
         return errno;
     }
     if (const int error = writeAll(file.get(), content)) {
@@ -67,7 +73,9 @@ int replaceFile(int folder, const std::string& name, std::string_view content, m
                 AfterCrash afterCrash) {
     removeLeftOver(folder, name);
     const std::string temporary = temporaryName(name);
-    int error = writeNewFile(folder, temporary, content, mode);
+    struct stat present = {};
+    const bool isPresent = ::fstatat(folder, name.c_str(), &present, AT_SYMLINK_NOFOLLOW) == 0;
+    int error = writeNewFile(folder, temporary, content, mode, isPresent ? present.st_gid : ::getegid());
     if (error == 0 && ::renameat(folder, temporary.c_str(), folder, name.c_str()) != 0) {
         error = errno == EBUSY ? rewriteInPlace(folder, name, content) : errno;
         removeLeftOver(folder, name);
@@ -87,7 +95,7 @@ int replaceFile(int folder, const std::string& name, std::string_view content, m
 int createFile(int folder, const std::string& name, std::string_view content, mode_t mode) {
     removeLeftOver(folder, name);
     const std::string temporary = temporaryName(name);
-    int error = writeNewFile(folder, temporary, content, mode);
+    int error = writeNewFile(folder, temporary, content, mode, ::getegid());
     if (error == 0 && ::linkat(folder, temporary.c_str(), folder, name.c_str(), 0) != 0) {
         error = errno;
     }

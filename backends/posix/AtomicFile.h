@@ -18,7 +18,8 @@ enum class AfterCrash { New, OldOrNew };
 //  folder   a descriptor of the folder; the caller holds the lock of the file (FileLock.h)
 //  name     the file's name in it
 //  content  the new content, any bytes
-//  mode     the permissions of the new file, whatever the process's mask; a mount point keeps its own
+//  mode     the permissions of the new file, whatever the process's mask; a mount point keeps its own. The
+//           group stays, where this process may give a file to it: whoever could read it still can
 //  result   0, or the system's error number; the file is then unchanged and nothing is left beside it
 // Any thread.
 int replaceFile(int folder, const std::string& name, std::string_view content, mode_t mode,

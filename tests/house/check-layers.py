@@ -50,7 +50,8 @@ TOOL_ROOMS = {"tools/welcomer": ["terminal", "cli", "login", "story", "checks", 
 TESTS = {"tests"}
 # The only files, besides tests and the backends themselves, that may choose a backend, and what is offered to them.
 PROGRAMS = re.compile(r"^(agent/main\.cpp|tools/[^/]+/main\.cpp|examples/setup/[^/]+\.cpp)$")
-OFFERED = re.compile(r"^backends/(Backends|StoredNetwork|UnexpectedEnd|simulated/.+)\.h$")
+OFFERED = re.compile(
+    r"^backends/(Backends|StoredNetwork|UnexpectedEnd|simulated/.+|local/LocalSystemLog|local/accounts/NimbusDirectory)\.h$")
 
 # What of the backends tools may use, too: the bases on the kernel and on the bus, addresses as text, and what the account
 # server says.

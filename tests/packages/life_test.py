@@ -20,6 +20,7 @@ import booted_machine as booted  # noqa: E402
 MACHINE, PACKAGES, PACKAGES_BEFORE = None, (), ()
 LAUNCH, RESOLVER = "welcomer-launch-agents.service", "welcomer-resolver-sync.service"
 NETWORK = "welcomer-restore-network.service"
+ACCOUNTS = "welcomer-account-server.socket"
 USER = "newcomer"
 # What a machine itself writes while it runs, and what every package manager keeps for its own use.
 OWN_BUSINESS = ("dev", "proc", "root", "run", "sys", "tmp", "mnt", "var/cache", "var/lib/dpkg", "var/lib/systemd", "var/log",
@@ -101,12 +102,13 @@ class LifeTest(unittest.TestCase):
         left = self.machine.must(["find", "/var/lib/systemd", "/run/systemd", "/etc/systemd", "-name", "*welcomer*"])
         self.assertEqual(left, "")
 
-    def test_the_login_service_and_the_network_are_enabled_and_the_resolver_service_is_not(self):
+    def test_the_login_service_and_the_network_are_enabled_and_what_serves_others_is_not(self):
         self.machine.install(PACKAGES)
         self.assertEqual(self.state(LAUNCH, "--global"), "enabled")
         # At the next start, and not in the middle of an installation.
         self.assertEqual((self.state(NETWORK), self.is_active(NETWORK)), ("enabled", False))
-        self.assertEqual((self.state(RESOLVER), self.is_active(RESOLVER)), ("disabled", False))
+        for unit in (RESOLVER, ACCOUNTS):
+            self.assertEqual((self.state(unit), self.is_active(unit)), ("disabled", False))
         self.assertEqual(self.machine.must(["systemctl", "--failed", "--no-legend"]), "")
 
     def test_an_upgrade_keeps_what_is_in_use_and_what_the_administrator_has_decided(self):

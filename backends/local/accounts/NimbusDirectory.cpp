@@ -108,6 +108,8 @@ NimbusDirectory::Found NimbusDirectory::_find(const std::string& username,
     }
     const PropertyList* const user = valueIn(*users, username);
     if (!user) {
+        // It takes as long as a wrong password, so that nobody learns from it who is there.
+        static_cast<void>(!users->empty() && isRightPassword(users->begin()->second, password));
         return {std::nullopt, accountError(platform::kSKAccountErrorUnknownUser)};
     }
     if (!isRightPassword(*user, password)) {

@@ -37,7 +37,8 @@ class NimbusDirectory final : public platform::SignInDirectory {
   public:
     explicit NimbusDirectory(posix::RootFolder root) : _root(std::move(root)) {}
 
-    // Each reads the file anew; one that is damaged counts as one that cannot be read.
+    // Each reads the file anew; one that is damaged counts as one that cannot be read. An answer takes as long
+    // where there is no such user as where the password is wrong.
     platform::SignInAnswer answer(const std::string& username, const std::string& password,
                                   const PropertyList::Dictionary& delegateRequest) const override;
     std::string server() const override { return ""; }

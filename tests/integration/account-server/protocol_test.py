@@ -1,0 +1,258 @@
+#!/usr/bin/env python3
+"""The installed account server answers as the protocol's document says, on each of its sockets.
+
+usage: protocol_test.py BUILD_DIR
+"""
+
+import json
+import plistlib
+import re
+import shutil
+import subprocess
+import sys
+import tempfile
+import time
+import unittest
+from pathlib import Path
+
+TOP = Path(__file__).resolve().parents[3]
+sys.path.insert(0, str(TOP / "tests/support"))
+import account_server  # noqa: E402
+import machine  # noqa: E402
+from account_server import AccountServer, PASSWORD  # noqa: E402
+
+TERMS = {"version": "2026-10", "url": "https://services.nimbus.example/terms"}
+DELEGATES = {"com.corvid.chatter": {"status": 0, "aliases": ["anna@nimbus.example"]}}
+USERS = {
+    "anna": {"Response": {"status": 0, "delegates": DELEGATES}, "MailAddress": "anna@nimbus.example"},
+    "binary": {"Response": {"status": 0, "delegates": {"com.corvid.chatter": {"picture": b"\0\1"}}}},
+    "late": {"DelaySeconds": 1.5},
+    "terms": {"AccountError": 3, "AccountErrorInfo": TERMS},
+    "terms-of-others": {"AccountError": 3, "AccountErrorInfo": TERMS},
+    "repair": {"AccountError": 5, "AccountErrorInfo": "Call us."},
+    "broken": {"Fails": True},
+    "tried": {}, "tried-in-secret": {}, "counted": {},
+}
+WAYS = ("account", "tls", "clear")
+
+
+def rows_of_the_document():
+    """Status and type of each failure in the table."""
+    text = (TOP / "docs/account-server.md").read_text(encoding="utf-8")
+    return {name: int(status) for status, name in
+            re.findall(r"^\| (\d+) \| `urn:welcomer:problem:([a-z-]+)` \|", text, flags=re.M)}
+
+
+class Protocol(unittest.TestCase):
+    build = None
+
+    @classmethod
+    def setUpClass(cls):
+        cls.folder = Path(tempfile.mkdtemp(prefix="account-server-"))
+        cls.addClassCleanup(shutil.rmtree, cls.folder)
+        subprocess.run(["ip", "link", "set", "lo", "up"], check=True)
+        cls.machine = machine.Machine(cls.folder / "machine")
+        cls.addClassCleanup(cls.machine.stop)
+        cls.machine.install(cls.build)
+        cls.machine.start_system_log()
+        account_server.write_directory(cls.machine.root, USERS)
+        account_server.make_certificate(cls.folder, "authority")
+        for file in account_server.make_certificate(cls.folder, "server", "authority"):
+            shutil.copy(file, cls.machine.root / "etc")
+        tls = "Certificate=/etc/server.pem\nKey=/etc/server.key\n"
+        cls.authority = cls.folder / "authority.pem"
+        # One that tells unknown users and notes terms, and one that does neither.
+        cls.server = cls.start(f"{tls}UnknownUsers=told\nBodySeconds=2\n", "", certificate=cls.authority)
+        cls.other = cls.start(tls, "2", state=False, certificate=cls.authority)
+
+    @classmethod
+    def start(cls, settings, name, **options):
+        server = AccountServer(cls.machine, settings, name, **options)
+        cls.addClassCleanup(server.close)
+        server.start()
+        return server
+
+    def assert_answer(self, answer, status, problem=None):
+        self.assertEqual(answer.status, status, answer)
+        if problem:
+            self.assertEqual((answer.problem, answer.content["status"]), (problem, status))
+
+    def too_slow(self, use):
+        with self.server.open(use) as bare:
+            bare.sendall(b"POST /v1/authenticate HTTP/1.1\r\nHost: x\r\nContent-Type: application/json\r\n"
+                         b"Content-Length: 100\r\n\r\n{")
+            response = account_server.http.client.HTTPResponse(bare)
+            response.begin()
+            return account_server.Answer(response)
+
+    def too_many(self, use):
+        for _ in range(5):
+            self.server.authenticate("tried", "wrong", use)
+        return self.server.authenticate("tried", use=use)
+
+    def with_a_damaged_directory(self, use):
+        directory = self.machine.root / account_server.DIRECTORY
+        whole = directory.read_bytes()
+        directory.write_text("{", encoding="ascii")
+        try:
+            return self.server.authenticate(use=use)
+        finally:
+            directory.write_bytes(whole)
+
+    # How each failure of the table comes about, on one of the sockets.
+    FAILURES = {
+        "invalid-request": lambda self, use: self.server.authenticate(use=use, machine=None),
+        "wrong-password": lambda self, use: self.server.authenticate(password="wrong", use=use),
+        "unknown-user": lambda self, use: self.server.authenticate("nobody", use=use),
+        "wrong-credentials": lambda self, use: self.other.authenticate("nobody", use=use),
+        "terms-of-service": lambda self, use: self.server.authenticate("terms", use=use),
+        "repair": lambda self, use: self.server.authenticate("repair", use=use),
+        "no-such-resource": lambda self, use: self.server.request("GET", "/v2/authenticate", use=use),
+        "method-not-allowed": lambda self, use: self.server.request("PUT", "/v1/authenticate", "{}", use=use),
+        "not-acceptable": lambda self, use: self.server.authenticate("binary", use=use,
+                                                                     headers={"Accept": "application/json"}),
+        "request-timeout": too_slow,
+        "other-terms": lambda self, use: self.server.accept_terms("terms", {"version": "2026-09"}, use=use),
+        "content-too-large": lambda self, use: self.server.request(
+            "POST", "/v1/authenticate", None, {"Content-Type": "application/json", "Content-Length": str(2**24 + 1)}, use),
+        "unsupported-media-type": lambda self, use: self.server.request("POST", "/v1/authenticate", "user=anna",
+                                                                        {"Content-Type": "text/plain"}, use),
+        "too-many-tries": too_many,
+        "server-error": lambda self, use: self.server.authenticate("broken", use=use),
+        "not-supported": lambda self, use: self.other.accept_terms("terms", TERMS, use=use),
+        "unavailable": with_a_damaged_directory,
+    }
+
+    def test_every_failure_of_the_document_comes_on_every_socket(self):
+        rows = rows_of_the_document()
+        self.assertEqual(sorted(rows), sorted(self.FAILURES))
+        for problem, fail in self.FAILURES.items():
+            for use in WAYS:
+                with self.subTest(problem=problem, use=use):
+                    answer = fail(self, use)
+                    self.assert_answer(answer, rows[problem], problem)
+                    self.assertEqual(answer.kind, "application/problem+json")
+                    self.assertIn("GMT", answer.headers["Date"])
+
+    def test_fields_that_go_with_a_status(self):
+        self.assertEqual(self.server.authenticate(password="wrong").headers["WWW-Authenticate"], "Welcomer")
+        self.assertEqual(self.FAILURES["method-not-allowed"](self, "clear").headers["Allow"], "POST")
+        self.assertEqual(self.server.request("POST", "/v1/server", "").headers["Allow"], "GET")
+        self.assertIn(int(self.too_many("account").headers["Retry-After"]), range(1, 61))
+
+    def test_a_right_password_is_answered_with_what_the_directory_has(self):
+        for use in WAYS:
+            answer = self.server.authenticate(use=use)
+            self.assert_answer(answer, 200)
+            content = answer.content
+            self.assertEqual((content["status"], content["accountID"], content["delegates"]), (0, "anna", DELEGATES))
+            mail = content["services"]["com.corvid.nimbus.service.mail"]
+            self.assertEqual(mail["properties"], {"com.corvid.nimbus.property.mailEmailAddress": "anna@nimbus.example"})
+            self.assertEqual(len(content["services"]), 10)
+
+    def test_an_answer_comes_in_the_form_of_the_request_and_data_as_a_property_list(self):
+        listed = self.server.authenticate(form="plist")
+        self.assertEqual((listed.status, listed.kind, listed.content["accountID"]), (200, "application/x-plist", "anna"))
+        data = self.server.authenticate("binary", headers={"Accept": "application/json, application/x-plist"})
+        self.assertEqual(data.content["delegates"]["com.corvid.chatter"]["picture"], b"\0\1")
+        refused = self.server.authenticate(headers={"Accept": "text/html"})
+        self.assert_answer(refused, 406, "not-acceptable")
+
+    def test_what_is_wrong_with_a_request_is_named(self):
+        missing = self.server.authenticate(machine={"product": "", "locale": ""})
+        self.assertIn("machine/version", missing.content["detail"])
+        for body in (b"", b"{", b"[]", b'{"a":1,"a":2}', b"[" * 100_000, b"\xff\xfe", b"1e999", b"null"):
+            with self.subTest(body[:20]):
+                answer = self.server.request("POST", "/v1/authenticate", body, {"Content-Type": "application/json"})
+                self.assert_answer(answer, 400, "invalid-request")
+
+    def test_a_problem_names_its_request(self):
+        answer = self.server.authenticate("repair", requestID="one-2-THREE")
+        self.assertEqual(answer.content["instance"], "urn:welcomer:request:one-2-THREE")
+        self.assertEqual(answer.content["errorInfo"], "Call us.")
+
+    def test_an_empty_password_is_wrong_and_nobody_is_asked(self):
+        questions = self.server.figures()["question_seconds_count"]
+        self.assert_answer(self.server.authenticate("counted", ""), 401, "wrong-password")
+        self.assertEqual(self.server.figures()["question_seconds_count"], questions)
+
+    def test_terms_are_accepted_once_and_not_asked_for_again(self):
+        asked = self.server.authenticate("terms-of-others")
+        self.assert_answer(asked, 403, "terms-of-service")
+        wrong = self.server.accept_terms("terms-of-others", asked.content["errorInfo"], "wrong")
+        self.assert_answer(wrong, 401, "wrong-password")
+        self.assert_answer(self.server.authenticate("terms-of-others"), 403, "terms-of-service")
+        for _ in range(2):
+            accepted = self.server.accept_terms("terms-of-others", asked.content["errorInfo"])
+            self.assertEqual((accepted.status, accepted.bytes), (204, b""))
+        self.assert_answer(self.server.authenticate("terms-of-others"), 200)
+
+    def test_a_repetition_counts_once(self):
+        before = self.server.figures()["sign_ins_total"]
+        for _ in range(3):
+            self.server.authenticate(requestID="the-same")
+        self.server.authenticate(requestID="another")
+        self.assertEqual(self.server.figures()["sign_ins_total"], before + 2)
+        for _ in range(20):
+            failed = self.server.authenticate("counted", "wrong", requestID="failed-once")
+            self.assert_answer(failed, 401, "wrong-password")
+
+    def test_too_many_tries_hold_back_the_right_password_too_and_nobody_else(self):
+        for number in range(5):
+            # However the name is written.
+            name = ("Tried-In-Secret", " tried-in-secret ")[number % 2]
+            self.assert_answer(self.other.authenticate(name, "wrong"), 401, "wrong-credentials")
+        self.assert_answer(self.other.authenticate("tried-in-secret"), 429, "too-many-tries")
+        self.assert_answer(self.other.authenticate("anna"), 200)
+        # From another address the account has tries of its own.
+        self.assert_answer(self.other.authenticate("tried-in-secret", use="tls"), 200)
+
+    def test_tries_side_by_side_are_told_five_results_at_most(self):
+        connections = [self.other.connect() for _ in range(20)]
+        for number, connection in enumerate(connections):
+            body = json.dumps(account_server.body_of("broken", f"wrong {number}"))
+            connection.request("POST", "/v1/authenticate", body, {"Content-Type": "application/json"})
+        answers = [account_server.Answer(connection.getresponse()) for connection in connections]
+        for connection in connections:
+            connection.close()
+        self.assertEqual(sorted(answer.status for answer in answers), [401] * 5 + [429] * 15)
+
+    def test_an_answer_that_takes_its_time_keeps_nobody_else_waiting(self):
+        late = self.server.connect()
+        body = json.dumps(account_server.body_of("late"))
+        began = time.monotonic()
+        late.request("POST", "/v1/authenticate", body, {"Content-Type": "application/json"})
+        others = [self.server.authenticate().status for _ in range(10)]
+        self.assertEqual(self.server.figures()["requests_under_way"], 1)
+        self.assertEqual(late.getresponse().status, 200)
+        self.assertGreaterEqual(time.monotonic() - began, 1.5)
+        late.close()
+        self.assertEqual(others, [200] * 10)
+
+    def test_the_server_says_which_it_is(self):
+        answer = self.server.request("GET", "/v1/server")
+        self.assertEqual(answer.content["server"], "welcomer-account-server")
+        self.assertRegex(answer.content["version"], r"^\d+\.\d+\.\d+$")
+        listed = self.server.request("GET", "/v1/server", headers={"Accept": "application/x-plist"})
+        self.assertEqual(plistlib.loads(listed.bytes), answer.content)
+
+    def test_a_line_of_the_log_has_who_and_what_and_no_password(self):
+        self.server.authenticate("anna", "not this one", requestID="to-be-found")
+        self.server.authenticate("x\" status=\"200\n", PASSWORD, requestID="to-be-found-2")
+        def lines():
+            return [text for _, _, text in self.machine.log_records("welcomer-account-server")]
+        self.machine.wait_for(lambda: any("to-be-found-2" in line for line in lines()), "the lines of the log")
+        line, = (line for line in lines() if "request=to-be-found " in line)
+        self.assertRegex(line, r'^authenticate status=401 from="uid 0" user=anna request=to-be-found '
+                               r'product="Debian GNU/Linux" version=12 problem=wrong-password seconds=\d+\.\d{3}$')
+        line, = (line for line in lines() if "request=to-be-found-2 " in line)
+        self.assertIn('user="x\\" status=\\"200\\\\n"', line)
+        everything = (self.machine.root / "run/records").read_text(encoding="utf-8")
+        for password in ("not this one", PASSWORD, "wrong 1"):
+            self.assertNotIn(password, everything)
+
+
+if __name__ == "__main__":
+    machine.enter_namespaces()
+    Protocol.build = sys.argv.pop(1)
+    unittest.main(verbosity=2)
