@@ -1,0 +1,60 @@
+// An LDAP directory as a source of users: searches a user's entry, and signs in to the directory as that user.
+
+#pragma once
+
+#include "tools/account-server/AccountSource.h"
+#include "tools/account-server/LdapConnection.h"
+#include "tools/account-server/Settings.h"
+
+#include <chrono>
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <vector>
+
+namespace welcomer::server {
+
+class LdapSource final : public AccountSource {
+  public:
+    //  settings        with at least one server
+    //  searchPassword  of who searches
+    //  log             takes a line for each server that could not be asked; any thread
+    LdapSource(LdapSettings settings, std::string searchPassword,
+               std::function<void(const std::string&)> log);
+    ~LdapSource() override;
+
+    SourceAnswer authenticate(const std::string& user, const std::string& password) override;
+
+    // The directory has no place for it.
+    SourceAnswer acceptTerms(const std::string& user, const std::string& password,
+                             const PropertyList& terms) override;
+
+  private:
+    using Clock = std::chrono::steady_clock;
+
+    // One to search with and one to be a user with, to the same server.
+    struct Connections {
+        LdapConnection searching;
+        LdapConnection checking;
+    };
+    struct Server {
+        std::string address;
+        Clock::time_point avoidedUntil = {};
+        std::vector<std::unique_ptr<Connections>> idle = {};
+    };
+
+    std::vector<Server*> _serversToAsk();
+    std::unique_ptr<Connections> _connect(const Server& server) const;
+    SourceAnswer _askServer(Server& server, const std::string& user, const std::string& password);
+    SourceAnswer _ask(Connections& connections, const std::string& user, const std::string& password) const;
+
+    const LdapSettings _settings;
+    std::string _searchPassword;
+    const std::function<void(const std::string&)> _log;
+    std::vector<std::string> _attributes;
+    std::mutex _mutex; // of what changes in the servers
+    std::vector<Server> _servers;
+};
+
+} // namespace welcomer::server
