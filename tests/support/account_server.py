@@ -5,6 +5,7 @@ import http.client
 import json
 import os
 import plistlib
+import re
 import signal
 import socket
 import ssl
@@ -93,7 +94,7 @@ class AccountServer:
         self.settings_file = machine.root / "etc/welcomer/account-server.conf"
         self.settings_file.parent.mkdir(parents=True, exist_ok=True)
         self.settings = settings
-        self.environment = {}
+        self.environment = {"GLIBC_TUNABLES": "glibc.malloc.tcache_count=0"}  # as the unit has it
         if state:
             folder = machine.root / f"var/lib/welcomer-account-server{name}"
             folder.mkdir(parents=True)
@@ -110,6 +111,14 @@ class AccountServer:
     def write_settings(self, settings):
         self.settings_file.write_text(settings, encoding="utf-8")
 
+    def fail_to_start(self):
+        """Starts it where that does not succeed, and gives what it says."""
+        self.write_settings(self.settings)
+        process = self._run({}, stderr=subprocess.PIPE, text=True)
+        said = process.communicate(timeout=60)[1]
+        assert process.returncode == 1, said
+        return said
+
     def start(self, **options):
         self.write_settings(self.settings)
         ready = socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM)
@@ -118,12 +127,14 @@ class AccountServer:
         ready.bind(str(notify))
         ready.settimeout(60)
         self._notify = ready
-        variables = {"LISTEN_FDS": str(len(self.sockets)), "LISTEN_FDNAMES": ":".join(self.sockets),
-                     "NOTIFY_SOCKET": f"/run/notify{self.name}", **self.environment}
+        self.process = self._run({"NOTIFY_SOCKET": f"/run/notify{self.name}"}, **options)
+        self.wait_for_notice("READY=1")
+
+    def _run(self, variables, **options):
+        variables = {"LISTEN_FDS": str(len(self.sockets)), "LISTEN_FDNAMES": ":".join(self.sockets), **self.environment, **variables}
         command = ["/usr/bin/env", *(f"{name}={value}" for name, value in variables.items()),
                    "/bin/sh", "-c", f"LISTEN_PID=$$ exec {PROGRAM}"]
-        self.process = self.machine.start(command, preexec_fn=self._hand_over, close_fds=False, **options)
-        self.wait_for_notice("READY=1")
+        return self.machine.start(command, preexec_fn=self._hand_over, close_fds=False, **options)
 
     def wait_for_notice(self, text):
         while text not in self._notify.recv(4096).decode().split("\n"):
@@ -202,3 +213,17 @@ class AccountServer:
         text = self.request("GET", "/metrics", use="metrics").bytes.decode()
         lines = [line.rsplit(" ", 1) for line in text.splitlines() if not line.startswith("#")]
         return {name.removeprefix("welcomer_account_"): float(value) for name, value in lines}
+
+    def memory_holds(self, text):
+        """Whether a text is anywhere in the server's memory."""
+        process = Path(f"/proc/{self.process.pid}")
+        with open(process / "maps", encoding="ascii") as maps, open(process / "mem", "rb", buffering=0) as memory:
+            for line in maps:
+                area = re.match(r"([0-9a-f]+)-([0-9a-f]+) r", line)
+                if not area or "[v" in line:  # what the kernel shows there cannot be read
+                    continue
+                begin, end = (int(place, 16) for place in area.groups())
+                memory.seek(begin)
+                if text.encode() in memory.read(end - begin):
+                    return True
+        return False

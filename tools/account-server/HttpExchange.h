@@ -29,6 +29,7 @@ struct HttpListener::Exchange {
     MHD_Connection* const handle;
     Request request;
     std::size_t received = 0; // bytes of the body
+    std::size_t stored = 0;   // those of them that were kept for the answer
     std::optional<Answer> answer;
     Timers::Timer delay; // the answer is held back until then
 };

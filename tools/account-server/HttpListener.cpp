@@ -197,6 +197,7 @@ bool HttpListener::_appendBody(Exchange& exchange, char* bytes, std::size_t coun
     }
     if (!exchange.answer) {
         _bodyBytes += count;
+        exchange.stored += count;
         exchange.request.body.insert(exchange.request.body.end(), bytes, bytes + count);
     }
     ::explicit_bzero(bytes, count);
@@ -206,6 +207,7 @@ bool HttpListener::_appendBody(Exchange& exchange, char* bytes, std::size_t coun
 bool HttpListener::_startWork(Exchange& exchange) {
     const bool isTaken = _surroundings.workers.take([this, &exchange] {
         exchange.answer = _handler.answer(exchange.request);
+        WipedBytes().swap(exchange.request.body);
         const std::lock_guard lock(_mutex);
         _finished.push_back(&exchange);
         _surroundings.wake();
@@ -267,7 +269,7 @@ bool HttpListener::_send(Exchange& exchange) {
 
 void HttpListener::_completed(const Exchange& exchange) {
     Connection& connection = exchange.connection;
-    _bodyBytes -= exchange.request.body.size();
+    _bodyBytes -= exchange.stored;
     connection.exchange.reset();
     if (_drains) {
         connection.end();

@@ -13,6 +13,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
+#include <malloc.h>
 #include <memory>
 #include <stdexcept>
 #include <string>
@@ -50,7 +51,9 @@ int main(int argc, char** argv) {
     if (argc > 1) {
         return answerOption(argv[1], "welcomer-account-server", "");
     }
-    ::prctl(PR_SET_DUMPABLE, 0); // passwords pass through here
+    // Passwords pass through here: nobody looks into the memory, and what the libraries give back is written over.
+    ::prctl(PR_SET_DUMPABLE, 0);
+    ::mallopt(M_PERTURB, 1);
     // systemd's name for the folder of the service.
     const char* const folder = std::getenv("STATE_DIRECTORY");
     // The settings of the server hold, and no others on the machine.

@@ -8,11 +8,14 @@ import json
 import plistlib
 import re
 import shutil
+import socket
+import ssl
 import subprocess
 import sys
 import tempfile
 import time
 import unittest
+import warnings
 from pathlib import Path
 
 TOP = Path(__file__).resolve().parents[3]
@@ -31,7 +34,7 @@ USERS = {
     "terms-of-others": {"AccountError": 3, "AccountErrorInfo": TERMS},
     "repair": {"AccountError": 5, "AccountErrorInfo": "Call us."},
     "broken": {"Fails": True},
-    "tried": {}, "tried-in-secret": {}, "counted": {},
+    "tried": {}, "tried-in-secret": {}, "counted": {}, "claiming": {},
 }
 WAYS = ("account", "tls", "clear")
 
@@ -61,9 +64,10 @@ class Protocol(unittest.TestCase):
             shutil.copy(file, cls.machine.root / "etc")
         tls = "Certificate=/etc/server.pem\nKey=/etc/server.key\n"
         cls.authority = cls.folder / "authority.pem"
-        # One that tells unknown users and notes terms, and one that does neither.
+        # One that tells unknown users and notes terms, one that does neither, and one behind fronts.
         cls.server = cls.start(f"{tls}UnknownUsers=told\nBodySeconds=2\n", "", certificate=cls.authority)
         cls.other = cls.start(tls, "2", state=False, certificate=cls.authority)
+        cls.behind = cls.start("Fronts=root loopback\n", "3")
 
     @classmethod
     def start(cls, settings, name, **options):
@@ -251,8 +255,95 @@ class Protocol(unittest.TestCase):
         for password in ("not this one", PASSWORD, "wrong 1"):
             self.assertNotIn(password, everything)
 
+    def test_a_front_says_who_asks_and_nobody_else_does(self):
+        for use in ("account", "clear"):
+            # What a client makes up stands before what the front has seen.
+            for made_up in range(5):
+                seen = {"X-Forwarded-For": f"203.0.113.{made_up}, 198.51.100.1"}
+                self.assert_answer(self.behind.authenticate(f"tried-{use}", "wrong", use, seen), 401, "wrong-credentials")
+            last = self.behind.authenticate(f"tried-{use}", "wrong", use, {"X-Forwarded-For": "198.51.100.1"})
+            self.assert_answer(last, 429, "too-many-tries")
+            other = self.behind.authenticate(f"tried-{use}", "wrong", use, {"X-Forwarded-For": "198.51.100.2"})
+            self.assert_answer(other, 401, "wrong-credentials")
+        for number in range(5):
+            claimed = {"X-Forwarded-For": f"198.51.100.{number}"}
+            self.assert_answer(self.other.authenticate("claiming", "wrong", "clear", claimed), 401, "wrong-credentials")
+        self.assert_answer(self.other.authenticate("claiming", "wrong", "clear", {"X-Forwarded-For": "198.51.100.9"}), 429)
+
+    def test_on_the_unix_socket_the_users_of_the_settings_alone_may_ask(self):
+        server = self.start(f"Users={machine.USER}\n", "4")
+        with self.assertRaises(ConnectionError):
+            server.authenticate()
+        asked = self.machine.run(
+            ["/usr/bin/python3", "-c", "import socket; s = socket.socket(socket.AF_UNIX); s.settimeout(60); "
+             f"s.connect('/{account_server.SOCKET}4'); s.sendall(b'GET /v1/server HTTP/1.1\\r\\nHost: x\\r\\n\\r\\n'); "
+             "print(s.recv(100)[:12].decode())"], user=True)
+        self.assertEqual(asked.stdout, "HTTP/1.1 200\n", asked)
+
+    def test_tls_is_new_enough(self):
+        for version, is_taken in (("TLSv1_1", False), ("TLSv1_2", True), ("TLSv1_3", True)):
+            context = ssl.create_default_context(cafile=self.authority)
+            context.set_ciphers("ALL:@SECLEVEL=0")
+            with warnings.catch_warnings(action="ignore"):
+                context.minimum_version = context.maximum_version = getattr(ssl.TLSVersion, version)
+            with socket.create_connection(self.server.address("tls"), timeout=60) as bare:
+                try:
+                    context.wrap_socket(bare, server_hostname="127.0.0.1").close()
+                    was_taken = True
+                except (ssl.SSLError, ConnectionError):
+                    was_taken = False
+            self.assertEqual(was_taken, is_taken, version)
+
+    def test_a_new_certificate_is_shown_after_a_reload(self):
+        def shown():
+            with self.server.open("tls") as connection:
+                return connection.getpeercert(binary_form=True)
+        before = shown()
+        self.server.write_settings(self.server.settings)  # the others have the same file
+        self.server.reload()
+        self.assertEqual(shown(), before)
+        account_server.make_certificate(self.folder, "server", "authority")
+        for name in ("server.pem", "server.key"):
+            shutil.copy(self.folder / name, self.machine.root / "etc")
+        self.server.reload()
+        self.assertNotEqual(shown(), before)
+        self.assert_answer(self.server.authenticate(use="tls"), 200)
+
+    def test_no_password_stays_in_the_memory(self):
+        self.assertTrue(self.server.memory_holds("/etc/welcomer/account-server.conf"))
+        for use in WAYS:
+            for form in ("json", "plist"):
+                for name in ("anna", "nobody"):
+                    password = f"remember {use} {form} {name}" if name == "nobody" else PASSWORD
+                    self.server.authenticate(name, password, use, form=form)
+                    self.assertFalse(self.server.memory_holds(password), password)
+
+    def run_it(self, *arguments, **options):
+        return self.machine.run([account_server.PROGRAM, *arguments], **options)
+
+    def test_what_keeps_it_from_serving_is_said_in_one_line(self):
+        self.assertEqual(self.run_it("--version").stdout, f"welcomer-account-server {self.version()}\n")
+        self.assertEqual((self.run_it("--help").returncode, self.run_it("--sideways").returncode), (0, 2))
+        none = self.run_it()
+        self.assertEqual((none.returncode, none.stdout, none.stderr.count("\n")), (1, "", 1))
+        self.assertIn("welcomer-account-server.socket", none.stderr)
+        for settings, why in (("Sauce=x\n", "line 1: there is no such setting"), ("Users=nobody-at-all\n", "nobody-at-all"),
+                              ("Certificate=/etc/server.pem\nKey=/etc/missing\n", "/etc/missing: No such file"),
+                              ("Certificate=/etc/server.pem\nKey=/etc/passwd\n", "")):
+            server = AccountServer(self.machine, settings, f"-{abs(hash(settings))}", certificate=self.authority)
+            with self.subTest(settings):
+                said = server.fail_to_start()
+                self.assertEqual(said.count("\n"), 1, said)
+                self.assertTrue(said.startswith("welcomer-account-server: "), said)
+                self.assertIn(why, said)
+            server.close()
+
+    def version(self):
+        return self.server.request("GET", "/v1/server").content["version"]
+
 
 if __name__ == "__main__":
     machine.enter_namespaces()
+    machine.mount("proc", "/proc", "proc")
     Protocol.build = sys.argv.pop(1)
     unittest.main(verbosity=2)

@@ -96,6 +96,8 @@ class Units(unittest.TestCase):
         self.assertEqual(process["Uid"].split(), [user] * 4)
         self.assertEqual([process[name] for name in ("CapEff", "CapPrm", "CapBnd")], ["0" * 16] * 3)
         self.assertEqual((process["NoNewPrivs"], process["Seccomp"]), ("1", "2"))
+        # Its user's other processes, if there were any, could not look into it.
+        self.assertEqual((self.machine.inside / f"proc/{process['Pid']}/environ").stat().st_uid, 0)
 
     def test_4_the_directory_stays_roots_and_the_servers(self):
         self.add_user("bert")
