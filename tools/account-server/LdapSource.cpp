@@ -83,8 +83,8 @@ std::vector<LdapSource::Server*> LdapSource::_serversToAsk() {
     for (Server& server : _servers) {
         servers.push_back(&server);
     }
-    std::ranges::stable_partition(
-        servers, [now = Clock::now()](const Server* server) { return server->avoidedUntil <= now; });
+    std::stable_partition(servers.begin(), servers.end(),
+                          [now = Clock::now()](const Server* server) { return server->avoidedUntil <= now; });
     return servers;
 }
 
