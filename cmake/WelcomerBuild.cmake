@@ -43,15 +43,3 @@ function(welcomer_configure_target target)
         target_compile_definitions(${target} PRIVATE WELCOMER_FLUSH_AT_EXIT=1)
     endif()
 endfunction()
-
-# welcomer_precompile(TARGET HEADERS...)
-#   Has the target's sources begin with these headers, which the compiler reads once. A source includes what it uses all the
-#   same. The options have a compiler cache see through to what was precompiled.
-function(welcomer_precompile target)
-    target_precompile_headers(${target} PRIVATE ${ARGN})
-    if(CMAKE_CXX_COMPILER_ID STREQUAL GNU)
-        target_compile_options(${target} PRIVATE -fpch-preprocess)
-    else()
-        target_compile_options(${target} PRIVATE "SHELL:-Xclang -fno-pch-timestamp")
-    endif()
-endfunction()
