@@ -165,6 +165,7 @@ TEST_F(AccountServerTest, AServerThatIsSilentIsGivenUp) {
     EXPECT_EQ(unavailability(client(std::chrono::seconds(1)).answer("anna", "secret", {})),
               name() + " has not answered within 1 s");
     isOver = true;
+    server.reset(); // which still asks whether it is over
 }
 
 TEST_F(AccountServerTest, WhatIsAskedEndsWhenTheClientIsStopped) {
@@ -189,6 +190,7 @@ TEST_F(AccountServerTest, WhatIsAskedEndsWhenTheClientIsStopped) {
     stopper.join();
     isOver = true;
     EXPECT_FALSE(asked.answer("anna", "secret", {}).isCompleted);
+    server.reset(); // which still asks whether it is over
 }
 
 } // namespace
