@@ -168,6 +168,7 @@ bool LdapConnection::bind(const std::string& name, const std::string& password) 
 std::vector<LdapConnection::Entry> LdapConnection::search(const std::string& filter,
                                                           const std::vector<std::string>& attributes) {
     std::vector<char*> names;
+    names.reserve(attributes.size() + 1);
     for (const std::string& attribute : attributes) {
         names.push_back(const_cast<char*>(attribute.c_str()));
     }
