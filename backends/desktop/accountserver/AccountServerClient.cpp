@@ -25,7 +25,7 @@ constexpr std::array<std::chrono::milliseconds, 2> kWaits = {500ms, 1500ms};
 
 constexpr std::size_t kMaximumRemembered = 64;        // users
 constexpr std::int64_t kMaximumClockDifference = 120; // seconds
-constexpr std::int64_t kSecondsOfADay = 24 * 60 * 60;
+constexpr std::int64_t kSecondsOfADay = std::int64_t{24} * 60 * 60;
 constexpr std::int64_t kSoon = 14; // days, before a certificate's end
 
 // A random UUID.

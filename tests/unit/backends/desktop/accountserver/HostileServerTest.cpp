@@ -3,6 +3,7 @@
 
 #include "tests/unit/backends/desktop/accountserver/AccountServerFixture.h"
 
+#include <atomic>
 #include <string>
 
 namespace welcomer::desktop {
@@ -10,7 +11,7 @@ namespace {
 
 TEST_F(AccountServerTest, AnAnswerThatBreaksOffAtAnyByteIsNone) {
     const std::string whole = json(kRightAnswer);
-    std::size_t size = 0;
+    std::atomic<std::size_t> size = 0;
     serve([&](const StubRequest&) { return whole.substr(0, size); });
     const AccountServerClient asked = client();
     for (; size < whole.size(); ++size) {
