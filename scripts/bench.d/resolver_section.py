@@ -10,7 +10,7 @@ TOP = Path(__file__).resolve().parents[2]
 
 def measure(build, tables):
     resolved = Path(build) / "systemd-resolved"
-    subprocess.run([TOP / "scripts/fetch-resolved", resolved], check=True, stdout=sys.stderr)
+    subprocess.run([TOP / "scripts/fetch-package", "systemd-resolved", resolved], check=True, stdout=sys.stderr)
     result = subprocess.run([sys.executable, "-B", Path(__file__).with_name("resolver.py"), build, resolved], check=True,
                             stdout=subprocess.PIPE, text=True)
     figure = json.loads(result.stdout.splitlines()[-1])

@@ -6,14 +6,15 @@ import signal
 import socket
 import subprocess
 import time
+from pathlib import Path
 
 BASE = "dc=nimbus,dc=example"
 CONFIGURATION = """
-include /etc/ldap/schema/core.schema
-include /etc/ldap/schema/cosine.schema
-include /etc/ldap/schema/inetorgperson.schema
-modulepath /usr/lib/ldap
-moduleload back_mdb
+include {tree}/etc/ldap/schema/core.schema
+include {tree}/etc/ldap/schema/cosine.schema
+include {tree}/etc/ldap/schema/inetorgperson.schema
+modulepath {tree}/usr/lib/ldap
+moduleload back_mdb.so
 TLSCertificateFile {folder}/server.pem
 TLSCertificateKeyFile {folder}/server.key
 database mdb
@@ -22,8 +23,17 @@ directory {data}
 maxsize 268435456
 index objectClass,uid eq
 access to attrs=userPassword by anonymous auth by * none
+access to attrs=description by self write by dn.exact="cn=searcher,{base}" read by * none
 access to * by dn.exact="cn=searcher,{base}" read by * none
 """
+
+
+def tree_of(*folders):
+    """The first of some folders that slapd is unpacked in, or else the machine's root folder, where it is installed."""
+    for folder in (*folders, "/"):
+        if Path(folder, "usr/sbin/slapd").exists():
+            return Path(folder)
+    raise FileNotFoundError("slapd: scripts/fetch-package slapd FOLDER")
 
 
 def entry(name, attributes):
@@ -38,23 +48,28 @@ def entry(name, attributes):
 class Slapd:
     """One server. What it serves is the same in each that is given the same entries."""
 
-    def __init__(self, folder, data, entries, ports):
-        """folder: with server.pem and server.key. data: a folder of its own. ports: for ldap and ldaps."""
+    def __init__(self, tree, folder, data, entries, ports):
+        """tree: as tree_of() finds it. folder: with server.pem and server.key. data: a folder of its own. ports: for ldap and
+        ldaps."""
         data.mkdir()
         self.address, self.secure_address = (f"{kind}://127.0.0.1:{port}" for kind, port in zip(("ldap", "ldaps"), ports))
         # An address that is not in the certificate.
         self.other_address = self.address.replace("127.0.0.1", "127.0.0.2")
         self._port = ports[0]
         self._configuration = data / "slapd.conf"
-        self._configuration.write_text(CONFIGURATION.format(folder=folder, data=data, base=BASE), encoding="utf-8")
-        subprocess.run(["/usr/sbin/slapadd", "-q", "-f", self._configuration], input="\n".join(entries), check=True, text=True,
-                       capture_output=True)
+        self._configuration.write_text(CONFIGURATION.format(tree=tree, folder=folder, data=data, base=BASE), encoding="utf-8")
+        self._program = tree / "usr/sbin/slapd"
+        # One of its libraries comes with it.
+        self._environment = {**os.environ, "LDAPNOINIT": "1",
+                             "LD_LIBRARY_PATH": ":".join(str(path.parent) for path in tree.glob("usr/lib/*/libslapi*.so.0"))}
+        subprocess.run([self._program, "-T", "add", "-q", "-f", self._configuration], input="\n".join(entries), check=True,
+                       text=True, capture_output=True, env=self._environment)
         self._process = None
 
     def start(self):
         self._process = subprocess.Popen(
-            ["/usr/sbin/slapd", "-f", self._configuration, "-h", f"{self.address} {self.secure_address} {self.other_address}", "-d", "0"],
-            stdin=subprocess.DEVNULL, stderr=subprocess.DEVNULL, env={**os.environ, "LDAPNOINIT": "1"})
+            [self._program, "-f", self._configuration, "-h", f"{self.address} {self.secure_address} {self.other_address}", "-d", "0"],
+            stdin=subprocess.DEVNULL, stderr=subprocess.DEVNULL, env=self._environment)
         end = time.monotonic() + 60
         while True:
             try:

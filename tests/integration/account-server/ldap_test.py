@@ -1,7 +1,8 @@
 #!/usr/bin/env python3
 """The installed account server in front of real LDAP directories.
 
-usage: ldap_test.py BUILD_DIR
+usage: ldap_test.py BUILD_DIR SLAPD
+    SLAPD   the folder that the package slapd is unpacked in
 """
 
 import shutil
@@ -55,7 +56,7 @@ def entries():
 
 
 class Ldap(unittest.TestCase):
-    build = None
+    build, tree = None, None
 
     @classmethod
     def setUpClass(cls):
@@ -73,8 +74,8 @@ class Ldap(unittest.TestCase):
         account_server.make_certificate(cls.folder, "server", "authority")
         cls.silent = socket.create_server(("127.0.0.1", 3890), backlog=64)
         cls.addClassCleanup(cls.silent.close)
-        cls.directories = [slapd.Slapd(cls.folder, cls.folder / f"data{number}", list(entries()), (3890 + number, 6360 + number))
-                           for number in (1, 2)]
+        cls.directories = [slapd.Slapd(cls.tree, cls.folder, cls.folder / f"data{number}", list(entries()),
+                                       (3890 + number, 6360 + number)) for number in (1, 2)]
         for directory in cls.directories:
             cls.addClassCleanup(directory.stop)
         first, second = cls.directories
@@ -215,5 +216,5 @@ class Ldap(unittest.TestCase):
 if __name__ == "__main__":
     machine.enter_namespaces()
     machine.mount("proc", "/proc", "proc")
-    Ldap.build = sys.argv.pop(1)
-    unittest.main(verbosity=2)
+    Ldap.build, Ldap.tree = sys.argv[1], slapd.tree_of(sys.argv[2])
+    unittest.main(argv=sys.argv[:1], verbosity=2)
