@@ -4,6 +4,7 @@
 #include "tools/account-server/LdapSocket.h"
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <ldap.h>
 #include <openldap.h> // ldap_init_fd
@@ -190,6 +191,23 @@ std::vector<LdapConnection::Entry> LdapConnection::search(const std::string& fil
         ldap_memfree(name);
     }
     return entries;
+}
+
+void LdapConnection::replace(const std::string& name, const std::string& attribute,
+                             const std::string& value) {
+    // As above, libldap does not write what it takes.
+    berval written{value.size(), const_cast<char*>(value.data())};
+    std::array<berval*, 2> values{&written, nullptr};
+    LDAPMod change{};
+    change.mod_op = LDAP_MOD_REPLACE | LDAP_MOD_BVALUES;
+    change.mod_type = const_cast<char*>(attribute.c_str());
+    change.mod_bvalues = values.data();
+    std::array<LDAPMod*, 2> changes{&change, nullptr};
+    int request = 0;
+    check(ldap_modify_ext(_handle.get(), name.c_str(), changes.data(), nullptr, nullptr, &request));
+    int code = 0;
+    await(_handle.get(), request, _settings, code);
+    check(code);
 }
 
 } // namespace welcomer::server

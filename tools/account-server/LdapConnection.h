@@ -42,6 +42,9 @@ class LdapConnection {
     // The entries that fit, two at most. Throws as above.
     std::vector<Entry> search(const std::string& filter, const std::vector<std::string>& attributes);
 
+    // Has an attribute of an entry have this one value. Throws as above.
+    void replace(const std::string& name, const std::string& attribute, const std::string& value);
+
   private:
     struct Close {
         void operator()(ldap* handle) const;

@@ -83,6 +83,14 @@ std::optional<Problem> problemIn(const PropertyList::Dictionary& members) {
     }
 }
 
+// Whether the user has accepted the terms that a problem asks for.
+bool areAccepted(const Problem& problem, const LdapAttributes& attributes,
+                 const std::string& termsAttribute) {
+    const auto note = attributes.find(lowerCase(termsAttribute));
+    return problem.type == ProblemType::TermsOfService && problem.errorInfo && note != attributes.end() &&
+           std::ranges::find(note->second, noteOfTerms(*problem.errorInfo)) != note->second.end();
+}
+
 } // namespace
 
 std::string filterFor(std::string_view filter, std::string_view user) {
@@ -109,7 +117,8 @@ std::string filterFor(std::string_view filter, std::string_view user) {
 
 std::variant<accountserver::AuthenticateAnswer, Problem> answerOf(const std::string& user,
                                                                   const LdapAttributes& attributes,
-                                                                  const std::vector<MappedMember>& members) {
+                                                                  const std::vector<MappedMember>& members,
+                                                                  const std::string& termsAttribute) {
     PropertyList::Dictionary answer{{"status", 0}, {"accountID", user}};
     for (const MappedMember& member : members) {
         std::vector<std::string> values{member.value};
@@ -125,7 +134,7 @@ std::variant<accountserver::AuthenticateAnswer, Problem> answerOf(const std::str
             return badMember(shown(member));
         }
     }
-    if (auto problem = problemIn(answer)) {
+    if (auto problem = problemIn(answer); problem && !areAccepted(*problem, attributes, termsAttribute)) {
         return std::move(*problem);
     }
     // What an answer may be is known where answers are read.
@@ -139,6 +148,10 @@ std::variant<accountserver::AuthenticateAnswer, Problem> answerOf(const std::str
         return badMember(decoded.error);
     }
     return std::move(*decoded.message);
+}
+
+std::string noteOfTerms(const PropertyList& terms) {
+    return accountserver::writeJSON(terms).value_or(""); // what comes from a directory is texts and numbers
 }
 
 } // namespace welcomer::server

@@ -25,7 +25,12 @@ using LdapAttributes = std::map<std::string, std::vector<std::string>>;
 //     accountError  an integer: has the user accept terms (3) or be told of a repair (5) first
 //     errorInfo     goes with it
 // Members that make no answer are a problem that says what is wrong with them. Any thread.
+//  termsAttribute  where the terms are noted that the user has accepted: these are not asked for; may be empty
 std::variant<accountserver::AuthenticateAnswer, accountserver::Problem>
-answerOf(const std::string& user, const LdapAttributes& attributes, const std::vector<MappedMember>& members);
+answerOf(const std::string& user, const LdapAttributes& attributes, const std::vector<MappedMember>& members,
+         const std::string& termsAttribute = {});
+
+// The value of that attribute for terms: JSON, which administrators can read. Any thread.
+std::string noteOfTerms(const PropertyList& terms);
 
 } // namespace welcomer::server

@@ -33,6 +33,9 @@ LdapSource::LdapSource(LdapSettings settings, std::string searchPassword,
             _attributes.push_back(member.attribute);
         }
     }
+    if (!_settings.termsAttribute.empty()) {
+        _attributes.push_back(_settings.termsAttribute);
+    }
     if (_attributes.empty()) {
         _attributes.emplace_back(LDAP_NO_ATTRS);
     }
@@ -46,12 +49,21 @@ LdapSource::~LdapSource() {
 }
 
 SourceAnswer LdapSource::authenticate(const std::string& user, const std::string& password) {
-    if (password.empty()) { // a directory may take it for nobody in particular, and let them in
+    return _askServers({user, password, nullptr});
+}
+
+SourceAnswer LdapSource::acceptTerms(const std::string& user, const std::string& password,
+                                     const PropertyList& terms) {
+    return _askServers({user, password, &terms});
+}
+
+SourceAnswer LdapSource::_askServers(const Question& question) {
+    if (question.password.empty()) { // a directory may take it for nobody in particular, and let them in
         return problem(ProblemType::WrongPassword);
     }
     for (Server* const server : _serversToAsk()) {
         try {
-            return _askServer(*server, user, password);
+            return _askServer(*server, question);
         } catch (const LdapUnavailable& error) {
             _log(LogLine("directory-unavailable")
                      .add("server", server->address)
@@ -65,16 +77,6 @@ SourceAnswer LdapSource::authenticate(const std::string& user, const std::string
         }
     }
     return problem(ProblemType::Unavailable);
-}
-
-SourceAnswer LdapSource::acceptTerms(const std::string& user, const std::string& password,
-                                     const PropertyList& /*terms*/) {
-    SourceAnswer answer = authenticate(user, password);
-    const auto* const found = std::get_if<Problem>(&answer.content);
-    if (!found || found->type == ProblemType::TermsOfService) {
-        answer.content = Problem{ProblemType::NotSupported, {}, {}, {}};
-    }
-    return answer;
 }
 
 std::vector<LdapSource::Server*> LdapSource::_serversToAsk() {
@@ -98,7 +100,7 @@ std::unique_ptr<LdapSource::Connections> LdapSource::_connect(const Server& serv
     return connections;
 }
 
-SourceAnswer LdapSource::_askServer(Server& server, const std::string& user, const std::string& password) {
+SourceAnswer LdapSource::_askServer(Server& server, const Question& question) {
     std::unique_ptr<Connections> connections;
     {
         const std::lock_guard lock(_mutex);
@@ -108,7 +110,7 @@ SourceAnswer LdapSource::_askServer(Server& server, const std::string& user, con
         }
     }
     const auto askAndKeep = [&] {
-        SourceAnswer answer = _ask(*connections, user, password);
+        SourceAnswer answer = _ask(*connections, question);
         const std::lock_guard lock(_mutex);
         server.avoidedUntil = {};
         server.idle.push_back(std::move(connections));
@@ -125,24 +127,46 @@ SourceAnswer LdapSource::_askServer(Server& server, const std::string& user, con
     return askAndKeep();
 }
 
-SourceAnswer LdapSource::_ask(Connections& connections, const std::string& user,
-                              const std::string& password) const {
+SourceAnswer LdapSource::_ask(Connections& connections, const Question& question) const {
     const std::vector<LdapConnection::Entry> entries =
-        connections.searching.search(filterFor(_settings.filter, user), _attributes);
+        connections.searching.search(filterFor(_settings.filter, question.user), _attributes);
     if (entries.size() > 1) {
         return problem(ProblemType::ServerError, "the directory has several entries of this name");
     }
     if (entries.empty()) {
         // As many steps as for a wrong password.
         connections.checking.bind(_settings.base.empty() ? "cn=nobody" : "cn=nobody," + _settings.base,
-                                  password);
+                                  question.password);
         return problem(ProblemType::UnknownUser);
     }
     const LdapConnection::Entry& entry = entries.front();
-    if (!connections.checking.bind(entry.name, password)) {
+    if (!connections.checking.bind(entry.name, question.password)) {
         return {Problem{ProblemType::WrongPassword, {}, {}, {}}, entry.name, {}};
     }
-    return {answerOf(user, entry.attributes, _settings.members), entry.name, {}};
+    SourceAnswer answer{
+        answerOf(question.user, entry.attributes, _settings.members, _settings.termsAttribute),
+        entry.name,
+        {}};
+    if (question.acceptedTerms) {
+        _accept(connections.checking, *question.acceptedTerms, answer);
+    }
+    return answer;
+}
+
+// Notes that the user has accepted the terms that the answer asks for, as that user.
+void LdapSource::_accept(LdapConnection& user, const PropertyList& terms, SourceAnswer& answer) const {
+    const auto* const found = std::get_if<Problem>(&answer.content);
+    if (found && found->type != ProblemType::TermsOfService) {
+        return;
+    }
+    if (_settings.termsAttribute.empty()) {
+        answer.content = Problem{ProblemType::NotSupported, {}, {}, {}};
+    } else if (found && found->errorInfo && *found->errorInfo != terms) {
+        answer.content = Problem{ProblemType::OtherTerms, {}, {}, found->errorInfo};
+    } else if (found && found->errorInfo) {
+        user.replace(answer.identity, _settings.termsAttribute, noteOfTerms(terms));
+        answer.content = accountserver::AuthenticateAnswer{};
+    }
 }
 
 } // namespace welcomer::server

@@ -26,7 +26,7 @@ class LdapSource final : public AccountSource {
 
     SourceAnswer authenticate(const std::string& user, const std::string& password) override;
 
-    // The directory has no place for it.
+    // The user's own entry has the note, where the settings have an attribute for it.
     SourceAnswer acceptTerms(const std::string& user, const std::string& password,
                              const PropertyList& terms) override;
 
@@ -44,10 +44,19 @@ class LdapSource final : public AccountSource {
         std::vector<std::unique_ptr<Connections>> idle = {};
     };
 
+    // What is asked.
+    struct Question {
+        const std::string& user;
+        const std::string& password;
+        const PropertyList* acceptedTerms; // null: who signs in
+    };
+
+    SourceAnswer _askServers(const Question& question);
     std::vector<Server*> _serversToAsk();
     std::unique_ptr<Connections> _connect(const Server& server) const;
-    SourceAnswer _askServer(Server& server, const std::string& user, const std::string& password);
-    SourceAnswer _ask(Connections& connections, const std::string& user, const std::string& password) const;
+    SourceAnswer _askServer(Server& server, const Question& question);
+    SourceAnswer _ask(Connections& connections, const Question& question) const;
+    void _accept(LdapConnection& user, const PropertyList& terms, SourceAnswer& answer) const;
 
     const LdapSettings _settings;
     std::string _searchPassword;

@@ -172,6 +172,12 @@ constexpr Kind kKinds[] = {
      "a filter in brackets with %u in the place of the user's name"},
     {"LdapSeconds", [](Text value, Settings& to) { return readSeconds(value, to.ldap.limit); },
      kSecondsWanted},
+    {"LdapTermsAttribute",
+     [](Text value, Settings& to) {
+         to.ldap.termsAttribute = value;
+         return value.find(' ') == Text::npos;
+     },
+     "the name of an attribute"},
     {"LdapAttribute", [](Text value, Settings& to) { return readMapping(value, to.ldap.members, true); },
      kMemberWanted},
     {"LdapValue", [](Text value, Settings& to) { return readMapping(value, to.ldap.members, false); },

@@ -32,6 +32,7 @@ struct LdapSettings {
     std::string filter = "(&(objectClass=person)(uid=%u))"; // %u is the user's name
     std::chrono::seconds limit{3};                          // for each server
     std::vector<MappedMember> members;
+    std::string termsAttribute; // where users have noted which terms of service they accept; empty: nowhere
 };
 
 struct Settings {

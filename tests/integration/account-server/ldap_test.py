@@ -24,7 +24,7 @@ USERS = {
     "anna": {"mail": ["anna@nimbus.example", "a@nimbus.example"], "displayName": "Anna A.", "employeeNumber": "7"},
     "bert": {}, "counted": {}, "änna": {},
     "brackets(*)\\": {},
-    "terms": {"employeeType": "3"}, "repair": {"employeeType": "5"}, "misled": {"employeeType": "many"},
+    "terms": {"employeeType": "3"}, "accepting": {"employeeType": "3"}, "repair": {"employeeType": "5"}, "misled": {"employeeType": "many"},
 }
 SETTINGS = f"""
 Source=ldap
@@ -142,6 +142,32 @@ class Ldap(unittest.TestCase):
         self.assert_answer(self.server.accept_terms("terms", asked.content["errorInfo"]), 501, "not-supported")
         self.assert_answer(self.server.authenticate("repair"), 403, "repair")
         self.assert_answer(self.server.authenticate("misled"), 500, "server-error")
+
+    def test_the_users_own_entry_has_the_note_of_accepted_terms(self):
+        settings = f"{SETTINGS}LdapServers={self.directories[0].address}\n"
+        self.serve(settings + "LdapTermsAttribute=description\n")
+        asked = self.server.authenticate("accepting")
+        self.assert_answer(asked, 403, "terms-of-service")
+        terms = asked.content["errorInfo"]
+        self.assert_answer(self.server.accept_terms("accepting", terms, "wrong"), 401, "wrong-credentials")
+        others = self.server.accept_terms("accepting", {"version": "2025-01"})
+        self.assert_answer(others, 409, "other-terms")
+        self.assertEqual(others.content["errorInfo"], terms)
+        self.assert_answer(self.server.authenticate("accepting"), 403, "terms-of-service")
+        for _ in range(2):
+            self.assert_answer(self.server.accept_terms("accepting", terms), 204)
+        answer = self.server.authenticate("accepting")
+        self.assert_answer(answer, 200)
+        self.assertEqual(answer.content["delegates"], {"com.corvid.chatter": {"status": 0}})
+        self.assert_answer(self.server.accept_terms("bert", terms), 204)
+        self.assert_answer(self.server.authenticate("terms"), 403, "terms-of-service")
+        self.serve(f"{settings}LdapTermsAttribute=description\nLdapValue=errorInfo/version 2026-11\n")
+        self.assertEqual(self.server.authenticate("accepting").content["errorInfo"], {"version": "2026-11"})
+        # An attribute that users may not write.
+        self.serve(settings + "LdapTermsAttribute=title\n")
+        refused = self.server.accept_terms("accepting", terms)
+        self.assert_answer(refused, 500, "server-error")
+        self.assertEqual(refused.content["detail"], "the directory refuses: Insufficient access")
 
     def test_another_server_answers_when_one_has_gone_and_a_new_connection_when_one_was_lost(self):
         first, second = self.directories

@@ -38,6 +38,29 @@ Problem problem(const LdapAttributes& attributes, const std::vector<MappedMember
     return found ? *found : Problem();
 }
 
+TEST(LdapMapping, TermsThatAnAttributeHasTheNoteOfAreNotAskedForAgain) {
+    const std::vector<MappedMember> members{{"", "3", {"accountError"}, Type::Integer},
+                                            {"", "2026-10", {"errorInfo", "version"}, Type::Text}};
+    const std::string note = noteOfTerms(PropertyList::Dictionary{{"version", "2026-10"}});
+    EXPECT_EQ(note, R"({"version":"2026-10"})");
+    const auto isAskedFor = [&](const LdapAttributes& attributes, const std::string& attribute) {
+        return std::holds_alternative<Problem>(answerOf("anna", attributes, members, attribute));
+    };
+    EXPECT_TRUE(isAskedFor({}, "note"));
+    EXPECT_FALSE(isAskedFor({{"note", {note}}}, "Note"));
+    EXPECT_FALSE(isAskedFor({{"note", {"something else", note}}}, "note"));
+    EXPECT_TRUE(isAskedFor({{"note", {R"({"version":"2026-09"})"}}}, "note"));
+    EXPECT_TRUE(isAskedFor({{"note", {note}}}, "other"));
+    EXPECT_TRUE(isAskedFor({{"note", {note}}}, ""));
+}
+
+TEST(LdapMapping, ANoteOfTermsTakesNoRepairAway) {
+    const std::vector<MappedMember> members{{"", "5", {"accountError"}, Type::Integer},
+                                            {"", "2026-10", {"errorInfo"}, Type::Text}};
+    const auto result = answerOf("anna", {{"note", {"\"2026-10\""}}}, members, "note");
+    EXPECT_EQ(std::get<Problem>(result).type, ProblemType::Repair);
+}
+
 TEST(LdapMapping, WithoutMembersAnAnswerSaysThatAllIsWell) {
     EXPECT_EQ(answer({}, {}), (AuthenticateAnswer{0, "anna", {}, {}, {}}));
 }

@@ -1,7 +1,10 @@
 #include "tools/account-server/ListeningSockets.h"
 
+#include "tests/contract/TemporaryRoot.h"
+
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <stdexcept>
 
 namespace welcomer::server {
@@ -17,6 +20,23 @@ TEST(ListeningSockets, AUnixSocketIsServedInTheClear) {
     for (const bool hasCertificate : {false, true}) {
         EXPECT_EQ(useOf({posix::FileDescriptor(), "any", "/run/x", true, true}, hasCertificate), Use::Clear);
     }
+}
+
+TEST(ListeningSockets, ASocketOfTheServersOwnIsForItsUserAloneAndTakesTheOldOnesPlace) {
+    const TemporaryRoot root;
+    const std::string path = root.path() + "/socket";
+    for (int i = 0; i < 2; ++i) {
+        const std::vector<ListeningSocket> sockets = openListeningSocket(path);
+        ASSERT_EQ(sockets.size(), 1U);
+        EXPECT_EQ(sockets[0].shown, path);
+        EXPECT_EQ(useOf(sockets[0], true), Use::Clear);
+        const std::filesystem::file_status status = std::filesystem::status(path);
+        EXPECT_EQ(status.type(), std::filesystem::file_type::socket);
+        EXPECT_EQ(status.permissions(),
+                  std::filesystem::perms::owner_read | std::filesystem::perms::owner_write);
+    }
+    EXPECT_THROW(openListeningSocket(path + std::string(108, 'x')), std::runtime_error);
+    EXPECT_THROW(openListeningSocket(root.path() + "/nowhere/socket"), std::runtime_error);
 }
 
 TEST(ListeningSockets, PasswordsInTheClearStayOnThisMachine) {

@@ -67,7 +67,9 @@ TEST(AccountServerSettings, WhatBelongsTogetherIsAskedForTogether) {
 TEST(AccountServerSettings, TheServersOfADirectoryKeepTheirOrder) {
     const SettingsText read =
         readSettings("Source=ldap\nLdapServers=ldap://b.example ldaps://a.example:636 ldapi:///\n"
-                     "LdapBase=dc=example\nLdapFilter=(mail=%u)\nLdapSeconds=2\nLdapAuthority=/ca\n");
+                     "LdapBase=dc=example\nLdapFilter=(mail=%u)\nLdapSeconds=2\nLdapAuthority=/ca\n"
+                     "LdapTermsAttribute=acceptedTerms\n");
+    EXPECT_EQ(read.settings.ldap.termsAttribute, "acceptedTerms");
     EXPECT_EQ(read.problems, Problems());
     EXPECT_EQ(read.settings.ldap.servers,
               (Problems{"ldap://b.example", "ldaps://a.example:636", "ldapi:///"}));
@@ -77,6 +79,7 @@ TEST(AccountServerSettings, TheServersOfADirectoryKeepTheirOrder) {
     EXPECT_EQ(read.settings.ldap.authority, "/ca");
     EXPECT_FALSE(readSettings("LdapServers=http://a").problems.empty());
     EXPECT_FALSE(readSettings("LdapFilter=(mail=anna)").problems.empty());
+    EXPECT_FALSE(readSettings("LdapTermsAttribute=two words").problems.empty());
 }
 
 TEST(AccountServerSettings, AttributesAndValuesLeadToMembersOfTheirType) {
