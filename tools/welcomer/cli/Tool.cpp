@@ -185,6 +185,12 @@ int runChosen(const CommandLine& commandLine, Options& options, const PlatformFa
 
 } // namespace
 
+void tellAskedServer(Session& session) {
+    if (const std::string server = session.signInDirectory.server(); !server.empty()) {
+        session.printer.tell(Report({}, "Asking the account server " + server));
+    }
+}
+
 CommandLevel CommandLine::addGroup(const std::string& name, const std::string& description) {
     CLI::App& group = addLevel(_app, name, description);
     group.require_subcommand(1);

@@ -44,6 +44,9 @@ struct Session {
     ReportPrinter& printer;                           // for what people are told on the way
 };
 
+// Tells people which account server signing in asks; nothing where it asks none.
+void tellAskedServer(Session& session);
+
 // A command's work: it returns what it has to say, and what it throws ends the tool with one line on stderr.
 using Command = std::function<Report(Session&)>;
 

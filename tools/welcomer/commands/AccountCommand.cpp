@@ -185,9 +185,7 @@ Report signIn(Session& session, const SignInArguments& arguments) {
     refuseEmpty(arguments.user);
     SetupFlow::checkWhoIsLoggedIn(arguments.user);
     const std::string server = session.signInDirectory.server();
-    if (!server.empty()) {
-        session.printer.tell(Report({}, "Asking the account server " + server));
-    }
+    tellAskedServer(session);
     SetupFlow flow(session.log, !session.options.verbose);
     std::string password = getPassword(arguments.password, "Password for " + arguments.user + ":");
     const WipedAtEnd wiped(password);

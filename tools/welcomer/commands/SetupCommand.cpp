@@ -191,9 +191,6 @@ Report result(const Decisions& decisions, SetupFlow& flow, const std::string& se
         {"account", decisions.account},     {"server", server.empty() ? Json() : Json(server)},
         {"services", toJson(states)},       {"aliases", decisions.aliases},
         {"launchAgent", kLaunchAgentLabel}, {"atNextLogin", {{"services", later}, {"delegates", delegates}}}};
-    if (!server.empty()) {
-        report.document["server"] = server;
-    }
     report.lines({"", decisions.account + " is set up.", ""});
     addServiceTable(report, report.document["services"], "  ");
     return report.lines({"", "At the next login the agent starts, once. It",
@@ -251,9 +248,11 @@ Report setUp(Session& session, const SetupArguments& arguments) {
     refuseWhereSomethingIsWaiting({session.options.user, session.options.storesLocally});
 
     SetupFlow flow(session.log, !session.options.verbose);
+    const std::string server = session.signInDirectory.server();
     Decisions decisions;
     if (answers) {
         SetupFlow::checkWhoIsLoggedIn(answers->decisions.account);
+        tellAskedServer(session);
         const std::string& account = answers->decisions.account;
         std::string password = arguments.firstLine
                                    ? *arguments.firstLine
@@ -264,7 +263,6 @@ Report setUp(Session& session, const SetupArguments& arguments) {
         decisions = answers->decisions;
     } else {
         terminal->say("This sets up your cloud account for the desktop.");
-        const std::string server = session.signInDirectory.server();
         if (!server.empty()) {
             terminal->say("Your name and password go to the account server " + server);
         }
@@ -277,7 +275,7 @@ Report setUp(Session& session, const SetupArguments& arguments) {
     flow.checkHandOver(decisions.aliases);
     flow.complete(decisions.services, decisions.justTheAccountAndKVS);
     flow.handOver(decisions.aliases, *bundle);
-    return result(decisions, flow, session.signInDirectory.server());
+    return result(decisions, flow, server);
 }
 
 } // namespace
