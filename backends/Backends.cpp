@@ -3,6 +3,7 @@
 #include "backends/local/LocalPlatform.h"
 #ifdef WELCOMER_DESKTOP
 #include "backends/desktop/DesktopPlatform.h"
+#include "backends/desktop/ServedPlatform.h"
 #endif
 
 namespace welcomer {
@@ -12,6 +13,9 @@ std::unique_ptr<PlatformOwner> buildPlatform(const PlatformOptions& options) {
     // The desktop's services know of no other root.
     if (options.root == "/") {
         return std::make_unique<desktop::DesktopPlatform>(options);
+    }
+    if (!options.accountServer.empty()) {
+        return std::make_unique<desktop::ServedPlatform>(options);
     }
 #endif
     return std::make_unique<local::LocalPlatform>(options);

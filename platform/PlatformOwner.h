@@ -31,6 +31,10 @@ struct PlatformOptions {
     platform::HostReachability* hostReachability = nullptr;
     platform::SignInDirectory* signInDirectory = nullptr;
 
+    // Below another root than "/", the address of the account server that signing in asks, as in the settings of a
+    // machine; empty: none. A build without desktop backends asks none. With the root "/" the settings say it.
+    std::string accountServer = {};
+
     // The folder of the application's main bundle, a path of this machine; empty: the application has none.
     std::string mainBundle = {};
 

@@ -14,6 +14,9 @@ inline constexpr char kAuthenticatePath[] = "/v1/authenticate";
 inline constexpr char kAcceptTermsPath[] = "/v1/accept-terms";
 inline constexpr char kServerPath[] = "/v1/server";
 
+// Where the server of a machine is asked by the users of that machine.
+inline constexpr char kSocketPath[] = "/run/welcomer-account-server.sock";
+
 // How the content of a body is written.
 enum class ContentType { JSON, PropertyList };
 

@@ -6,7 +6,6 @@
 #include "backends/posix/RootFolder.h"
 
 #include <chrono>
-#include <cstdlib>
 #include <memory>
 
 namespace welcomer::desktop {
@@ -25,17 +24,6 @@ PlatformOptions standingOn(PlatformOptions options, platform::RunLoops& runLoops
         options.signInDirectory = &signIn;
     }
     return options;
-}
-
-// Of who runs the program, as the C library finds it.
-std::string messagesLocale() {
-    for (const char* const name : {"LC_ALL", "LC_MESSAGES", "LANG"}) {
-        const char* const value = std::getenv(name);
-        if (value && *value != '\0') {
-            return value;
-        }
-    }
-    return "";
 }
 
 SearchListCredentialStore::NewItems newItemsOf(const PlatformOptions& options) {

@@ -1,7 +1,6 @@
 #include "tools/account-server/AccountServer.h"
 
 #include "backends/posix/FileContent.h"
-#include "backends/posix/RootFolder.h"
 #include "backends/posix/SystemError.h"
 #include "tools/account-server/HttpListener.h"
 #include "tools/account-server/LogLine.h"
@@ -41,19 +40,19 @@ posix::FileDescriptor takeSignals() {
 }
 
 // Throws where the file cannot be read; one that may be missing is empty then.
-std::string contentOf(const std::string& path, bool mayBeMissing = false) {
+std::string contentOf(const posix::RootFolder& root, const std::string& path, bool mayBeMissing = false) {
     std::string content;
-    const int error = posix::readFile(posix::RootFolder("/"), path, content, kMaximumFileSize);
+    const int error = posix::readFile(root, path, content, kMaximumFileSize);
     if (error != 0 && !(mayBeMissing && error == ENOENT)) {
-        throw std::runtime_error(path + ": " + std::generic_category().message(error));
+        throw std::runtime_error(root.shown(path) + ": " + std::generic_category().message(error));
     }
     return content;
 }
 
-Settings settingsIn(const std::string& path) {
-    SettingsText read = readSettings(contentOf(path, true));
+Settings settingsBelow(const posix::RootFolder& root) {
+    SettingsText read = readSettings(contentOf(root, kSettingsFile, true));
     if (!read.problems.empty()) {
-        throw std::runtime_error(path + ": " + read.problems.front());
+        throw std::runtime_error(root.shown(kSettingsFile) + ": " + read.problems.front());
     }
     return std::move(read.settings);
 }
@@ -81,10 +80,10 @@ struct AccountServer::Generation {
     bool isEmpty() const { return std::ranges::all_of(listeners, &HttpListener::isEmpty); }
 };
 
-AccountServer::AccountServer(std::vector<ListeningSocket> sockets, std::string settingsFile,
+AccountServer::AccountServer(std::vector<ListeningSocket> sockets, posix::RootFolder root,
                              MakeSource makeSource, platform::SystemLog& log)
     : _sockets(std::move(sockets)),
-      _settingsFile(std::move(settingsFile)),
+      _root(std::move(root)),
       _makeSource(std::move(makeSource)),
       _systemLog(log),
       _signals(takeSignals()),
@@ -96,12 +95,12 @@ AccountServer::~AccountServer() = default;
 
 std::unique_ptr<AccountServer::Generation> AccountServer::_start() {
     auto generation = std::make_unique<Generation>();
-    generation->settings = settingsIn(_settingsFile);
+    generation->settings = settingsBelow(_root);
     const Settings& settings = generation->settings;
     std::unique_ptr<TlsIdentity> identity;
     if (!settings.certificate.empty()) {
         identity = std::make_unique<TlsIdentity>(
-            TlsIdentity{contentOf(settings.certificate), contentOf(settings.key)});
+            TlsIdentity{contentOf(_root, settings.certificate), contentOf(_root, settings.key)});
     }
     generation->source = _makeSource(settings);
     generation->handler =

@@ -4,6 +4,7 @@
 #pragma once
 
 #include "backends/posix/FileDescriptor.h"
+#include "backends/posix/RootFolder.h"
 #include "platform/SystemLog.h"
 #include "tools/account-server/AccountHandler.h"
 #include "tools/account-server/AccountSource.h"
@@ -28,8 +29,9 @@ class AccountServer {
     // Reads the settings and serves the sockets from then on. Throws std::runtime_error with one line when
     // something of that fails. SIGTERM, SIGINT and SIGHUP are this object's from now on, in all threads that
     // are made afterwards.
-    //  log  takes the lines; borrowed
-    AccountServer(std::vector<ListeningSocket> sockets, std::string settingsFile, MakeSource makeSource,
+    //  root  below which the settings and what they name lie
+    //  log   takes the lines; borrowed
+    AccountServer(std::vector<ListeningSocket> sockets, posix::RootFolder root, MakeSource makeSource,
                   platform::SystemLog& log);
     ~AccountServer();
     AccountServer(const AccountServer&) = delete;
@@ -50,7 +52,7 @@ class AccountServer {
     void _log(int severity, const std::string& line) const;
 
     const std::vector<ListeningSocket> _sockets;
-    const std::string _settingsFile;
+    const posix::RootFolder _root;
     const MakeSource _makeSource;
     platform::SystemLog& _systemLog;
     const posix::FileDescriptor _signals;

@@ -2,13 +2,17 @@
 
 #include <arpa/inet.h>
 #include <array>
+#include <cerrno>
 #include <cstdlib>
 #include <memory>
 #include <netinet/in.h>
 #include <stdexcept>
 #include <sys/socket.h>
+#include <sys/stat.h>
 #include <sys/un.h>
+#include <system_error>
 #include <systemd/sd-daemon.h>
+#include <unistd.h>
 
 namespace welcomer::server {
 
@@ -61,6 +65,30 @@ std::vector<ListeningSocket> takeListeningSockets() {
                                      "\" is none that connections come in on");
         }
     }
+    return sockets;
+}
+
+std::vector<ListeningSocket> openListeningSocket(const std::string& path) {
+    const auto failed = [&path](int error) {
+        return std::runtime_error(path + ": " + std::generic_category().message(error));
+    };
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    if (path.size() >= sizeof address.sun_path) {
+        throw failed(ENAMETOOLONG);
+    }
+    path.copy(address.sun_path, path.size());
+    std::vector<ListeningSocket> sockets(1);
+    sockets[0].socket = posix::FileDescriptor(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    ::unlink(path.c_str());
+    const mode_t mask = ::umask(S_IXUSR | S_IRWXG | S_IRWXO);
+    const int bound =
+        ::bind(sockets[0].socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address);
+    ::umask(mask);
+    if (bound != 0 || ::listen(sockets[0].socket.get(), SOMAXCONN) != 0) {
+        throw failed(errno);
+    }
+    describe(sockets[0]);
     return sockets;
 }
 

@@ -26,6 +26,11 @@ struct ListeningSocket {
 // that is no listening stream socket. Once, on the main thread.
 std::vector<ListeningSocket> takeListeningSockets();
 
+// Opens a Unix socket of the caller's own, for nobody else, in the place of one that an earlier server has left there. Throws
+// std::runtime_error with one line. Main thread, no other thread running.
+//  path  of this machine
+std::vector<ListeningSocket> openListeningSocket(const std::string& path);
+
 // What a socket serves. Throws std::runtime_error with one line where the socket is not to be served so:
 // passwords in the clear stay on this machine.
 //  hasCertificate  whether there is one to show

@@ -2,6 +2,8 @@
 
 #include "platform/AccountService.h"
 
+#include <cstdlib>
+
 namespace welcomer::desktop {
 
 namespace {
@@ -56,6 +58,16 @@ void DesktopSignIn::stop() {
 
 const platform::SignInDirectory* DesktopSignIn::_directory() const {
     return _asksServer() ? _module.service() : &_local;
+}
+
+std::string messagesLocale() {
+    for (const char* const name : {"LC_ALL", "LC_MESSAGES", "LANG"}) {
+        const char* const value = std::getenv(name);
+        if (value && *value != '\0') {
+            return value;
+        }
+    }
+    return "";
 }
 
 } // namespace welcomer::desktop

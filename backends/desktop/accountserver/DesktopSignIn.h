@@ -8,6 +8,7 @@
 #include "platform/SignInDirectory.h"
 
 #include <optional>
+#include <string>
 
 namespace welcomer::desktop {
 
@@ -47,5 +48,8 @@ class DesktopSignIn final : public platform::SignInDirectory {
     const std::function<AccountServerSettings()> _settings;
     mutable DesktopModule<AccountServerModule> _module;
 };
+
+// The locale of who runs the program, for texts that people read, as the C library finds it. Any thread.
+std::string messagesLocale();
 
 } // namespace welcomer::desktop

@@ -29,8 +29,9 @@ std::vector<ToolFolders> toolFolders() {
         return {};
     }
     const fs::path built = programs.parent_path();
-    return {{programs / WELCOMER_DATA_FROM_PROGRAMS, programs / WELCOMER_EXAMPLES_FROM_PROGRAMS},
-            {built, built}};
+    return {{programs / WELCOMER_DATA_FROM_PROGRAMS, programs / WELCOMER_EXAMPLES_FROM_PROGRAMS,
+             programs / WELCOMER_SERVICES_FROM_PROGRAMS},
+            {built, built, programs}};
 }
 
 std::string findToolBundle() {

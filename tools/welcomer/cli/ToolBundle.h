@@ -13,6 +13,7 @@ namespace welcomer::tool {
 struct ToolFolders {
     std::filesystem::path data;     // the bundles
     std::filesystem::path examples; // the example plug-ins, in "plugins"
+    std::filesystem::path services; // the programs that people do not start themselves
 };
 
 // Where to look, in this order; empty when the system does not say where the program is.

@@ -2,9 +2,11 @@
 
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/login/LoginPicture.h"
+#include "tools/welcomer/story/ExampleServer.h"
 #include "tools/welcomer/story/Story.h"
 #include "tools/welcomer/story/TemporaryFolder.h"
 
+#include <filesystem>
 #include <memory>
 
 namespace welcomer::tool {
@@ -13,15 +15,18 @@ namespace {
 
 struct TryArguments {
     bool timeLapse = false;
+    bool withServer = false;
     std::string picture;
 };
 
-Report tellInFolder(Session& session, bool timeLapse, InterruptionGuard& guard, LoginRecord& firstLogin) {
+Report tellInFolder(Session& session, const TryArguments& arguments, InterruptionGuard& guard,
+                    LoginRecord& firstLogin) {
+    const auto server = arguments.withServer ? findAccountServer() : std::filesystem::path();
     if (session.options.rootGiven) {
-        return tellStory(session, timeLapse, session.options.root, guard, firstLogin);
+        return tellStory(session, arguments.timeLapse, server, session.options.root, guard, firstLogin);
     }
     const TemporaryFolder temporary;
-    return tellStory(session, timeLapse, temporary.path(), guard, firstLogin);
+    return tellStory(session, arguments.timeLapse, server, temporary.path(), guard, firstLogin);
 }
 
 Report tryStory(Session& session, const TryArguments& arguments) {
@@ -33,7 +38,7 @@ Report tryStory(Session& session, const TryArguments& arguments) {
     InterruptionGuard guard;
     try {
         LoginRecord firstLogin;
-        Report report = tellInFolder(session, arguments.timeLapse, guard, firstLogin);
+        Report report = tellInFolder(session, arguments, guard, firstLogin);
         if (!arguments.picture.empty()) {
             writePicture(arguments.picture,
                          drawLogin(firstLogin, {"The first login of " + firstLogin.account(),
@@ -60,6 +65,10 @@ void addTryCommand(CommandLine& commandLine) {
         [arguments](Session& session) { return tryStory(session, *arguments); });
     command.flag("--time-lapse", arguments->timeLapse,
                  "Run the agent on simulated time: the two minutes pass at once");
+    command.flag(
+        "--server", arguments->withServer,
+        "Sign in with the account server, which is started for it in the same folder and asked over a "
+        "Unix socket");
     command
         .option("--picture", arguments->picture, "Draw the timeline of the first login in this file, as SVG")
         .called("FILE");

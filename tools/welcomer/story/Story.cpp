@@ -1,6 +1,7 @@
 #include "tools/welcomer/story/Story.h"
 #include "tools/welcomer/story/SetupBundle.h"
 
+#include "backends/accountserver/Protocol.h"
 #include "handoff/LaunchAgentFile.h"
 #include "handoff/ReplayItem.h"
 #include "plugins/WLNimbusDelegatePlugins.h"
@@ -9,6 +10,7 @@
 #include "tools/welcomer/login/LoginReport.h"
 #include "tools/welcomer/story/AgentProcess.h"
 #include "tools/welcomer/story/ExampleFiles.h"
+#include "tools/welcomer/story/ExampleServer.h"
 #include "tools/welcomer/story/ExampleSetup.h"
 #include "tools/welcomer/story/FolderCopy.h"
 #include "tools/welcomer/story/FolderSnapshot.h"
@@ -19,6 +21,7 @@
 #include <chrono>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace welcomer::tool {
@@ -38,6 +41,7 @@ struct Setup {
     std::vector<AgentLogRecord> log;
     Json result;
     Json services; // afterwards
+    Json server;   // which was asked, with its log; null for none
 };
 
 // One login, as it was seen from outside.
@@ -59,9 +63,10 @@ struct LeftOnDisk {
 
 class Story {
   public:
-    Story(Session& session, bool timeLapse, const fs::path& root, InterruptionGuard& guard)
+    Story(Session& session, bool timeLapse, fs::path server, const fs::path& root, InterruptionGuard& guard)
         : _session(session),
           _timeLapse(timeLapse),
+          _serverProgram(std::move(server)),
           _root(root),
           _guard(guard),
           _owner(session.buildPlatform({.root = root.string(), .systemLog = &_log}, TimeKind::Real)),
@@ -100,7 +105,8 @@ class Story {
                             {{"log", _asJson(setup.log)},
                              {"aliases", setup.result["aliases"]},
                              {"delegates", setup.result["delegates"]},
-                             {"services", setup.services}}},
+                             {"services", setup.services},
+                             {"server", setup.server}}},
                            {"firstLogin", _asJson(first)},
                            {"left",
                             {{"launchAgent", left.launchAgent},
@@ -145,6 +151,10 @@ class Story {
             throw CommandFailure("cannot add the user: " + outcome.error.message);
         }
         _password = user.password;
+        if (!_serverProgram.empty()) {
+            makeFolders(_below(accountserver::kSocketPath).parent_path());
+            _server.emplace(_serverProgram, _root, _guard);
+        }
         _sayWhatIsPrepared(examples.plugins.size());
     }
 
@@ -167,14 +177,30 @@ class Story {
         listener.told = [&](const std::string& text) {
             setup.result = Json::parse(text);
         };
-        const AgentEnd end = runChildProcess(_session.buildPlatform, _root.string(), TimeKind::Real, _guard,
-                                             listener, setupLife(_password));
+        const std::string server = _server ? _server->address() : "";
+        const auto build = [&](PlatformOptions options, TimeKind time) {
+            options.accountServer = server;
+            return _session.buildPlatform(options, time);
+        };
+        if (build({.root = _root.string()}, TimeKind::Real)->signInDirectory().server() != server) {
+            throw CommandFailure("this build of the tool asks no account server");
+        }
+        const AgentEnd end =
+            runChildProcess(build, _root.string(), TimeKind::Real, _guard, listener, setupLife(_password));
         if (!end.succeeded()) {
             throw CommandFailure(setup.result.contains("failure")
                                      ? setup.result["failure"].get<std::string>()
                                      : "the setup ended with " + end.description());
         }
         setup.services = toJson(_services());
+        if (_server) {
+            setup.server = {{"address", server}, {"log", _server->newLines()}};
+            _say("");
+            _say("  The account server's own log:");
+            for (const Json& line : setup.server["log"]) {
+                _say("    " + line.get<std::string>());
+            }
+        }
         _say("");
         for (const auto& [identifier, aliases] : setup.result["aliases"].items()) {
             _say("  " + std::to_string(aliases.size()) + " aliases chosen for " + identifier);
@@ -246,6 +272,9 @@ class Story {
         _say("  plug-ins           " + std::to_string(plugins) + " in " + kPluginDirectory);
         _say(std::string("  setup application  ") + kSetupBundlePath);
         _say(std::string("  who can sign in    ") + kExampleAccount);
+        if (_server) {
+            _say("  account server     " + _serverProgram.string() + ", asked at " + _server->address());
+        }
     }
 
     void _showRecord(const AgentLogRecord& record) { _say(timedLine(record.time, record.message)); }
@@ -329,6 +358,7 @@ class Story {
 
     Session& _session;
     const bool _timeLapse;
+    const fs::path _serverProgram; // empty: none
     const fs::path _root;
     InterruptionGuard& _guard;
     KeptLog _log;
@@ -336,13 +366,14 @@ class Story {
     const platform::ScopedPlatform _installed;
     const std::string _home;
     std::string _password; // of the story's user
+    std::optional<ExampleServer> _server;
 };
 
 } // namespace
 
-Report tellStory(Session& session, bool timeLapse, const fs::path& root, InterruptionGuard& guard,
-                 LoginRecord& firstLogin) {
-    return Story(session, timeLapse, root, guard).tell(firstLogin);
+Report tellStory(Session& session, bool timeLapse, const fs::path& server, const fs::path& root,
+                 InterruptionGuard& guard, LoginRecord& firstLogin) {
+    return Story(session, timeLapse, server, root, guard).tell(firstLogin);
 }
 
 } // namespace welcomer::tool
