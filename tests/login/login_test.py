@@ -1,16 +1,19 @@
 #!/usr/bin/env python3
 """From `welcomer setup` to the end of the login after it, with the installed packages: a real login starts the agent.
 
-Six machines side by side. On one the administrator sets up two users, who log in at the same time; on the others one user
-is set up, by the administrator or in a session of their own: with a keyring and online accounts, with the keyring locked
-and somebody or nobody to unlock it, without a keyring, and with a bus that dies while the plug-ins work.
+Seven machines side by side. On one the administrator sets up two users, who log in at the same time; on another one an
+organisation's users sign in over HTTPS against its directory; on the others one user is set up, by the administrator or in a
+session of their own: with a keyring and online accounts, with the keyring locked and somebody or nobody to unlock it, without
+a keyring, and with a bus that dies while the plug-ins work.
 
-usage: login_test.py MACHINE [PACKAGES]
+usage: login_test.py MACHINE [PACKAGES SLAPD]
     MACHINE   the root folder of a minimal system; what happens leaves it as it is
     PACKAGES  the folder of the packages that are to be installed on it; without one, they are installed already
+    SLAPD     the folder that the package slapd is unpacked in; without one, it is installed
 """
 
 import concurrent.futures
+import json
 import re
 import sys
 import unittest
@@ -18,6 +21,8 @@ from pathlib import Path
 
 sys.path.insert(0, str(Path(__file__).resolve().parents[1] / "support"))
 import booted_machine as booted  # noqa: E402
+import organisation  # noqa: E402
+import slapd  # noqa: E402
 import stories  # noqa: E402
 from stories import POST_LOGIN, PRE_LOGIN, SERVICE  # noqa: E402
 
@@ -52,8 +57,8 @@ class StoryTest(unittest.TestCase):
             f"Enabling Nimbus Mail: {newcomer.name}@nimbus.example",
             "Enabling Nimbus Notes",
             f"{SERVICE}documents should be configured pre-login",
-            "Vidlink: 0 aliases",
-            "Chatter: 0 aliases",
+            f"Vidlink: {self.seen.aliases} aliases",
+            f"Chatter: {self.seen.aliases} aliases",
         ])
         delayed = {f"Enabling Nimbus service '{SERVICE}{name}'" for name in ("calendars", "reminders")}
         # The plug-ins finish beside one another: only each one's own two lines have an order.
@@ -129,6 +134,50 @@ class WholeTest(StoryTest):
         self.assertEqual(self.seen.greetings, ["Deskmate is ready"])
 
 
+class OrganisationTest(StoryTest):
+    story = organisation.Organisation
+
+    def test_its_users_sign_in_over_https_and_every_delegate_finishes_at_the_login(self):
+        self.assertEqual([newcomer.name for newcomer in self.seen.newcomers], ["newcomer", "latecomer"])
+        self.assert_setup_and_login_are_whole()
+
+    def test_the_second_login_starts_nothing(self):
+        self.assert_second_login_starts_nothing()
+
+    def test_the_status_says_that_every_delegate_has_finished(self):
+        for newcomer in self.seen.newcomers:
+            self.assertEqual(newcomer.status.returncode, 0, newcomer.status)
+            status = json.loads(newcomer.status.stdout)
+            self.assertEqual((status["lastLogin"]["account"], status["lastLogin"]["end"]), (newcomer.name, "ended"))
+            self.assertEqual({each["identifier"]: each["outcome"] for each in status["lastLogin"]["delegates"]},
+                             {f"com.corvid.{name}": "completed" for name in ("chatter", "vidlink", "deskmate")})
+            self.assertEqual((status["waiting"]["item"], status["waiting"]["agent"], status["toDo"]), (False, False, []))
+
+    def test_the_setup_and_the_doctor_say_which_server_is_asked(self):
+        for newcomer in self.seen.newcomers:
+            self.assertIn(f"Asking the account server {organisation.ADDRESS}\n", newcomer.said)
+            [server] = [each for each in newcomer.doctor["backends"] if each["interface"] == "SignInDirectory"]
+            self.assertEqual(server["backend"], organisation.ADDRESS)
+            self.assertRegex(server["reason"], r"^answers: welcomer-account-server [\d.]+, certificate until \d{4}-\d\d-\d\d, "
+                                               r"(clocks agree|its clock is \d+ s behind)$")
+
+    def test_a_wrong_password_sets_nothing_up(self):
+        for newcomer in self.seen.newcomers:
+            self.assertEqual((newcomer.refused.returncode, newcomer.installed_when_refused), (1, False))
+            self.assertEqual(newcomer.refused.stderr,
+                             f"welcomer: cannot sign in {newcomer.name}: The user name or the password is wrong\n")
+
+    def test_the_server_asks_the_directory_and_no_file_and_tells_of_no_password(self):
+        self.assertEqual(self.seen.users_of_the_machine, [])
+        for newcomer in self.seen.newcomers:
+            answers = [line for line in self.seen.server_log if f" user={newcomer.name} " in line]
+            # Who completes the sign-in asks once more.
+            self.assertEqual([line.split()[:3] for line in answers],
+                             [["authenticate", f"status={status}", "from=127.0.0.1"] for status in (401, 200, 200)])
+        for password in (stories.PASSWORD, organisation.WRONG_PASSWORD, organisation.SEARCHERS_PASSWORD):
+            self.assertNotIn(password, self.seen.everything)
+
+
 class LockedTest(StoryTest):
     story = stories.Locked
 
@@ -184,7 +233,8 @@ class BusDiesTest(StoryTest):
 
 def main():
     base, packages = sys.argv[1], booted.package_files(sys.argv[2]) if len(sys.argv) > 2 else ()
-    kinds = (stories.Administered, stories.Whole, stories.Locked, stories.LockedForGood, stories.WithoutKeyring,
+    organisation.Organisation.slapd = slapd.tree_of(*sys.argv[3:4])
+    kinds = (stories.Administered, organisation.Organisation, stories.Whole, stories.Locked, stories.LockedForGood, stories.WithoutKeyring,
              stories.BusDies)
     with concurrent.futures.ThreadPoolExecutor(len(kinds)) as pool:
         SEEN.update({kind: pool.submit(lambda each: each(base, packages).run(), kind) for kind in kinds})

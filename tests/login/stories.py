@@ -27,10 +27,17 @@ ENABLE_PLUGINS = """
     ln -s ../examples/plugins/Vidlink.ncdplugin ../examples/plugins/Chatter.ncdplugin .
     ln -s ../examples/desktop-plugins/Deskmate.ncdplugin .
 """
-# An account on the server that the machine itself stands for, how long it has the plug-ins take, and the setup with it.
+# The setup of an account.
 SET_UP = """
     account=$1 delays=$2 password=$3
     shift 3
+    answers=$(mktemp)
+    printf '{ Account = "%s"; }' "$account" > "$answers"
+    echo "$password" | welcomer setup "$@" --answers "$answers" --password-fd 0
+"""
+# The account on the server that the machine itself stands for, before that, and how long it has the plug-ins take.
+ADD = """
+    account=$1 delays=$2 password=$3
     echo "$password" | welcomer account add "$account" --mail "$account@nimbus.example" --password-fd 0
     python3 - "$account" "$delays" <<'END'
 import json, plistlib, sys
@@ -43,13 +50,11 @@ for identifier, seconds in json.loads(sys.argv[2]).items():
 with open(path, "wb") as file:
     plistlib.dump(contents, file)
 END
-    answers=$(mktemp)
-    printf '{ Account = "%s"; }' "$account" > "$answers"
-    echo "$password" | welcomer setup "$@" --answers "$answers" --password-fd 0
 """
 # Who signs in is who has the directory of users: for a user's own setup it lies in a folder that only this setup sees.
 AS_OWN_SERVER = ["unshare", "--user", "--map-current-user", "--keep-caps", "--mount", "sh", "-ec",
                  'mount -t tmpfs tmpfs /var/lib && mkdir -m 700 /var/lib/welcomer && exec "$@"', "sh"]
+
 
 class Newcomer:
     """One user of a machine, from the setup to the end of the second login: what was seen of them."""
@@ -78,19 +83,30 @@ class Newcomer:
     def agent_units(self, session):
         return session.systemctl("list-units", "--all", "--plain", "--no-legend", "welcomer-agent-*").stdout
 
+    def setup_command(self, password, *arguments):
+        return ["sh", "-ec", self.story.set_up, "sh", self.name, json.dumps(self.story.delays), password, *arguments]
+
     def set_up(self):
         """By the administrator: the user is not logged in."""
-        self.machine.must(["sh", "-ec", SET_UP, "sh", self.name, json.dumps(self.story.delays), PASSWORD,
-                           "--user", self.name])
+        set_up = lambda password: self.machine.run(self.setup_command(password, "--user", self.name))
+        self.story.before_setup(self, set_up)
+        self.set_up_with(set_up)
         self.look_at_setup(booted.Session(self.machine, self.name))
 
     def set_up_themselves(self):
         """In a session of their own, with the desktop's services there."""
         session = booted.Session(self.machine, self.name)
         self.story.prepare_setup(session)
-        session.run([*AS_OWN_SERVER, "sh", "-ec", SET_UP, "sh", self.name, json.dumps(self.story.delays), PASSWORD],
-                    check=True)
+        set_up = lambda password: session.run([*self.story.own_setup, *self.setup_command(password)])
+        self.story.before_setup(self, set_up)
+        self.set_up_with(set_up)
         self.look_at_setup(session)
+
+    def set_up_with(self, set_up):
+        done = set_up(PASSWORD)
+        if done.returncode != 0:
+            raise AssertionError(f"the setup failed: {done}")
+        self.said = done.stdout
 
     def look_at_setup(self, session):
         self.installed = self.launch_agent.exists()
@@ -131,6 +147,7 @@ class Newcomer:
         self.services_after_login = self.services(session)
         self.replay_after_login = self.replay(session)
         self.doctor = json.loads(session.run([TOOL, "--json", "doctor"]).stdout)
+        self.status = session.run([TOOL, "--json", "status"])
         session.end()
         self.launch_agent_after_second = self.launch_agent.exists()
 
@@ -140,7 +157,10 @@ class Story:
 
     delays = AT_ONCE
     names = ("newcomer",)
-    by_administrator = False
+    administered = ()  # those of them whom the administrator sets up
+    aliases = 0  # that the server offers for each way to be reached
+    set_up = ADD + SET_UP
+    own_setup = AS_OWN_SERVER  # what a user's own setup runs in
     # Whether the agent cannot ask for its item at the first login, and so runs at the second one.
     is_offered_again = False
 
@@ -155,7 +175,7 @@ class Story:
             self.install()
             self.newcomers = [Newcomer(self, name) for name in self.names]
             for newcomer in self.newcomers:
-                newcomer.set_up() if self.by_administrator else newcomer.set_up_themselves()
+                newcomer.set_up() if newcomer.name in self.administered else newcomer.set_up_themselves()
             with concurrent.futures.ThreadPoolExecutor(len(self.newcomers)) as pool:
                 list(pool.map(self.live, self.newcomers))
         finally:
@@ -185,6 +205,9 @@ class Story:
         self.start_online_accounts(session)
         self.notifications = session.start_script("notifications.py")
 
+    def before_setup(self, newcomer, set_up):
+        """set_up: sets the newcomer up with the password that it is called with."""
+
     def meanwhile(self, newcomer, session):
         """Called when the agent has begun."""
 
@@ -199,8 +222,7 @@ class Story:
 class Administered(Story):
     """The administrator has set up two users, who log in at the same time."""
 
-    names = ("newcomer", "latecomer")
-    by_administrator = True
+    names = administered = ("newcomer", "latecomer")
 
     def look_afterwards(self, newcomer):
         newcomer.foreign_files = self.machine.must(["find", f"/home/{newcomer.name}", "!", "-user", newcomer.name])

@@ -15,6 +15,7 @@ import unittest
 from pathlib import Path
 
 sys.path.insert(0, str(Path(__file__).resolve().parents[1] / "support"))
+import account_server  # noqa: E402
 import booted_machine as booted  # noqa: E402
 
 MACHINE, PACKAGES, PACKAGES_BEFORE = None, (), ()
@@ -110,6 +111,31 @@ class LifeTest(unittest.TestCase):
         for unit in (RESOLVER, ACCOUNTS):
             self.assertEqual((self.state(unit), self.is_active(unit)), ("disabled", False))
         self.assertEqual(self.machine.must(["systemctl", "--failed", "--no-legend"]), "")
+
+    def test_an_account_server_that_serves_does_so_after_an_upgrade_with_its_settings(self):
+        self.machine.install(PACKAGES_BEFORE)
+        self.use()
+        authenticate = lambda: account_server.ask_on(
+            self.machine, USER, "/v1/authenticate", account_server.body_of("nimbus", "secret"))
+        settings, noted = "etc/welcomer/account-server.conf", "var/lib/welcomer-account-server/accepted-terms.plist"
+        self.machine.write(settings, "UnknownUsers=told\n")
+        self.machine.must(["systemctl", "enable", "--now", ACCOUNTS])
+        self.assertEqual(authenticate()[0], 200)
+        self.machine.write(noted, "{}")
+        before = [entry_of(self.root / name) for name in (settings, noted)]
+        process = self.machine.process_of("welcomer-account-server")
+        self.machine.install(PACKAGES)
+        self.assertEqual((self.state(ACCOUNTS), self.is_active(ACCOUNTS)), ("enabled", True))
+        self.assertEqual(authenticate()[0], 200)
+        self.assertNotEqual(self.machine.process_of("welcomer-account-server"), process)
+        self.assertEqual(self.machine.must(["systemctl", "--failed", "--no-legend"]), "")
+
+        self.machine.must(["dpkg", "--remove", *self.names])
+        self.assertEqual([entry_of(self.root / name) for name in (settings, noted)], before)
+        self.assertIsNone(self.machine.process_of("welcomer-account-server"))
+        self.assertNotEqual(self.machine.run(["test", "-e", "/run/welcomer-account-server.sock"]).returncode, 0)
+        self.machine.must(["dpkg", "--purge", *self.names])
+        self.assertFalse((self.root / noted).parent.exists())
 
     def test_an_upgrade_keeps_what_is_in_use_and_what_the_administrator_has_decided(self):
         self.machine.install(PACKAGES_BEFORE)

@@ -19,14 +19,34 @@ DIRECTORY = "var/lib/welcomer/nimbus-directory.plist"
 PASSWORD = "right horse"
 
 
-def make_certificate(folder, name="server", authority=None):
-    """Makes a key and a certificate of 127.0.0.1: of an authority, or one that is an authority itself. All in PEM."""
+# Asks over the Unix socket of a machine as whoever runs it.
+ASK = """
+import http.client, socket, sys
+class Connection(http.client.HTTPConnection):
+    def connect(self):
+        self.sock = socket.socket(socket.AF_UNIX)
+        self.sock.connect("/run/welcomer-account-server.sock")
+connection = Connection("localhost", timeout=60)
+connection.request("POST", sys.argv[1], sys.argv[2], {"Content-Type": "application/json"})
+answer = connection.getresponse()
+print(answer.status, answer.read().decode())
+"""
+
+
+def ask_on(machine, user, path, members):
+    """What a user of a booted machine is answered: the status, and the content if there is any."""
+    status, body = machine.must(["python3", "-c", ASK, path, json.dumps(members)], user).split(" ", 1)
+    return int(status), json.loads(body) if body.strip() else None
+
+
+def make_certificate(folder, name="server", authority=None, host="localhost"):
+    """Makes a key and a certificate of a host and 127.0.0.1: of an authority, or one that is an authority itself. All in PEM."""
     key, certificate = folder / f"{name}.key", folder / f"{name}.pem"
     command = ["openssl", "req", "-x509", "-newkey", "ec", "-pkeyopt", "ec_paramgen_curve:P-256", "-nodes", "-days", "2",
                "-subj", f"/CN={name}", "-keyout", key, "-out", certificate]
     if authority:
         command += ["-CA", folder / f"{authority}.pem", "-CAkey", folder / f"{authority}.key",
-                    "-addext", "subjectAltName=DNS:localhost,IP:127.0.0.1", "-addext", "basicConstraints=critical,CA:FALSE"]
+                    "-addext", f"subjectAltName=DNS:{host},IP:127.0.0.1", "-addext", "basicConstraints=critical,CA:FALSE"]
     else:
         command += ["-addext", "keyUsage=critical,keyCertSign"]
     subprocess.run([str(part) for part in command], check=True, capture_output=True)
