@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <mutex>
+#include <random>
 #include <unordered_map>
 #include <utility>
 
@@ -17,8 +18,12 @@ class HandlerTable {
   public:
     std::uint64_t add(Handler handler) {
         const std::lock_guard lock(_mutex);
-        _handlers.emplace(++_last, std::move(handler));
-        return _last;
+        std::uint64_t number = 0;
+        do {
+            number = std::uint64_t{_random()} << 32 | _random();
+        } while (number == 0 || _handlers.contains(number));
+        _handlers.emplace(number, std::move(handler));
+        return number;
     }
 
     // The handler, which is then no longer in the table; empty when it is spent or was never there.
@@ -31,7 +36,7 @@ class HandlerTable {
   private:
     std::mutex _mutex;
     std::unordered_map<std::uint64_t, Handler> _handlers;
-    std::uint64_t _last = 0;
+    std::random_device _random; // the system's own
 };
 
 // Never destroyed: plug-in threads may still call while the process ends.

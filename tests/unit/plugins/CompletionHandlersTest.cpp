@@ -5,6 +5,7 @@
 #include <atomic>
 #include <gtest/gtest.h>
 #include <memory>
+#include <set>
 #include <stdexcept>
 #include <thread>
 #include <vector>
@@ -101,6 +102,34 @@ TEST(CompletionHandlers, DoNothingForAContextThatWasNeverIssued) {
     const auto handler = issueFor(received);
     handler.call(handler.context + 1000, true, 0, nullptr);
     EXPECT_EQ(received.calls, 0);
+}
+
+TEST(CompletionHandlers, HaveContextsThatNobodyCanGuess) {
+    constexpr int kHandlers = 100;
+    constexpr std::uint64_t kGuesses = 1000;
+    std::vector<Received> received(kHandlers);
+    std::vector<wl_completion_handler> handlers;
+    std::set<std::uint64_t> upperHalves;
+    for (Received& each : received) {
+        handlers.push_back(issueFor(each));
+        upperHalves.insert(handlers.back().context >> 32);
+    }
+    EXPECT_GT(upperHalves.size(), kHandlers / 2);
+    // What a plug-in would try: small numbers, and the neighbours of its own.
+    const wl_completion_handler own = handlers.back();
+    for (std::uint64_t guess = 1; guess <= kGuesses; ++guess) {
+        for (const std::uint64_t context : {guess, own.context - guess, own.context + guess}) {
+            own.call(context, true, 0, nullptr);
+        }
+    }
+    for (const Received& each : received) {
+        EXPECT_EQ(each.calls, 0);
+    }
+    own.call(own.context, true, 0, nullptr);
+    EXPECT_EQ(received.back().calls, 1);
+    for (const wl_completion_handler& handler : handlers) {
+        revokeCompletionHandler(handler);
+    }
 }
 
 TEST(CompletionHandlers, KeepNothingAliveOnceSpent) {
