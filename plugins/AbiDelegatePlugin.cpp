@@ -1,5 +1,6 @@
 #include "plugins/AbiDelegatePlugin.h"
 
+#include "log/PCLogManager.h"
 #include "plugins/CompletionHandlers.h"
 #include "plugins/PluginMark.h"
 #include "plugins/PluginText.h"
@@ -132,6 +133,25 @@ AbiDelegatePlugin::~AbiDelegatePlugin() {
 }
 
 std::optional<std::string> AbiDelegatePlugin::delegateIdentifier() {
+    std::optional<std::string> identifier = _askForIdentifier();
+    if (!_firstIdentifier) {
+        _firstIdentifier = std::move(identifier);
+    } else if (identifier != *_firstIdentifier && !_hasChanged.exchange(true)) {
+        _logChange(identifier);
+    }
+    return *_firstIdentifier;
+}
+
+// What a plug-in is known by decides what it gets: one that could change it would get what is meant for another.
+void AbiDelegatePlugin::_logChange(const std::optional<std::string>& identifier) {
+    const auto shown = [](const std::optional<std::string>& each) {
+        return each ? std::optional(pluginText(*each)) : std::nullopt;
+    };
+    WL_LOG("Nimbus Plugins: '%@' has changed its identifier to '%@', the one on load counts: '%@'",
+           pluginText(_name), shown(identifier), shown(*_firstIdentifier));
+}
+
+std::optional<std::string> AbiDelegatePlugin::_askForIdentifier() {
     throwIfMissing(_instance->delegate_identifier, "delegateIdentifier");
     ErrorSlot slot;
     const char* const identifier = callPlugin(_name, slot, [this](wl_error_slot* handle) {

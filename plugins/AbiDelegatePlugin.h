@@ -6,6 +6,7 @@
 #include "plugins/WLFirstRunDelegateConfiguration.h"
 #include "sdk/welcomer/delegate_plugin.h"
 
+#include <atomic>
 #include <memory>
 #include <optional>
 #include <string>
@@ -45,7 +46,8 @@ class AbiDelegatePlugin final : public WLFirstRunDelegateConfiguration {
     AbiDelegatePlugin(const AbiDelegatePlugin&) = delete;
     AbiDelegatePlugin& operator=(const AbiDelegatePlugin&) = delete;
 
-    // An identifier that is no UTF-8 counts as raising.
+    // An identifier that is no UTF-8 counts as raising. The first answer counts: one that differs later is logged,
+    // once, and the first one is given. The first time with no other call on the instance.
     std::optional<std::string> delegateIdentifier() override;
     // A request that is no dictionary counts as raising.
     std::optional<PropertyList> delegateSetupRequest() override;
@@ -70,6 +72,11 @@ class AbiDelegatePlugin final : public WLFirstRunDelegateConfiguration {
     const wl_delegate_plugin_descriptor& _principalClass;
     wl_delegate* _instance; // owned
     const std::string _name;
+    std::optional<std::optional<std::string>> _firstIdentifier; // none until it was asked
+    std::atomic<bool> _hasChanged = false;                      // and that was logged
+
+    std::optional<std::string> _askForIdentifier();
+    void _logChange(const std::optional<std::string>& identifier);
 };
 
 } // namespace welcomer

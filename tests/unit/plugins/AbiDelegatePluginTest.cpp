@@ -3,6 +3,7 @@
 #include "plugins/AbiDelegatePlugin.h"
 #include "plugins/PluginMark.h"
 #include "plugins/PropertyListHandles.h"
+#include "tests/fakes/FakePlatform.h"
 #include "tests/unit/plugins/AbiDelegatePluginFixture.h"
 #include "tests/unit/plugins/InProcessPlugin.h"
 
@@ -130,6 +131,32 @@ TEST_F(AbiDelegatePluginTest, CopiesTheIdentifier) {
     const auto identifier = instance->delegateIdentifier();
     plugin.identifier = "another text of a certain length";
     EXPECT_EQ(identifier, "com.corvid.sample");
+}
+
+TEST_F(AbiDelegatePluginTest, TheIdentifierOnLoadCountsAndAChangeIsSaidOnce) {
+    fakes::FakePlatform fake;
+    const platform::ScopedPlatform installed(fake.platform());
+    const auto instance = create();
+    EXPECT_EQ(instance->delegateIdentifier(), "com.corvid.sample");
+    EXPECT_EQ(instance->delegateIdentifier(), "com.corvid.sample");
+    EXPECT_EQ(fake.systemLog.lines(), std::vector<std::string>{});
+    plugin.identifier = "com.corvid.other\n";
+    EXPECT_EQ(instance->delegateIdentifier(), "com.corvid.sample");
+    plugin.identifier.reset();
+    EXPECT_EQ(instance->delegateIdentifier(), "com.corvid.sample");
+    EXPECT_EQ(fake.systemLog.lines(),
+              std::vector<std::string>{"Nimbus Plugins: 'Sample.ncdplugin' has changed its identifier to "
+                                       "'com.corvid.other\\n', the one on load counts: 'com.corvid.sample'"});
+}
+
+TEST_F(AbiDelegatePluginTest, OneThatHadNoIdentifierGetsNoneLater) {
+    fakes::FakePlatform fake;
+    const platform::ScopedPlatform installed(fake.platform());
+    plugin.identifier.reset();
+    const auto instance = create();
+    EXPECT_EQ(instance->delegateIdentifier(), std::nullopt);
+    plugin.identifier = "com.corvid.late";
+    EXPECT_EQ(instance->delegateIdentifier(), std::nullopt);
 }
 
 TEST_F(AbiDelegatePluginTest, GivesTheClassNameInMessages) {
