@@ -1,6 +1,8 @@
 #include "backends/local/LocalPluginBundle.h"
 
+#include "backends/local/LibraryFile.h"
 #include "backends/posix/FileContent.h"
+#include "backends/posix/Strangers.h"
 #include "backends/posix/SystemError.h"
 #include "platform/Path.h"
 #include "propertylist/Lookup.h"
@@ -24,34 +26,40 @@ bool isFolder(const posix::RootFolder& root, const std::string& path) {
     return file && ::fstat(file.get(), &status) == 0 && S_ISDIR(status.st_mode);
 }
 
-// The library of a folder as a path of this machine, or none with the reason.
+// The library of a folder as a path of the system, or none with the reason.
 std::optional<std::string> libraryOf(const posix::RootFolder& root, const std::string& path,
                                      std::string& reason) {
     const std::string folder = root.shown(path);
-    const std::string infoPath = platform::joinPath(folder, "Info.plist");
+    const std::string infoPath = platform::joinPath(path, "Info.plist");
+    for (const std::string& each : {posix::splitPath(path).folder, infoPath}) {
+        reason = posix::strangerWhoMayChange(root, each, true);
+        if (!reason.empty()) {
+            return std::nullopt;
+        }
+    }
     std::string bytes;
-    if (const int error =
-            posix::readFile(root, platform::joinPath(path, "Info.plist"), bytes, kMaximumInfoSize)) {
-        reason = posix::systemError("cannot read " + infoPath, error).message;
+    if (const int error = posix::readFile(root, infoPath, bytes, kMaximumInfoSize)) {
+        reason = posix::systemError("cannot read " + root.shown(infoPath), error).message;
         return std::nullopt;
     }
     const PropertyListReadResult info = readPropertyList(bytes);
     if (!info) {
-        reason = infoPath + ": " + info.error;
+        reason = root.shown(infoPath) + ": " + info.error;
         return std::nullopt;
     }
     const std::string* const name = textIn(*info.value, "Executable");
     if (!name || name->empty()) {
-        reason = infoPath + ": no Executable";
+        reason = root.shown(infoPath) + ": no Executable";
         return std::nullopt;
     }
-    std::optional<std::string> library = root.resolve(platform::joinPath(path, *name));
+    const std::string library = platform::joinPath(path, *name);
+    const std::optional<std::string> resolved = root.resolve(library);
     const std::optional<std::string> inside = root.resolve(path);
-    if (!library || !inside) {
+    if (!resolved || !inside) {
         reason = folder + ": its Executable is missing";
         return std::nullopt;
     }
-    if (!library->starts_with(platform::joinPath(*inside, ""))) {
+    if (!resolved->starts_with(platform::joinPath(*inside, ""))) {
         reason = folder + ": its Executable is outside of it";
         return std::nullopt;
     }
@@ -67,33 +75,33 @@ std::string lastLoaderError(const std::string& path) {
 
 platform::PluginSymbol LocalPluginBundle::load(const std::string& given, const char* symbol) {
     const std::string path = _pluginFolder.located(given);
-    const std::string shown = _root.shown(path);
-    // The loader knows libraries by their paths, so that a descriptor's in /proc, whose number is used again,
-    // would be taken for another's. With the root "/" it follows links as the system does.
-    const std::string located = _root.isWholeMachine() ? shown : _root.resolve(path).value_or("");
-    if (located.empty()) {
-        return {nullptr, posix::systemError("cannot load " + shown, errno).message};
-    }
-    // A library is loaded without a look at what it is: scanning many plug-ins should cost what loading
-    // costs.
-    void* library = ::dlopen(located.c_str(), RTLD_NOW | RTLD_LOCAL);
-    if (!library) {
-        std::string reason = lastLoaderError(located);
-        if (!isFolder(_root, path)) {
-            return {nullptr, reason};
-        }
+    std::string library = path;
+    std::string reason;
+    if (isFolder(_root, path)) {
         const std::optional<std::string> inner = libraryOf(_root, path, reason);
         if (!inner) {
             return {nullptr, reason};
         }
-        library = ::dlopen(inner->c_str(), RTLD_NOW | RTLD_LOCAL);
-        if (!library) {
-            return {nullptr, lastLoaderError(*inner)};
-        }
+        library = *inner;
     }
-    const void* address = ::dlsym(library, symbol);
+    reason = reasonNotToLoad(_root, library);
+    if (!reason.empty()) {
+        return {nullptr, reason};
+    }
+    // The loader knows libraries by their paths, so that a descriptor's in /proc, whose number is used again,
+    // would be taken for another's. With the root "/" it follows links as the system does.
+    const std::string located =
+        _root.isWholeMachine() ? _root.shown(library) : _root.resolve(library).value_or("");
+    if (located.empty()) {
+        return {nullptr, posix::systemError("cannot load " + _root.shown(library), errno).message};
+    }
+    void* const loaded = ::dlopen(located.c_str(), RTLD_NOW | RTLD_LOCAL);
+    if (!loaded) {
+        return {nullptr, lastLoaderError(located)};
+    }
+    const void* address = ::dlsym(loaded, symbol);
     if (!address) {
-        return {nullptr, shown + ": no symbol " + symbol};
+        return {nullptr, _root.shown(path) + ": no symbol " + symbol};
     }
     return {address, {}};
 }

@@ -9,7 +9,9 @@
 namespace welcomer::local {
 
 // Libraries are bound at once, keep their symbols to themselves and are never closed. The "Executable" of a
-// folder is a path in it: one that leads out of the folder, also by a symbolic link, is refused.
+// folder is a path in it: one that leads out of the folder, also by a symbolic link, is refused. So is what others may
+// change (posix/Strangers.h: root, the root folder's owner and the user are no others), and a library that is no whole
+// regular file: loading would block, or end the process.
 class LocalPluginBundle final : public platform::PluginBundle {
   public:
     explicit LocalPluginBundle(const posix::RootFolder& root) : LocalPluginBundle(root, PluginFolder(root)) {}

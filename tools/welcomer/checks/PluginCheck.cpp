@@ -1,9 +1,9 @@
 #include "tools/welcomer/checks/PluginCheck.h"
 
+#include "backends/posix/Strangers.h"
 #include "platform/Path.h"
 #include "platform/Platform.h"
 #include "tools/welcomer/checks/ChildOutput.h"
-#include "tools/welcomer/checks/CodeFolders.h"
 
 #include <nlohmann/json.hpp>
 
@@ -30,12 +30,12 @@ std::vector<std::string> entriesOf(const std::string& folder) {
     return paths;
 }
 
-void addStrangers(Findings& findings, const std::string& root, const std::string& folder) {
+void addStrangers(Findings& findings, const posix::RootFolder& root, const std::string& folder) {
     std::vector<std::string> paths = entriesOf(folder);
     paths.insert(paths.begin(), folder);
     std::string last; // a folder is on the way to everything in it
     for (const std::string& path : paths) {
-        const std::string stranger = strangerWhoMayChange(root, path, false);
+        const std::string stranger = posix::strangerWhoMayChange(root, path, false);
         if (!stranger.empty() && stranger != last) {
             findings.push_back({kSubject, Verdict::Wrong, stranger,
                                 "give it to root alone: chown root:root and chmod go-w"});
@@ -80,7 +80,7 @@ Findings checkPlugins(const Options& options, const std::string& folder) {
     }
     Findings findings{{kSubject, Verdict::Right, "they are in " + folder}};
     const std::size_t before = findings.size();
-    addStrangers(findings, options.root, folder);
+    addStrangers(findings, posix::RootFolder(options.root), folder);
     if (findings.size() > before) {
         findings.push_back(
             {kSubject, Verdict::Unknown,
