@@ -94,6 +94,8 @@ int main(int argc, char** argv) {
     // Passwords pass through here: nobody looks into the memory, and what the libraries give back is written over.
     ::prctl(PR_SET_DUMPABLE, 0);
     ::mallopt(M_PERTURB, 1);
+    // A long body is the machine's again as soon as it is gone; the library would keep room for the next one.
+    ::mallopt(M_MMAP_THRESHOLD, 128 * 1024);
     // systemd's name for the folder of the service.
     const char* const folder = std::getenv("STATE_DIRECTORY");
     // The settings of the server hold, and no others on the machine.
