@@ -102,12 +102,15 @@ class WLFirstRunDelegateConfiguration {
 
     // For the video-calling and the messaging delegate, which are called here and not above: the same with
     // the aliases that the user chose. Raises where it is not overridden, which the host logs.
+    // The handler is a delegate's own to keep, as above.
+    // NOLINTBEGIN(performance-unnecessary-value-param)
     virtual void
     completeSetupWithResponseChosenAliasesHandler(ValueView /*response*/,
                                                   const std::optional<std::vector<std::string>>& /*aliases*/,
                                                   CompletionHandler /*handler*/) {
         throw std::logic_error("completeSetupWithResponse:chosenAliases:handler: is not implemented");
     }
+    // NOLINTEND(performance-unnecessary-value-param)
 
     // For these two as well: the aliases that the server offers in its response. Raises as above.
     virtual std::optional<std::vector<std::string>> messagingAliasesFromResponse(ValueView /*response*/) {
