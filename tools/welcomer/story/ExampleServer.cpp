@@ -48,7 +48,7 @@ CommandFailure notStarted(const std::string& why) {
 fs::path findAccountServer() {
     std::string looked;
     for (const ToolFolders& folders : toolFolders()) {
-        const fs::path program = (folders.services / kProgram).lexically_normal();
+        fs::path program = (folders.services / kProgram).lexically_normal();
         if (::access(program.c_str(), X_OK) == 0) {
             return program;
         }
