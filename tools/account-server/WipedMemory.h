@@ -7,7 +7,6 @@
 #include <cstddef>
 #include <memory>
 #include <string.h>
-#include <string>
 #include <vector>
 
 namespace welcomer::server {
@@ -31,16 +30,6 @@ struct WipingAllocator {
 
 using WipedBytes = std::vector<char, WipingAllocator<char>>;
 
-// Wipes a text of somebody else's when this goes. Borrows it.
-class WipedAtEnd {
-  public:
-    explicit WipedAtEnd(std::string& text) : _text(text) {}
-    ~WipedAtEnd() { posix::wipe(_text); }
-    WipedAtEnd(const WipedAtEnd&) = delete;
-    WipedAtEnd& operator=(const WipedAtEnd&) = delete;
-
-  private:
-    std::string& _text;
-};
+using posix::WipedAtEnd;
 
 } // namespace welcomer::server

@@ -8,6 +8,11 @@ namespace welcomer::desktop {
 namespace {
 
 constexpr std::size_t kLongestEscape = 8; // bytes, of one byte of the password
+constexpr std::size_t kStep = 512;        // bytes; of what is seen on the network
+
+std::size_t roundedUp(std::size_t size) {
+    return (size + kStep - 1) / kStep * kStep;
+}
 
 void clear(std::string& text) {
     ::explicit_bzero(text.data(), text.size());
@@ -20,10 +25,12 @@ RequestBody::RequestBody(accountserver::AroundPassword around, std::string_view 
                          accountserver::ContentType type)
     : _around(std::move(around)),
       _password(password),
-      _type(type),
-      _size(_around.before.size() + _around.after.size()) {
-    accountserver::escapePassword(_password, _type,
-                                  [this](std::string_view piece) { _size += piece.size(); });
+      _type(type) {
+    std::size_t end = _around.before.size(); // of the password
+    accountserver::escapePassword(_password, _type, [&end](std::string_view piece) { end += piece.size(); });
+    _content = end + _around.after.size();
+    _filling = roundedUp(_content) - _content;
+    _cover = roundedUp(end);
     _escaped.reserve(kLongestEscape); // so that it stays where it is
     rewind();
 }
@@ -35,6 +42,8 @@ RequestBody::~RequestBody() {
 void RequestBody::rewind() {
     _piece = 0;
     _current = _around.before;
+    _fillingLeft = _filling;
+    _coverLeft = _cover;
 }
 
 std::size_t RequestBody::read(char* buffer, std::size_t room) {
@@ -51,7 +60,16 @@ std::size_t RequestBody::read(char* buffer, std::size_t room) {
         _current.remove_prefix(count);
         copied += count;
     }
-    return copied;
+    copied += _blank(buffer + copied, room - copied, _fillingLeft);
+    return copied > 0 ? copied : _blank(buffer, room, _coverLeft);
+}
+
+// Writes as many of these blanks as there is room for.
+std::size_t RequestBody::_blank(char* buffer, std::size_t room, std::size_t& left) {
+    const std::size_t count = std::min(room, left);
+    std::memset(buffer, ' ', count);
+    left -= count;
+    return count;
 }
 
 std::string_view RequestBody::_next() {

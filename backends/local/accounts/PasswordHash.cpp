@@ -2,6 +2,7 @@
 
 #include <array>
 #include <crypt.h>
+#include <cstring>
 #include <dlfcn.h>
 #include <memory>
 #include <string_view>
@@ -40,8 +41,10 @@ std::optional<std::string> hashWithSetting(const std::string& password, const st
         return std::nullopt;
     }
     const auto scratch = std::make_unique<crypt_data>(); // too large for a stack
-    const char* result = hash(password.c_str(), setting.c_str(), scratch.get(), sizeof(crypt_data));
-    return result ? std::optional<std::string>(result) : std::nullopt;
+    const char* const text = hash(password.c_str(), setting.c_str(), scratch.get(), sizeof(crypt_data));
+    std::optional<std::string> result = text ? std::optional<std::string>(text) : std::nullopt;
+    ::explicit_bzero(scratch.get(), sizeof(crypt_data)); // what it was worked out from
+    return result;
 }
 
 bool isEqual(std::string_view a, std::string_view b) {

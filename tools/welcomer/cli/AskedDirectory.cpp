@@ -16,10 +16,10 @@ namespace welcomer::tool {
 namespace {
 
 // A message is the number of its bytes and an XML property list; texts are data in it, so that any can be
-// asked for.
+// asked for. A password follows its question by itself, its bytes behind their number: what writes and reads
+// property lists leaves copies.
 constexpr char kQuestionKey[] = "Question";
 constexpr char kUserKey[] = "User";
-constexpr char kPasswordKey[] = "Password";
 constexpr char kRequestKey[] = "Request";
 constexpr char kTermsKey[] = "Terms";
 constexpr char kAnswerQuestion[] = "answer";
@@ -66,30 +66,43 @@ bool receiveAll(int socket, char* bytes, std::size_t size) {
                     [socket](char* rest, std::size_t length) { return ::recv(socket, rest, length, 0); });
 }
 
+bool sendCounted(int socket, std::string_view bytes) {
+    const auto size = static_cast<std::uint32_t>(bytes.size());
+    return bytes.size() <= kLongestMessage &&
+           sendAll(socket, reinterpret_cast<const char*>(&size), sizeof(size)) &&
+           sendAll(socket, bytes.data(), bytes.size());
+}
+
+// How many bytes follow; none at the end of all messages, and where it makes no sense.
+std::optional<std::uint32_t> receiveCount(int socket) {
+    std::uint32_t size = 0;
+    return receiveAll(socket, reinterpret_cast<char*>(&size), sizeof(size)) && size <= kLongestMessage
+               ? std::optional(size)
+               : std::nullopt;
+}
+
 // What cannot be written is sent as nothing.
 bool sendMessage(int socket, const PropertyList& message) {
-    std::string bytes = writeXMLPropertyList(message).value_or("");
-    const auto size = static_cast<std::uint32_t>(bytes.size());
-    const bool isSent = bytes.size() <= kLongestMessage &&
-                        sendAll(socket, reinterpret_cast<const char*>(&size), sizeof(size)) &&
-                        sendAll(socket, bytes.data(), bytes.size());
-    posix::wipe(bytes); // there may be a password in it
-    return isSent;
+    return sendCounted(socket, writeXMLPropertyList(message).value_or(""));
 }
 
 // None at the end of all messages, and for one that makes no sense.
 std::optional<PropertyList> receiveMessage(int socket) {
-    std::uint32_t size = 0;
-    if (!receiveAll(socket, reinterpret_cast<char*>(&size), sizeof(size)) || size > kLongestMessage) {
-        return std::nullopt;
-    }
-    std::string bytes(size, '\0');
-    if (!receiveAll(socket, bytes.data(), bytes.size())) {
-        return std::nullopt;
-    }
-    std::optional<PropertyList> message = readXMLPropertyList(bytes).value;
-    posix::wipe(bytes);
-    return message;
+    const auto size = receiveCount(socket);
+    std::string bytes(size.value_or(0), '\0');
+    return size && receiveAll(socket, bytes.data(), bytes.size()) ? readXMLPropertyList(bytes).value
+                                                                  : std::nullopt;
+}
+
+// One that breaks off is empty, and so is right for nobody.
+posix::SecretText receivePassword(int socket) {
+    const std::uint32_t size = receiveCount(socket).value_or(0);
+    return {size, [&](std::string& text) {
+                text.resize(size);
+                if (!receiveAll(socket, text.data(), size)) {
+                    posix::wipe(text);
+                }
+            }};
 }
 
 std::string bytesIn(const PropertyList& message, const char* key) {
@@ -111,17 +124,18 @@ PropertyList::Dictionary written(const platform::SignInAnswer& answer) {
             {kDelayKey, answer.delaySeconds}};
 }
 
-PropertyList replyTo(const PropertyList& question, const platform::SignInDirectory& directory) {
+//  socket  has the password that goes with the question
+PropertyList replyTo(const PropertyList& question, int socket, const platform::SignInDirectory& directory) {
     const std::string* const kind = textIn(question, kQuestionKey);
     const std::string user = bytesIn(question, kUserKey);
     PropertyList::Dictionary reply;
     if (kind && *kind == kAnswerQuestion) {
-        const posix::SecretText password(bytesIn(question, kPasswordKey));
+        const posix::SecretText password = receivePassword(socket);
         reply = written(directory.answer(
             user, password.text(),
             copyOf(dictionaryIn(question, kRequestKey)).value_or(PropertyList::Dictionary())));
     } else if (kind && *kind == kAcceptQuestion) {
-        const posix::SecretText password(bytesIn(question, kPasswordKey));
+        const posix::SecretText password = receivePassword(socket);
         reply = written(directory.acceptTerms(user, password.text(),
                                               copyOf(valueIn(question, kTermsKey)).value_or(PropertyList())));
     } else if (kind && *kind == kServerQuestion) {
@@ -159,8 +173,7 @@ std::string AskedDirectory::server() const {
 
 platform::SignInAnswer AskedDirectory::_askWithPassword(PropertyList::Dictionary question,
                                                         const std::string& password) const {
-    question[kPasswordKey] = PropertyList::Data{password};
-    const PropertyList reply = _ask(std::move(question));
+    const PropertyList reply = _ask(std::move(question), &password);
     const PropertyList::Dictionary* const contents = dictionaryIn(reply, kContentsKey);
     if (!contents) {
         return {false, {{platform::kSKPropertyAccountError, platform::kSKAccountErrorServerUnavailable}}, 0};
@@ -188,9 +201,10 @@ std::optional<std::vector<std::string>> AskedDirectory::userNames() const {
     return texts;
 }
 
-PropertyList AskedDirectory::_ask(PropertyList::Dictionary question) const {
+PropertyList AskedDirectory::_ask(PropertyList::Dictionary question, const std::string* password) const {
     const std::lock_guard lock(_mutex);
-    if (!sendMessage(_socket.get(), std::move(question))) {
+    if (!sendMessage(_socket.get(), std::move(question)) ||
+        (password && !sendCounted(_socket.get(), *password))) {
         return {};
     }
     return receiveMessage(_socket.get()).value_or(PropertyList());
@@ -198,7 +212,7 @@ PropertyList AskedDirectory::_ask(PropertyList::Dictionary question) const {
 
 void answerQuestions(int socket, const platform::SignInDirectory& directory) {
     while (const std::optional<PropertyList> question = receiveMessage(socket)) {
-        if (!sendMessage(socket, replyTo(*question, directory))) {
+        if (!sendMessage(socket, replyTo(*question, socket, directory))) {
             return;
         }
     }

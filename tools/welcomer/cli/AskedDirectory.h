@@ -24,7 +24,7 @@ class AskedDirectory final : public platform::SignInDirectory {
     std::optional<std::vector<std::string>> userNames() const override;
 
   private:
-    PropertyList _ask(PropertyList::Dictionary question) const;
+    PropertyList _ask(PropertyList::Dictionary question, const std::string* password = nullptr) const;
     platform::SignInAnswer _askWithPassword(PropertyList::Dictionary question,
                                             const std::string& password) const;
 

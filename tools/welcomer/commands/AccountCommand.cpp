@@ -98,9 +98,10 @@ Report add(Session& session, const AddArguments& arguments) {
     if (users && std::ranges::find(*users, arguments.user) != users->end()) {
         throw existsAlready(arguments.user);
     }
-    const std::string password =
+    const posix::SecretText password =
         getNewPassword(arguments.password, "New password for " + arguments.user + ":");
-    platform::CloudUser user{arguments.user, password, std::nullopt, responseFor(arguments.aliases)};
+    platform::CloudUser user{arguments.user, password.text(), std::nullopt, responseFor(arguments.aliases)};
+    const posix::WipedAtEnd wiped(user.password);
     if (!arguments.mailAddress.empty()) {
         user.mailAddress = arguments.mailAddress;
     }
@@ -187,9 +188,9 @@ Report signIn(Session& session, const SignInArguments& arguments) {
     const std::string server = session.signInDirectory.server();
     tellAskedServer(session);
     SetupFlow flow(session.log, !session.options.verbose);
-    std::string password = getPassword(arguments.password, "Password for " + arguments.user + ":");
-    const WipedAtEnd wiped(password);
-    flow.signIn(arguments.user, password);
+    const posix::SecretText password =
+        getPassword(arguments.password, "Password for " + arguments.user + ":");
+    flow.signIn(arguments.user, password.text());
     flow.complete({}, false); // no service: that is for setup
     Report report({{"account", arguments.user}, {"signedIn", true}}, arguments.user + " is signed in.");
     if (!server.empty()) {

@@ -53,8 +53,8 @@ struct SetupArguments {
     std::string answers;
     std::string bundle; // empty: the one that comes with the tool
     PasswordSource password;
-    std::shared_ptr<SetupAnswers> read;   // what the file holds; null without one
-    std::optional<std::string> firstLine; // the password, where both come from the standard input
+    std::shared_ptr<SetupAnswers> read;         // what the file holds; null without one
+    std::optional<posix::SecretText> firstLine; // the password, where both come from the standard input
     bool cancels = false;
 };
 
@@ -104,10 +104,9 @@ std::string signInAtTerminal(Terminal& terminal, SetupFlow& flow, const platform
                              const PasswordSource& source) {
     std::string account = askForAccount(terminal);
     for (int attempt = 1;; ++attempt) {
-        std::string password = getPassword(source, "Password for " + account + ":");
-        const WipedAtEnd wiped(password);
+        const posix::SecretText password = getPassword(source, "Password for " + account + ":");
         try {
-            signInOrAccept(terminal, flow, directory, account, password);
+            signInOrAccept(terminal, flow, directory, account, password.text());
             return account;
         } catch (const SignInFailure& failure) {
             const bool mayBeMistyped = failure.isWrongPassword() || failure.isUnknownUser();
@@ -254,11 +253,10 @@ Report setUp(Session& session, const SetupArguments& arguments) {
         SetupFlow::checkWhoIsLoggedIn(answers->decisions.account);
         tellAskedServer(session);
         const std::string& account = answers->decisions.account;
-        std::string password = arguments.firstLine
-                                   ? *arguments.firstLine
-                                   : getPassword(arguments.password, "Password for " + account + ":");
-        const WipedAtEnd wiped(password);
-        flow.signIn(account, password);
+        const posix::SecretText password =
+            arguments.firstLine ? *arguments.firstLine
+                                : getPassword(arguments.password, "Password for " + account + ":");
+        flow.signIn(account, password.text());
         answers->choose(flow.aliasOffers());
         decisions = answers->decisions;
     } else {

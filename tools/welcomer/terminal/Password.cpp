@@ -16,10 +16,8 @@ constexpr const char* kInsteadOfTerminal = "--password-fd N";
 
 // One byte at a time: what follows the line is somebody else's. A carriage return before the line's end
 // belongs to that.
-std::string readLine(int descriptor) {
+void readLine(int descriptor, std::string& line) {
     const std::string option = "--password-fd " + std::to_string(descriptor) + ": ";
-    std::string line;
-    line.reserve(kLongestPassword + 1); // so that it stays in one place
     for (;;) {
         char byte = 0;
         const ssize_t count = ::read(descriptor, &byte, 1);
@@ -34,7 +32,7 @@ std::string readLine(int descriptor) {
                 line.pop_back();
             }
             if (line.size() <= kLongestPassword) {
-                return line;
+                return;
             }
         }
         if (line.size() > kLongestPassword) {
@@ -46,16 +44,21 @@ std::string readLine(int descriptor) {
 
 } // namespace
 
-std::string getPassword(const PasswordSource& source, const std::string& question) {
-    return source ? readLine(*source) : Terminal(kInsteadOfTerminal).askWithoutEcho(question);
+posix::SecretText getPassword(const PasswordSource& source, const std::string& question) {
+    if (!source) {
+        return Terminal(kInsteadOfTerminal).askWithoutEcho(question);
+    }
+    return {kLongestPassword + 1, [&](std::string& line) {
+                readLine(*source, line);
+            }};
 }
 
-std::string getNewPassword(const PasswordSource& source, const std::string& question) {
-    std::string password = getPassword(source, question);
-    if (password.empty()) {
+posix::SecretText getNewPassword(const PasswordSource& source, const std::string& question) {
+    posix::SecretText password = getPassword(source, question);
+    if (password.text().empty()) {
         throw CommandFailure("the password is empty");
     }
-    if (!source && Terminal(kInsteadOfTerminal).askWithoutEcho("Once more:") != password) {
+    if (!source && Terminal(kInsteadOfTerminal).askWithoutEcho("Once more:").text() != password.text()) {
         throw CommandFailure("the two passwords differ");
     }
     return password;

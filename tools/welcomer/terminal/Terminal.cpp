@@ -6,6 +6,7 @@
 #include "tools/welcomer/terminal/Printable.h"
 #include "tools/welcomer/terminal/SuspensionWatch.h"
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <charconv>
@@ -71,7 +72,9 @@ std::string Terminal::ask(const std::string& question) {
     const std::string prompt = printable(question) + ' ';
     const LineEditor editor(_descriptor);
     if (!editor.isThere()) {
-        return trimmed(_askPlainly(prompt, true, -1));
+        std::string line;
+        _askPlainly(prompt, true, -1, line);
+        return trimmed(line);
     }
     const std::optional<std::string> line = editor.readLine(prompt);
     if (!line) {
@@ -81,10 +84,12 @@ std::string Terminal::ask(const std::string& question) {
     return trimmed(*line);
 }
 
-std::string Terminal::askWithoutEcho(const std::string& question) {
+posix::SecretText Terminal::askWithoutEcho(const std::string& question) {
     InterruptionGuard guard;
     try {
-        std::string line = _askPlainly(printable(question) + ' ', false, guard.descriptor());
+        posix::SecretText line(2 * kLongestLine, [&](std::string& typed) {
+            _askPlainly(printable(question) + ' ', false, guard.descriptor(), typed);
+        });
         _write("\n"); // the one that was typed is not shown either
         return line;
     } catch (const Interrupted&) {
@@ -132,17 +137,19 @@ void Terminal::_write(const std::string& text) {
 }
 
 // Asks with no more than the terminal itself has for mending the line.
-std::string Terminal::_askPlainly(const std::string& prompt, bool isShown, int interruption) {
+//  line  receives the answer
+void Terminal::_askPlainly(const std::string& prompt, bool isShown, int interruption, std::string& line) {
     SuspensionWatch suspension;
     for (;;) {
+        line.clear();
         {
             std::optional<EchoGuard> quiet;
             if (!isShown) {
                 quiet.emplace(_descriptor);
             }
             _write(prompt);
-            if (auto line = _readLine(interruption, suspension.descriptor())) {
-                return *line;
+            if (_readLine(interruption, suspension.descriptor(), line)) {
+                return;
             }
         }
         suspension.takeEffect();
@@ -150,9 +157,9 @@ std::string Terminal::_askPlainly(const std::string& prompt, bool isShown, int i
 }
 
 // Throws Interrupted when the descriptor given for that is readable first.
-//  result  none when the one for suspensions is
-std::optional<std::string> Terminal::_readLine(int interruption, int suspension) {
-    std::string line;
+//  line    receives what is typed, and is at most twice as long as a line that a terminal takes
+//  result  false when the one for suspensions is
+bool Terminal::_readLine(int interruption, int suspension, std::string& line) {
     for (;;) {
         std::array<pollfd, 3> watched{
             {{_descriptor, POLLIN, 0}, {interruption, POLLIN, 0}, {suspension, POLLIN, 0}}};
@@ -163,10 +170,15 @@ std::optional<std::string> Terminal::_readLine(int interruption, int suspension)
             throw Interrupted();
         }
         if (watched[2].revents != 0) {
-            return std::nullopt;
+            return false;
         }
-        std::array<char, kLongestLine> buffer;
-        const ssize_t count = ::read(_descriptor, buffer.data(), buffer.size());
+        const std::size_t before = line.size();
+        if (before > kLongestLine) {
+            throw CommandFailure("the line is too long");
+        }
+        line.resize(before + kLongestLine);
+        const ssize_t count = ::read(_descriptor, line.data() + before, kLongestLine);
+        line.resize(before + static_cast<std::size_t>(std::max(count, ssize_t{0})));
         if (count < 0 && errno == EINTR) {
             continue;
         }
@@ -174,10 +186,9 @@ std::optional<std::string> Terminal::_readLine(int interruption, int suspension)
             _write("\n");
             throw CommandFailure(kInputHasEnded);
         }
-        line.append(buffer.data(), static_cast<std::size_t>(count));
         if (line.ends_with('\n')) {
             line.pop_back();
-            return line;
+            return true;
         }
     }
 }

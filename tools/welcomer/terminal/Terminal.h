@@ -2,6 +2,8 @@
 
 #pragma once
 
+#include "backends/posix/SecretText.h"
+
 #include <cstddef>
 #include <optional>
 #include <string>
@@ -33,7 +35,7 @@ class Terminal {
     // course only after the terminal shows what is typed again; after a stop the question is asked anew.
     //  result  without its end
     // Throws CommandFailure when the input has ended.
-    std::string askWithoutEcho(const std::string& question);
+    posix::SecretText askWithoutEcho(const std::string& question);
 
     // Asks yes or no, until it is one of them. Return alone is a yes.
     bool confirm(const std::string& question);
@@ -45,8 +47,8 @@ class Terminal {
 
   private:
     void _write(const std::string& text);
-    std::string _askPlainly(const std::string& prompt, bool isShown, int interruption);
-    std::optional<std::string> _readLine(int interruption, int suspension);
+    void _askPlainly(const std::string& prompt, bool isShown, int interruption, std::string& line);
+    bool _readLine(int interruption, int suspension, std::string& line);
 
     const int _descriptor;
 };
