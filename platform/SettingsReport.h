@@ -11,7 +11,7 @@ namespace welcomer::platform {
 struct SettingReport {
     std::string name;   // as it stands in the settings files
     std::string value;  // the one that holds
-    std::string origin; // the file that it was read from, or "the build"
+    std::string origin; // the file that it was read from, the setting that it follows, or "the build"
     friend bool operator==(const SettingReport&, const SettingReport&) = default;
 };
 

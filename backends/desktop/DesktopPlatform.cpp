@@ -111,6 +111,7 @@ AccountServerModule::Arguments DesktopPlatform::_accountServerArguments() {
     return {[this, seconds] {
                 return AccountServerSettings{_local.setting(local::Setting::AccountServer),
                                              _local.setting(local::Setting::AccountServerAuthority),
+                                             _local.setting(local::Setting::AccountServerRevocations),
                                              seconds(local::Setting::AccountServerConnectSeconds),
                                              seconds(local::Setting::AccountServerSeconds)};
             },

@@ -16,10 +16,13 @@ namespace {
 constexpr std::array<std::string_view, kSettingCount> kBuiltIn = {"",
                                                                   "",
                                                                   "10",
+                                                                  "",
                                                                   "30",
                                                                   configuration::kOnlineAccountProvider,
                                                                   configuration::kOnlineAccountServer,
                                                                   configuration::kPluginFolder};
+
+constexpr char kOfTheBuild[] = "the build";
 
 } // namespace
 
@@ -35,12 +38,24 @@ platform::SettingsReport LocalSettings::report() {
 
 void LocalSettings::_read() {
     for (std::size_t i = 0; i < kSettingCount; ++i) {
-        _report.settings.push_back({nameOf(static_cast<Setting>(i)), std::string(kBuiltIn[i]), "the build"});
+        _report.settings.push_back({nameOf(static_cast<Setting>(i)), std::string(kBuiltIn[i]), kOfTheBuild});
     }
     std::for_each(kSettingsFiles.rbegin(), kSettingsFiles.rend(),
                   [this](const char* path) { _readFile(path); });
+    _followAccountServer();
     for (const std::string& problem : _report.problems) {
         _log.write(platform::kErrorPriority, problem);
+    }
+}
+
+// The password that one server has accepted is given to no other that nobody has named.
+void LocalSettings::_followAccountServer() {
+    const platform::SettingReport& asked = _report.settings[static_cast<std::size_t>(Setting::AccountServer)];
+    platform::SettingReport& online =
+        _report.settings[static_cast<std::size_t>(Setting::OnlineAccountServer)];
+    if (online.origin == kOfTheBuild && asked.value.starts_with("https://")) {
+        online.value = asked.value + (asked.value.ends_with('/') ? "" : "/");
+        online.origin = asked.name;
     }
 }
 

@@ -35,6 +35,7 @@ class LocalSettings {
   private:
     void _read();
     void _readFile(const char* path);
+    void _followAccountServer();
 
     const posix::RootFolder& _root;
     platform::SystemLog& _log;

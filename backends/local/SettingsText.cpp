@@ -95,6 +95,7 @@ constexpr std::array<Kind, kSettingCount> kKinds = {
     Kind{"AccountServer", isAccountServer, "https://HOST, perhaps with a port and a path, nor unix:/PATH"},
     Kind{"AccountServerAuthority", isFileOrNone, "the path of a file, which begins with /"},
     Kind{"AccountServerConnectSeconds", isSeconds, "a number of seconds from 1 to 999"},
+    Kind{"AccountServerRevocations", isFileOrNone, "the path of a file, which begins with /"},
     Kind{"AccountServerSeconds", isSeconds, "a number of seconds from 1 to 999"},
     Kind{"OnlineAccountProvider", isProvider, "a provider, such as owncloud"},
     Kind{"OnlineAccountServer", isAddress, "an address, such as https://services.example/"},

@@ -16,12 +16,13 @@ enum class Setting : std::size_t {
     AccountServer,
     AccountServerAuthority,
     AccountServerConnectSeconds,
+    AccountServerRevocations,
     AccountServerSeconds,
     OnlineAccountProvider,
     OnlineAccountServer,
     PluginFolder
 };
-inline constexpr std::size_t kSettingCount = 7;
+inline constexpr std::size_t kSettingCount = 8;
 
 // How a setting is called in a settings file. Any thread.
 const char* nameOf(Setting setting);

@@ -1,6 +1,7 @@
 #include "backends/desktop/accountserver/AccountServerClient.h"
 
 #include "backends/accountserver/SignInAnswers.h"
+#include "backends/desktop/accountserver/DesktopProxies.h"
 #include "backends/desktop/accountserver/ReplyReading.h"
 #include "backends/desktop/accountserver/TransferFailure.h"
 #include "propertylist/CalendarDate.h"
@@ -181,10 +182,12 @@ TransferOutcome AccountServerClient::_post(const char* path, const Request& requ
 
 TransferOutcome AccountServerClient::_send(const char* path, RequestBody* body) const {
     const auto end = std::chrono::steady_clock::now() + _settings.limit;
+    const std::vector<std::string> proxies = _proxies();
     for (std::size_t tried = 0;; ++tried) {
         const auto left =
             std::chrono::duration_cast<std::chrono::milliseconds>(end - std::chrono::steady_clock::now());
-        TransferOutcome outcome = transfer(_settings, path, body, std::max(left, 1ms), _interruption);
+        TransferOutcome outcome = transfer(_settings, proxies[tried % proxies.size()], path, body,
+                                           std::max(left, 1ms), _interruption);
         const bool isOver = outcome.reply || !outcome.wasNeverSent || !outcome.mayHelpAgain;
         if (isOver || tried == kWaits.size() || std::chrono::steady_clock::now() + kWaits[tried] >= end ||
             _interruption.isStopped()) {
@@ -192,6 +195,16 @@ TransferOutcome AccountServerClient::_send(const char* path, RequestBody* body) 
         }
         _interruption.wait(kWaits[tried]);
     }
+}
+
+// Never empty.
+std::vector<std::string> AccountServerClient::_proxies() const {
+    std::vector<std::string> proxies;
+    if (!isSocket(_settings)) {
+        proxies = desktopProxies(_settings.address, std::min(_settings.connectLimit, _settings.limit),
+                                 _interruption);
+    }
+    return proxies.empty() ? std::vector<std::string>(1) : proxies;
 }
 
 accountserver::Sender AccountServerClient::_sender(const std::string& username) const {

@@ -9,11 +9,13 @@
 #include <map>
 #include <mutex>
 #include <string>
+#include <vector>
 
 namespace welcomer::desktop {
 
 // Every question is a connection of its own. One that has not carried the request is tried twice more, after
-// growing waits and with the same ID; nothing else is sent twice. Any thread.
+// growing waits and with the same ID, and through the next proxy where the desktop has several; nothing else is
+// sent twice. Any thread.
 class AccountServerClient final : public AccountServer {
   public:
     explicit AccountServerClient(const AccountServerModule::Arguments& arguments)
@@ -34,6 +36,7 @@ class AccountServerClient final : public AccountServer {
     template <class Request>
     TransferOutcome _post(const char* path, const Request& request, const std::string& password) const;
     TransferOutcome _send(const char* path, RequestBody* body) const;
+    std::vector<std::string> _proxies() const;
     accountserver::Sender _sender(const std::string& username) const;
     void _remember(const std::string& username, PropertyList::Dictionary services) const;
 

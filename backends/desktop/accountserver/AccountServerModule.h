@@ -18,6 +18,9 @@ struct AccountServerSettings {
     // The file of the authorities that its certificate may be from; empty: the system's.
     std::string authority = {};
 
+    // The file of the certificates that those authorities have revoked; empty: nobody looks.
+    std::string revocations = {};
+
     std::chrono::seconds connectLimit{10};
     std::chrono::seconds limit{30}; // for everything, with what is tried again
 };

@@ -1,12 +1,14 @@
 #include "backends/desktop/accountserver/Interruption.h"
 
+#include <utility>
+
 namespace welcomer::desktop {
 
 void Interruption::stop() {
     const std::lock_guard lock(_mutex);
     _isStopped = true;
-    for (CURLM* const each : _transfers) {
-        curl_multi_wakeup(each);
+    for (const auto& [waiting, wake] : _waiting) {
+        wake();
     }
     _changed.notify_all();
 }
@@ -21,16 +23,18 @@ void Interruption::wait(std::chrono::milliseconds duration) {
     _changed.wait_for(lock, duration, [this] { return _isStopped; });
 }
 
-Interruption::Registration::Registration(Interruption& interruption, CURLM* transfer)
-    : _interruption(interruption),
-      _transfer(transfer) {
+Interruption::Registration::Registration(Interruption& interruption, std::function<void()> wake)
+    : _interruption(interruption) {
     const std::lock_guard lock(_interruption._mutex);
-    _interruption._transfers.insert(_transfer);
+    if (_interruption._isStopped) {
+        wake();
+    }
+    _interruption._waiting.emplace(this, std::move(wake));
 }
 
 Interruption::Registration::~Registration() {
     const std::lock_guard lock(_interruption._mutex);
-    _interruption._transfers.erase(_transfer);
+    _interruption._waiting.erase(this);
 }
 
 } // namespace welcomer::desktop

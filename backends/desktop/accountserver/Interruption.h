@@ -1,42 +1,42 @@
-// Has transfers end that others wait for.
+// Has what others wait for end.
 
 #pragma once
 
 #include <chrono>
 #include <condition_variable>
-#include <curl/curl.h>
+#include <functional>
+#include <map>
 #include <mutex>
-#include <set>
 
 namespace welcomer::desktop {
 
 // Any thread.
 class Interruption {
   public:
-    // Wakes every transfer, now and from now on.
+    // Wakes whoever waits, now and from now on.
     void stop();
     bool isStopped();
 
     // Waits, for less where it is stopped.
     void wait(std::chrono::milliseconds duration);
 
-    // A transfer that is to be woken, for as long as this lives.
+    // Something that is to be woken, for as long as this lives; at once where it is stopped already.
     class Registration {
       public:
-        Registration(Interruption& interruption, CURLM* transfer);
+        //  wake  called by whoever stops, on any thread; may not use the interruption
+        Registration(Interruption& interruption, std::function<void()> wake);
         ~Registration();
         Registration(const Registration&) = delete;
         Registration& operator=(const Registration&) = delete;
 
       private:
         Interruption& _interruption;
-        CURLM* const _transfer;
     };
 
   private:
     std::mutex _mutex;
     std::condition_variable _changed;
-    std::set<CURLM*> _transfers;
+    std::map<const Registration*, std::function<void()>> _waiting;
     bool _isStopped = false;
 };
 

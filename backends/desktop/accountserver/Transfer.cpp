@@ -29,9 +29,10 @@ struct FreeList {
 // One transfer, as libcurl's callbacks see it. None of them throws.
 class Exchange {
   public:
-    Exchange(const AccountServerSettings& settings, const char* path, RequestBody* body,
-             std::chrono::milliseconds limit)
+    Exchange(const AccountServerSettings& settings, const std::string& proxy, const char* path,
+             RequestBody* body, std::chrono::milliseconds limit)
         : _settings(settings),
+          _proxy(proxy),
           _body(body) {
         _address(path);
         _security();
@@ -71,6 +72,10 @@ class Exchange {
         const std::size_t end = address.find_last_not_of('/') + 1;
         _set(CURLOPT_PROTOCOLS_STR, "https");
         _set(CURLOPT_URL, (std::string(address.substr(0, end)) + path).c_str());
+        if (!_proxy.empty()) {
+            _set(CURLOPT_PROXY, _proxy.c_str());
+            _set(CURLOPT_NOPROXY, ""); // the desktop has been asked about this very server
+        }
     }
 
     void _security() {
@@ -80,6 +85,9 @@ class Exchange {
         if (!_settings.authority.empty()) {
             _set(CURLOPT_CAINFO, _settings.authority.c_str());
             _set(CURLOPT_CAPATH, static_cast<char*>(nullptr));
+        }
+        if (!_settings.revocations.empty()) {
+            _set(CURLOPT_CRLFILE, _settings.revocations.c_str());
         }
         _set(CURLOPT_FOLLOWLOCATION, 0L);
         _set(CURLOPT_DISALLOW_USERNAME_IN_URL, 1L);
@@ -128,7 +136,7 @@ class Exchange {
     void _add(const char* field) { _fields.reset(curl_slist_append(_fields.release(), field)); }
 
     CURLcode _wait(CURLM* multi, Interruption& interruption) {
-        const Interruption::Registration registration(interruption, multi);
+        const Interruption::Registration registration(interruption, [multi] { curl_multi_wakeup(multi); });
         for (int running = 1; running > 0;) {
             if (interruption.isStopped()) {
                 return CURLE_ABORTED_BY_CALLBACK;
@@ -156,16 +164,31 @@ class Exchange {
     }
 
     TransferOutcome _outcome(CURLcode code) {
-        if (code == CURLE_OK) {
+        if (code == CURLE_OK && _saysItsLength()) {
             return {_whole(), "", false, false};
         }
         const TransferFailure failure{code,
                                       _explanation.data(),
                                       _get<long>(CURLINFO_OS_ERRNO),
                                       _get<long>(CURLINFO_SSL_VERIFYRESULT),
+                                      _get<long>(CURLINFO_HTTP_CONNECTCODE),
                                       _isConnected,
                                       _isTooLong || code == CURLE_FILESIZE_EXCEEDED};
         return {std::nullopt, explain(failure, _settings), !_isConnected, mayPass(failure)};
+    }
+
+    std::optional<std::string> _field(const char* name) const {
+        curl_header* field = nullptr;
+        return curl_easy_header(_easy.get(), name, 0, CURLH_HEADER, -1, &field) == CURLHE_OK
+                   ? std::optional<std::string>(field->value)
+                   : std::nullopt;
+    }
+
+    // Of an answer that is as long as its connection nobody knows whether somebody between has cut it off.
+    bool _saysItsLength() const {
+        constexpr long withoutBody = 204;
+        return _field("Content-Length") || _field("Transfer-Encoding") ||
+               _get<long>(CURLINFO_RESPONSE_CODE) == withoutBody;
     }
 
     Reply _whole() {
@@ -180,9 +203,8 @@ class Exchange {
         if (const auto seconds = _get<curl_off_t>(CURLINFO_RETRY_AFTER); seconds > 0) {
             reply.retryAfter = seconds;
         }
-        curl_header* field = nullptr;
-        if (curl_easy_header(_easy.get(), "Date", 0, CURLH_HEADER, -1, &field) == CURLHE_OK) {
-            reply.date = _moment(field->value);
+        if (const auto date = _field("Date")) {
+            reply.date = _moment(date->c_str());
         }
         reply.certificateUntil = _certificateUntil();
         return reply;
@@ -235,6 +257,7 @@ class Exchange {
     }
 
     const AccountServerSettings& _settings;
+    const std::string& _proxy;
     RequestBody* const _body;
     std::unique_ptr<curl_slist, FreeList> _fields;
     std::array<char, CURL_ERROR_SIZE> _explanation{};
@@ -247,12 +270,12 @@ class Exchange {
 
 } // namespace
 
-TransferOutcome transfer(const AccountServerSettings& settings, const char* path, RequestBody* body,
-                         std::chrono::milliseconds limit, Interruption& interruption) {
+TransferOutcome transfer(const AccountServerSettings& settings, const std::string& proxy, const char* path,
+                         RequestBody* body, std::chrono::milliseconds limit, Interruption& interruption) {
     if (!prepareCurl()) {
         return {std::nullopt, "libcurl cannot be used", true, false};
     }
-    return Exchange(settings, path, body, limit).run(interruption);
+    return Exchange(settings, proxy, path, body, limit).run(interruption);
 }
 
 } // namespace welcomer::desktop

@@ -32,11 +32,12 @@ struct TransferOutcome {
 };
 
 // Sends a request once, on a connection of its own, and waits for the answer. Follows no redirect.
+//  proxy  as libcurl takes it; empty: what the environment says. A Unix socket has none
 //  path   of the resource
 //  body   of a POST; null for a GET
 //  limit  how long it may take
 // Any thread; blocks.
-TransferOutcome transfer(const AccountServerSettings& settings, const char* path, RequestBody* body,
-                         std::chrono::milliseconds limit, Interruption& interruption);
+TransferOutcome transfer(const AccountServerSettings& settings, const std::string& proxy, const char* path,
+                         RequestBody* body, std::chrono::milliseconds limit, Interruption& interruption);
 
 } // namespace welcomer::desktop

@@ -10,13 +10,17 @@
 namespace welcomer::desktop {
 
 struct TransferFailure {
-    CURLcode code = CURLE_OK;
-    std::string explanation; // libcurl's own, perhaps empty
-    long systemError = 0;    // of connecting, or 0
-    long verifyResult = 0;   // of the certificate, as the TLS library counts; 0 for none
+    CURLcode code = CURLE_OK; // this for an answer that does not say how long it is
+    std::string explanation;  // libcurl's own, perhaps empty
+    long systemError = 0;     // of connecting, or 0
+    long verifyResult = 0;    // of the certificate, as the TLS library counts; 0 for none
+    long proxyStatus = 0;     // what a proxy has answered, an HTTP status; 0 for none
     bool wasConnected = false;
     bool isTooLong = false; // the answer
 };
+
+// Whether the server is a Unix socket's.
+bool isSocket(const AccountServerSettings& settings);
 
 // The server's name for people: "accounts.example:8443", "the socket /run/a".
 std::string shownServer(const AccountServerSettings& settings);

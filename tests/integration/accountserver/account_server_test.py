@@ -1,90 +1,17 @@
 #!/usr/bin/env python3
-"""The installed tool signs in with an account server: over TLS and a Unix socket, and with servers that it must not trust.
+"""The installed tool signs in with an account server: over TLS and a Unix socket. What the doctor says of it, and where the
+password is meanwhile.
 
 usage: account_server_test.py BUILD_DIR SUITE
 """
 
 import json
-import os
 import signal
-import ssl
 import subprocess
-import sys
-import tempfile
-import unittest
-from pathlib import Path
 
-sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "support"))
-import machine  # noqa: E402
-import tls_server  # noqa: E402
-from tls_server import HOST, Authority, Server, answer, problem  # noqa: E402
-
-TOOL = "/usr/local/bin/welcomer"
-PASSWORD = "Tr0ub4dor and 3"
-RIGHT = {"status": 0, "accountID": "anna", "delegates": {}, "mailAddress": "anna@example.org",
-         "services": {"com.corvid.nimbus.service.mail": {"canBeEnabled": False}}}
-
-
-def right(_line, _body):
-    return answer(200, RIGHT)
-
-
-class AccountServerTest(unittest.TestCase):
-    build = None
-
-    @classmethod
-    def setUpClass(cls):
-        cls.folder = Path(tempfile.mkdtemp(prefix="account-server-"))
-        cls.machine = machine.Machine(cls.folder / "machine")
-        cls.machine.install(cls.build)
-        cls.root = cls.machine.root
-        (cls.root / "etc/welcomer").mkdir(parents=True, exist_ok=True)
-        (cls.root / "etc/hosts").write_text(f"127.0.0.1 localhost {HOST} other.example\n", encoding="ascii")
-        (cls.root / "var/lib").mkdir(exist_ok=True)
-        cls.authority = Authority(cls.folder / "authority")
-        (cls.root / "etc/authority.pem").write_bytes(cls.authority.certificate.read_bytes())
-        cls.certificate = cls.authority.issue("right")
-
-    @classmethod
-    def tearDownClass(cls):
-        cls.machine.stop()
-        subprocess.run(["rm", "-r", str(cls.folder)], check=True)
-
-    def tearDown(self):
-        subprocess.run(["rm", "-rf", str(self.root / "root/Library")], check=True)
-
-    def serve(self, reply=right, **options):
-        server = Server(reply, **options)
-        self.addCleanup(server.close)
-        return server
-
-    def settle(self, server=None, **settings):
-        """Writes the settings: for a server over TLS, or as they are given."""
-        lines = {"AccountServer": f"https://{HOST}:{server.port}" if server else "",
-                 "AccountServerAuthority": "/etc/authority.pem", **settings}
-        self.address = lines["AccountServer"]
-        (self.root / "etc/welcomer/platform.conf").write_text(
-            "".join(f"{name}={value}\n" for name, value in lines.items()), encoding="ascii")
-
-    def tool(self, *arguments, password=PASSWORD, **options):
-        reading, writing = os.pipe()
-        os.write(writing, password.encode() + b"\n")
-        os.close(writing)
-        try:
-            return self.machine.run([TOOL, *arguments, "--password-fd", str(reading)], pass_fds=[reading], **options)
-        finally:
-            os.close(reading)
-
-    def sign_in(self):
-        return self.tool("account", "sign-in", "anna")
-
-    def refused(self):
-        """What the tool says to somebody who cannot sign in."""
-        done = self.sign_in()
-        self.assertEqual((done.returncode, done.stdout), (1, f"Asking the account server {self.address}\n"), done)
-        self.assertEqual(done.stderr.count("\n"), 1, done)
-        self.assertFalse((self.root / "root/Library/Accounts").exists(), "nothing is stored")
-        return done.stderr.removeprefix("welcomer: ").strip()
+from account_server_case import PASSWORD, RIGHT, TOOL, AccountServerTest, machine, main, right
+from tls_server import HOST, Server, answer, problem
+import process_memory
 
 
 class SigningIn(AccountServerTest):
@@ -156,103 +83,67 @@ class SigningIn(AccountServerTest):
         server = self.serve(lambda *_: (asked.append(1), b"")[1], certificate=self.certificate)
         server._reply = lambda *_: (asked.append(1), self.machine.wait_for(lambda: len(asked) > 1, "the end"), b"")[2]
         self.settle(server)
-        reading, writing = os.pipe()
-        os.write(writing, PASSWORD.encode() + b"\n")
-        os.close(writing)
-        process = self.machine.start([TOOL, "account", "sign-in", "anna", "--password-fd", str(reading)],
-                                     pass_fds=[reading])
-        os.close(reading)
+        process = self.with_password(self.machine.start, "account", "sign-in", "anna")
         self.machine.wait_for(lambda: asked, "the request")
         process.send_signal(signal.SIGTERM)
         self.assertEqual(process.wait(timeout=20), -signal.SIGTERM)
         asked.append(2)
 
 
-class WithoutTrust(AccountServerTest):
-    def reason(self, server=None, **settings):
-        self.settle(server, **settings)
-        text = self.refused()
-        self.assertTrue(text.startswith("cannot sign in anna: "), text)
-        return text.removeprefix("cannot sign in anna: ")
+class Memory(AccountServerTest):
+    """The password is looked for as in a core file."""
 
-    def refuses_certificate(self, certificate, text):
-        server = self.serve(certificate=certificate)
-        self.assertIn(f"the certificate of {HOST}:{server.port} {text}", self.reason(server))
-        self.assertEqual(server.requests, [], "no password is sent")
+    def sign_in_watched(self, server, *arguments, **options):
+        """Signs in. The number of copies in each process while the server is asked, and of those at their ends."""
+        held, left, process = [], {}, []
+        proc = self.root / "proc"
 
-    def test_an_authority_that_is_not_known(self):
-        other = Authority(self.folder / "other")
-        self.refuses_certificate(other.issue("right"), "is from an authority that is not known")
+        def reply(line, body):
+            self.machine.wait_for(lambda: process, "the program")
+            held.append([process_memory.count(proc, each, PASSWORD)
+                         for each in process_memory.descendants(proc, process[0].pid)])
+            return right(line, body)
 
-    def test_a_certificate_that_is_its_own_authority(self):
-        self.refuses_certificate(self.authority.self_signed(), "is from an authority that is not known")
+        server._reply = reply
+        process.append(self.with_password(self.machine.start, "account", "sign-in", "anna", *arguments,
+                                          stdout=subprocess.DEVNULL, **options))
+        process[0].returncode = process_memory.watch_ends(
+            proc, process[0].pid, lambda each: left.update({each: process_memory.count(proc, each, PASSWORD)}))
+        self.assertEqual(process[0].returncode, 0)
+        return held, list(left.values())
 
-    def test_a_certificate_for_another_host(self):
-        self.refuses_certificate(self.authority.issue("other", host="other.example"), "is for another host")
-
-    def test_a_certificate_that_has_expired(self):
-        self.refuses_certificate(self.authority.issue("old", end="20200201000000Z"), "has expired by this machine's clock")
-
-    def test_a_certificate_of_the_future(self):
-        self.refuses_certificate(self.authority.issue("new", start="20480101000000Z"),
-                                 "is not valid yet by this machine's clock")
-
-    def test_authorities_that_cannot_be_read(self):
+    def test_while_the_server_is_asked_the_password_is_in_one_place_and_afterwards_nowhere(self):
         server = self.serve(certificate=self.certificate)
-        self.assertEqual(self.reason(server, AccountServerAuthority="/etc/nothing.pem"),
-                         "the authorities in /etc/nothing.pem cannot be read")
+        self.settle(server)
+        held, left = self.sign_in_watched(server)
+        self.assertEqual((held, left), ([[1], [1]], [0]))
 
-    def test_a_server_that_offers_old_tls_alone(self):
-        context = ssl.SSLContext(ssl.PROTOCOL_TLS_SERVER)
-        context.set_ciphers("ALL:@SECLEVEL=0")
-        context.minimum_version = ssl.TLSVersion.TLSv1
-        context.maximum_version = ssl.TLSVersion.TLSv1_1
-        server = self.serve(certificate=self.certificate, context=context)
-        self.assertIn("does not offer TLS 1.2 or newer", self.reason(server))
-        self.assertEqual(server.requests, [])
+    def test_so_it_is_in_each_of_both_where_root_asks_for_another_user(self):
+        path = self.root / "run/watched"
+        server = self.serve(path=path)
+        self.addCleanup(path.unlink)
+        self.settle(AccountServer="unix:/run/watched")
+        held, left = self.sign_in_watched(server, "--user", machine.USER)
+        self.assertEqual((held, left), ([[1, 1], [1, 1]], [0, 0]))
 
-    def test_a_server_without_tls(self):
-        server = self.serve()
-        self.assertIn("does not speak TLS there", self.reason(server))
-        self.assertEqual(server.requests, [])
+    def test_nobody_may_look_while_it_is_held(self):
+        server = self.serve(certificate=self.certificate)
+        self.settle(server)
+        process, owners = [], []
 
-    def test_a_redirect(self):
-        other = self.serve()
-        server = self.serve(lambda *_: answer(307, "", fields=f"Location: http://{HOST}:{other.port}/\r\n"),
-                            certificate=self.certificate)
-        self.assertIn(f"sends on to http://{HOST}:{other.port}/, where no password is sent",
-                      self.reason(server))
-        self.assertEqual(other.connections, 0)
+        def reply(line, body):
+            self.machine.wait_for(lambda: process, "the program")
+            owners.append((self.root / f"proc/{process[0].pid}/mem").stat().st_uid)
+            return right(line, body)
 
-    def test_a_login_page_of_the_network(self):
-        server = self.serve(lambda *_: answer(200, "<html>", "text/html"), certificate=self.certificate)
-        self.assertIn("a login page of this network may stand in between", self.reason(server))
-
-    def test_a_server_that_is_not_there(self):
-        server = Server(right)
-        server.close()
-        self.assertEqual(self.reason(server), f"no server can be reached at {HOST}:{server.port}: Connection refused")
-
-    def test_a_name_that_is_not_found(self):
-        self.assertIn("the name of nowhere.example is not found", self.reason(AccountServer="https://nowhere.example"))
-
-    def test_a_machine_without_a_network(self):
-        self.assertIn("there is no network connection to 192.0.2.1: Network is unreachable",
-                      self.reason(AccountServer="https://192.0.2.1"))
-
-    def test_a_server_that_is_silent(self):
-        server = self.serve(is_silent=True)
-        self.assertEqual(self.reason(server, AccountServerConnectSeconds="1", AccountServerSeconds="2"),
-                         f"no connection to {HOST}:{server.port} within 1 s: look at the network")
-
-    def test_a_missing_module_lets_nobody_in(self):
-        modules = list(self.root.glob("usr/local/lib/**/accountserver.so"))
-        self.assertEqual(len(modules), 1)
-        hidden = modules[0].rename(modules[0].with_suffix(".away"))
-        try:
-            self.assertIn("the module accountserver.so cannot be used", self.reason(AccountServer="https://192.0.2.1"))
-        finally:
-            hidden.rename(modules[0])
+        server._reply = reply
+        process.append(self.with_password(self.machine.start, "account", "sign-in", "anna", user=True, stdout=subprocess.DEVNULL))
+        self.assertEqual(process[0].wait(timeout=60), 0)
+        self.assertEqual(owners, [0, 0], "neither the user's other processes nor a core file get to see it")
+        other = self.machine.start(["sleep", "60"], user=True)
+        self.addCleanup(other.wait)
+        self.addCleanup(other.kill)
+        self.machine.wait_for(lambda: (self.root / f"proc/{other.pid}/mem").stat().st_uid == machine.UID, "what is otherwise so")
 
 
 class Doctor(AccountServerTest):
@@ -287,7 +178,4 @@ class Doctor(AccountServerTest):
 
 
 if __name__ == "__main__":
-    machine.enter_namespaces()
-    subprocess.run(["ip", "link", "set", "lo", "up"], check=True)
-    AccountServerTest.build = Path(sys.argv.pop(1)).resolve()
-    unittest.main(verbosity=2)
+    main()

@@ -214,7 +214,7 @@ class Settings(DoctorTest):
         found = {each["setting"]: (each["value"], each["origin"]) for each in document["settings"]}
         self.assertEqual(found.pop("OnlineAccountServer")[1], "the build")
         for name, value in (("AccountServer", ""), ("AccountServerAuthority", ""), ("AccountServerConnectSeconds", "10"),
-                            ("AccountServerSeconds", "30")):
+                            ("AccountServerRevocations", ""), ("AccountServerSeconds", "30")):
             self.assertEqual(found.pop(name), (value, "the build"))
         self.assertEqual(found, {"OnlineAccountProvider": ("delivered", "/usr/share/welcomer/platform.conf"),
                                  "PluginFolder": ("/opt/plug-ins", "/etc/welcomer/platform.conf")})

@@ -37,6 +37,7 @@ TEST_F(LocalSettingsTest, WithoutAFileTheBuildsValuesHold) {
     EXPECT_EQ(settings.value(Setting::AccountServer), "");
     EXPECT_EQ(settings.value(Setting::AccountServerAuthority), "");
     EXPECT_EQ(settings.value(Setting::AccountServerConnectSeconds), "10");
+    EXPECT_EQ(settings.value(Setting::AccountServerRevocations), "");
     EXPECT_EQ(settings.value(Setting::AccountServerSeconds), "30");
     EXPECT_EQ(
         reported(Setting::PluginFolder),
@@ -64,6 +65,22 @@ TEST_F(LocalSettingsTest, AValueThatMakesNoSenseLeavesTheOneBelowAndIsLoggedOnce
     EXPECT_EQ(settings.report().problems, expected);
     EXPECT_EQ(log.lines(), expected);
     EXPECT_EQ(log.records().front().priority, platform::kErrorPriority);
+}
+
+TEST_F(LocalSettingsTest, OnlineAccountsAreMadeWithTheAccountServerUnlessSomebodyNamesAnother) {
+    const auto onlineWith = [this](const std::string& lines) {
+        files.addFile(kAdministrators, lines);
+        return LocalSettings(root, log)
+            .report()
+            .settings[static_cast<std::size_t>(Setting::OnlineAccountServer)];
+    };
+    EXPECT_EQ(
+        onlineWith("AccountServer=https://accounts.example:8443\n"),
+        (platform::SettingReport{"OnlineAccountServer", "https://accounts.example:8443/", "AccountServer"}));
+    EXPECT_EQ(onlineWith("AccountServer=https://accounts.example/a/\n").value, "https://accounts.example/a/");
+    EXPECT_EQ(onlineWith("AccountServer=https://a.example\nOnlineAccountServer=https://b.example/\n").value,
+              "https://b.example/");
+    EXPECT_EQ(onlineWith("AccountServer=unix:/run/a\n").origin, "the build");
 }
 
 TEST_F(LocalSettingsTest, AFileThatCannotBeReadIsLoggedAndCostsNoOther) {

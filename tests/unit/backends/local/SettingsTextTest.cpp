@@ -98,6 +98,9 @@ TEST(SettingsTextTest, AnAccountServerIsAskedOverTLSOrASocketOfTheMachineAlone) 
     EXPECT_EQ(problemWith("AccountServerAuthority=a"),
               "line 1: AccountServerAuthority is not the path of a file, which begins with /");
     EXPECT_EQ(readSettings("AccountServerAuthority=").problems, Texts{});
+    EXPECT_EQ(problemWith("AccountServerRevocations=a"),
+              "line 1: AccountServerRevocations is not the path of a file, which begins with /");
+    EXPECT_EQ(readSettings("AccountServerRevocations=/etc/a.pem").problems, Texts{});
 }
 
 TEST(SettingsTextTest, SecondsAreAWholeNumberFromOneTo999) {

@@ -30,7 +30,7 @@ class AccountServerTest : public testing::Test {
 
     AccountServerClient client(std::chrono::seconds limit = std::chrono::seconds(30)) const {
         return AccountServerClient({[this, limit] {
-                                        return AccountServerSettings{"unix:" + root.locate("/socket"), "",
+                                        return AccountServerSettings{"unix:" + root.locate("/socket"), "", "",
                                                                      std::chrono::seconds(10), limit};
                                     },
                                     [] {
