@@ -1,6 +1,8 @@
 #include "backends/desktop/accounts/GoaOnlineAccounts.h"
 
+#include "backends/bus/BusCall.h"
 #include "backends/desktop/glib/MainContext.h"
+#include "backends/posix/OwnProcess.h"
 
 #include <algorithm>
 #include <array>
@@ -120,6 +122,29 @@ std::string presentation(const NewOnlineAccount& account) {
                                                                     : account.identity + "@" + host;
 }
 
+// Not with GLib, which a process that was forked cannot use.
+bool addAccount(const NewOnlineAccount& account, const std::string& presentation) {
+    const bus::Bus session = bus::openSessionBus(kPatience);
+    if (!session) {
+        return false;
+    }
+    bus::Call call(session.get(), kManager, "AddAccount");
+    call.append("sss", account.providerType.c_str(), account.identity.c_str(), presentation.c_str())
+        .open('a', "{sv}")
+        .open('e', "sv")
+        .append("s", "password")
+        .open('v', "s")
+        .append("s", account.password.text().c_str())
+        .close(3)
+        .open('a', "{ss}")
+        .append("{ss}", "Uri", account.serverAddress.c_str())
+        .append("{ss}", "AcceptSslErrors", "false");
+    for (std::size_t i = 0; i < kOnlineFeatureCount; ++i) {
+        call.append("{ss}", kFeatureNames[i].detail, account.isOn[i] ? "true" : "false");
+    }
+    return static_cast<bool>(call.close().send());
+}
+
 } // namespace
 
 GoaOnlineAccounts::Daemon GoaOnlineAccounts::look() {
@@ -183,7 +208,7 @@ bool GoaOnlineAccounts::setFeature(const OnlineAccount& account, OnlineFeature f
 }
 
 bool GoaOnlineAccounts::makeOnce(const NewOnlineAccount& account) {
-    if (!canBeSent(account.identity) || !canBeSent(account.password)) {
+    if (!canBeSent(account.identity) || !canBeSent(account.password.text())) {
         return false;
     }
     const std::lock_guard threads(_making);
@@ -198,31 +223,9 @@ bool GoaOnlineAccounts::makeOnce(const NewOnlineAccount& account) {
     const bool isThere = std::any_of(accounts->begin(), accounts->end(), [&](const OnlineAccount& other) {
         return other.providerType == account.providerType && other.identity == account.identity;
     });
-    return isThere || _add(account);
-}
-
-bool GoaOnlineAccounts::_add(const NewOnlineAccount& account) {
-    const BusConnection bus = _connection(Deadline(kPatience));
-    if (!bus) {
-        return false;
-    }
-    GVariantBuilder credentials;
-    g_variant_builder_init(&credentials, G_VARIANT_TYPE_VARDICT);
-    g_variant_builder_add(&credentials, "{sv}", "password", g_variant_new_string(account.password.c_str()));
-    GVariantBuilder details;
-    g_variant_builder_init(&details, G_VARIANT_TYPE("a{ss}"));
-    g_variant_builder_add(&details, "{ss}", "Uri", account.serverAddress.c_str());
-    g_variant_builder_add(&details, "{ss}", "AcceptSslErrors", "false");
-    for (std::size_t i = 0; i < kOnlineFeatureCount; ++i) {
-        g_variant_builder_add(&details, "{ss}", kFeatureNames[i].detail, account.isOn[i] ? "true" : "false");
-    }
-    ErrorSlot error;
-    const VariantPointer answer =
-        call(bus.get(), kManager, "AddAccount",
-             g_variant_new("(sssa{sv}a{ss})", account.providerType.c_str(), account.identity.c_str(),
-                           presentation(account).c_str(), &credentials, &details),
-             "(o)", error);
-    return answer != nullptr;
+    // Whichever library speaks on the bus, it leaves copies of the password: they go with the process.
+    return isThere || posix::succeedsInAProcessOfItsOwn(
+                          [&account, name = presentation(account)] { return addAccount(account, name); });
 }
 
 BusConnection GoaOnlineAccounts::_connection(const Deadline& deadline) {

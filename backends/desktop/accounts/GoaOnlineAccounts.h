@@ -38,7 +38,6 @@ class GoaOnlineAccounts final : public OnlineAccounts {
 
   private:
     BusConnection _connection(const Deadline& deadline);
-    bool _add(const NewOnlineAccount& account);
 
     const std::function<posix::FileLock()> _lock;
     std::mutex _making;                              // keeps other threads out

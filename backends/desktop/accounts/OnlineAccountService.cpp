@@ -1,6 +1,5 @@
 #include "backends/desktop/accounts/OnlineAccountService.h"
 
-#include "backends/posix/SecretText.h"
 #include "propertylist/PropertyListReadings.h"
 
 #include <algorithm>
@@ -184,11 +183,12 @@ class OnlineAccountService::SignIn final : public platform::NotificationCenter,
            const std::string& username, const std::string& password)
         : _surroundings(surroundings),
           _switches(std::move(switches)),
-          _account{"", username, password, "", {}},
+          _identity(username),
+          _password(std::in_place, password),
           _embedded(surroundings.makeEmbedded(*this)) {}
 
     void start(const PropertyList::Dictionary& delegateRequest) {
-        _embedded->sharedManager().finishSignIn(_account.identity, _account.password, delegateRequest);
+        _embedded->sharedManager().finishSignIn(_identity, _password->text(), delegateRequest);
     }
 
     bool isOver() const { return _isOver; }
@@ -204,41 +204,45 @@ class OnlineAccountService::SignIn final : public platform::NotificationCenter,
             _finish(notification);
             return;
         }
-        const auto account = _embedded->sharedManager().accountForID(_account.identity, false);
+        NewOnlineAccount made{"", _identity, *_password, "", {}};
+        const auto account = _embedded->sharedManager().accountForID(_identity, false);
         for (std::size_t i = 0; i < kServices.size(); ++i) {
-            _account.isOn[i] = _embedded->isServiceEnabled(account.get(), kServices[i]);
+            made.isOn[i] = _embedded->isServiceEnabled(account.get(), kServices[i]);
         }
         const std::shared_ptr<platform::RunLoop> runLoop = _surroundings.runLoops.current();
         const std::shared_ptr<platform::RunLoopPort> port = runLoop->attachPort();
-        _surroundings.dispatchQueues.global().async(
-            [weak = weak_from_this(), switches = _switches, account = _account, runLoop, port, notification] {
-                const bool isMade = switches->makeOnce(account);
-                runLoop->perform([weak, port, notification, isMade] {
-                    if (const auto self = weak.lock()) {
-                        self->_remember(isMade);
-                        self->_finish(notification);
-                    }
-                });
+        _surroundings.dispatchQueues.global().async([weak = weak_from_this(), switches = _switches,
+                                                     made = std::optional(std::move(made)), runLoop, port,
+                                                     notification]() mutable {
+            const bool isMade = switches->makeOnce(*std::move(made));
+            made.reset(); // and the password with it
+            runLoop->perform([weak, port, notification, isMade] {
+                if (const auto self = weak.lock()) {
+                    self->_remember(isMade);
+                    self->_finish(notification);
+                }
             });
+        });
     }
 
   private:
     void _remember(bool isMade) {
         if (isMade) {
-            _surroundings.preferenceStore.setValue(_account.identity, true, kOnlineAccountsDomain);
+            _surroundings.preferenceStore.setValue(_identity, true, kOnlineAccountsDomain);
             _surroundings.preferenceStore.synchronise(kOnlineAccountsDomain);
         }
     }
 
     void _finish(const platform::Notification& notification) {
-        posix::wipe(_account.password);
+        _password.reset();
         _surroundings.notificationCenter.post(notification);
         _isOver = true; // an observer that starts the next sign-in must not end this one
     }
 
     const OnlineAccountSurroundings& _surroundings;
     const std::shared_ptr<const Switches> _switches;
-    NewOnlineAccount _account;
+    const std::string _identity;
+    std::optional<posix::SecretText> _password; // until it is over
     const std::unique_ptr<platform::AccountService> _embedded;
     std::atomic<bool> _isOver{false};
 };

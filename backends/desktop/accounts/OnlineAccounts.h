@@ -2,6 +2,8 @@
 
 #pragma once
 
+#include "backends/posix/SecretText.h"
+
 #include <array>
 #include <cstddef>
 #include <optional>
@@ -41,7 +43,7 @@ struct OnlineAccount {
 struct NewOnlineAccount {
     std::string providerType;
     std::string identity;
-    std::string password;
+    posix::SecretText password;
     std::string serverAddress;                    // a URL
     std::array<bool, kOnlineFeatureCount> isOn{}; // the features that are switched on from the start
 };

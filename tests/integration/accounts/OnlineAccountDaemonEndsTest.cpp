@@ -85,8 +85,11 @@ TEST_F(OnlineAccountDaemon, ASwitchThatHasNoEffectIsWaitedForOnlyOnce) {
 }
 
 TEST_F(OnlineAccountDaemon, AnAccountBeginsWithWhatItIsToldTo) {
-    ASSERT_TRUE(backend.onlineAccounts()->makeOnce(
-        {"owncloud", "bert", "secret", "http://127.0.0.1:9/", {true, false, true, false}}));
+    ASSERT_TRUE(backend.onlineAccounts()->makeOnce({"owncloud",
+                                                    "bert",
+                                                    posix::SecretText("secret"),
+                                                    "http://127.0.0.1:9/",
+                                                    {true, false, true, false}}));
     EXPECT_TRUE(isEnabled(kSKServiceIDContacts));
     EXPECT_FALSE(isEnabled(kSKServiceIDCalendars));
     EXPECT_TRUE(isEnabled(kSKServiceMobileDocuments));

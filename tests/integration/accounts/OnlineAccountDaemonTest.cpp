@@ -160,7 +160,8 @@ TEST_F(OnlineAccountDaemon, AWrongPasswordMakesNoAccount) {
 }
 
 TEST_F(OnlineAccountDaemon, ManyAtOnceMakeOneAccount) {
-    const desktop::NewOnlineAccount account{"owncloud", "anna", "secret", "http://127.0.0.1:9/", {}};
+    const desktop::NewOnlineAccount account{
+        "owncloud", "anna", posix::SecretText("secret"), "http://127.0.0.1:9/", {}};
     std::vector<std::thread> threads;
     for (int i = 0; i < 8; ++i) {
         threads.emplace_back([&] { EXPECT_TRUE(backend.onlineAccounts()->makeOnce(account)); });
@@ -169,8 +170,8 @@ TEST_F(OnlineAccountDaemon, ManyAtOnceMakeOneAccount) {
         thread.join();
     }
     EXPECT_EQ(OnlineAccountsBus().accounts().size(), 1U);
-    EXPECT_TRUE(
-        backend.onlineAccounts()->makeOnce({"owncloud", "bert@example.org", "", "http://127.0.0.1:9/", {}}));
+    EXPECT_TRUE(backend.onlineAccounts()->makeOnce(
+        {"owncloud", "bert@example.org", posix::SecretText(""), "http://127.0.0.1:9/", {}}));
     OnlineAccountsBus bus;
     ASSERT_EQ(bus.accounts().size(), 2U);
     EXPECT_EQ(bus.property(bus.accounts()[1], "PresentationIdentity"), "'bert@example.org'");
@@ -178,13 +179,13 @@ TEST_F(OnlineAccountDaemon, ManyAtOnceMakeOneAccount) {
 
 TEST_F(OnlineAccountDaemon, WhatTheBusDoesNotTakeMakesNoAccountAndHarmsNobody) {
     for (const std::string& text : {std::string("an\xff"), std::string("an\0na", 5)}) {
-        EXPECT_FALSE(
-            backend.onlineAccounts()->makeOnce({"owncloud", text, "secret", "http://127.0.0.1:9/", {}}));
-        EXPECT_FALSE(
-            backend.onlineAccounts()->makeOnce({"owncloud", "anna", text, "http://127.0.0.1:9/", {}}));
+        EXPECT_FALSE(backend.onlineAccounts()->makeOnce(
+            {"owncloud", text, posix::SecretText("secret"), "http://127.0.0.1:9/", {}}));
+        EXPECT_FALSE(backend.onlineAccounts()->makeOnce(
+            {"owncloud", "anna", posix::SecretText(text), "http://127.0.0.1:9/", {}}));
     }
-    EXPECT_FALSE(
-        backend.onlineAccounts()->makeOnce({"no_such_kind", "anna", "secret", "http://127.0.0.1:9/", {}}));
+    EXPECT_FALSE(backend.onlineAccounts()->makeOnce(
+        {"no_such_kind", "anna", posix::SecretText("secret"), "http://127.0.0.1:9/", {}}));
     EXPECT_EQ(OnlineAccountsBus().accounts(), Names{});
     ASSERT_TRUE(backend.onlineAccounts()->list());
 }

@@ -8,15 +8,20 @@ import json
 import os
 import re
 import shutil
+import subprocess
 import sys
 import tempfile
 import unittest
 from pathlib import Path
 
 sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "support"))
+sys.path.insert(0, str(Path(__file__).resolve().parents[1] / "accountserver"))
 import machine  # noqa: E402
+import process_memory  # noqa: E402
+import tls_server  # noqa: E402
 
 BUILD = None
+TOOL = "/usr/local/bin/welcomer"
 PASSWORD = "open sesame"
 RUNTIME = f"/run/user/{machine.UID}"
 SESSION = ["env", f"XDG_RUNTIME_DIR={RUNTIME}", f"DBUS_SESSION_BUS_ADDRESS=unix:path={RUNTIME}/bus",
@@ -70,18 +75,22 @@ class InstalledTool(unittest.TestCase):
         self.assertEqual(done.returncode, 0, done.stderr)
         return done.stdout
 
+    @staticmethod
+    def with_password(run, *arguments, password=PASSWORD):
+        reading, writing = os.pipe()
+        os.write(writing, password.encode() + b"\n")
+        os.close(writing)
+        try:
+            return run([*SESSION, TOOL, "--json", *arguments, "--password-fd", str(reading)], user=True, pass_fds=[reading])
+        finally:
+            os.close(reading)
+
     def tool(self, *arguments, password=None):
         """The tool's JSON answer."""
-        files, options = [], []
         if password:
-            reading, writing = os.pipe()
-            os.write(writing, password.encode() + b"\n")
-            os.close(writing)
-            files, options = [reading], ["--password-fd", str(reading)]
-        done = self.machine.run([*SESSION, "/usr/local/bin/welcomer", "--json", *arguments, *options], user=True,
-                                pass_fds=files)
-        for file in files:
-            os.close(file)
+            done = self.with_password(self.machine.run, *arguments, password=password)
+        else:
+            done = self.machine.run([*SESSION, TOOL, "--json", *arguments], user=True)
         self.assertEqual(done.returncode, 0, done.stderr + done.stdout)
         return json.loads(done.stdout)
 
@@ -119,6 +128,57 @@ class InstalledTool(unittest.TestCase):
         self.tool("account", "sign-in", "anna", password=PASSWORD)
         self.assertEqual(self.online_account()[1], {"Files", "Contacts"}, "what was enabled is on again")
 
+    def serve(self):
+        """An account server that knows anna, which the settings name."""
+        authority = tls_server.Authority(self.folder / "authority")
+        right = {"status": 0, "accountID": "anna"}
+        server = tls_server.Server(lambda *_: tls_server.answer(200, right), certificate=authority.issue("right"))
+        self.addCleanup(server.close)
+        address = f"https://{tls_server.HOST}:{server.port}"
+        etc = self.machine.root / "etc"
+        (etc / "welcomer").mkdir(exist_ok=True)
+        (etc / "authority.pem").write_bytes(authority.certificate.read_bytes())
+        (etc / "hosts").write_text(f"127.0.0.1 localhost {tls_server.HOST}\n", encoding="ascii")
+        (etc / "welcomer/platform.conf").write_text(
+            f"AccountServer={address}\nAccountServerAuthority=/etc/authority.pem\n", encoding="ascii")
+        return server, address
+
+    def stored_accounts(self):
+        return (self.machine.home / ".config/goa-1.0/accounts.conf").read_text(encoding="utf-8")
+
+    def test_with_an_account_server_the_online_account_gets_the_same_user_and_server(self):
+        self.start_daemons()
+        server, address = self.serve()
+        self.tool("account", "sign-in", "anna", password=PASSWORD)
+        asked = [json.loads(body)["user"] for head, body in server.requests if head.startswith("POST /v1/authenticate")]
+        self.assertEqual(asked, ["anna", "anna"])
+        path, features = self.online_account()
+        self.assertEqual(features, set())
+        self.assertIn("'anna'", self.call(NAME, path, "org.freedesktop.DBus.Properties.Get", f"{NAME}.Account", "Identity"))
+        self.assertIn(PASSWORD, self.call(NAME, path, f"{NAME}.PasswordBased.GetPassword", "password"))
+        self.assertIn(f"Uri={address}/\n", self.stored_accounts())
+        self.assertEqual(self.tool("account", "status")["loggedIn"], "anna")
+
+    def test_an_administrator_may_name_another_server_for_the_online_accounts(self):
+        self.start_daemons()
+        self.serve()
+        with open(self.machine.root / "etc/welcomer/platform.conf", "a", encoding="ascii") as settings:
+            settings.write("OnlineAccountServer=https://cloud.example/\n")
+        self.tool("account", "sign-in", "anna", password=PASSWORD)
+        self.assertIn("Uri=https://cloud.example/\n", self.stored_accounts())
+
+    def test_the_online_account_leaves_no_password_behind(self):
+        self.start_daemons()
+        self.serve()
+        left = []
+        process = self.with_password(lambda command, **options: self.machine.start(command, stdout=subprocess.DEVNULL, **options),
+                                     "account", "sign-in", "anna")
+        proc = self.machine.root / "proc"
+        process.returncode = process_memory.watch_ends(
+            proc, process.pid, lambda each: left.append(process_memory.count(proc, each, PASSWORD)))
+        self.assertEqual((process.returncode, left), (0, [0]))
+        self.assertIn(PASSWORD, self.call(NAME, self.online_account()[0], f"{NAME}.PasswordBased.GetPassword", "password"))
+
     def test_setting_up_without_a_word_makes_the_online_account_with_what_was_chosen(self):
         self.start_daemons()
         self.tool("account", "add", "anna", password=PASSWORD)
@@ -146,5 +206,6 @@ if __name__ == "__main__":
     BUILD = sys.argv.pop(1) if len(sys.argv) > 1 else sys.exit(__doc__)
     sys.argv.insert(1, BUILD)
     machine.enter_namespaces()
+    subprocess.run(["ip", "link", "set", "lo", "up"], check=True)
     del sys.argv[1]
     unittest.main(verbosity=2)

@@ -20,7 +20,7 @@ TEST_F(OnlineAccountServiceTest, ACompletedSignInMakesTheOnlineAccountBeforeItIs
     ASSERT_EQ(online.made.size(), 1U);
     EXPECT_EQ(online.made[0].providerType, "owncloud");
     EXPECT_EQ(online.made[0].identity, "anna");
-    EXPECT_EQ(online.made[0].password, "secret");
+    EXPECT_EQ(online.made[0].password.text(), "secret");
     EXPECT_EQ(online.made[0].serverAddress, "https://cloud.example/");
     EXPECT_EQ(loggedIn(), "anna");
 }
