@@ -1,10 +1,10 @@
 #include "tests/support/StubServer.h"
 
+#include "tests/support/ListeningSocket.h"
+
 #include <cstring>
 #include <poll.h>
-#include <stdexcept>
 #include <sys/socket.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 namespace welcomer {
@@ -43,14 +43,7 @@ std::string httpAnswer(int status, const std::string& contentType, const std::st
 StubServer::StubServer(std::string path, Answer answer)
     : _path(std::move(path)),
       _answer(std::move(answer)),
-      _socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
-    sockaddr_un address = {};
-    address.sun_family = AF_UNIX;
-    std::strncpy(address.sun_path, _path.c_str(), sizeof(address.sun_path) - 1);
-    if (::bind(_socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)) != 0 ||
-        ::listen(_socket.get(), 64) != 0) {
-        throw std::runtime_error("cannot listen on " + _path);
-    }
+      _socket(listenOn(_path)) {
     _thread = std::thread([this] { _serve(); });
 }
 
