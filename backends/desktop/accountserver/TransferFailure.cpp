@@ -54,9 +54,9 @@ std::string whyNotTrusted(const TransferFailure& failure, const AccountServerSet
     case kSelfSignedInChain:
     case kNoIssuer:
     case kNoIssuerOfFirst:
-        return certificate + " is from an authority that is not known: install the authority's certificate, "
-                             "or name it in the "
-                             "setting AccountServerAuthority";
+        return certificate +
+               " is from an authority that is not known: a login page of this network may stand "
+               "in between, or the authority is to be named in the setting AccountServerAuthority";
     case kRevoked:
         return certificate + ", or that of its authority, has been revoked: ask who runs the server";
     case kNoRevocations:
@@ -135,6 +135,13 @@ std::string whyTooLate(const TransferFailure& failure, const AccountServerSettin
 }
 
 std::string whyNoTLS(const TransferFailure& failure, const AccountServerSettings& settings) {
+    if (failure.explanation.find("SSL_ERROR_SYSCALL") != std::string::npos ||
+        failure.explanation.find("reset by peer") != std::string::npos ||
+        failure.explanation.find("unexpected eof") != std::string::npos) {
+        return "the connection to " + shownServer(settings) +
+               " broke off before it was secured: a firewall of this network may stand in between" +
+               inBrackets(failure.explanation);
+    }
     const bool isOld = failure.explanation.find("protocol") != std::string::npos ||
                        failure.explanation.find("handshake") != std::string::npos;
     return shownServer(settings) +

@@ -23,6 +23,17 @@ class WithoutTrust(AccountServerTest):
     def test_a_certificate_that_is_its_own_authority(self):
         self.refuses_certificate(self.authority.self_signed(), "is from an authority that is not known")
 
+    def test_a_login_page_that_answers_in_the_servers_place(self):
+        portal = Authority(self.folder / "portal")
+        for certificate, text in ((portal.issue("portal", host="portal.example"), "is from an authority that is not known"),
+                                  (self.authority.issue("known", host="portal.example"), "is for another host")):
+            server = self.serve(lambda *_: answer(302, "", fields="Location: https://portal.example/\r\n"),
+                                certificate=certificate)
+            said = self.reason(server)
+            self.assertIn(text, said)
+            self.assertIn(": a login page of this network may stand in between, or the ", said)
+            self.assertEqual(server.requests, [])
+
     def test_a_certificate_for_another_host(self):
         self.refuses_certificate(self.authority.issue("other", host="other.example"), "is for another host")
 

@@ -50,7 +50,7 @@ class Hostile(AccountServerTest):
         for what, reply in (("header", dripping(self.WHOLE)),
                             ("body", lambda *_: itertools.chain([self.WHOLE[:head]], dripping(self.WHOLE[head:])()))):
             with self.subTest(what):
-                self.assertEqual(self.told(reply, AccountServerSeconds="2"), "SERVER has not answered within 2 s")
+                self.assertEqual(self.told(reply, AccountServerSeconds="6"), "SERVER has not answered within 6 s")
 
     def test_an_answer_without_an_end_is_broken_off(self):
         chunk = b"10000\r\n" + b" " * 0x10000 + b"\r\n"
@@ -98,7 +98,8 @@ class Hostile(AccountServerTest):
 
     def test_a_connection_that_carries_nothing_is_tried_twice_more(self):
         server = self.serve(certificate=self.certificate, hangs_up=True)
-        self.assertIn("SERVER", self.reason(server).replace(f"{HOST}:{server.port}", "SERVER"))
+        self.assertIn(f"the connection to {HOST}:{server.port} broke off before it was secured: a firewall of this network may "
+                      "stand in between", self.reason(server))
         self.assertEqual((server.requests, server.connections), ([], 3))
 
 
