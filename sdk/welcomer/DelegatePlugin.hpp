@@ -102,8 +102,7 @@ class WLFirstRunDelegateConfiguration {
 
     // For the video-calling and the messaging delegate, which are called here and not above: the same with
     // the aliases that the user chose. Raises where it is not overridden, which the host logs.
-    // The handler is a delegate's own to keep, as above.
-    // NOLINTBEGIN(performance-unnecessary-value-param)
+    // NOLINTBEGIN(performance-unnecessary-value-param): whoever overrides it keeps the handler, as above
     virtual void
     completeSetupWithResponseChosenAliasesHandler(ValueView /*response*/,
                                                   const std::optional<std::vector<std::string>>& /*aliases*/,

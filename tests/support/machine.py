@@ -6,8 +6,10 @@ process ends with it. Needs root, or sudo without a question.
 
 import ctypes
 import os
+import shutil
 import subprocess
 import sys
+import tempfile
 import time
 from pathlib import Path
 
@@ -185,3 +187,15 @@ class Machine:
         """Lets go of everything mounted below the root, which leaves an empty folder, and removes that."""
         unmount(self.root)
         self.root.rmdir()
+
+
+def for_class(case, build, name):
+    """A machine with what a build installs, for as long as a class of tests lasts: case.machine, in case.folder.
+
+    name: what the folder's begins with.
+    """
+    case.folder = Path(tempfile.mkdtemp(prefix=f"{name}-"))
+    case.addClassCleanup(shutil.rmtree, case.folder)
+    case.machine = Machine(case.folder / "machine")
+    case.addClassCleanup(case.machine.stop)
+    case.machine.install(build)

@@ -214,8 +214,8 @@ class OnlineAccountService::SignIn final : public platform::NotificationCenter,
         _surroundings.dispatchQueues.global().async([weak = weak_from_this(), switches = _switches,
                                                      made = std::optional(std::move(made)), runLoop, port,
                                                      notification]() mutable {
-            const bool isMade = switches->makeOnce(*std::move(made));
-            made.reset(); // and the password with it
+            // Taken out, so that the password does not stay with what the queue keeps.
+            const bool isMade = switches->makeOnce(*std::exchange(made, std::nullopt));
             runLoop->perform([weak, port, notification, isMade] {
                 if (const auto self = weak.lock()) {
                     self->_remember(isMade);

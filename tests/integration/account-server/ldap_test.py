@@ -9,7 +9,6 @@ import shutil
 import socket
 import subprocess
 import sys
-import tempfile
 import threading
 import unittest
 from pathlib import Path
@@ -60,12 +59,8 @@ class Ldap(unittest.TestCase):
 
     @classmethod
     def setUpClass(cls):
-        cls.folder = Path(tempfile.mkdtemp(prefix="account-ldap-"))
-        cls.addClassCleanup(shutil.rmtree, cls.folder)
+        machine.for_class(cls, cls.build, "account-ldap")
         subprocess.run(["ip", "link", "set", "lo", "up"], check=True)
-        cls.machine = machine.Machine(cls.folder / "machine")
-        cls.addClassCleanup(cls.machine.stop)
-        cls.machine.install(cls.build)
         cls.machine.start_system_log()
         (cls.machine.root / "etc/searcher").write_text("searching\n", encoding="ascii")
         for authority in ("authority", "other"):

@@ -12,7 +12,6 @@ import shutil
 import socket
 import subprocess
 import sys
-import tempfile
 import unittest
 from pathlib import Path
 
@@ -44,12 +43,8 @@ class Limits(unittest.TestCase):
     def setUpClass(cls):
         hard = resource.getrlimit(resource.RLIMIT_NOFILE)[1]
         resource.setrlimit(resource.RLIMIT_NOFILE, (min(hard, 16384), hard))
-        cls.folder = Path(tempfile.mkdtemp(prefix="account-limits-"))
-        cls.addClassCleanup(shutil.rmtree, cls.folder)
+        machine.for_class(cls, cls.build, "account-limits")
         subprocess.run(["ip", "link", "set", "lo", "up"], check=True)
-        cls.machine = machine.Machine(cls.folder / "machine")
-        cls.addClassCleanup(cls.machine.stop)
-        cls.machine.install(cls.build)
         long_text = "long " * 400_000
         account_server.write_directory(cls.machine.root, {
             "anna": {}, "slow": {"Password": slow_hash("salt")},

@@ -12,7 +12,6 @@ import socket
 import ssl
 import subprocess
 import sys
-import tempfile
 import time
 import unittest
 import warnings
@@ -51,12 +50,8 @@ class Protocol(unittest.TestCase):
 
     @classmethod
     def setUpClass(cls):
-        cls.folder = Path(tempfile.mkdtemp(prefix="account-server-"))
-        cls.addClassCleanup(shutil.rmtree, cls.folder)
+        machine.for_class(cls, cls.build, "account-server")
         subprocess.run(["ip", "link", "set", "lo", "up"], check=True)
-        cls.machine = machine.Machine(cls.folder / "machine")
-        cls.addClassCleanup(cls.machine.stop)
-        cls.machine.install(cls.build)
         cls.machine.start_system_log()
         account_server.write_directory(cls.machine.root, USERS)
         account_server.make_certificate(cls.folder, "authority")

@@ -8,7 +8,6 @@ import json
 import shutil
 import subprocess
 import sys
-import tempfile
 import unittest
 from pathlib import Path
 
@@ -25,12 +24,8 @@ class SignIn(unittest.TestCase):
 
     @classmethod
     def setUpClass(cls):
-        cls.folder = Path(tempfile.mkdtemp(prefix="account-sign-in-"))
-        cls.addClassCleanup(shutil.rmtree, cls.folder)
+        machine.for_class(cls, cls.build, "account-sign-in")
         subprocess.run(["ip", "link", "set", "lo", "up"], check=True)
-        cls.machine = machine.Machine(cls.folder / "machine")
-        cls.addClassCleanup(cls.machine.stop)
-        cls.machine.install(cls.build)
         account_server.make_certificate(cls.folder, "authority")
         for file in (cls.folder / "authority.pem", *account_server.make_certificate(cls.folder, "server", "authority")):
             shutil.copy(file, cls.machine.root / "etc")

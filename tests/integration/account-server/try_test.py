@@ -10,7 +10,6 @@ import shutil
 import signal
 import subprocess
 import sys
-import tempfile
 import unittest
 from pathlib import Path
 
@@ -39,11 +38,7 @@ class TryServer(unittest.TestCase):
 
     @classmethod
     def setUpClass(cls):
-        cls.folder = Path(tempfile.mkdtemp(prefix="try-server-"))
-        cls.addClassCleanup(shutil.rmtree, cls.folder)
-        cls.machine = machine.Machine(cls.folder / "machine")
-        cls.addClassCleanup(cls.machine.stop)
-        cls.machine.install(cls.build)
+        machine.for_class(cls, cls.build, "try-server")
 
     def tearDown(self):
         self.assertEqual(list((self.machine.root / "tmp").iterdir()), [], "the temporary folder is gone")

@@ -10,7 +10,6 @@ import resource
 import shutil
 import stat
 import sys
-import tempfile
 import unittest
 from pathlib import Path
 
@@ -34,20 +33,13 @@ class OnAMachine(unittest.TestCase):
 
     @classmethod
     def setUpClass(cls):
-        cls.folder = Path(tempfile.mkdtemp(prefix="agent-ending-"))
-        cls.machine = machine.Machine(cls.folder / "machine")
-        cls.machine.install(BUILD)
+        machine.for_class(cls, BUILD, "agent-ending")
         cls.machine.start_system_log()
         replay = cls.machine.root / "tmp/replay.plist"
         replay.write_bytes(plistlib.dumps(REPLAY))
         replay.chmod(0o644)
         cls.plugins = cls.machine.root / PLUGIN_FOLDER
         cls.plugins.mkdir(parents=True)
-
-    @classmethod
-    def tearDownClass(cls):
-        cls.machine.stop()
-        shutil.rmtree(cls.folder)
 
     def install_plugin(self, name, entry):
         for old in self.plugins.iterdir():

@@ -10,7 +10,6 @@ import plistlib
 import re
 import shutil
 import sys
-import tempfile
 import unittest
 from pathlib import Path
 
@@ -31,17 +30,10 @@ class OnAMachine(unittest.TestCase):
 
     @classmethod
     def setUpClass(cls):
-        cls.folder = Path(tempfile.mkdtemp(prefix="hardened-host-"))
-        cls.machine = machine.Machine(cls.folder / "machine")
-        cls.machine.install(BUILD)
+        machine.for_class(cls, BUILD, "hardened-host")
         cls.machine.start_system_log()
         cls.plugins = cls.machine.root / PLUGIN_FOLDER
         cls.plugins.mkdir(parents=True)
-
-    @classmethod
-    def tearDownClass(cls):
-        cls.machine.stop()
-        shutil.rmtree(cls.folder)
 
     def setUp(self):
         shutil.rmtree(self.plugins)

@@ -60,7 +60,7 @@ TEST_P(RequestBodyTest, NothingOfThePasswordIsLeftWhereItWasReadInto) {
 INSTANTIATE_TEST_SUITE_P(Rooms, RequestBodyTest, testing::Values(10, 64, 511, 512, 513, 65536));
 
 TEST(RequestBody, TheLengthsOfItsPiecesSayLittleAboutThePasswords) {
-    for (const std::size_t size : {0, 1, 8, 100}) {
+    for (const std::size_t size : {0U, 1U, 8U, 100U}) {
         const std::string password(size, 'x');
         RequestBody body({"{", std::string(300, 'y')}, password, ContentType::JSON);
         Reader reader(65536);
