@@ -4,6 +4,15 @@
 
 namespace welcomer {
 
+PropertyList::PropertyList() = default;
+PropertyList::PropertyList(const PropertyList& other) = default;
+PropertyList::PropertyList(PropertyList&& other) noexcept = default;
+PropertyList& PropertyList::operator=(const PropertyList& other) = default;
+PropertyList& PropertyList::operator=(PropertyList&& other) noexcept = default;
+PropertyList::~PropertyList() = default;
+
+bool operator==(const PropertyList& one, const PropertyList& other) = default;
+
 PropertyList::Type PropertyList::type() const {
     // In the order of the variant's alternatives.
     static constexpr std::array types{Type::Dictionary, Type::Array,   Type::String,

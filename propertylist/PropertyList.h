@@ -44,7 +44,14 @@ class PropertyList {
     enum class Type { Dictionary, Array, String, Integer, Real, Boolean, Data, Date };
 
     // An empty dictionary.
-    PropertyList() = default;
+    PropertyList();
+
+    // Not where they are declared: what a variant of nine types does then is the greater part of compiling whoever has values.
+    PropertyList(const PropertyList& other);
+    PropertyList(PropertyList&& other) noexcept;
+    PropertyList& operator=(const PropertyList& other);
+    PropertyList& operator=(PropertyList&& other) noexcept;
+    ~PropertyList();
 
     PropertyList(Dictionary value) : _value(std::move(value)) {}
     PropertyList(Array value) : _value(std::move(value)) {}
@@ -94,7 +101,7 @@ class PropertyList {
     // above.
     const PropertyList* find(std::string_view key) const;
 
-    friend bool operator==(const PropertyList&, const PropertyList&) = default;
+    friend bool operator==(const PropertyList& one, const PropertyList& other);
 
   private:
     // An integer is held unsigned only when it is above the signed range.

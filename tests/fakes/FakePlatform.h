@@ -21,8 +21,6 @@
 #include "tests/fakes/FakeSystemVersionInfo.h"
 #include "tests/fakes/RecordedTime.h"
 
-#include <type_traits>
-
 namespace welcomer::fakes {
 
 // A test makes one, sets up its members and installs it:
@@ -37,8 +35,12 @@ class FakePlatform {
         platform::RunLoops* runLoops = nullptr;
     };
 
-    FakePlatform() = default;
-    explicit FakePlatform(const Instead& instead) : _instead(instead) {}
+    // Not where they are declared: making and ending all of the fakes was the greater part of compiling a test.
+    FakePlatform();
+    explicit FakePlatform(const Instead& instead);
+    ~FakePlatform();
+    FakePlatform(const FakePlatform&) = delete;
+    FakePlatform& operator=(const FakePlatform&) = delete;
 
     // Every call to any of the fakes, in order.
     CallRecorder recorder;
@@ -64,30 +66,7 @@ class FakePlatform {
     const platform::Platform& platform() const { return _platform; }
 
   private:
-    template <class Interface>
-    static Interface& _chosen(Interface* instead, std::type_identity_t<Interface>& fake) {
-        return instead ? *instead : fake;
-    }
-
-    const Instead _instead = {};
-    const platform::Platform _platform{.systemLog = systemLog,
-                                       .fileSystem = _chosen(_instead.fileSystem, fileSystem),
-                                       .processIdentity = processIdentity,
-                                       .credentialStore = credentialStore,
-                                       .pluginBundle = _chosen(_instead.pluginBundle, pluginBundle),
-                                       .resourceBundles = resourceBundles,
-                                       .clock = virtualTime,
-                                       .runLoops = _chosen(_instead.runLoops, virtualTime),
-                                       .dispatchQueues = virtualTime,
-                                       .preferenceStore = preferenceStore,
-                                       .systemVersionInfo = systemVersionInfo,
-                                       .hostReachability = hostReachability,
-                                       .notificationCenter = notificationCenter,
-                                       .accountService = accountService,
-                                       .processLauncher = processLauncher,
-                                       .networkConfigStore = networkConfigStore,
-                                       .networkStateStore = networkStateStore,
-                                       .directoryService = directoryService};
+    const platform::Platform _platform;
 };
 
 } // namespace welcomer::fakes
