@@ -7,6 +7,7 @@
 #include "handoff/ReplayItem.h"
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
+#include "plugins/PluginContext.h"
 
 #include <chrono>
 #include <exception>
@@ -59,6 +60,7 @@ void finishSetup(const std::string& label) {
     }
     // Before any use of its contents, so that a crash never replays it twice.
     attempt([&] { WLDeleteNimbusReplayKeychainItem(replay); });
+    attempt([&] { setPluginAccount(replay.item.label); });
     attempt([&] { wlnimbussetup_RemainingSkylarkSetup(replay.item.label, group); });
     attempt([&] { wlnimbussetup_RemainingDelegateSetup(replay.replayObject, std::nullopt, group); });
     replay.replayObject = PropertyList(); // may be large, and each plug-in's job holds what it needs of it

@@ -304,8 +304,19 @@ class Story {
         } else if (!login.lingering && login.record.working() > 0) {
             progress.show("  " + std::to_string(login.record.working()) + " of " +
                           std::to_string(login.record.delegates().size()) + " delegates at work, " +
-                          wholeSeconds(now - login.started) + " s");
+                          wholeSeconds(now - login.started) + " s" + _saidProgress(login.record));
         }
+    }
+
+    // What those at work have said of it.
+    static std::string _saidProgress(const LoginRecord& record) {
+        std::string said;
+        for (const DelegateOutcome& delegate : record.delegates()) {
+            if (delegate.working() && !delegate.progress.empty()) {
+                said += "; " + delegate.identifier + ": " + delegate.progress;
+            }
+        }
+        return said;
     }
 
     // What programs get
