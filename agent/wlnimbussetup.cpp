@@ -7,6 +7,7 @@
 #include "handoff/ReplayItem.h"
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
+#include "plugins/PluginContext.h"
 
 #include <chrono>
 #include <exception>
@@ -35,21 +36,6 @@ void attempt(const Step& step) {
     }
 }
 
-// The run loop's slices keep alive what plug-ins schedule on the main thread. There is no overall limit.
-void waitFor(platform::WorkGroup& group) {
-    while (!group.wait(100ms)) {
-        attempt([] { platform::current().runLoops.current()->run(1s); });
-    }
-}
-
-// For what plug-ins have started outside the group. The port keeps the run loop from returning at once.
-void linger() {
-    WL_LOG("delaying exit by two minutes");
-    const auto runLoop = platform::current().runLoops.current();
-    const auto port = runLoop->attachPort();
-    runLoop->run(120s);
-}
-
 void finishSetup(const std::string& label) {
     attempt([&] { selfDestruct(label); });
     const std::shared_ptr<platform::WorkGroup> group = platform::current().dispatchQueues.createGroup();
@@ -59,14 +45,32 @@ void finishSetup(const std::string& label) {
     }
     // Before any use of its contents, so that a crash never replays it twice.
     attempt([&] { WLDeleteNimbusReplayKeychainItem(replay); });
+    attempt([&] { setPluginAccount(replay.item.label); });
     attempt([&] { wlnimbussetup_RemainingSkylarkSetup(replay.item.label, group); });
     attempt([&] { wlnimbussetup_RemainingDelegateSetup(replay.replayObject, std::nullopt, group); });
     replay.replayObject = PropertyList(); // may be large, and each plug-in's job holds what it needs of it
-    attempt([&] { waitFor(*group); });
-    attempt(linger);
+    attempt([&] { waitForDelegates(*group); });
+    attempt([] {
+        WL_LOG("delaying exit by two minutes");
+        linger(120s);
+    });
 }
 
 } // namespace
+
+// The run loop's slices keep alive what plug-ins schedule on the main thread.
+void waitForDelegates(platform::WorkGroup& group) {
+    while (!group.wait(100ms)) {
+        attempt([] { platform::current().runLoops.current()->run(1s); });
+    }
+}
+
+// The port keeps the run loop from returning at once.
+void linger(std::chrono::nanoseconds duration) {
+    const auto runLoop = platform::current().runLoops.current();
+    const auto port = runLoop->attachPort();
+    runLoop->run(duration);
+}
 
 int wlnimbussetup(int argc, const char* const* argv) {
     try {

@@ -2,6 +2,10 @@
 
 #pragma once
 
+#include "platform/DispatchQueue.h"
+
+#include <chrono>
+
 namespace welcomer {
 
 // The agent's last log line.
@@ -15,5 +19,13 @@ inline constexpr char kAgentExitingMessage[] = "exiting";
 // Main thread. Plug-in threads may still be running when this returns: the process is to be left at once
 // (agent/leaveProcess.h).
 int wlnimbussetup(int argc, const char* const* argv);
+
+// The last two steps of it, for who has a stage carried out alone. On the thread whose run loop the plug-ins use.
+
+// Waits until the group is empty, without a limit. The run loop is run meanwhile, in slices.
+void waitForDelegates(platform::WorkGroup& group);
+
+// Runs the run loop for a while, for what plug-ins have started outside the group.
+void linger(std::chrono::nanoseconds duration);
 
 } // namespace welcomer

@@ -5,6 +5,7 @@
 #include "cloud/WLSetupProbes.h"
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
+#include "plugins/PluginContext.h"
 #include "plugins/WLNimbusDelegatesRequest.h"
 #include "propertylist/Lookup.h"
 #include "propertylist/PropertyListReadings.h"
@@ -79,6 +80,7 @@ bool NimbusTesselDelegate::validateNimbusUsernameAndPasswordTosVersionsDelegates
            "-[NimbusTesselDelegate validateNimbusUsername:andPassword:tosVersions:delegates:error:]",
            username);
     _startObservingTesselNotificationsForOperation(kValidateOperation);
+    setPluginAccount(username);
     PropertyList::Dictionary request = delegates ? *delegates : WLNimbusDelegatesRequest({}, {});
     if (tosVersions) {
         request = addToDelegates(std::move(request), *tosVersions);
@@ -94,6 +96,7 @@ bool NimbusTesselDelegate::signInWithUsernameAndPasswordAdditionalDelegatesOmitt
     const std::string& username, const std::string& password,
     const PropertyList::Dictionary& additionalDelegates, const std::vector<std::string>& omittingDelegates,
     [[maybe_unused]] platform::Error* error) {
+    setPluginAccount(username);
     const PropertyList::Dictionary request = WLNimbusDelegatesRequest(additionalDelegates, omittingDelegates);
     WL_LOG(
         "%@: %s %@ - *", *this,

@@ -22,7 +22,8 @@ foreach(room IN LISTS WELCOMER_ROOMS)
             FILES_MATCHING PATTERN "*.h"
             # The SDK has a place of its own, and the host's side of the C ABI is nothing for a setup application.
             PATTERN sdk EXCLUDE PATTERN Resources EXCLUDE PATTERN AbiDelegatePlugin.h EXCLUDE
-            PATTERN CompletionHandlers.h EXCLUDE PATTERN PropertyListHandles.h EXCLUDE)
+            PATTERN CompletionHandlers.h EXCLUDE PATTERN HostExtensions.h EXCLUDE PATTERN PluginInstances.h EXCLUDE
+            PATTERN PropertyListHandles.h EXCLUDE)
 endforeach()
 install(FILES "${PROJECT_SOURCE_DIR}/backends/Backends.h" DESTINATION "${WELCOMER_MODULE_INCLUDE_DIR}/backends"
         COMPONENT dev)

@@ -2,6 +2,8 @@
 
 #include "log/PCLogManager.h"
 #include "plugins/CompletionHandlers.h"
+#include "plugins/HostExtensions.h"
+#include "plugins/PluginInstances.h"
 #include "plugins/PluginMark.h"
 #include "plugins/PluginText.h"
 #include "plugins/PropertyListHandles.h"
@@ -125,7 +127,17 @@ AbiDelegatePlugin::create(const wl_delegate_plugin_descriptor& principalClass, c
     return plugin;
 }
 
+AbiDelegatePlugin::AbiDelegatePlugin(const wl_delegate_plugin_descriptor& principalClass,
+                                     wl_delegate* instance, std::string name)
+    : _principalClass(principalClass),
+      _instance(instance),
+      _name(std::move(name)) {
+    addPluginInstance(_instance, _name);
+}
+
 AbiDelegatePlugin::~AbiDelegatePlugin() {
+    dropBlocksOf(_instance);
+    removePluginInstance(_instance);
     if (_principalClass.destroy) {
         ErrorSlot slot; // nobody is left to hear of it
         callPlugin(_name, slot, [this](wl_error_slot*) { _principalClass.destroy(_instance); });
@@ -135,6 +147,8 @@ AbiDelegatePlugin::~AbiDelegatePlugin() {
 std::optional<std::string> AbiDelegatePlugin::delegateIdentifier() {
     std::optional<std::string> identifier = _askForIdentifier();
     if (!_firstIdentifier) {
+        visitPluginInstance(
+            _instance, [&](PluginInstance& known) { known.identifier = identifier.value_or(std::string()); });
         _firstIdentifier = std::move(identifier);
     } else if (identifier != *_firstIdentifier && !_hasChanged.exchange(true)) {
         _logChange(identifier);
@@ -238,6 +252,15 @@ AbiDelegatePlugin::messagingAliasesFromResponse(const PropertyList& response) {
         texts.push_back(std::move(*alias.string()));
     }
     return texts;
+}
+
+const void* AbiDelegatePlugin::extension(const char* identifier) {
+    if (!WL_HAS_MEMBER(_instance, get_extension) || !_instance->get_extension) {
+        return nullptr;
+    }
+    ErrorSlot slot; // what it throws comes to the same as none
+    return callPlugin(_name, slot,
+                      [&](wl_error_slot*) { return _instance->get_extension(_instance, identifier); });
 }
 
 std::string AbiDelegatePlugin::className() const {

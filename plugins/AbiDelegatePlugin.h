@@ -59,15 +59,15 @@ class AbiDelegatePlugin final : public WLFirstRunDelegateConfiguration {
     // Aliases that are no array of strings count as raising.
     std::optional<std::vector<std::string>>
     messagingAliasesFromResponse(const PropertyList& response) override;
+    // What else the delegate can do: the structure of an extension, or null. Lives as long as this object.
+    const void* extension(const char* identifier);
+
     // "(unnamed)" when the plug-in gives no name.
     std::string className() const override;
 
   private:
     AbiDelegatePlugin(const wl_delegate_plugin_descriptor& principalClass, wl_delegate* instance,
-                      std::string name)
-        : _principalClass(principalClass),
-          _instance(instance),
-          _name(std::move(name)) {}
+                      std::string name);
 
     const wl_delegate_plugin_descriptor& _principalClass;
     wl_delegate* _instance; // owned

@@ -1,5 +1,6 @@
 #include "plugins/PropertyListHandles.h"
 
+#include "plugins/HostExtensions.h"
 #include "plugins/PluginText.h"
 #include "propertylist/UTF8.h"
 #include "propertylist/UnwritableValue.h"
@@ -297,6 +298,10 @@ static bool hostDictionarySet(wl_value* dictionary, const char* key, std::size_t
 static void hostRelease(wl_value* value) {
     delete owned(value);
 }
+
+static const void* hostGetExtension(const char* identifier) {
+    return hostExtension(identifier);
+}
 }
 
 } // namespace
@@ -331,6 +336,7 @@ const wl_host& delegatePluginHost() {
         .array_append = hostArrayAppend,
         .dictionary_set = hostDictionarySet,
         .release = hostRelease,
+        .get_extension = hostGetExtension,
     };
     return host;
 }

@@ -3,6 +3,7 @@
 #include "log/PCLogManager.h"
 #include "platform/Platform.h"
 #include "plugins/AbiDelegatePlugin.h"
+#include "plugins/HostExtensions.h"
 #include "plugins/PluginMark.h"
 #include "plugins/PluginText.h"
 
@@ -89,7 +90,7 @@ void loadEntry(PluginScanEntry& entry) {
 DelegatePluginArray loadDelegatePlugins() {
     // The thread that will wait for the plug-ins has its run loop before there are any: what that loop stands
     // on a plug-in's own thread could otherwise take first.
-    platform::current().runLoops.current();
+    setPluginMainLoop();
     DelegatePluginArray plugins;
     for (PluginScanEntry& entry : scanDelegatePlugins()) {
         if (entry.plugin) {

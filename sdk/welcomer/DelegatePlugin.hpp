@@ -6,7 +6,8 @@
 //     WL_EXPORT_DELEGATE_PLUGIN(Mail)
 //
 // An operation raises by throwing: the exception is caught before it leaves the plug-in, and the text of a
-// std::exception is what the host logs. A thread of the plug-in's own must catch its exceptions itself.
+// std::exception is what the host logs. A thread of the plug-in's own must catch its exceptions itself. A plug-in may
+// also be compiled without exceptions, and without run-time type information.
 
 #ifndef WELCOMER_DELEGATE_PLUGIN_HPP
 #define WELCOMER_DELEGATE_PLUGIN_HPP
@@ -78,6 +79,11 @@ class CompletionHandler {
     std::shared_ptr<Counted> _counted;
 };
 
+namespace detail {
+template <class Delegate>
+class Adapter;
+}
+
 // A delegate. Made with its plain constructor, on the thread that looks for plug-ins, and alive until the
 // process ends when it is used. See wl_delegate for the thread of each operation.
 class WLFirstRunDelegateConfiguration {
@@ -106,15 +112,34 @@ class WLFirstRunDelegateConfiguration {
     virtual void
     completeSetupWithResponseChosenAliasesHandler(ValueView /*response*/,
                                                   const std::optional<std::vector<std::string>>& /*aliases*/,
-                                                  CompletionHandler /*handler*/) {
+                                                  [[maybe_unused]] CompletionHandler handler) {
+#if WL_DETAIL_HAS_EXCEPTIONS
         throw std::logic_error("completeSetupWithResponse:chosenAliases:handler: is not implemented");
+#else
+        handler(false, Error{0, "completeSetupWithResponse:chosenAliases:handler: is not implemented"});
+#endif
     }
     // NOLINTEND(performance-unnecessary-value-param)
 
     // For these two as well: the aliases that the server offers in its response. Raises as above.
     virtual std::optional<std::vector<std::string>> messagingAliasesFromResponse(ValueView /*response*/) {
+#if WL_DETAIL_HAS_EXCEPTIONS
         throw std::logic_error("messagingAliasesFromResponse: is not implemented");
+#else
+        return std::nullopt;
+#endif
     }
+
+    // What the delegate has to say which one it is to an extension (Extensions.hpp); null in its constructor.
+    wl_delegate* handle() const {
+        return _handle;
+    }
+
+  private:
+    template <class Delegate>
+    friend class detail::Adapter;
+
+    wl_delegate* _handle = nullptr;
 };
 
 namespace detail {
@@ -122,6 +147,7 @@ namespace detail {
 // Runs an operation and turns what it throws into the error slot.
 template <class Operation>
 auto guarded(wl_error_slot* slot, Operation operation) noexcept -> decltype(operation()) {
+#if WL_DETAIL_HAS_EXCEPTIONS
     try {
         return operation();
     } catch (const std::exception& exception) {
@@ -130,13 +156,22 @@ auto guarded(wl_error_slot* slot, Operation operation) noexcept -> decltype(oper
         host().raise(slot, "unknown exception");
     }
     return decltype(operation())();
+#else
+    static_cast<void>(slot);
+    return operation();
+#endif
 }
 
 // An author's object with the C structure that stands for it.
 template <class Delegate>
 class Adapter {
   public:
+    // None for a host of another version, or whose table lacks what this header uses.
     static wl_delegate* create(const wl_host* table, wl_error_slot* slot) {
+        if (!table || table->abi_version != WL_DELEGATE_PLUGIN_ABI_VERSION ||
+            !WL_HAS_MEMBER(table, release)) {
+            return nullptr;
+        }
         hostTable = table;
         return guarded(slot, [] { return &(new Adapter)->_interface; });
     }
@@ -149,6 +184,7 @@ class Adapter {
 
   private:
     Adapter() {
+        static_cast<WLFirstRunDelegateConfiguration&>(_delegate)._handle = &_interface;
         _interface.size = sizeof(wl_delegate);
         _interface.plugin_data = this;
         _interface.delegate_identifier = delegateIdentifier;
@@ -171,7 +207,7 @@ class Adapter {
                 return nullptr;
             }
             if (identifier->find('\0') != std::string::npos) {
-                throw std::invalid_argument("delegateIdentifier returned a NUL");
+                refuse("delegateIdentifier returned a NUL");
             }
             auto* adapter = static_cast<Adapter*>(self->plugin_data);
             const std::lock_guard<std::mutex> lock(adapter->_mutex);
@@ -217,12 +253,16 @@ class Adapter {
     static void complete(wl_error_slot* slot, wl_completion_handler handler, Operation operation) noexcept {
         guarded(slot, [&] {
             const CompletionHandler counted(handler);
+#if WL_DETAIL_HAS_EXCEPTIONS
             try {
                 operation(counted);
             } catch (...) {
                 counted.withdraw();
                 throw;
             }
+#else
+            operation(counted);
+#endif
         });
     }
 

@@ -22,11 +22,24 @@
 #endif
 #pragma GCC visibility push(hidden)
 
+#if defined(__cpp_exceptions)
+#define WL_DETAIL_HAS_EXCEPTIONS 1
+#else
+#define WL_DETAIL_HAS_EXCEPTIONS 0
+#endif
+
 namespace welcomer::sdk {
 
 namespace detail {
 
 inline const wl_host* hostTable = nullptr; // set when the first instance is made, the same for all
+
+// Throws; where the plug-in is compiled without exceptions, its caller goes on.
+inline void refuse([[maybe_unused]] const char* reason) {
+#if WL_DETAIL_HAS_EXCEPTIONS
+    throw std::invalid_argument(reason);
+#endif
+}
 
 } // namespace detail
 
@@ -104,7 +117,8 @@ class ValueView {
 
 // A property-list value of one's own. Throws std::invalid_argument when it cannot be built: text that is no
 // UTF-8 or holds a character that XML cannot hold (control characters), a date outside the years 0000 to
-// 9999, nesting beyond WL_VALUE_DEPTH_LIMIT, an entry for what is no dictionary.
+// 9999, nesting beyond WL_VALUE_DEPTH_LIMIT, an entry for what is no dictionary. Where the plug-in is compiled without
+// exceptions, such a value is no value instead, and such an entry is left out.
 class Value {
   public:
     Value(std::string_view text) : _handle(host().new_string(text.data() ? text.data() : "", text.size())) {
@@ -133,19 +147,19 @@ class Value {
 
     Value& set(std::string_view key, Value value) {
         if (!host().dictionary_set(_handle, key.data() ? key.data() : "", key.size(), value.giveUp())) {
-            throw std::invalid_argument("an entry that cannot be set");
+            detail::refuse("an entry that cannot be set");
         }
         return *this;
     }
 
     Value& append(Value value) {
         if (!host().array_append(_handle, value.giveUp())) {
-            throw std::invalid_argument("an element that cannot be appended");
+            detail::refuse("an element that cannot be appended");
         }
         return *this;
     }
 
-    ValueView view() const { return ValueView(_handle); }
+    ValueView view() const { return ValueView(_handle); } // no value where this could not be built
 
     // Hands the handle to the caller.
     wl_value* giveUp() { return std::exchange(_handle, nullptr); }
@@ -168,7 +182,7 @@ class Value {
 
     void require() const {
         if (!_handle) {
-            throw std::invalid_argument("a value that cannot be built");
+            detail::refuse("a value that cannot be built");
         }
     }
 

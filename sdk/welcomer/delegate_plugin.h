@@ -50,6 +50,18 @@ extern "C" {
  * -fvisibility=hidden. */
 #define WL_DELEGATE_PLUGIN_EXPORT __attribute__((visibility("default")))
 
+/* Whether a structure of either side is so large, by its own account, that it has a member: those behind
+ * `release` of wl_host, and behind `messaging_aliases_from_response` of wl_delegate, are not in every one. */
+#define WL_HAS_MEMBER(structure, member) WL_DETAIL_HAS_MEMBER((structure), member)
+#ifdef __cplusplus
+#define WL_DETAIL_HAS_MEMBER(structure, member)                                                              \
+    ((structure)->size >= static_cast<size_t>(reinterpret_cast<const char*>(&(structure)->member + 1) -      \
+                                              reinterpret_cast<const char*>(structure)))
+#else
+#define WL_DETAIL_HAS_MEMBER(structure, member)                                                              \
+    ((structure)->size >= (size_t)((const char*)(&(structure)->member + 1) - (const char*)(structure)))
+#endif
+
 /* A length that stands for "up to the terminating NUL". */
 #define WL_NUL_TERMINATED ((size_t)-1)
 
@@ -153,6 +165,13 @@ typedef struct wl_host {
 
     /* Ends an owned value that is passed on to nobody; null is allowed. */
     void (*release)(wl_value* value);
+
+    /* What this version of the structure ends with; the first version ended above. WL_HAS_MEMBER tells. */
+
+    /* What else this host can do, by the identifier that an extension's header gives (extensions/): a
+     * structure of functions that lives until the process ends, or null where this host does not have it. Any
+     * thread. */
+    const void* (*get_extension)(const char* identifier);
 } wl_host;
 
 /*
@@ -212,6 +231,12 @@ struct wl_delegate {
      * of the setup application that asks. Optional: null raises. */
     wl_value* (*messaging_aliases_from_response)(wl_delegate* self, const wl_value* response,
                                                  wl_error_slot* slot);
+
+    /* The first version ended above. */
+
+    /* What else this delegate can do, by the identifier that an extension's header gives: a structure of
+     * functions that lives as long as the delegate, or null. Any thread. Optional: null has none. */
+    const void* (*get_extension)(wl_delegate* self, const char* identifier);
 };
 
 /* What a plug-in exports. It is read once, when the plug-in is loaded, and stays where it is. */

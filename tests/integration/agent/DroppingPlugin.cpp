@@ -1,5 +1,6 @@
 // A delegate that loses its handler. How, says the response: "at once", "on another thread", "when it throws", "in a
-// copy", or not at all: "called".
+// copy", or not at all: "called". With "throws in its thread" a thread ends the process; with
+// "leaves things running" it completes.
 
 #include <welcomer/DelegatePlugin.hpp>
 
@@ -8,7 +9,9 @@
 #include <optional>
 #include <stdexcept>
 #include <string>
+#include <sys/prctl.h>
 #include <thread>
+#include <unistd.h>
 #include <utility>
 
 namespace sdk = welcomer::sdk;
@@ -24,6 +27,19 @@ std::string ownName() {
     const std::string path = library.dli_fname;
     const std::string name = path.substr(path.rfind('/') + 1);
     return name.substr(0, name.find('.'));
+}
+
+// A thread and a process, each with a name of its own. They end by themselves.
+void leaveThingsRunning() {
+    if (::fork() == 0) {
+        ::prctl(PR_SET_NAME, "left-process");
+        ::sleep(20);
+        ::_exit(0);
+    }
+    std::thread([] {
+        ::prctl(PR_SET_NAME, "left-thread");
+        ::sleep(20);
+    }).detach();
 }
 
 class Dropping : public sdk::WLFirstRunDelegateConfiguration {
@@ -43,6 +59,11 @@ class Dropping : public sdk::WLFirstRunDelegateConfiguration {
         } else if (how == "in a copy") {
             _kept = handler;
             _kept.reset();
+        } else if (how == "throws in its thread") {
+            std::thread([handler] { throw std::runtime_error("thrown in a thread"); }).detach();
+        } else if (how == "leaves things running") {
+            leaveThingsRunning();
+            handler(true);
         } else if (how == "called") {
             handler(true);
         }

@@ -40,6 +40,11 @@ static void* leave(void* unused) {
     return unused;
 }
 
+static void* overflow_thread(void* unused) {
+    overflow(INT_MAX);
+    return unused;
+}
+
 static void run_thread(void* (*function)(void*), void* argument, pthread_t* thread) {
     pthread_create(thread, NULL, function, argument);
 }
@@ -98,6 +103,11 @@ static void end_by(const char* how) {
     } else if (strcmp(how, "thread-fault") == 0) {
         run_thread(fault, NULL, &thread);
         pthread_join(thread, NULL);
+    } else if (strcmp(how, "thread-overflow") == 0) {
+        run_thread(overflow_thread, NULL, &thread);
+        pthread_join(thread, NULL);
+    } else if (strcmp(how, "_exit") == 0) {
+        _exit(7);
     } else if (strcmp(how, "two-at-once") == 0) {
         two_at_once();
     } else if (strcmp(how, "fork") == 0) {

@@ -8,6 +8,7 @@ import os
 import plistlib
 import resource
 import shutil
+import signal
 import stat
 import sys
 import unittest
@@ -96,6 +97,17 @@ class Endings(OnAMachine):
         for how, what in (("thread-fault", "SIGSEGV"), ("thread-exit", "exit(7)")):
             with self.subTest(how):
                 self.assert_ends(f"complete {how}", f"ended outside of any call into a plug-in: {what}")
+
+    def test_what_nobody_can_catch_ends_it_without_a_line(self):
+        self.install_plugin("EndingPlugin", "Bad.ncdplugin")
+        for how, status in (("_exit", 7), ("thread-overflow", -signal.SIGSEGV)):
+            with self.subTest(how):
+                self.store_replay_item()
+                begin = len(self.machine.log_records("wlnimbussetup"))
+                ended = self.machine.run(["/usr/bin/env", f"ENDING=complete {how}", AGENT], user=True)
+                self.assertEqual(ended.returncode, status, ended)
+                texts = [text for _, _, text in self.records_since(begin, "setting up org.example.ending")]
+                self.assertEqual([text for text in texts if text.startswith("ended ")], [])
 
     def test_of_two_threads_that_fault_at_once_one_speaks(self):
         self.install_plugin("EndingPlugin", "Bad.ncdplugin")

@@ -90,7 +90,20 @@ class Meddlers(OnAMachine):
         self.assertIn("org.example.victim setup: the victim's own outcome (N seconds)", lines)
 
 
+    def test_one_that_never_answers_is_waited_for_while_the_others_complete(self):
+        self.install_plugin("MeddlingPlugin", "silent")
+        self.install_plugin("DroppingPlugin", "good")
+        lines = self.login({"silent": "", "good": "called"}, last="org.example.good setup: completed")
+        self.assertIn("setting up org.example.silent", lines)
+        self.assertNotIn(LINGER, lines)
+
+
 class Handlers(OnAMachine):
+    def test_an_exception_in_a_thread_of_its_own_ends_the_agent(self):
+        self.install_plugin("DroppingPlugin", "bad")
+        lines = self.login({"bad": "throws in its thread"}, last="ended ")
+        self.assertEqual(lines[-1], "ended outside of any call into a plug-in: uncaught exception: thrown in a thread")
+
     def test_one_that_is_dropped_ends_the_wait(self):
         ways = {"first": "at once", "second": "on another thread", "third": "when it throws", "fourth": "in a copy",
                 "fifth": "called"}

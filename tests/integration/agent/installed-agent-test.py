@@ -30,8 +30,10 @@ REPLAY = {
             "com.corvid.storefront": {"status": 0},
             "com.corvid.nowhere": {"status": 0},
             "com.corvid.gcc.c": "other thread",
+            "com.corvid.gcc.frozen": "other thread",
             "com.corvid.gcc.layer": {"asked": "this"},
             "com.corvid.clang.c": "after return",
+            "com.corvid.clang.frozen": "other thread",
             "com.corvid.clang.layer": {"asked": "this"},
         }
     },
@@ -116,8 +118,8 @@ class InstalledAgent(unittest.TestCase):
             for name, outcome in (
                 ("chatter", "setup+chosen: completed"), ("storefront", "setup: completed"),
                 ("vidlink", "setup+chosen: completed"),
-                ("gcc.c", "setup: completed"), ("gcc.layer", "setup: AN ERROR"),
-                ("clang.c", "setup: completed"), ("clang.layer", "setup: AN ERROR"))
+                ("gcc.c", "setup: completed"), ("gcc.frozen", "setup: completed"), ("gcc.layer", "setup: AN ERROR"),
+                ("clang.c", "setup: completed"), ("clang.frozen", "setup: completed"), ("clang.layer", "setup: AN ERROR"))
         ]
         self.assertEqual(sorted(middle), sorted(line for pair in pairs for line in pair))
         for first, second in pairs:

@@ -62,7 +62,7 @@ class ToolTest(unittest.TestCase):
 
 class CommandLine(ToolTest):
     COMMANDS = [[], ["try"], ["replay"], ["replay", "store"], ["replay", "show"], ["replay", "delete"], ["plugins"],
-                ["plugins", "list"], ["setup"], ["account"], ["account", "add"], ["account", "list"], ["account", "status"],
+                ["plugins", "list"], ["plugins", "try"], ["setup"], ["account"], ["account", "add"], ["account", "list"], ["account", "status"],
                 ["account", "sign-in"], ["account", "services"], ["services"], ["services", "list"], ["services", "enable"],
                 ["network"], ["network", "show"], ["network", "ports"], ["network", "probe"], ["network", "apply"],
                 ["network", "register"]]

@@ -76,7 +76,7 @@ struct InProcessPlugin {
     int destroyed = 0;
     int identifierCalls = 0;
 
-    wl_delegate instance = {sizeof(wl_delegate), {}, {}, {}, {}, {}, {}, {}};
+    wl_delegate instance = {sizeof(wl_delegate), {}, {}, {}, {}, {}, {}, {}, {}};
     wl_delegate_plugin_descriptor descriptor = {WL_DELEGATE_PLUGIN_ABI_VERSION,
                                                 sizeof(wl_delegate_plugin_descriptor),
                                                 WL_DELEGATE_PLUGIN_PROTOCOL,

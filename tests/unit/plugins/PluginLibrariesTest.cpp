@@ -75,8 +75,25 @@ TEST_P(PluginLibrariesOfACompiler, AreSkippedWhenTheyBreakARuleAndDoNotHarmTheOt
         }));
 }
 
-TEST_P(PluginLibrariesOfACompiler, InCDoTheirWork) {
-    const auto plugin = only("good");
+class PluginLibrariesInC : public PluginLibrariesOfACompiler {
+  protected:
+    // That a plug-in in C does everything that one can.
+    void expectWork(const std::string& name);
+};
+
+INSTANTIATE_TEST_SUITE_P(Each, PluginLibrariesInC, testing::ValuesIn(compilers()),
+                         [](const auto& parameter) { return parameter.param; });
+
+TEST_P(PluginLibrariesInC, DoTheirWork) {
+    expectWork("good");
+}
+
+TEST_P(PluginLibrariesInC, FromTheFirstHeaderDoTheirWork) {
+    expectWork("frozen");
+}
+
+void PluginLibrariesInC::expectWork(const std::string& name) {
+    const auto plugin = only(name);
     EXPECT_EQ(plugin->delegateSetupRequest(), PropertyList(PropertyList::Dictionary{{"number", 7}}));
     EXPECT_EQ(plugin->messagingAliasesFromResponse({}), Aliases({"ann@example.com"}));
     plugin->completeSetupWithResponseHandler("succeed", handler(outcomes));

@@ -1,5 +1,6 @@
 #include "tools/welcomer/cli/Tool.h"
 
+#include "plugins/PluginContext.h"
 #include "tools/welcomer/cli/AsUser.h"
 #include "tools/welcomer/cli/Definition.h"
 #include "tools/welcomer/cli/HelpCommands.h"
@@ -151,6 +152,7 @@ int runCommand(const Command& command, const Options& options, const PlatformFac
                                       .storesCredentialsLocally = options.storesLocally},
                                      TimeKind::Real);
     const platform::ScopedPlatform installed(owner->platform());
+    setPluginRoot(options.root);
     const DamageReport damageReport(owner->platform().preferenceStore);
     ReportPrinter printer(std::cout, STDOUT_FILENO, options.json);
     Session session{options, buildPlatform, owner->accountDirectory(), owner->signInDirectory(),

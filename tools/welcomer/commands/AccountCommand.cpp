@@ -7,6 +7,7 @@
 #include "propertylist/UTF8.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/story/DelegateResponses.h"
 #include "tools/welcomer/story/ServiceStates.h"
 #include "tools/welcomer/story/SetupFlow.h"
 #include "tools/welcomer/terminal/Password.h"
@@ -25,6 +26,7 @@ struct AddArguments {
     std::string user;
     std::string mailAddress;
     std::vector<std::string> aliases;
+    std::vector<std::string> responses;
     PasswordSource password;
 };
 
@@ -77,8 +79,9 @@ CommandFailure existsAlready(const std::string& user) {
 }
 
 // What the server will answer: a response for every delegate that the system knows, with the aliases on offer
-// for those that have aliases.
-PropertyList::Dictionary responseFor(const std::vector<std::string>& aliases) {
+// for those that have aliases, and what was given in their place or beside them.
+PropertyList::Dictionary responseFor(const std::vector<std::string>& aliases,
+                                     const PropertyList::Dictionary& given) {
     PropertyList::Dictionary delegates;
     for (const char* identifier : {kVidlinkIdentifier, kChatterIdentifier}) {
         delegates[identifier] = PropertyList::Dictionary{
@@ -87,11 +90,15 @@ PropertyList::Dictionary responseFor(const std::vector<std::string>& aliases) {
     for (const std::string& identifier : WLNimbusStoreDelegateIdentifiers()) {
         delegates[identifier] = PropertyList::Dictionary{{platform::kStatusKey, 0}};
     }
+    for (const auto& [identifier, response] : given) {
+        delegates.insert_or_assign(identifier, response);
+    }
     return {{platform::kStatusKey, 0}, {platform::kDelegatesKey, delegates}};
 }
 
 Report add(Session& session, const AddArguments& arguments) {
     refuseUnusable(arguments.user);
+    const PropertyList::Dictionary responses = readDelegateResponses(arguments.responses);
     platform::AccountDirectory& directory = session.accountDirectory;
     // So that nobody is asked for a password in vain; adding decides.
     const auto users = directory.users();
@@ -100,7 +107,8 @@ Report add(Session& session, const AddArguments& arguments) {
     }
     const posix::SecretText password =
         getNewPassword(arguments.password, "New password for " + arguments.user + ":");
-    platform::CloudUser user{arguments.user, password.text(), std::nullopt, responseFor(arguments.aliases)};
+    platform::CloudUser user{arguments.user, password.text(), std::nullopt,
+                             responseFor(arguments.aliases, responses)};
     const posix::WipedAtEnd wiped(user.password);
     if (!arguments.mailAddress.empty()) {
         user.mailAddress = arguments.mailAddress;
@@ -253,6 +261,11 @@ void addAdd(CommandLine& commandLine, CommandLevel group) {
         .option("--alias", arguments->aliases,
                 "An alias that is offered for video calling and messaging; may be given several times")
         .called("A")
+        .repeated();
+    command
+        .option("--response", arguments->responses,
+                "What the server answers a delegate, a property list; may be given several times")
+        .called("ID=PLIST")
         .repeated();
     CommandLine::addPasswordOption(command, arguments->password);
 }

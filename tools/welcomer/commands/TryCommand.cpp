@@ -2,12 +2,15 @@
 
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/login/LoginPicture.h"
+#include "tools/welcomer/story/DelegateResponses.h"
 #include "tools/welcomer/story/ExampleServer.h"
 #include "tools/welcomer/story/Story.h"
 #include "tools/welcomer/story/TemporaryFolder.h"
 
 #include <filesystem>
 #include <memory>
+#include <string>
+#include <vector>
 
 namespace welcomer::tool {
 
@@ -17,16 +20,31 @@ struct TryArguments {
     bool timeLapse = false;
     bool withServer = false;
     std::string picture;
+    std::vector<std::string> plugins;
+    std::vector<std::string> responses;
 };
 
-Report tellInFolder(Session& session, const TryArguments& arguments, InterruptionGuard& guard,
+StoryOptions storyOptions(const TryArguments& arguments) {
+    StoryOptions options{arguments.timeLapse,
+                         arguments.withServer ? findAccountServer() : std::filesystem::path(),
+                         {},
+                         readDelegateResponses(arguments.responses)};
+    for (const std::string& plugin : arguments.plugins) {
+        if (!std::filesystem::exists(plugin)) {
+            throw CommandFailure("there is no file " + plugin);
+        }
+        options.plugins.push_back(std::filesystem::absolute(plugin));
+    }
+    return options;
+}
+
+Report tellInFolder(Session& session, const StoryOptions& story, InterruptionGuard& guard,
                     LoginRecord& firstLogin) {
-    const auto server = arguments.withServer ? findAccountServer() : std::filesystem::path();
     if (session.options.rootGiven) {
-        return tellStory(session, arguments.timeLapse, server, session.options.root, guard, firstLogin);
+        return tellStory(session, story, session.options.root, guard, firstLogin);
     }
     const TemporaryFolder temporary;
-    return tellStory(session, arguments.timeLapse, server, temporary.path(), guard, firstLogin);
+    return tellStory(session, story, temporary.path(), guard, firstLogin);
 }
 
 Report tryStory(Session& session, const TryArguments& arguments) {
@@ -34,11 +52,12 @@ Report tryStory(Session& session, const TryArguments& arguments) {
     if (options.rootGiven && options.root == "/") {
         throw UsageError("--root: the story needs a folder of its own, not the machine's own root");
     }
+    const StoryOptions story = storyOptions(arguments);
     // Before anything is made that an interruption would leave behind.
     InterruptionGuard guard;
     try {
         LoginRecord firstLogin;
-        Report report = tellInFolder(session, arguments, guard, firstLogin);
+        Report report = tellInFolder(session, story, guard, firstLogin);
         if (!arguments.picture.empty()) {
             writePicture(arguments.picture,
                          drawLogin(firstLogin, {"The first login of " + firstLogin.account(),
@@ -72,6 +91,16 @@ void addTryCommand(CommandLine& commandLine) {
     command
         .option("--picture", arguments->picture, "Draw the timeline of the first login in this file, as SVG")
         .called("FILE");
+    command
+        .option("--plugin", arguments->plugins,
+                "A plug-in that takes part beside the examples; may be given several times")
+        .called("FILE")
+        .repeated();
+    command
+        .option("--response", arguments->responses,
+                "What the server answers a delegate, a property list; may be given several times")
+        .called("ID=PLIST")
+        .repeated();
 }
 
 } // namespace welcomer::tool

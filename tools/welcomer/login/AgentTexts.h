@@ -40,6 +40,7 @@ inline constexpr std::string_view kNoResponse = "no cached response for ";
 inline constexpr std::string_view kDelegateRaised = "exception in setup response for plugin ";
 inline constexpr std::string_view kAnsweredWithAliases = " setup+chosen: ";
 inline constexpr std::string_view kAnswered = " setup: ";
+inline constexpr std::string_view kProgress = " progress: ";
 inline constexpr std::string_view kCompleted = "completed";
 inline constexpr std::string_view kSecondsBegin = " (";
 inline constexpr std::string_view kSecondsEnd = " seconds)";

@@ -57,12 +57,20 @@ bool readAnswer(DelegateOutcome& delegate, std::string_view line) {
     return true;
 }
 
+bool readProgress(DelegateOutcome& delegate, std::string_view line) {
+    const auto progress = after(line, delegate.identifier + std::string(kProgress));
+    if (progress) {
+        delegate.progress = *progress;
+    }
+    return progress.has_value();
+}
+
 } // namespace
 
 std::string DelegateOutcome::text() const {
     switch (kind) {
     case Kind::Working:
-        return "working";
+        return progress.empty() ? "working" : "working, " + progress;
     case Kind::NoResponse:
         return "no cached response";
     case Kind::Completed:
@@ -86,6 +94,9 @@ bool DelegateReport::read(std::chrono::nanoseconds time, std::string_view line) 
         return true;
     }
     for (DelegateOutcome& delegate : _delegates) {
+        if (delegate.working() && readProgress(delegate, line)) {
+            return true;
+        }
         // The first outcome counts: a plug-in may still raise after its handler has run.
         if (delegate.working() && (readException(delegate, line) || readAnswer(delegate, line))) {
             delegate.end = time;

@@ -17,14 +17,15 @@ struct DelegateOutcome {
 
     std::string identifier;
     Kind kind = Kind::Working;
-    std::string reason = {};  // of a refusal or an exception
-    std::string seconds = {}; // as the agent printed them; empty where it prints none
+    std::string reason = {};   // of a refusal or an exception
+    std::string progress = {}; // what it last said of it: "40 % copying"; empty where it has said nothing
+    std::string seconds = {};  // as the agent printed them; empty where it prints none
     std::chrono::nanoseconds begin{0};
     std::chrono::nanoseconds end{0}; // of the outcome's line
 
     bool working() const { return kind == Kind::Working; }
 
-    // "completed", "no cached response", or what went wrong; "working" until it is known.
+    // "completed", "no cached response", or what went wrong; until that is known "working", and how far it has come.
     std::string text() const;
 };
 

@@ -73,6 +73,7 @@ Json toJson(const DelegateOutcome& delegate, bool isRunning) {
     return {{"identifier", delegate.identifier},
             {"outcome", kindName(delegate.kind, isRunning)},
             {"reason", delegate.reason.empty() ? Json() : Json(delegate.reason)},
+            {"progress", delegate.progress.empty() ? Json() : Json(delegate.progress)},
             {"seconds", delegate.seconds.empty() ? Json() : Json(std::stod(delegate.seconds))}};
 }
 
@@ -170,7 +171,8 @@ std::string endText(const LoginRecord& record, bool isRunning) {
 
 std::string outcomeText(const DelegateOutcome& delegate, bool isRunning) {
     if (delegate.working()) {
-        return isRunning ? "has not answered yet" : "never answered";
+        const std::string progress = delegate.progress.empty() ? "" : ", at " + delegate.progress;
+        return (isRunning ? "has not answered yet" : "never answered") + progress;
     }
     return (delegate.kind == DelegateOutcome::Kind::Refused ? "refused: " : "") + delegate.text();
 }

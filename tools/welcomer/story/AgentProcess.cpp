@@ -2,6 +2,7 @@
 
 #include "agent/leaveProcess.h"
 #include "agent/wlnimbussetup.h"
+#include "plugins/PluginContext.h"
 #include "tools/welcomer/terminal/Failure.h"
 
 #include <array>
@@ -160,6 +161,7 @@ class RecordReader {
     const auto owner = buildPlatform({.root = root, .systemLog = &log}, time);
     log.setClock(owner->platform().clock);
     const platform::ScopedPlatform installed(owner->platform());
+    setPluginRoot(root);
     leaveProcess(life(log, [&log](const std::string& text) { log.tell(text); }));
 }
 

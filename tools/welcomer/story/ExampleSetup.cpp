@@ -14,7 +14,7 @@
 
 namespace welcomer::tool {
 
-platform::CloudUser exampleUser() {
+platform::CloudUser exampleUser(const PropertyList::Dictionary& responses) {
     // The example plug-ins take as long as the response says, so that one sees them work beside one another.
     const auto response = [](double delaySeconds) {
         return PropertyList::Dictionary{{platform::kStatusKey, 0}, {"delaySeconds", delaySeconds}};
@@ -26,13 +26,15 @@ platform::CloudUser exampleUser() {
     std::random_device random;
     std::ostringstream password;
     password << std::hex << random() << random();
+    PropertyList::Dictionary delegates{
+        {kVidlinkIdentifier, vidlink}, {kChatterIdentifier, chatter}, {kStorefrontIdentifier, response(1.0)}};
+    for (const auto& [identifier, given] : responses) {
+        delegates.insert_or_assign(identifier, given);
+    }
     return {kExampleAccount,
             password.str(),
             kExampleAccount,
-            {{platform::kStatusKey, 0},
-             {platform::kDelegatesKey, PropertyList::Dictionary{{kVidlinkIdentifier, vidlink},
-                                                                {kChatterIdentifier, chatter},
-                                                                {kStorefrontIdentifier, response(1.0)}}}}};
+            {{platform::kStatusKey, 0}, {platform::kDelegatesKey, delegates}}};
 }
 
 ChildLife setupLife(const std::string& password) {

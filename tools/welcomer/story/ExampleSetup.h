@@ -12,7 +12,8 @@ namespace welcomer::tool {
 inline constexpr const char* kExampleAccount = "user@nimbus.example";
 
 // A new user with a password of its own, and with what the server answers.
-platform::CloudUser exampleUser();
+//  responses  of further delegates, or in the place of the examples', by identifier
+platform::CloudUser exampleUser(const PropertyList::Dictionary& responses = {});
 
 // The setup application's whole life, in a process of its own. Tells a document with the chosen "aliases" and
 // the "delegates", or with the "failure" that ended it.

@@ -14,6 +14,7 @@
 #include "tools/welcomer/story/ExampleSetup.h"
 #include "tools/welcomer/story/FolderCopy.h"
 #include "tools/welcomer/story/FolderSnapshot.h"
+#include "tools/welcomer/story/PluginCopy.h"
 #include "tools/welcomer/story/ServiceStates.h"
 #include "tools/welcomer/story/SetupFlow.h"
 #include "tools/welcomer/terminal/ProgressLine.h"
@@ -63,10 +64,10 @@ struct LeftOnDisk {
 
 class Story {
   public:
-    Story(Session& session, bool timeLapse, fs::path server, const fs::path& root, InterruptionGuard& guard)
+    Story(Session& session, const StoryOptions& options, const fs::path& root, InterruptionGuard& guard)
         : _session(session),
-          _timeLapse(timeLapse),
-          _serverProgram(std::move(server)),
+          _options(options),
+          _timeLapse(options.timeLapse),
           _root(root),
           _guard(guard),
           _owner(session.buildPlatform({.root = root.string(), .systemLog = &_log}, TimeKind::Real)),
@@ -143,19 +144,22 @@ class Story {
         for (const fs::path& plugin : examples.plugins) {
             copyTree(plugin, plugins / plugin.filename());
         }
+        for (const fs::path& plugin : _options.plugins) {
+            installPlugin(plugin, plugins);
+        }
         makeFolders(_below(kSetupBundlePath).parent_path());
         copyTree(examples.setupBundle, _below(kSetupBundlePath));
 
-        const platform::CloudUser user = exampleUser();
+        const platform::CloudUser user = exampleUser(_options.responses);
         if (const platform::Outcome outcome = _owner->accountDirectory().storeUser(user); !outcome) {
             throw CommandFailure("cannot add the user: " + outcome.error.message);
         }
         _password = user.password;
-        if (!_serverProgram.empty()) {
+        if (!_options.server.empty()) {
             makeFolders(_below(accountserver::kSocketPath).parent_path());
-            _server.emplace(_serverProgram, _root, _guard);
+            _server.emplace(_options.server, _root, _guard);
         }
-        _sayWhatIsPrepared(examples.plugins.size());
+        _sayWhatIsPrepared(examples.plugins.size() + _options.plugins.size());
     }
 
     std::vector<ServiceState> _services() const {
@@ -273,7 +277,7 @@ class Story {
         _say(std::string("  setup application  ") + kSetupBundlePath);
         _say(std::string("  who can sign in    ") + kExampleAccount);
         if (_server) {
-            _say("  account server     " + _serverProgram.string() + ", asked at " + _server->address());
+            _say("  account server     " + _options.server.string() + ", asked at " + _server->address());
         }
     }
 
@@ -304,8 +308,19 @@ class Story {
         } else if (!login.lingering && login.record.working() > 0) {
             progress.show("  " + std::to_string(login.record.working()) + " of " +
                           std::to_string(login.record.delegates().size()) + " delegates at work, " +
-                          wholeSeconds(now - login.started) + " s");
+                          wholeSeconds(now - login.started) + " s" + _saidProgress(login.record));
         }
+    }
+
+    // What those at work have said of it.
+    static std::string _saidProgress(const LoginRecord& record) {
+        std::string said;
+        for (const DelegateOutcome& delegate : record.delegates()) {
+            if (delegate.working() && !delegate.progress.empty()) {
+                said += "; " + delegate.identifier + ": " + delegate.progress;
+            }
+        }
+        return said;
     }
 
     // What programs get
@@ -357,8 +372,8 @@ class Story {
     }
 
     Session& _session;
+    const StoryOptions& _options;
     const bool _timeLapse;
-    const fs::path _serverProgram; // empty: none
     const fs::path _root;
     InterruptionGuard& _guard;
     KeptLog _log;
@@ -371,9 +386,9 @@ class Story {
 
 } // namespace
 
-Report tellStory(Session& session, bool timeLapse, const fs::path& server, const fs::path& root,
+Report tellStory(Session& session, const StoryOptions& options, const fs::path& root,
                  InterruptionGuard& guard, LoginRecord& firstLogin) {
-    return Story(session, timeLapse, server, root, guard).tell(firstLogin);
+    return Story(session, options, root, guard).tell(firstLogin);
 }
 
 } // namespace welcomer::tool

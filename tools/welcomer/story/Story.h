@@ -2,22 +2,29 @@
 
 #pragma once
 
+#include "propertylist/PropertyList.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/login/LoginRecord.h"
 #include "tools/welcomer/terminal/InterruptionGuard.h"
 
 #include <filesystem>
+#include <vector>
 
 namespace welcomer::tool {
 
+struct StoryOptions {
+    bool timeLapse = false;       // the agent runs on simulated time
+    std::filesystem::path server; // the account server's program; empty: the machine's directory
+    std::vector<std::filesystem::path> plugins; // beside the examples
+    PropertyList::Dictionary responses; // that the server gives, by delegate; beside those of the examples
+};
+
 // Tells people the story while it goes on.
-//  timeLapse   the agent runs on simulated time
-//  server      the program of an account server that the user signs in with; empty: the machine's own directory
 //  root        the folder of the machine
 //  firstLogin  receives what happened at the first login
 //  result      the document, with a failure where a login did not do its part
 // Throws CommandFailure where it cannot go on, and Interrupted. Main thread, no other thread running.
-Report tellStory(Session& session, bool timeLapse, const std::filesystem::path& server,
-                 const std::filesystem::path& root, InterruptionGuard& guard, LoginRecord& firstLogin);
+Report tellStory(Session& session, const StoryOptions& options, const std::filesystem::path& root,
+                 InterruptionGuard& guard, LoginRecord& firstLogin);
 
 } // namespace welcomer::tool

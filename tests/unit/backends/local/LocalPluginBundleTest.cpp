@@ -104,6 +104,35 @@ TEST_F(LocalPluginBundleTest, AnInfoFileThatIsAPipeDoesNotBlock) {
     EXPECT_EQ(load("/folder.ncdplugin").address, nullptr);
 }
 
+TEST_F(LocalPluginBundleTest, ALibraryThatIsAPipeDoesNotBlock) {
+    ASSERT_EQ(::mkfifo(root.locate("/pipe.ncdplugin").c_str(), 0600), 0);
+
+    EXPECT_EQ(load("/pipe.ncdplugin").reason, root.locate("/pipe.ncdplugin") + " is no regular file");
+}
+
+TEST_F(LocalPluginBundleTest, ALibraryIsNotMappedUntilAllOfItIsThere) {
+    addLibrary("/half.ncdplugin");
+    const std::filesystem::path half = root.locate("/half.ncdplugin");
+    const auto size = std::filesystem::file_size(half);
+    for (const auto length : {size - 1, size / 2, std::uintmax_t{70}}) {
+        std::filesystem::resize_file(half, length);
+        EXPECT_TRUE(load("/half.ncdplugin")
+                        .reason.starts_with(half.string() + " is not whole: it has " +
+                                            std::to_string(length) + " of "))
+            << load("/half.ncdplugin").reason;
+    }
+    // So short that it is no library at all, which is the loader's to tell.
+    std::filesystem::resize_file(half, 10);
+    EXPECT_NE(load("/half.ncdplugin").reason, "");
+}
+
+TEST_F(LocalPluginBundleTest, WhatOthersMayWriteIsRefused) {
+    addLibrary("/library.ncdplugin");
+    ASSERT_EQ(::chmod(root.locate("/library.ncdplugin").c_str(), 0646), 0);
+
+    EXPECT_EQ(load("/library.ncdplugin").reason, "everybody may write " + root.locate("/library.ncdplugin"));
+}
+
 TEST_F(LocalPluginBundleTest, ALibraryStaysLoadedAndKeepsItsSymbolsToItself) {
     addLibrary("/library.ncdplugin");
 

@@ -24,6 +24,14 @@ TEST(DelegateReport, ADelegateIsAtWorkUntilItsOutcomeIsLogged) {
     EXPECT_EQ(report({"Vidlink: 2 aliases", "setting up a.b"}), Rows{"a.b|working|"});
 }
 
+TEST(DelegateReport, ProgressIsToldUntilThereIsAnOutcome) {
+    EXPECT_EQ(report({"setting up a.b", "a.b progress: 0 %", "a.b progress: 40 % copying: 1 of 3"}),
+              Rows{"a.b|working, 40 % copying: 1 of 3|"});
+    EXPECT_EQ(report({"setting up a.b", "setting up c.d", "a.b progress: 40 %",
+                      "a.b setup: completed (1.250 seconds)", "a.b progress: 41 %"}),
+              (Rows{"a.b|completed|1.250", "c.d|working|"}));
+}
+
 TEST(DelegateReport, BothFormsOfCompletionAreRead) {
     EXPECT_EQ(report({"setting up a.b", "setting up c.d", "c.d setup: completed (1.250 seconds)",
                       "a.b setup+chosen: completed (0.003 seconds)"}),
