@@ -24,7 +24,9 @@ namespace welcomer {
 namespace {
 
 constexpr char kLogPath[] = "/dev/log";
-constexpr timeval kLongestWait{5, 0}; // for a system log that does not read
+// For a system log that does not read: room in the own buffer and in the daemon's are waited for one after the
+// other, a second in all.
+constexpr timeval kLongestWait{0, 500'000};
 
 struct FatalSignal {
     int number;

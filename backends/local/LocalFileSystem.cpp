@@ -4,12 +4,12 @@
 #include "backends/posix/FileContent.h"
 #include "backends/posix/FileDescriptor.h"
 #include "backends/posix/SystemError.h"
+#include "backends/posix/UnfinishedCopy.h"
 #include "propertylist/UTF8.h"
 
 #include <array>
 #include <cerrno>
 #include <fcntl.h>
-#include <random>
 #include <sys/stat.h>
 #include <unistd.h>
 #include <utility>
@@ -21,7 +21,6 @@ namespace {
 constexpr std::size_t kCopyBufferSize = 65536;
 constexpr mode_t kCopiedPermissions = 0777;
 constexpr mode_t kNewFileMode = 0644;
-constexpr mode_t kPrivateMode = 0600;
 
 int copyContent(int source, int destination) {
     std::array<char, kCopyBufferSize> buffer;
@@ -58,19 +57,6 @@ int openSource(const posix::RootFolder& root, const std::string& path, posix::Fi
     return 0;
 }
 
-// Makes a file under a name that is free. None when that failed; errno then says why.
-posix::FileDescriptor makeTemporary(int folder, std::string& name) {
-    std::random_device random;
-    while (true) {
-        name = ".copy-" + std::to_string(random());
-        posix::FileDescriptor file(
-            ::openat(folder, name.c_str(), O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kPrivateMode));
-        if (file || errno != EEXIST) {
-            return file;
-        }
-    }
-}
-
 // Fills the new file and gives it its name, which must be free. 0, or the system's error number.
 int finishCopy(int source, mode_t mode, int file, int folder, const std::string& temporary,
                const std::string& name) {
@@ -98,8 +84,9 @@ int copyFile(const posix::RootFolder& root, const std::string& from, const std::
     if (folderError != 0) {
         return folderError;
     }
+    posix::removeAbandonedCopies(folder.get());
     std::string temporary;
-    const posix::FileDescriptor file = makeTemporary(folder.get(), temporary);
+    const posix::FileDescriptor file = posix::makeCopy(folder.get(), temporary);
     if (!file) {
         return errno;
     }
@@ -108,23 +95,30 @@ int copyFile(const posix::RootFolder& root, const std::string& from, const std::
     return error;
 }
 
-// Opens a file to be written from its start, making it where it is missing. 0, or the system's error number.
-int openToWrite(const posix::RootFolder& root, const std::string& path, posix::FileDescriptor& file) {
-    file = root.open(path, O_WRONLY | O_CREAT | O_EXCL, kNewFileMode);
-    if (file) {
-        return ::fchmod(file.get(), kNewFileMode) == 0 ? 0 : errno;
+// Writes a file that is not there yet; what could not be written whole is not left behind. 0, or the system's error
+// number.
+int writeNewFile(const posix::RootFolder& root, const std::string& path, std::string_view content) {
+    const posix::FileDescriptor file = root.open(path, O_WRONLY | O_CREAT | O_EXCL, kNewFileMode);
+    if (!file) {
+        return errno;
     }
-    if (errno == EEXIST) {
-        // A pipe must not block; a dangling link is not followed to make a file elsewhere.
-        file = root.open(path, O_WRONLY | O_TRUNC | O_NONBLOCK);
+    const int error = ::fchmod(file.get(), kNewFileMode) == 0 ? posix::writeAll(file.get(), content) : errno;
+    if (error != 0) {
+        if (const posix::FolderEntry entry = root.entry(path)) {
+            ::unlinkat(entry.folder(), entry.name(), 0);
+        }
     }
-    return file ? 0 : errno;
+    return error;
 }
 
 int writeFile(const posix::RootFolder& root, const std::string& path, std::string_view content) {
-    posix::FileDescriptor file;
-    const int error = openToWrite(root, path, file);
-    return error == 0 ? posix::writeAll(file.get(), content) : error;
+    const int error = writeNewFile(root, path, content);
+    if (error != EEXIST) {
+        return error;
+    }
+    // A pipe must not block; a dangling link is not followed to make a file elsewhere.
+    const posix::FileDescriptor file = root.open(path, O_WRONLY | O_TRUNC | O_NONBLOCK);
+    return file ? posix::writeAll(file.get(), content) : errno;
 }
 
 int removeAll(const posix::FolderEntry& entry) {

@@ -54,7 +54,8 @@ class LocalPlatform final : public PlatformOwner {
                                      }};
     LocalFileSystem _fileSystem{_root, _pluginFolder};
     LocalProcessIdentity _processIdentity{_root};
-    LocalCredentialStore _credentialStore{_root, _processIdentity};
+    // It complains to the machine's log, also where a program keeps its own lines for itself.
+    LocalCredentialStore _credentialStore{_root, _processIdentity, &_systemLog};
     LocalPluginBundle _pluginBundle{_root, _pluginFolder};
     LocalResourceBundles _resourceBundles;
     LocalClock _clock;

@@ -1,8 +1,8 @@
 #include "backends/local/LocalSystemLog.h"
 
+#include <algorithm>
 #include <exception>
 #include <string_view>
-#include <syslog.h>
 
 namespace welcomer::local {
 
@@ -45,17 +45,18 @@ void cut(std::string& text) {
 
 void LocalSystemLog::write(int priority, const std::string& message) {
     if (message.size() <= kMaximumLogMessage && message.find('\0') == std::string::npos) {
-        ::syslog(priority, "%s", message.c_str());
+        _connection.send(priority, message);
         return;
     }
     try {
         // No byte becomes less than one.
         std::string text = withVisibleNulls(std::string_view(message).substr(0, kMaximumLogMessage + 1));
         cut(text);
-        ::syslog(priority, "%s", text.c_str());
+        _connection.send(priority, text);
     } catch (const std::exception&) {
         // No memory for another copy: the text up to the first NUL has to do.
-        ::syslog(priority, "%.*s", static_cast<int>(kMaximumLogMessage), message.c_str());
+        const std::string_view text(message);
+        _connection.send(priority, text.substr(0, std::min(text.find('\0'), kMaximumLogMessage)));
     }
 }
 

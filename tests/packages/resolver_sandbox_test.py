@@ -66,13 +66,14 @@ class Sandbox(unittest.TestCase):
         self.assertIn("Overall exposure level", rated.stdout)
         self.assertEqual(rated.returncode, 0, rated.stdout.splitlines()[-1])
 
-    def test_3_it_runs_as_its_own_user_with_one_right_and_works(self):
+    def test_3_it_runs_as_its_own_user_with_two_rights_and_works(self):
         self.machine.must(["systemctl", "start", UNIT])
         process = self.machine.must(["systemctl", "show", UNIT, "--property=MainPID", "--value"]).strip()
         user = str(self.machine.user_id(USER))
         status = self.status_of(process)
         self.assertEqual(status["Uid"].split(), [user] * 4)
-        self.assertEqual((status["CapEff"], status["CapBnd"]), (f"{1 << 12:016x}",) * 2)  # CAP_NET_ADMIN
+        rights = 1 << 12 | 1 << 10  # CAP_NET_ADMIN, CAP_NET_BIND_SERVICE
+        self.assertEqual((status["CapEff"], status["CapBnd"]), (f"{rights:016x}",) * 2)
         self.assertEqual((status["NoNewPrivs"], status["Seccomp"]), ("1", "2"))
         self.select("Nimbus1")
         for domain in resolver.DOMAINS:

@@ -1,5 +1,6 @@
 #include "tools/launch-agents/LaunchAgentFolder.h"
 
+#include "backends/posix/UnfinishedCopy.h"
 #include "log/PCLogManager.h"
 #include "platform/FileSystem.h"
 
@@ -129,8 +130,12 @@ std::vector<LaunchAgent> readLaunchAgents(const std::string& path, uid_t owner) 
         logRefusal(path, reason);
         return {};
     }
+    posix::removeAbandonedCopies(descriptor);
     std::vector<LaunchAgent> agents;
     for (const std::string& name : sortedNames(folder.get())) {
+        if (posix::isNameOfCopy(name)) {
+            continue; // it gets its own name once it is whole
+        }
         LaunchAgentResult read = readFile(descriptor, name, owner);
         if (read.agent && std::ranges::find(agents, read.agent->label, &LaunchAgent::label) != agents.end()) {
             read = {std::nullopt, "an earlier file has the same label"};

@@ -1,14 +1,20 @@
 #include "tools/resolver-sync/Forwarder.h"
 
+#include "backends/posix/FileContent.h"
+#include "backends/posix/FileDescriptor.h"
 #include "platform/Platform.h"
 #include "tools/shared/ForwarderProgram.h"
 
+#include <algorithm>
 #include <arpa/inet.h>
+#include <array>
 #include <cerrno>
 #include <chrono>
 #include <csignal>
 #include <poll.h>
+#include <random>
 #include <spawn.h>
+#include <sys/mman.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -27,18 +33,54 @@ platform::Outcome failure(int number, const std::string& what) {
     return platform::Outcome::failure({number, what + ": " + std::generic_category().message(number)});
 }
 
-// A query that it refuses itself, since it is about none of the domains.
-constexpr std::string_view kQuery("\x77\x01\0\0\0\1\0\0\0\0\0\0\7invalid\0\0\1\0\1", 25);
+// The name that it answers for itself, with its secret.
+constexpr const char* kOwnName = "forwarder.welcomer.invalid";
+// The question for its text: one label after the other, the end of the name, the type TXT and the class IN.
+constexpr std::string_view kQuestion("\11forwarder\10welcomer\7invalid\0\0\20\0\1", 32);
+constexpr std::string_view kHead("\1\0\0\1\0\0\0\0\0\0", 10); // recursion is wished; one question
 
-// Asks once; whether anything answers within the time.
-bool answers(int socket, std::chrono::milliseconds time) {
-    if (::send(socket, kQuery.data(), kQuery.size(), 0) < 0) {
+std::string randomText(std::size_t bytes) {
+    static constexpr std::string_view kDigits = "0123456789abcdef";
+    std::random_device random;
+    std::string text;
+    for (std::size_t count = 0; count < 2 * bytes; ++count) {
+        text += kDigits[random() % kDigits.size()];
+    }
+    return text;
+}
+
+// Asks once; whether the secret is what comes back within the time. Another one may answer too.
+bool answers(int socket, const std::string& secret, std::chrono::milliseconds time) {
+    const std::string number = randomText(1);
+    const std::string query = number + std::string(kHead) + std::string(kQuestion);
+    if (::send(socket, query.data(), query.size(), 0) < 0) {
         return false;
     }
-    pollfd waiting{socket, POLLIN, 0};
-    char answer[512];
-    return ::poll(&waiting, 1, static_cast<int>(time.count())) == 1 &&
-           ::recv(socket, answer, sizeof answer, 0) > 0;
+    const auto end = std::chrono::steady_clock::now() + time;
+    while (true) {
+        const auto left =
+            std::chrono::ceil<std::chrono::milliseconds>(end - std::chrono::steady_clock::now());
+        pollfd waiting{socket, POLLIN, 0};
+        std::array<char, 512> bytes{};
+        if (left.count() <= 0 || ::poll(&waiting, 1, static_cast<int>(left.count())) != 1) {
+            return false;
+        }
+        const ssize_t size = ::recv(socket, bytes.data(), bytes.size(), 0);
+        const std::string_view answer(bytes.data(), static_cast<std::size_t>(std::max(size, ssize_t{0})));
+        if (size < 0 || (answer.starts_with(number) && answer.find(secret) != std::string_view::npos)) {
+            return size >= 0;
+        }
+    }
+}
+
+// A file that a child reads as its input, with this content; none when that failed, and errno says why. The other users
+// could read a child's arguments.
+posix::FileDescriptor inputWith(const std::string& content) {
+    posix::FileDescriptor file(::memfd_create("configuration", MFD_CLOEXEC));
+    if (file && (posix::writeAll(file.get(), content) != 0 || ::lseek(file.get(), 0, SEEK_SET) != 0)) {
+        return posix::FileDescriptor();
+    }
+    return file;
 }
 
 } // namespace
@@ -74,9 +116,15 @@ platform::Outcome Forwarder::_writeServers(const Overrides& overrides) const {
 }
 
 platform::Outcome Forwarder::_start() {
+    _secret = randomText(16);
+    const posix::FileDescriptor input =
+        inputWith(std::string("txt-record=").append(kOwnName).append(",").append(_secret).append("\n"));
+    if (!input) {
+        return failure(errno, std::string("failed to start ") + kForwarderProgram);
+    }
     std::vector<std::string> arguments{kForwarderProgram,
                                        "--keep-in-foreground",
-                                       "--conf-file=/dev/null",
+                                       "--conf-file=-",
                                        "--pid-file=",
                                        "--log-facility=-",
                                        "--no-resolv",
@@ -99,8 +147,12 @@ platform::Outcome Forwarder::_start() {
     ::sigemptyset(&none);
     ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGMASK);
     ::posix_spawnattr_setsigmask(&attributes, &none);
+    posix_spawn_file_actions_t actions{};
+    ::posix_spawn_file_actions_init(&actions);
+    ::posix_spawn_file_actions_adddup2(&actions, input.get(), STDIN_FILENO);
     const int number =
-        ::posix_spawn(&_process, kForwarderProgram, nullptr, &attributes, pointers.data(), environ);
+        ::posix_spawn(&_process, kForwarderProgram, &actions, &attributes, pointers.data(), environ);
+    ::posix_spawn_file_actions_destroy(&actions);
     ::posix_spawnattr_destroy(&attributes);
     if (number != 0) {
         _process = 0;
@@ -130,7 +182,7 @@ platform::Outcome Forwarder::waitUntilReady() {
     bool ready = false;
     if (socket >= 0 && ::connect(socket, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0) {
         const auto end = std::chrono::steady_clock::now() + 5s;
-        while (!(ready = answers(socket, 200ms)) && std::chrono::steady_clock::now() < end) {
+        while (!(ready = answers(socket, _secret, 200ms)) && std::chrono::steady_clock::now() < end) {
             // Where nobody listens yet, the query comes back at once.
             std::this_thread::sleep_for(1ms);
             siginfo_t ended{};

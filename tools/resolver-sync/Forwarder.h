@@ -17,8 +17,10 @@ std::string serverLines(const Overrides& overrides);
 // A dnsmasq of our own, which asks nobody about anything else and keeps nothing.
 class Forwarder {
   public:
+    // No other user can listen there: the port is one for the superuser, and for whom the machine's owner trusts. Those
+    // from 512 on are what other services take any of.
     static constexpr const char* kAddress = "127.0.77.1";
-    static constexpr std::uint16_t kPort = 5377;
+    static constexpr std::uint16_t kPort = 335;
 
     //  folder  where its one file lies; made when it is needed and removed at the end
     explicit Forwarder(std::string folder);
@@ -29,7 +31,7 @@ class Forwarder {
     // Starts it, or tells the running one what has changed. Does not wait for its start.
     platform::Outcome serve(const Overrides& overrides);
 
-    // Waits until it answers, for some seconds at most.
+    // Waits until it answers, for some seconds at most. What somebody else answers in its place does not count.
     platform::Outcome waitUntilReady();
 
     // Ends it and removes its folder.
@@ -47,6 +49,7 @@ class Forwarder {
 
     std::string _folder;
     std::string _serversFile;
+    std::string _secret; // what it alone answers
     pid_t _process = 0;
 };
 

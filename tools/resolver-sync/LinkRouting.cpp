@@ -26,7 +26,14 @@ platform::Outcome LinkRouting::apply(const Overrides& overrides) {
     };
     // While the forwarder starts.
     then([] { return OwnLink::make(); });
-    then([&] { return _forwarder.waitUntilReady(); });
+    then([&] {
+        platform::Outcome ready = _forwarder.waitUntilReady();
+        if (!ready) {
+            // Somebody else may listen there, who is to get no queries.
+            static_cast<void>(OwnLink::remove());
+        }
+        return ready;
+    });
     std::vector<std::string> domains;
     for (const auto& [domain, nameservers] : overrides) {
         domains.push_back(domain);

@@ -38,6 +38,21 @@ bool isDomainCharacter(char character) {
            character == '-' || character == '_' || character == '.';
 }
 
+// Whether each part between the dots is as long as the name system allows: the forwarder ends over a longer one.
+bool hasGoodLabels(std::string_view domain) {
+    constexpr std::size_t kLongestLabel = 63;
+    while (true) {
+        const std::size_t end = std::min(domain.find('.'), domain.size());
+        if (end == 0 || end > kLongestLabel) {
+            return false;
+        }
+        if (end == domain.size()) {
+            return true;
+        }
+        domain.remove_prefix(end + 1);
+    }
+}
+
 // A domain in the form that is compared, or none when it is no domain: it goes into other programs' files.
 std::optional<std::string> normalDomain(std::string_view text) {
     std::string domain(text);
@@ -48,9 +63,7 @@ std::optional<std::string> normalDomain(std::string_view text) {
         domain.pop_back();
     }
     const bool plain = std::ranges::all_of(domain, isDomainCharacter) && domain.size() <= 253;
-    const bool dotted =
-        domain.starts_with('.') || domain.ends_with('.') || domain.find("..") != std::string::npos;
-    return plain && !dotted && !domain.empty() ? std::optional(std::move(domain)) : std::nullopt;
+    return plain && hasGoodLabels(domain) ? std::optional(std::move(domain)) : std::nullopt;
 }
 
 OverrideFile refused(std::string reason) {

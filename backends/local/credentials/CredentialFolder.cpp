@@ -28,6 +28,7 @@ constexpr char kVersionKey[] = "Version";
 constexpr int kVersion = 1;
 constexpr mode_t kFileMode = 0600;
 constexpr mode_t kWritableByOthers = 022;
+constexpr mode_t kOfOthers = 077;
 
 bool isOwn(const struct stat& status) {
     return status.st_uid == ::geteuid() && (status.st_mode & kWritableByOthers) == 0;
@@ -37,6 +38,15 @@ bool isSymbolicLink(const posix::FolderEntry& entry) {
     struct stat status = {};
     return entry && ::fstatat(entry.folder(), entry.name(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
            S_ISLNK(status.st_mode);
+}
+
+// Takes from others what they may do with an open file. What there was, in one line.
+std::string makePrivate(int file, mode_t mode, const std::string& path) {
+    const bool isDone = ::fchmod(file, kFileMode) == 0;
+    const bool isForAll = (mode & kOfOthers & S_IRWXO) != 0;
+    return "The credentials in " + path + " could be read by " +
+           (isForAll ? "everybody" : "the file's group") +
+           (isDone ? "; they are the user's alone now" : ", and still can be");
 }
 
 bool takeItems(std::string_view bytes, PropertyList::Array& items) {
@@ -94,7 +104,7 @@ Outcome CredentialFolder::lock(const posix::RootFolder& root, const std::string&
     return {};
 }
 
-Outcome CredentialFolder::load(PropertyList::Array& items) {
+Outcome CredentialFolder::load(PropertyList::Array& items, std::string* complaint) {
     items.clear();
     _changed = 0;
     // A pipe must not block.
@@ -113,6 +123,9 @@ Outcome CredentialFolder::load(PropertyList::Array& items) {
     }
     if (!S_ISREG(status.st_mode) || !isOwn(status)) {
         return _failure(platform::kCredentialStoreUnsafe, kFileName);
+    }
+    if (complaint && (status.st_mode & kOfOthers) != 0) {
+        *complaint = makePrivate(file.get(), status.st_mode, platform::joinPath(_path, kFileName));
     }
     _changed = status.st_mtim.tv_sec;
     std::string bytes;

@@ -28,9 +28,11 @@ class CredentialFolder {
 
     // Reads the items. Each is a dictionary that itemMatches() and the rest of CredentialItemFormat.h
     // understand.
-    //  result  success with no items when there is no file; kCredentialStoreDamaged, kCredentialStoreUnsafe,
-    //          kCredentialReadFailed
-    platform::CredentialOutcome load(PropertyList::Array& items);
+    //  complaint  receives a line where others could read the file, which is the user's alone from then on; null:
+    //             it stays as it is
+    //  result     success with no items when there is no file; kCredentialStoreDamaged, kCredentialStoreUnsafe,
+    //             kCredentialReadFailed
+    platform::CredentialOutcome load(PropertyList::Array& items, std::string* complaint = nullptr);
 
     // When the loaded file was last changed, in seconds since 1970; 0 when there was none.
     std::int64_t changed() const { return _changed; }

@@ -125,8 +125,12 @@ platform::CredentialFinding LocalCredentialStore::findItem(const std::string& se
     CredentialFolder folder;
     PropertyList::Array items;
     result.status = folder.open(_root, _folderPath()).status;
+    std::string complaint;
     if (result) {
-        result.status = folder.load(items).status;
+        result.status = folder.load(items, &complaint).status;
+    }
+    if (_log && !complaint.empty()) {
+        _log->write(platform::kErrorPriority, complaint);
     }
     const auto found = findIn(items, service, account);
     if (result && found == items.end()) {

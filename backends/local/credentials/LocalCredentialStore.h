@@ -6,6 +6,7 @@
 #include "backends/posix/RootFolder.h"
 #include "platform/CredentialStore.h"
 #include "platform/ProcessIdentity.h"
+#include "platform/SystemLog.h"
 
 namespace welcomer::local {
 
@@ -14,16 +15,20 @@ namespace welcomer::local {
 // kept and shown, but NOT enforced. Every program of the user can read every item.
 //
 // The folder and the file are used only when they are the user's own, no symbolic links, and writable by
-// nobody else. Writers take the folder's lock (FileLock.h) and replace the file in one step; readers take no
+// nobody else. A file that others may read is made the user's alone when an item is looked up, with one line in the
+// log. Writers take the folder's lock (FileLock.h) and replace the file in one step; readers take no
 // lock. A file that cannot be read as what it should be is never written again, until somebody removes it.
 // Deleting the last item removes the file. All items have one time, the file's. Looking up an item in a store
 // that does not exist makes one system call where the root is "/".
 class LocalCredentialStore final : public platform::CredentialStore {
   public:
-    // Borrows the identity, which must outlive the store.
-    LocalCredentialStore(posix::RootFolder root, platform::ProcessIdentity& identity)
+    // Borrows the identity and the log, which must outlive the store.
+    //  log  where a file that others could read is complained about; null: nowhere
+    LocalCredentialStore(posix::RootFolder root, platform::ProcessIdentity& identity,
+                         platform::SystemLog* log = nullptr)
         : _root(std::move(root)),
-          _identity(identity) {}
+          _identity(identity),
+          _log(log) {}
 
     platform::CredentialOutcome createItem(const platform::CredentialItem& item,
                                            const std::string& data) override;
@@ -42,6 +47,7 @@ class LocalCredentialStore final : public platform::CredentialStore {
 
     const posix::RootFolder _root;
     platform::ProcessIdentity& _identity;
+    platform::SystemLog* const _log;
 };
 
 } // namespace welcomer::local

@@ -6,6 +6,7 @@ usage: resolver_sync_test.py BUILD_DIR RESOLVED_DIR
 
 import json
 import os
+import random
 import shutil
 import signal
 import subprocess
@@ -18,13 +19,33 @@ sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "support"))
 import resolver  # noqa: E402
 
 PROGRAM = "/usr/local/libexec/welcomer-resolver-sync"
+STRANGER = 31998  # another user of the machine
+
+# Answers every query with an address of its own, and with every text that it could be asked for.
+HIJACKING = """
+import socket, sys
+address, reuse = sys.argv[1:]
+host, _, port = address.partition(":")
+listening = socket.socket(socket.AF_INET, socket.SOCK_DGRAM)
+listening.setsockopt(socket.SOL_SOCKET, socket.SO_REUSEADDR, reuse == "reuse")
+try:
+    listening.bind((host, int(port or 53)))
+except OSError as error:
+    sys.exit(print(error.strerror, flush=True))
+print("listens", flush=True)
+while True:
+    query, sender = listening.recvfrom(4096)
+    answer = bytes.fromhex("c00c000100010000000a0004cb007142")
+    question = query[12:query.index(0, 12) + 5]
+    listening.sendto(query[:2] + bytes.fromhex("81800001000100000000") + question + answer, sender)
+"""
 
 
 def links():
     return set(os.listdir("/proc/sys/net/ipv4/conf")) - {"all", "default", "lo", resolver.LINK}
 
 
-class ResolverSync(unittest.TestCase):
+class OnAMachine(unittest.TestCase):
     build = resolved = None
 
     def setUp(self):
@@ -74,11 +95,19 @@ class ResolverSync(unittest.TestCase):
         found = []
         for process in Path("/proc").glob("[0-9]*"):
             try:
-                if b"--port=5377" in (process / "cmdline").read_bytes():
+                if b"--listen-address=127.0.77.1" in (process / "cmdline").read_bytes():
                     found.append(int(process.name))
             except OSError:
                 pass
         return found
+
+    def start_as_another_user(self, program, *arguments):
+        process = self.machine.start(["/usr/bin/python3", "-c", program, *arguments], user=STRANGER,
+                                     stdout=subprocess.PIPE, stderr=subprocess.DEVNULL, text=True)
+        self.addCleanup(process.wait)
+        self.addCleanup(process.stdout.close)
+        self.addCleanup(process.kill)
+        return process
 
     def diagnosis(self):
         result = self.machine.run(["/usr/local/bin/welcomer", "--json", "doctor"], user=True)
@@ -89,6 +118,8 @@ class ResolverSync(unittest.TestCase):
     def records(self):
         return [record[2] for record in self.machine.log_records("welcomer-resolver-sync")]
 
+
+class ResolverSync(OnAMachine):
     def test_a_cloud_name_leads_to_the_chosen_environment_and_after_prod_no_longer(self):
         self.start_service()
         self.select("Nimbus1")
@@ -249,8 +280,88 @@ class ResolverSync(unittest.TestCase):
         self.assertEqual([record for record in self.records() if "broken" in record],
                          ['Refusing resolver override /etc/resolver/broken.example: "nowhere" is no address'])
 
+    def test_one_file_that_no_name_system_takes_costs_only_itself(self):
+        self.start_service()
+        self.write("online.example", "nameserver 192.0.2.1\n")
+        self.wait_for_answer("a.online.example", resolver.ANSWERS["Nimbus1"])
+        long, nul = "x" * 64 + ".example", "nul.example"
+        self.write("long", f"domain {long}\nnameserver 192.0.2.1\n")
+        self.write("nul", f"domain {nul}\nnameserver 192.0.2.1\0.example\n")
+        self.write("more", "domain nimbus.example\nnameserver 192.0.2.2\n")
+        self.wait_for_answer("a.nimbus.example", resolver.ANSWERS["Nimbus2"])
+        self.assertEqual(resolver.ask("b.online.example"), resolver.ANSWERS["Nimbus1"])
+        self.machine.wait_for(lambda: len(self.records()) >= 2, "the records")
+        self.assertEqual(self.records(), [f'Refusing resolver override /etc/resolver/long: "{long}" is no domain',
+                                          r'Refusing resolver override /etc/resolver/nul: "192.0.2.1\0.example" is no '
+                                          "address"])
+
+    def test_a_lock_of_another_user_keeps_no_service_from_starting(self):
+        self.start_service()
+        self.select("Nimbus1")
+        self.wait_for_answer("probe.nimbus.example", resolver.ANSWERS["Nimbus1"])
+        locking = ("import fcntl, time; file = open('/run/welcomer-resolver-sync/state'); "
+                   "fcntl.flock(file, fcntl.LOCK_EX); print('flock', flush=True); "
+                   "fcntl.lockf(file, fcntl.LOCK_SH | fcntl.LOCK_NB); print('lockf', flush=True); time.sleep(1000)")
+        other = self.start_as_another_user(locking)
+        self.assertEqual(other.stdout.readline(), "flock\n")
+        self.service.kill()
+        self.service.wait(timeout=60)
+        # The whole file can be locked for reading once its holder is gone.
+        again = self.start_as_another_user(locking.replace("fcntl.flock(file, fcntl.LOCK_EX)", "pass"))
+        self.assertEqual([again.stdout.readline() for _ in range(2)], ["flock\n", "lockf\n"])
+        for process in self.forwarders():
+            os.kill(process, signal.SIGKILL)
+        self.machine.wait_for(lambda: not self.forwarders(), "the end of the forwarder")
+        self.start_service()
+        self.select("Nimbus2")
+        self.wait_for_answer("probe.nimbus.example", resolver.ANSWERS["Nimbus2"])
+
+
+class Hijacker(OnAMachine):
+    """Another user of the machine listens where the resolver asks, and answers what they like."""
+
+    def setUp(self):
+        super().setUp()
+        self.start_service()
+        self.select("Nimbus1")
+        self.wait_for_answer("probe.nimbus.example", resolver.ANSWERS["Nimbus1"])
+        self.address = self.machine.resolvectl("dns", "welcomer0").split()[-1]
+
+    def hijack(self, reuse):
+        """Whether the other user may listen, too, or why not; if so, they answer from then on."""
+        process = self.start_as_another_user(HIJACKING, self.address, reuse)
+        return process.stdout.readline().strip()
+
+    def assert_answers_are_right(self, count):
+        for number in range(count):
+            name = f"{random.randrange(1 << 40)}.{number}.nimbus.example"
+            self.assertEqual(resolver.ask(name), resolver.ANSWERS["Nimbus1"])
+
+    def test_nobody_else_can_listen_beside_the_running_service(self):
+        self.assertEqual(self.hijack("reuse"), "Permission denied")
+        self.assert_answers_are_right(20)
+
+    def test_nobody_else_can_listen_in_the_place_of_the_service(self):
+        self.end_service()
+        for reuse in ("reuse", "alone"):
+            self.assertEqual(self.hijack(reuse), "Permission denied")
+        self.start_service()
+        self.wait_for_answer("again.nimbus.example", resolver.ANSWERS["Nimbus1"])
+        self.assert_answers_are_right(20)
+
+    def test_where_everybody_may_listen_the_resolver_is_not_led_to_somebody_else(self):
+        self.end_service()
+        Path("/proc/sys/net/ipv4/ip_unprivileged_port_start").write_text("0", encoding="ascii")
+        self.addCleanup(Path("/proc/sys/net/ipv4/ip_unprivileged_port_start").write_text, "1024", encoding="ascii")
+        self.assertEqual(self.hijack("alone"), "listens")
+        self.start_service()
+        failure = "Failed to route the resolver's overrides: /usr/sbin/dnsmasq does not answer"
+        self.machine.wait_for(lambda: failure in self.records(), "the failure")
+        self.assertIsNone(resolver.ask("hijacked.nimbus.example"))
+        self.assertEqual(links(), set())
+
 
 if __name__ == "__main__":
     resolver.enter_namespaces()
-    ResolverSync.build, ResolverSync.resolved = sys.argv[1:]
-    unittest.main(argv=sys.argv[:1], verbosity=2)
+    OnAMachine.build, OnAMachine.resolved = sys.argv[1:3]
+    unittest.main(argv=[sys.argv[0], *sys.argv[3:]], verbosity=2)

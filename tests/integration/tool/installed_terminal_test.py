@@ -7,6 +7,7 @@ Run like tool_test.py beside it.
 import os
 import re
 import shlex
+import signal
 import termios
 import time
 import unittest
@@ -82,6 +83,25 @@ class Terminal(setup_test.AtTerminal, setup_test.SetupTest):
             self.assertLess(time.monotonic(), deadline)
             time.sleep(0.01)
         self.end()
+
+    def test_a_signal_that_ends_it_at_a_question_leaves_the_terminal_as_it_was(self):
+        for question in ("account's name: ", "Password for anna: "):
+            for number in (signal.SIGALRM, signal.SIGSEGV, signal.SIGABRT, signal.SIGUSR1, signal.SIGRTMIN):
+                with self.subTest(signal=number, question=question):
+                    tool = shlex.join([str(tool_test.PROGRAM), "--root", str(self.root), "setup"])
+                    self.start_program("/bin/sh", "-m", "-c", f"echo begins; read line; {tool}; echo ended; read line")
+                    self.expect("begins")
+                    before = termios.tcgetattr(self.terminal)
+                    os.write(self.terminal, b"\n")
+                    if question.startswith("Password"):
+                        self.answer("account's name: ", "anna")
+                    self.expect(question)
+                    self.assertEqual(self.echoes(), not question.startswith("Password") and not self.mends_by_itself())
+                    os.kill(os.tcgetpgrp(self.terminal), number)
+                    self.expect("ended")
+                    self.assertEqual(termios.tcgetattr(self.terminal), before)
+                    os.kill(self.process, signal.SIGKILL)
+                    os.waitpid(self.process, 0)
 
     def mends_by_itself(self):
         """Whether the tool takes each key as it comes, and not whole lines from the terminal."""

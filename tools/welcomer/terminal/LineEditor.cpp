@@ -1,5 +1,6 @@
 #include "tools/welcomer/terminal/LineEditor.h"
 
+#include "tools/welcomer/terminal/TerminalRestorer.h"
 #include "tools/welcomer/terminal/UTF8Characters.h"
 
 #include <cstdio>
@@ -62,6 +63,7 @@ std::optional<std::string> LineEditor::readLine(const std::string& prompt) const
     if (!terminal) {
         return std::nullopt;
     }
+    const TerminalRestorer restorer(_terminal);
     const std::unique_ptr<EditLine, decltype(&el_end)> editor(
         library()->init("welcomer", terminal.get(), terminal.get(), terminal.get()), library()->end);
     if (!editor) {

@@ -5,6 +5,7 @@
 #include "tools/welcomer/terminal/LineEditor.h"
 #include "tools/welcomer/terminal/Printable.h"
 #include "tools/welcomer/terminal/SuspensionWatch.h"
+#include "tools/welcomer/terminal/TerminalRestorer.h"
 
 #include <algorithm>
 #include <array>
@@ -28,19 +29,18 @@ constexpr const char* kInputHasEnded = "the input has ended";
 // While it lives, the terminal does not show what is typed.
 class EchoGuard {
   public:
-    explicit EchoGuard(int terminal) : _terminal(terminal) {
-        tcgetattr(terminal, &_before);
-        termios quiet = _before;
+    explicit EchoGuard(int terminal) : _terminal(terminal), _restorer(terminal) {
+        termios quiet = _restorer.before();
         quiet.c_lflag &= ~static_cast<tcflag_t>(ECHO);
         tcsetattr(terminal, TCSAFLUSH, &quiet);
     }
-    ~EchoGuard() { tcsetattr(_terminal, TCSAFLUSH, &_before); }
+    ~EchoGuard() { tcsetattr(_terminal, TCSAFLUSH, &_restorer.before()); }
     EchoGuard(const EchoGuard&) = delete;
     EchoGuard& operator=(const EchoGuard&) = delete;
 
   private:
     const int _terminal;
-    termios _before{};
+    const TerminalRestorer _restorer;
 };
 
 std::string trimmed(const std::string& text) {

@@ -6,8 +6,11 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cerrno>
+#include <fcntl.h>
 #include <filesystem>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 
@@ -148,6 +151,42 @@ TEST_F(LocalFileSystemTest, ACopyHasItsNameOnlyWhenItIsWholeWhereverTheProcessIs
         EXPECT_TRUE(copy || fileSystem.copy("/from/file", "/to/copy")) << number;
         EXPECT_TRUE(fileSystem.remove("/to"));
         root.addDirectory("/to");
+    }
+}
+
+TEST_F(LocalFileSystemTest, ACopyClearsAwayWhatKilledOnesLeftAndNothingElse) {
+    root.addFile("/from/file", kContent);
+    root.addDirectory("/to");
+    for (const char* const name :
+         {".copy-1", ".copy-4294967295", ".copy-", ".copy-x1", "copy-2", ".copy-3.plist"}) {
+        root.addFile("/to/" + std::string(name), "left");
+    }
+    root.addFile("/to/.copy-7", "being written");
+    const posix::FileDescriptor writing(::open(root.locate("/to/.copy-7").c_str(), O_RDWR));
+    ASSERT_EQ(::flock(writing.get(), LOCK_EX), 0);
+    ASSERT_EQ(::symlink("copy-2", root.locate("/to/.copy-8").c_str()), 0);
+    ASSERT_EQ(::mkfifo(root.locate("/to/.copy-9").c_str(), 0600), 0);
+
+    EXPECT_TRUE(fileSystem.copy("/from/file", "/to/file"));
+
+    Names left = root.names("/to");
+    std::ranges::sort(left);
+    EXPECT_EQ(left, (Names{".copy-", ".copy-3.plist", ".copy-7", ".copy-8", ".copy-9", ".copy-x1", "copy-2",
+                           "file"}));
+}
+
+TEST_F(LocalFileSystemTest, ATextThatCannotBeWrittenWholeLeavesNoNewFile) {
+    for (int number = 1;; ++number) {
+        SystemCallFaults::failAt(number, ENOSPC);
+        const platform::Outcome outcome = fileSystem.writeText("/file", "text");
+        const auto calls = static_cast<int>(SystemCallFaults::stop().size());
+        if (number > calls) {
+            EXPECT_TRUE(outcome);
+            EXPECT_GT(number, 2);
+            return;
+        }
+        EXPECT_TRUE(outcome ? root.content("/file") == "text" : root.names("/").empty()) << number;
+        static_cast<void>(fileSystem.remove("/file"));
     }
 }
 

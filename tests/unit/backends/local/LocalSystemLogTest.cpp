@@ -7,6 +7,8 @@
 #include <cerrno>
 #include <optional>
 #include <string>
+#include <sys/socket.h>
+#include <sys/un.h>
 #include <unistd.h>
 
 namespace welcomer::local {
@@ -71,6 +73,27 @@ TEST_F(LocalSystemLogTest, ACutSplitsNoCharacterAndNulsCountAsTheyAreShown) {
     EXPECT_EQ(records[0].message, birds.substr(0, kMaximumLogMessage - 4) + "…");
     EXPECT_EQ(records[1].message.size(), kMaximumLogMessage);
     EXPECT_TRUE(records[1].message.ends_with("…"));
+}
+
+TEST_F(LocalSystemLogTest, ADaemonThatWasStartedAnewGetsTheNextRecordWhole) {
+    log.write(115, "before");
+    socket.reset();
+    ASSERT_EQ(::unlink("/dev/log"), 0);
+    sockaddr_un address = {AF_UNIX, "/dev/log"};
+    const int listening = ::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    ASSERT_EQ(::bind(listening, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+    ASSERT_EQ(::listen(listening, 1), 0);
+
+    log.write(115, "after");
+
+    const int connection = ::accept(listening, nullptr, nullptr);
+    std::string record(100, '\0');
+    const ssize_t size = ::recv(connection, record.data(), record.size(), 0);
+    ASSERT_GT(size, 0);
+    record.resize(static_cast<std::size_t>(size));
+    EXPECT_TRUE(record.ends_with(": after" + std::string(1, '\0'))) << record;
+    ::close(connection);
+    ::close(listening);
 }
 
 TEST_F(LocalSystemLogTest, WithoutASystemLogNothingHappens) {

@@ -4,7 +4,9 @@
 #include "tests/contract/TemporaryRoot.h"
 #include "tests/fakes/FakePlatform.h"
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -54,6 +56,19 @@ TEST_F(LaunchAgentFolder, IsReadInTheOrderOfTheNames) {
     add("c.plist", "{ Label = three; Program = \"/bin/three\"; }");
     EXPECT_EQ(labels(), (std::vector<std::string>{"one", "two", "three"}));
     EXPECT_EQ(_fake.systemLog.lines(), std::vector<std::string>());
+}
+
+TEST_F(LaunchAgentFolder, IsRidOfCopiesThatWereLeftAndSilentAboutOneThatIsBeingWritten) {
+    add("a.plist");
+    add(".copy-12");
+    add(".copy-34");
+    const int writing = ::open((folder() + "/.copy-34").c_str(), O_RDWR | O_CLOEXEC);
+    ASSERT_EQ(::flock(writing, LOCK_EX), 0);
+    EXPECT_EQ(labels(), std::vector<std::string>{"one"});
+    EXPECT_EQ(_fake.systemLog.lines(), std::vector<std::string>());
+    EXPECT_NE(::access((folder() + "/.copy-12").c_str(), F_OK), 0);
+    EXPECT_EQ(::access((folder() + "/.copy-34").c_str(), F_OK), 0);
+    ::close(writing);
 }
 
 TEST_F(LaunchAgentFolder, ThatIsMissingHoldsNothing) {

@@ -57,8 +57,22 @@ TEST(ResolverOverride, WhatIsNoDomainIsRefusedSinceItGoesIntoOtherProgramsFiles)
         EXPECT_EQ(readOverride(domain, "nameserver 192.0.2.1\n").error, "\"" + domain + "\" is no domain");
     }
     EXPECT_EQ(readOverride("a.example", "domain\nnameserver 192.0.2.1\n").error, "\"\" is no domain");
-    EXPECT_EQ(readOverride(std::string(253, 'a'), "nameserver 192.0.2.1\n").error, "");
-    EXPECT_NE(readOverride(std::string(254, 'a'), "nameserver 192.0.2.1\n").error, "");
+}
+
+TEST(ResolverOverride, ADomainAndItsLabelsAreAsLongAsTheNameSystemAllows) {
+    const std::string label(63, 'a');
+    const std::string longest = label + "." + label + "." + label + "." + std::string(61, 'a');
+    ASSERT_EQ(longest.size(), 253U);
+    EXPECT_EQ(readOverride(longest, "nameserver 192.0.2.1\n").error, "");
+    EXPECT_NE(readOverride(longest + "a", "nameserver 192.0.2.1\n").error, "");
+    for (const std::string& domain : {label + "a", label + "a.example", "example." + label + "a"}) {
+        EXPECT_EQ(readOverride(domain, "nameserver 192.0.2.1\n").error, "\"" + domain + "\" is no domain");
+    }
+}
+
+TEST(ResolverOverride, AnAddressHasNoNul) {
+    EXPECT_EQ(readOverride("a.example", std::string("nameserver 192.0.2.1\0x\n", 24)).error,
+              "\"" + std::string("192.0.2.1\0x", 11) + "\" is no address");
 }
 
 class OverrideFolderTest : public testing::Test {

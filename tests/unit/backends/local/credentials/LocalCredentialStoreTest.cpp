@@ -1,6 +1,7 @@
 // The file of credentials, and what is refused in its place.
 
 #include "backends/local/credentials/LocalCredentialStore.h"
+#include "tests/fakes/FakeSystemLog.h"
 #include "tests/support/FindCredential.h"
 #include "tests/support/SystemCallFaults.h"
 #include "tests/unit/backends/local/credentials/LocalCredentialStoreFixture.h"
@@ -183,6 +184,26 @@ TEST_F(LocalCredentialStoreWithLibraryTest, WhatOthersMayWriteIsRefused) {
         ::chmod(root.locate(kFolder).c_str(), mode);
         EXPECT_EQ(statusOf("account"), platform::kCredentialStoreUnsafe) << mode;
         EXPECT_EQ(create("other", "secret"), platform::kCredentialStoreUnsafe) << mode;
+    }
+}
+
+TEST_F(LocalCredentialStoreWithLibraryTest, WhatOthersMayReadIsComplainedAboutOnceAndMadePrivate) {
+    ASSERT_EQ(create("account", "secret"), 0);
+    fakes::FakeSystemLog log(recorder);
+    LocalCredentialStore telling{posix::RootFolder(root.path()), identity, &log};
+    const std::string file = "The credentials in " + root.locate(kFile) + " could be read by ";
+
+    for (const auto& [mode, whom] : {std::pair(0644U, "everybody"), std::pair(0640U, "the file's group")}) {
+        ::chmod(root.locate(kFile).c_str(), mode);
+        EXPECT_EQ(telling.examine(), platform::kCredentialSuccess);
+        EXPECT_EQ(modeOf(kFile), mode); // nothing is changed by looking whether it would do
+        for (int time = 0; time < 2; ++time) {
+            EXPECT_EQ(telling.findItem("service", "account", platform::CredentialWish::Secret).secret,
+                      "secret");
+        }
+        EXPECT_EQ(modeOf(kFile), 0600U);
+        EXPECT_EQ(log.lines(), std::vector{file + whom + "; they are the user's alone now"});
+        log.clear();
     }
 }
 
