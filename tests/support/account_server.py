@@ -39,14 +39,14 @@ def ask_on(machine, user, path, members):
     return int(status), json.loads(body) if body.strip() else None
 
 
-def make_certificate(folder, name="server", authority=None, host="localhost"):
-    """Makes a key and a certificate of a host and 127.0.0.1: of an authority, or one that is an authority itself. All in PEM."""
+def make_certificate(folder, name="server", authority=None, places="DNS:localhost,IP:127.0.0.1"):
+    """Makes a key and a certificate of places: of an authority, or one that is an authority itself. All in PEM."""
     key, certificate = folder / f"{name}.key", folder / f"{name}.pem"
     command = ["openssl", "req", "-x509", "-newkey", "ec", "-pkeyopt", "ec_paramgen_curve:P-256", "-nodes", "-days", "2",
                "-subj", f"/CN={name}", "-keyout", key, "-out", certificate]
     if authority:
         command += ["-CA", folder / f"{authority}.pem", "-CAkey", folder / f"{authority}.key",
-                    "-addext", f"subjectAltName=DNS:{host},IP:127.0.0.1", "-addext", "basicConstraints=critical,CA:FALSE"]
+                    "-addext", f"subjectAltName={places}", "-addext", "basicConstraints=critical,CA:FALSE"]
     else:
         command += ["-addext", "keyUsage=critical,keyCertSign"]
     subprocess.run([str(part) for part in command], check=True, capture_output=True)
