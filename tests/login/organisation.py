@@ -74,7 +74,7 @@ class Organisation(Story):
     def install(self):
         super().install()
         account_server.make_certificate(self.folder, "authority")
-        account_server.make_certificate(self.folder, "server", "authority", HOST)
+        account_server.make_certificate(self.folder, "server", "authority", f"DNS:{HOST},IP:127.0.0.1")
         # In the machine's network, as another host is.
         with concurrent.futures.ThreadPoolExecutor(1) as pool:
             pool.submit(self._start_directory).result()

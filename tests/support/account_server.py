@@ -39,14 +39,14 @@ def ask_on(machine, user, path, members):
     return int(status), json.loads(body) if body.strip() else None
 
 
-def make_certificate(folder, name="server", authority=None, host="localhost"):
-    """Makes a key and a certificate of a host and 127.0.0.1: of an authority, or one that is an authority itself. All in PEM."""
+def make_certificate(folder, name="server", authority=None, places="DNS:localhost,IP:127.0.0.1"):
+    """Makes a key and a certificate of places: of an authority, or one that is an authority itself. All in PEM."""
     key, certificate = folder / f"{name}.key", folder / f"{name}.pem"
     command = ["openssl", "req", "-x509", "-newkey", "ec", "-pkeyopt", "ec_paramgen_curve:P-256", "-nodes", "-days", "2",
                "-subj", f"/CN={name}", "-keyout", key, "-out", certificate]
     if authority:
         command += ["-CA", folder / f"{authority}.pem", "-CAkey", folder / f"{authority}.key",
-                    "-addext", f"subjectAltName=DNS:{host},IP:127.0.0.1", "-addext", "basicConstraints=critical,CA:FALSE"]
+                    "-addext", f"subjectAltName={places}", "-addext", "basicConstraints=critical,CA:FALSE"]
     else:
         command += ["-addext", "keyUsage=critical,keyCertSign"]
     subprocess.run([str(part) for part in command], check=True, capture_output=True)
@@ -54,9 +54,9 @@ def make_certificate(folder, name="server", authority=None, host="localhost"):
 
 
 def hash_of(password):
-    """A hash that is checked within a millisecond."""
-    return subprocess.run(["openssl", "passwd", "-5", "-stdin"], input=password, check=True, capture_output=True,
-                          text=True).stdout.strip()
+    """A hash of the least work that crypt() takes: a test checks thousands."""
+    return subprocess.run(["openssl", "passwd", "-5", "-salt", f"rounds=1000${os.urandom(6).hex()}", "-stdin"], input=password,
+                          check=True, capture_output=True, text=True).stdout.strip()
 
 
 def write_directory(root, users):

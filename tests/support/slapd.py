@@ -36,6 +36,12 @@ def tree_of(*folders):
     raise FileNotFoundError("slapd: scripts/fetch-package slapd FOLDER")
 
 
+def environment_of(tree):
+    """The variables that its programs run with: one of their libraries comes with them."""
+    return {**os.environ, "LDAPNOINIT": "1",
+            "LD_LIBRARY_PATH": ":".join(str(path.parent) for path in tree.glob("usr/lib/*/libslapi*.so.0"))}
+
+
 def entry(name, attributes):
     """An entry of an LDIF file; a list has several values."""
     lines = [f"dn: {name}"]
@@ -59,9 +65,7 @@ class Slapd:
         self._configuration = data / "slapd.conf"
         self._configuration.write_text(CONFIGURATION.format(tree=tree, folder=folder, data=data, base=BASE), encoding="utf-8")
         self._program = tree / "usr/sbin/slapd"
-        # One of its libraries comes with it.
-        self._environment = {**os.environ, "LDAPNOINIT": "1",
-                             "LD_LIBRARY_PATH": ":".join(str(path.parent) for path in tree.glob("usr/lib/*/libslapi*.so.0"))}
+        self._environment = environment_of(tree)
         subprocess.run([self._program, "-T", "add", "-q", "-f", self._configuration], input="\n".join(entries), check=True,
                        text=True, capture_output=True, env=self._environment)
         self._process = None

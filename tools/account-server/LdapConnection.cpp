@@ -36,6 +36,8 @@ std::string lowerCase(std::string_view text) {
 [[noreturn]] void fail(int code) {
     const char* const why = ldap_err2string(code);
     switch (code) {
+    case LDAP_TIMEOUT:
+        throw LdapSilent(why);
     case LDAP_BUSY:
     case LDAP_UNAVAILABLE:
     case LDAP_TIMELIMIT_EXCEEDED:

@@ -23,6 +23,12 @@ class LdapUnavailable : public std::runtime_error {
     using std::runtime_error::runtime_error;
 };
 
+// The server has not said anything for as long as the limit: asking it once more is for later.
+class LdapSilent : public LdapUnavailable {
+  public:
+    using LdapUnavailable::LdapUnavailable;
+};
+
 // One thread at a time. After an LdapUnavailable it serves for nothing more.
 class LdapConnection {
   public:

@@ -80,13 +80,19 @@ SourceAnswer LdapSource::_askServers(const Question& question) {
 }
 
 std::vector<LdapSource::Server*> LdapSource::_serversToAsk() {
+    const Clock::time_point now = Clock::now();
     std::vector<Server*> servers;
     const std::lock_guard lock(_mutex);
     for (Server& server : _servers) {
         servers.push_back(&server);
     }
     std::stable_partition(servers.begin(), servers.end(),
-                          [now = Clock::now()](const Server* server) { return server->avoidedUntil <= now; });
+                          [now](const Server* server) { return server->avoidedUntil <= now; });
+    Server& first = *servers.front();
+    if (first.avoidedUntil != Clock::time_point() && first.avoidedUntil <= now) {
+        // This one tries whether it can be asked again: the others do not wait with it.
+        first.avoidedUntil = now + kAvoided;
+    }
     return servers;
 }
 
@@ -119,6 +125,8 @@ SourceAnswer LdapSource::_askServer(Server& server, const Question& question) {
     if (connections) {
         try {
             return askAndKeep();
+        } catch (const LdapSilent&) {
+            throw; // on a new connection it would be waited for once more
         } catch (const LdapUnavailable&) {
             // The server may have closed it while it was idle.
         }

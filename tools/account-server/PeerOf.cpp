@@ -9,6 +9,7 @@
 #include <netinet/in.h>
 #include <stdexcept>
 #include <sys/socket.h>
+#include <utility>
 
 namespace welcomer::server {
 
@@ -72,9 +73,23 @@ std::optional<Peer> peerAt(std::string_view address) {
 }
 
 PeerOf::PeerOf(const Settings& settings)
-    : _fronts(numbersOf(settings.fronts)),
-      _users(numbersOf(settings.users)),
-      _trustsLoopback(settings.trustsLoopback) {}
+    : _users(numbersOf(settings.users)),
+      _trustsLoopback(settings.trustsLoopback) {
+    std::vector<std::string> names;
+    for (const std::string& front : settings.fronts) {
+        if (const auto address = peerAt(front)) {
+            _frontAddresses.push_back(address->shown);
+        } else {
+            names.push_back(front);
+        }
+    }
+    _fronts = numbersOf(names);
+}
+
+PeerOf::Connected PeerOf::_connectedFrom(Peer peer, bool isLocal) const {
+    const bool isFront = (isLocal && _trustsLoopback) || std::ranges::count(_frontAddresses, peer.shown) > 0;
+    return {std::move(peer), isFront, true};
+}
 
 PeerOf::Connected PeerOf::connected(int socket) const {
     sockaddr_storage address{};
@@ -83,12 +98,12 @@ PeerOf::Connected PeerOf::connected(int socket) const {
         return {};
     }
     if (address.ss_family == AF_INET) {
-        return {peerOf(reinterpret_cast<const sockaddr_in&>(address).sin_addr),
-                _trustsLoopback && isLoopback(address), true};
+        return _connectedFrom(peerOf(reinterpret_cast<const sockaddr_in&>(address).sin_addr),
+                              isLoopback(address));
     }
     if (address.ss_family == AF_INET6) {
-        return {peerOf(reinterpret_cast<const sockaddr_in6&>(address).sin6_addr),
-                _trustsLoopback && isLoopback(address), true};
+        return _connectedFrom(peerOf(reinterpret_cast<const sockaddr_in6&>(address).sin6_addr),
+                              isLoopback(address));
     }
     ucred credentials{};
     length = sizeof credentials;

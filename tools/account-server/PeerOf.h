@@ -36,7 +36,11 @@ class PeerOf {
     static Peer sender(const Connected& connected, std::string_view forwardedFor);
 
   private:
+    // Who comes over the network, or from this machine by its loopback address.
+    Connected _connectedFrom(Peer peer, bool isLocal) const;
+
     std::vector<uid_t> _fronts;
+    std::vector<std::string> _frontAddresses;
     std::vector<uid_t> _users; // empty: everybody
     bool _trustsLoopback;
 };

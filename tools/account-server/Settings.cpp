@@ -119,7 +119,7 @@ constexpr Kind kKinds[] = {
      "`directory` or `ldap`"},
     {"Certificate", [](Text value, Settings& to) { return readPath(value, to.certificate); }, kPathWanted},
     {"Key", [](Text value, Settings& to) { return readPath(value, to.key); }, kPathWanted},
-    {"Fronts", readFronts, "names of users, and `loopback`"},
+    {"Fronts", readFronts, "names of users, addresses, and `loopback`"},
     {"Users",
      [](Text value, Settings& to) {
          to.users = split(value, ' ');

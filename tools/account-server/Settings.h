@@ -44,8 +44,8 @@ struct Settings {
     std::string certificate; // files; both or none
     std::string key;
 
-    // Whose word is taken for where a request comes from: users on a Unix socket, and whoever comes to the
-    // loopback address.
+    // Whose word is taken for where a request comes from: users on a Unix socket and addresses, and whoever comes
+    // to the loopback address.
     std::vector<std::string> fronts;
     bool trustsLoopback = false;
     std::vector<std::string> users; // who may ask on a Unix socket; everybody where there is none

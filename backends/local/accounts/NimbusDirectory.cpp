@@ -102,7 +102,7 @@ void setMailAddress(PropertyList::Dictionary& services, const PropertyList& addr
 
 NimbusDirectory::Found NimbusDirectory::_find(const std::string& username,
                                               const std::string& password) const {
-    const std::optional<PropertyList::Dictionary> users = _users();
+    const std::shared_ptr<const PropertyList::Dictionary> users = _users();
     if (!users) {
         return {std::nullopt, accountError(platform::kSKAccountErrorServerUnavailable)};
     }
@@ -157,7 +157,7 @@ platform::SignInAnswer NimbusDirectory::acceptTerms(const std::string& username,
 }
 
 PropertyList::Dictionary NimbusDirectory::servicesOfNewAccount(const std::string& username) const {
-    const std::optional<PropertyList::Dictionary> users = _users();
+    const std::shared_ptr<const PropertyList::Dictionary> users = _users();
     const PropertyList* const user = users ? valueIn(*users, username) : nullptr;
     const PropertyList::Dictionary* const own = dictionaryIn(user, kServicesKey);
     PropertyList::Dictionary services = own ? *own : everyService();
@@ -236,9 +236,9 @@ platform::Outcome NimbusDirectory::_change(const Change& change) const {
                                                 : platform::Outcome::failure(folder.error());
 }
 
-std::optional<PropertyList::Dictionary> NimbusDirectory::_users() const {
-    const DictionaryFileContent file = readDictionaryFile(_root, kNimbusDirectoryPath);
-    return copyOf(dictionaryIn(file.values, kUsersKey));
+std::shared_ptr<const PropertyList::Dictionary> NimbusDirectory::_users() const {
+    const std::shared_ptr<const DictionaryFileContent> file = _file.content();
+    return {file, dictionaryIn(file->values, kUsersKey)};
 }
 
 } // namespace welcomer::local

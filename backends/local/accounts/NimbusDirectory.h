@@ -3,12 +3,14 @@
 
 #pragma once
 
+#include "backends/local/DictionaryFileCache.h"
 #include "backends/posix/RootFolder.h"
 #include "platform/AccountDirectory.h"
 #include "platform/SignInDirectory.h"
 #include "propertylist/PropertyList.h"
 
 #include <functional>
+#include <memory>
 #include <optional>
 #include <string>
 #include <vector>
@@ -37,7 +39,7 @@ class NimbusDirectory final : public platform::SignInDirectory {
   public:
     explicit NimbusDirectory(posix::RootFolder root) : _root(std::move(root)) {}
 
-    // Each reads the file anew; one that is damaged counts as one that cannot be read. An answer takes as long
+    // Each sees the file as it is at the time; one that is damaged counts as one that cannot be read. An answer takes as long
     // where there is no such user as where the password is wrong.
     platform::SignInAnswer answer(const std::string& username, const std::string& password,
                                   const PropertyList::Dictionary& delegateRequest) const override;
@@ -66,7 +68,7 @@ class NimbusDirectory final : public platform::SignInDirectory {
     using Change = std::function<platform::Outcome(PropertyList::Dictionary&, const std::string&)>;
     platform::Outcome _change(const Change& change) const;
 
-    std::optional<PropertyList::Dictionary> _users() const; // none when it cannot be read
+    std::shared_ptr<const PropertyList::Dictionary> _users() const; // null when it cannot be read
 
     // What the directory has about a user, or why the password opens nothing.
     struct Found {
@@ -76,6 +78,7 @@ class NimbusDirectory final : public platform::SignInDirectory {
     Found _find(const std::string& username, const std::string& password) const;
 
     const posix::RootFolder _root;
+    mutable DictionaryFileCache _file{_root, kNimbusDirectoryPath};
 };
 
 } // namespace welcomer::local

@@ -10,6 +10,7 @@ import socket
 import subprocess
 import sys
 import threading
+import time
 import unittest
 from pathlib import Path
 
@@ -41,6 +42,47 @@ LdapAttribute=employeeNumber delegates/com.corvid.vidlink/level:integer
 LdapAttribute=employeeType accountError:integer
 LdapValue=errorInfo/version 2026-10
 """
+
+
+class Cable:
+    """Carries connections to a port of this host, until it is pulled: then they stay, and so do new ones, in silence."""
+
+    def __init__(self, port):
+        self._port, self._silent, self.count = port, threading.Event(), 0
+        self._listening = socket.create_server(("127.0.0.1", 0), backlog=64)
+        self.address = f"ldap://127.0.0.1:{self._listening.getsockname()[1]}"
+        self._ends = []
+        threading.Thread(target=self._accept, daemon=True).start()
+
+    def _accept(self):
+        while True:
+            try:
+                near = self._listening.accept()[0]
+            except OSError:
+                return
+            self.count += 1
+            self._ends.append(near)
+            if not self._silent.is_set():
+                far = socket.create_connection(("127.0.0.1", self._port))
+                self._ends.append(far)
+                for one, other in ((near, far), (far, near)):
+                    threading.Thread(target=self._carry, args=(one, other), daemon=True).start()
+
+    def _carry(self, one, other):
+        try:
+            while (piece := one.recv(65536)) and not self._silent.is_set():
+                other.sendall(piece)
+        except OSError:
+            pass
+        if not self._silent.is_set():
+            other.close()
+
+    def pull(self):
+        self._silent.set()
+
+    def close(self):
+        for end in (self._listening, *self._ends):
+            end.close()
 
 
 def entries():
@@ -188,6 +230,29 @@ class Ldap(unittest.TestCase):
         self.assert_answer(self.server.authenticate("bert"), 200)
         self.directories[0].fall_silent()
         self.assert_answer(self.server.authenticate("bert"), 200)
+
+    def test_a_server_that_falls_silent_is_waited_for_once_and_then_tried_by_one_alone(self):
+        cable = Cable(3891)
+        self.addCleanup(cable.close)
+        self.serve(f"{SETTINGS}LdapSeconds=5\nLdapServers={cable.address} {self.directories[1].secure_address}\n")
+        self.assert_answer(self.server.authenticate("bert"), 200)
+        kept = cable.count
+        cable.pull()
+        self.assert_answer(self.server.authenticate("bert"), 200)
+        self.assertEqual(cable.count, kept)  # no new connection to who says nothing
+        end = time.monotonic() + 120
+
+        def ask_until_it_is_tried():
+            while cable.count == kept and time.monotonic() < end:
+                self.server.authenticate("bert")
+                time.sleep(0.1)
+
+        threads = [threading.Thread(target=ask_until_it_is_tried) for _ in range(8)]
+        for thread in threads:
+            thread.start()
+        for thread in threads:
+            thread.join(180)
+        self.assertEqual(cable.count, kept + 1)
 
     def test_a_server_that_agrees_to_tls_and_is_silent_then_is_passed_over(self):
         agreeing = socket.create_server(("127.0.0.1", 0), backlog=64)

@@ -163,22 +163,22 @@ class Limits(unittest.TestCase):
         self.assertEqual(server.authenticate().status, 200)
         self.assertEqual(server.figures()["requests_under_way"], 0)
 
-    def ask_slowly(self, server, user="slow", password=PASSWORD):
-        """Begins a request whose password takes its time to be checked; back when that has begun or waits."""
-        connection = server.connect()
-        body = json.dumps(account_server.body_of(user, password))
-        under_way = server.figures()["requests_under_way"]
-        connection.request("POST", "/v1/authenticate", body, {"Content-Type": "application/json"})
-        self.machine.wait_for(lambda: server.figures()["requests_under_way"] > under_way, "the request")
-        self.addCleanup(connection.close)
-        return connection
+    def ask_slowly(self, server, count=1):
+        """Begins requests whose password takes its time to be checked; back when that has begun for one and the others wait."""
+        connections = [server.connect() for _ in range(count)]
+        for connection in connections:
+            self.addCleanup(connection.close)
+            connection.request("POST", "/v1/authenticate", json.dumps(account_server.body_of("slow")),
+                               {"Content-Type": "application/json"})
+        self.machine.wait_for(lambda: server.figures()["requests_under_way"] == count, "the requests")
+        return connections
 
     def assert_unanswered(self, connection):
         self.assertEqual(select.select([connection.sock], [], [], 0)[0], [])
 
     def test_what_does_not_fit_the_queue_is_refused_and_everything_else_goes_on(self):
         server = self.serve("Workers=1\nQueue=1\n")
-        slow, waiting = self.ask_slowly(server), self.ask_slowly(server)
+        slow, waiting = self.ask_slowly(server, 2)
         refused = server.authenticate()
         self.assertEqual((refused.status, refused.problem), (503, "unavailable"))
         self.assertGreater(int(refused.headers["Retry-After"]), 0)
@@ -192,7 +192,7 @@ class Limits(unittest.TestCase):
         idle = server.connect()
         idle.request("GET", "/v1/server")
         idle.getresponse().read()
-        slow, waiting = self.ask_slowly(server), self.ask_slowly(server)
+        slow, waiting = self.ask_slowly(server, 2)
         server.process.terminate()
         self.assertEqual(idle.sock.recv(1), b"")
         answers = [connection.getresponse() for connection in (slow, waiting)]
@@ -203,7 +203,7 @@ class Limits(unittest.TestCase):
 
     def test_what_is_under_way_has_its_answer_over_a_reload(self):
         server = self.serve("Workers=1\n")
-        slow = self.ask_slowly(server)
+        slow, = self.ask_slowly(server)
         server.write_settings(server.settings + "UnknownUsers=told\n")
         server.reload()
         self.assert_unanswered(slow)

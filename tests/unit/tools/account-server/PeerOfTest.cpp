@@ -1,6 +1,7 @@
 #include "tools/account-server/PeerOf.h"
 
 #include <gtest/gtest.h>
+#include <netinet/in.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
@@ -57,6 +58,48 @@ TEST_F(OnASocketPair, OnlyTheUsersInTheSettingsMayAsk) {
     EXPECT_EQ(PeerOf(settings).connected(sockets[0]).isAllowed, ::getuid() == 65534);
     settings.users = {"no user of this name"};
     EXPECT_THROW(PeerOf{settings}, std::runtime_error);
+}
+
+class OnTheLoopbackAddress : public testing::Test {
+  protected:
+    void SetUp() override {
+        sockaddr_in address{};
+        address.sin_family = AF_INET;
+        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        socklen_t length = sizeof address;
+        auto* const where = reinterpret_cast<sockaddr*>(&address);
+        ASSERT_EQ(::bind(listening, where, length), 0);
+        ASSERT_EQ(::listen(listening, 1), 0);
+        ASSERT_EQ(::getsockname(listening, where, &length), 0);
+        ASSERT_EQ(::connect(client, where, length), 0);
+        server = ::accept(listening, nullptr, nullptr);
+        ASSERT_GE(server, 0);
+    }
+    void TearDown() override {
+        for (const int each : {listening, client, server}) {
+            ::close(each);
+        }
+    }
+    bool isFront(const Settings& settings) const { return PeerOf(settings).connected(server).isFront; }
+
+    const int listening = ::socket(AF_INET, SOCK_STREAM, 0);
+    const int client = ::socket(AF_INET, SOCK_STREAM, 0);
+    int server = -1;
+};
+
+TEST_F(OnTheLoopbackAddress, AnAddressCanBeAFront) {
+    Settings settings;
+    EXPECT_FALSE(isFront(settings));
+    settings.fronts = {"192.0.2.1", "::1"};
+    EXPECT_FALSE(isFront(settings));
+    settings.fronts = {"root", "127.0.0.1"};
+    EXPECT_TRUE(isFront(settings));
+}
+
+TEST_F(OnTheLoopbackAddress, EverybodyThereCanBeAFront) {
+    Settings settings;
+    settings.trustsLoopback = true;
+    EXPECT_TRUE(isFront(settings));
 }
 
 } // namespace
