@@ -226,6 +226,7 @@ void addPluginsCommands(CommandLine& commandLine) {
         "it was skipped",
         listPlugins);
     addTry(commandLine, group);
+    addPluginsCheck(commandLine, group);
 }
 
 } // namespace welcomer::tool
