@@ -8,7 +8,7 @@ static wl_completion_handler kept;
 static volatile pid_t caller;
 
 static void* run(void* given) {
-    usleep(100000);
+    usleep(400000);
     if (syscall(SYS_tgkill, getpid(), caller, 0) == 0) {
         answer(kept);
     }

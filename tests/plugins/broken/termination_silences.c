@@ -12,7 +12,7 @@ static void stop(wl_delegate* self, wl_error_slot* slot) {
 #define TERMINATE stop
 
 static void* run(void* given) {
-    usleep(100000);
+    usleep(400000);
     if (!is_stopped) {
         answer(kept);
     }

@@ -6,6 +6,7 @@
 #include "tools/welcomer/commands/Commands.h"
 #include "tools/welcomer/plugins/PluginChecks.h"
 #include "tools/welcomer/plugins/PluginExamination.h"
+#include "tools/welcomer/plugins/SanitizedExamination.h"
 #include "tools/welcomer/terminal/InterruptionGuard.h"
 
 #include <filesystem>
@@ -14,6 +15,8 @@
 namespace welcomer::tool {
 
 namespace {
+
+constexpr std::size_t kMarkWidth = 9; // of a verdict
 
 struct CheckArguments {
     std::vector<std::string> files;
@@ -41,11 +44,13 @@ void show(Report& report, const std::string& file, const Json& records) {
         const std::string verdict = record["verdict"];
         const Json& seen = record["seen"];
         const bool isBad = verdict == kFailed || verdict == kWarned;
-        const std::string mark = verdict == kFailed ? "FAILED " : verdict == kWarned ? "WARNED " : verdict;
-        report.line("  " + mark + " " + record["name"].get<std::string>() +
+        const std::string mark = verdict == kFailed ? "FAILED" : verdict == kWarned ? "WARNED" : verdict;
+        report.line("  " + mark + std::string(kMarkWidth - mark.size(), ' ') +
+                    record["name"].get<std::string>() +
                     (seen.is_string() ? ": " + seen.get<std::string>() : ""));
         if (isBad) {
-            report.line("          see " + record["documented"].get<std::string>());
+            report.line("  " + std::string(kMarkWidth, ' ') + "see " +
+                        record["documented"].get<std::string>());
         }
     }
 }
@@ -64,6 +69,13 @@ std::string counted(std::size_t count, const char* verdict) {
     return (count == 1 ? "one check " : std::to_string(count) + " checks ") + verdict;
 }
 
+Json examine(Session& session, const std::filesystem::path& file, const CheckArguments& arguments,
+             const PropertyList& response, InterruptionGuard& guard) {
+    const std::string sanitizer = missingSanitizer(libraryOfPlugin(file));
+    return sanitizer.empty() ? examinePlugin(session.buildPlatform, file, response, guard)
+                             : examineWithSanitizer(sanitizer, file, arguments.response);
+}
+
 Report check(Session& session, const CheckArguments& arguments) {
     const PropertyList response = arguments.response.empty()
                                       ? PropertyList(PropertyList::Dictionary{{platform::kStatusKey, 0}})
@@ -77,7 +89,7 @@ Report check(Session& session, const CheckArguments& arguments) {
                 throw CommandFailure("there is no file " + file);
             }
             const Json records =
-                examinePlugin(session.buildPlatform, std::filesystem::absolute(file), response, guard);
+                examine(session, std::filesystem::absolute(file), arguments, response, guard);
             show(report, file, records);
             plugins.push_back({{"file", file}, {"checks", records}});
         }

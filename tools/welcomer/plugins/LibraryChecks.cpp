@@ -27,7 +27,7 @@ bool isOfTheRuntime(std::string_view name) {
     if (!name.starts_with("_Z")) {
         return name.starts_with("__odr_asan");
     }
-    for (const std::string_view prefix : {"_Z", "GV", "TV", "TI", "TS", "TT", "Z", "N", "K"}) {
+    for (const std::string_view prefix : {"_Z", "GV", "TV", "TI", "TS", "TT", "Z", "N", "K", "R", "O"}) {
         drop(name, prefix);
     }
     return std::ranges::any_of(kScopes, [&](std::string_view scope) { return name.starts_with(scope); });

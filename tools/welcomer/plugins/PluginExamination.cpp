@@ -19,20 +19,6 @@ namespace {
 
 namespace fs = std::filesystem;
 
-// The library of a folder; what cannot be found out is left to the checks to tell.
-fs::path libraryOf(const fs::path& plugin) {
-    if (!fs::is_directory(plugin)) {
-        return plugin;
-    }
-    try {
-        const PropertyList info = readPropertyListFile((plugin / "Info.plist").string());
-        const PropertyList* const name = info.find("Executable");
-        return name && name->isString() ? plugin / *name->string() : plugin;
-    } catch (const CommandFailure&) {
-        return plugin;
-    }
-}
-
 Json recordOf(const PluginCheck& check, const char* verdict, const std::string& seen) {
     return {{"name", check.name},
             {"verdict", verdict},
@@ -46,7 +32,7 @@ class Examination {
                 InterruptionGuard& guard)
         : _buildPlatform(buildPlatform),
           _guard(guard),
-          _input{libraryOf(file), file.stem().string() + "." + kPluginExtension, response} {
+          _input{libraryOfPlugin(file), file.stem().string() + "." + kPluginExtension, response} {
         _install(file);
     }
 
@@ -91,6 +77,19 @@ class Examination {
 };
 
 } // namespace
+
+fs::path libraryOfPlugin(const fs::path& plugin) {
+    if (!fs::is_directory(plugin)) {
+        return plugin;
+    }
+    try {
+        const PropertyList info = readPropertyListFile((plugin / "Info.plist").string());
+        const PropertyList* const name = info.find("Executable");
+        return name && name->isString() ? plugin / *name->string() : plugin;
+    } catch (const CommandFailure&) {
+        return plugin;
+    }
+}
 
 Json examinePlugin(const PlatformFactory& buildPlatform, const fs::path& file, const PropertyList& response,
                    InterruptionGuard& guard) {

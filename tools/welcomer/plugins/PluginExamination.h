@@ -16,8 +16,11 @@ inline constexpr char kWarned[] = "warned";
 inline constexpr char kFailed[] = "failed";
 inline constexpr char kSkipped[] = "skipped"; // for want of what another check asks for
 
+// The library of a plug-in, which may be a folder; where that does not say it, the folder.
+std::filesystem::path libraryOfPlugin(const std::filesystem::path& plugin);
+
 // Makes every check, each in a process of its own, which gets five seconds, below a temporary folder that is removed
-// afterwards. One that was built with a shared address sanitizer is checked by this program with that loaded first.
+// afterwards.
 //  file      a library or a folder, of any name
 //  response  what it is to complete with
 //  result    one record a check: "name", "verdict", "seen" (or null) and "documented"
