@@ -102,12 +102,13 @@ DelegatePluginArray loadDelegatePlugins() {
 
 } // namespace
 
-std::vector<PluginScanEntry> scanDelegatePlugins() {
+std::vector<PluginScanEntry>
+scanDelegatePlugins(const std::function<bool(const std::string& fileName)>& isWanted) {
     std::vector<PluginScanEntry> entries;
     std::unordered_set<std::string> identifiers;
     const auto fileNames = platform::current().fileSystem.list(kPluginDirectory);
     for (const std::string& fileName : fileNames.value_or(std::vector<std::string>())) {
-        if (pathExtension(fileName) != kPluginExtension) {
+        if (pathExtension(fileName) != kPluginExtension || (isWanted && !isWanted(fileName))) {
             continue;
         }
         PluginScanEntry& entry = entries.emplace_back();

@@ -5,6 +5,7 @@
 #include "platform/PluginDirectory.h"
 #include "plugins/WLFirstRunDelegateConfiguration.h"
 
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -34,6 +35,8 @@ struct PluginScanEntry {
 
 // Scans the plug-in directory anew, with a log line for every entry that is skipped; WLNimbusDelegatePlugins
 // stands on it. Any thread.
-std::vector<PluginScanEntry> scanDelegatePlugins();
+//  isWanted  asked before each entry is loaded, with its file's name: one that is not wanted is left out; null for all
+std::vector<PluginScanEntry>
+scanDelegatePlugins(const std::function<bool(const std::string& fileName)>& isWanted = nullptr);
 
 } // namespace welcomer

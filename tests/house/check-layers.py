@@ -45,7 +45,7 @@ ASKED = {"backends/Backends.h"}
 SHOWN = {"backends/local": re.compile(r"/Local[^/]*\.h$")}
 # The rooms of one program, from the lowest: a room includes itself and those before it. What stands beside them may
 # include all of them.
-TOOL_ROOMS = {"tools/welcomer": ["terminal", "cli", "login", "story", "checks", "commands"]}
+TOOL_ROOMS = {"tools/welcomer": ["terminal", "cli", "login", "story", "checks", "plugins", "commands"]}
 # Free to include everything: nothing includes them.
 TESTS = {"tests"}
 # The only files, besides tests and the backends themselves, that may choose a backend, and what is offered to them.

@@ -17,7 +17,7 @@ RELEASE = "bookworm"
 # What a machine with users needs.
 SYSTEM = "systemd systemd-sysv libpam-systemd dbus dbus-user-session polkitd pkexec iproute2 procps python3".split()
 # What the packages depend on, and what the tests start as a desktop would.
-PACKAGES = """libcurl4 libedit2 libgnutls30 libldap-2.5-0 libmicrohttpd12 libmnl0 libnm0 libsecret-1-0 psmisc dnsmasq-base
+PACKAGES = """libcurl4 libedit2 libelf1 libgnutls30 libldap-2.5-0 libmicrohttpd12 libmnl0 libnm0 libsecret-1-0 psmisc dnsmasq-base
     gnome-keyring gnome-online-accounts libglib2.0-bin python3-gi""".split()
 # What a test installs, if it is to be there: the package files wait where apt keeps those that it has fetched.
 FETCHED = ["systemd-resolved"]

@@ -53,6 +53,11 @@ class ToolTest(unittest.TestCase):
         self.assertEqual((result.returncode, result.stderr), (0, ""), result)
         return result.stdout
 
+    def lists_some_that_do_not_load(self, result, count="one plug-in does"):
+        """What `plugins list` prints of them, with its failure."""
+        self.assertEqual((result.returncode, result.stderr), (1, f"welcomer: {count} not load\n"), result)
+        return result.stdout
+
     def fails(self, result, status, pattern):
         """Nothing on stdout, one line on stderr."""
         self.assertEqual((result.returncode, result.stdout), (status, ""), result)
@@ -62,8 +67,9 @@ class ToolTest(unittest.TestCase):
 
 class CommandLine(ToolTest):
     COMMANDS = [[], ["try"], ["replay"], ["replay", "store"], ["replay", "show"], ["replay", "delete"], ["plugins"],
-                ["plugins", "list"], ["plugins", "try"], ["setup"], ["account"], ["account", "add"], ["account", "list"], ["account", "status"],
-                ["account", "sign-in"], ["account", "services"], ["services"], ["services", "list"], ["services", "enable"],
+                ["plugins", "list"], ["plugins", "try"], ["plugins", "check"], ["setup"], ["account"], ["account", "add"],
+                ["account", "list"], ["account", "status"], ["account", "sign-in"], ["account", "services"], ["services"],
+                ["services", "list"], ["services", "enable"],
                 ["network"], ["network", "show"], ["network", "ports"], ["network", "probe"], ["network", "apply"],
                 ["network", "register"]]
 
@@ -104,7 +110,8 @@ class CommandLine(ToolTest):
         plugins = self.root / PLUGIN_FOLDER
         plugins.mkdir(parents=True)
         (plugins / "a.ncdplugin").write_text("nothing")
-        self.assertIn("a.ncdplugin", self.succeeds(self.run_tool("--root", "root", "plugins", "list", cwd=self.folder)))
+        listed = self.run_tool("--root", "root", "plugins", "list", cwd=self.folder)
+        self.assertIn("a.ncdplugin", self.lists_some_that_do_not_load(listed))
 
     def test_a_root_that_does_not_exist_is_a_failure(self):
         self.fails(self.run_tool("--root", self.folder / "missing", "plugins", "list"), 1, "--root: there is no folder .*missing")
@@ -137,7 +144,7 @@ class PluginsList(ToolTest):
         self.install(*(BUILD / "plugins").glob("*.ncdplugin"), OWN_PLUGINS / "SymbolLessLibrary.ncdplugin")
         (self.plugins / "text.ncdplugin").write_text("this is no library")
         (self.plugins / "ignored.txt").write_text("no plug-in")
-        rows = self.succeeds(self.run_below_root("plugins", "list")).splitlines()
+        rows = self.lists_some_that_do_not_load(self.run_below_root("plugins", "list"), "2 plug-ins do").splitlines()
         self.assertRegex(rows[0], r"^IDENTIFIER +FILE +STATE$")
         cells = sorted(re.split(r"  +", row, maxsplit=2) for row in rows[1:])
         self.assertEqual([row[0] for row in cells], ["-", "-", *IDENTIFIERS])
@@ -150,7 +157,7 @@ class PluginsList(ToolTest):
     def test_json(self):
         self.install(*(BUILD / "plugins").glob("*.ncdplugin"))
         (self.plugins / "text.ncdplugin").write_text("this is no library")
-        document = json.loads(self.succeeds(self.run_below_root("--json", "plugins", "list")))
+        document = json.loads(self.lists_some_that_do_not_load(self.run_below_root("--json", "plugins", "list")))
         self.assertEqual(document["directory"], "/" + PLUGIN_FOLDER)
         by_file = {plugin.pop("file"): plugin for plugin in document["plugins"]}
         bad = by_file.pop("text.ncdplugin")
@@ -164,7 +171,7 @@ class PluginsList(ToolTest):
         copy = shutil.copytree if plugin.is_dir() else shutil.copy
         for name in ("one.ncdplugin", "two.ncdplugin"):
             copy(plugin, self.plugins / name)
-        plugins = json.loads(self.succeeds(self.run_below_root("--json", "plugins", "list")))["plugins"]
+        plugins = json.loads(self.lists_some_that_do_not_load(self.run_below_root("--json", "plugins", "list")))["plugins"]
         self.assertEqual(plugins[0]["state"], "loaded")
         self.assertNotEqual(plugins[1]["state"], "loaded")
 
@@ -180,7 +187,8 @@ class PluginsList(ToolTest):
     def test_verbose_shows_the_systems_log_lines(self):
         (self.plugins / "text.ncdplugin").write_text("this is no library")
         result = self.run_below_root("--verbose", "plugins", "list")
-        self.assertEqual(result.stderr, "Nimbus Plugins: Failed to get principal class for text.ncdplugin\n")
+        self.assertEqual(result.stderr, "Nimbus Plugins: Failed to get principal class for text.ncdplugin\n"
+                                        "welcomer: one plug-in does not load\n")
 
     def test_a_plugin_that_writes_to_stdout_does_not_spoil_the_document(self):
         self.install(OWN_PLUGINS / "TalkingPlugin.ncdplugin")

@@ -56,6 +56,7 @@ class Report {
 
     // Why the command failed all the same: its line for the user, which comes after the report.
     std::optional<std::string> failure;
+    int failureStatus = 1; // the exit status then
 
   private:
     friend class ReportPrinter;

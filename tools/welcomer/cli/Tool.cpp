@@ -163,7 +163,7 @@ int runCommand(const Command& command, const Options& options, const PlatformFac
     if (!std::cout) {
         return fail("the output could not be written", kExitFailed);
     }
-    return report.failure ? fail(*report.failure, kExitFailed) : kExitSuccess;
+    return report.failure ? fail(*report.failure, report.failureStatus) : kExitSuccess;
 }
 
 int runChosen(const CommandLine& commandLine, Options& options, const PlatformFactory& buildPlatform) {

@@ -23,6 +23,7 @@ namespace welcomer::tool {
 inline constexpr int kExitSuccess = 0;
 inline constexpr int kExitFailed = 1;
 inline constexpr int kExitUsage = 2;
+inline constexpr int kExitWarned = 3; // of the commands that know warnings
 
 // The options that every command takes.
 struct Options {

@@ -14,6 +14,7 @@ void addAccountCommands(CommandLine& commandLine);
 void addServicesCommands(CommandLine& commandLine);
 void addReplayCommands(CommandLine& commandLine);
 void addPluginsCommands(CommandLine& commandLine);
+void addPluginsCheck(CommandLine& commandLine, CommandLevel group); // one of these
 void addStateCommands(CommandLine& commandLine);
 void addSyncCommands(CommandLine& commandLine);
 void addSwitchCommands(CommandLine& commandLine);

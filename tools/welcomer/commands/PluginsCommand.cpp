@@ -4,12 +4,13 @@
 #include "plugins/WLNimbusDelegatePlugins.h"
 #include "tools/welcomer/checks/ChildOutput.h"
 #include "tools/welcomer/cli/PropertyListFile.h"
-#include "tools/welcomer/cli/StandardOutputGuard.h"
 #include "tools/welcomer/cli/Tool.h"
 #include "tools/welcomer/commands/Commands.h"
+#include "tools/welcomer/plugins/PluginListing.h"
 #include "tools/welcomer/story/PluginTrial.h"
 #include "tools/welcomer/terminal/InterruptionGuard.h"
 
+#include <algorithm>
 #include <chrono>
 #include <cstdint>
 #include <filesystem>
@@ -23,28 +24,26 @@ namespace welcomer::tool {
 
 namespace {
 
-std::string stateOf(const PluginScanEntry& entry) {
-    return entry.plugin ? "loaded" : entry.reason;
-}
-
-std::vector<PluginScanEntry> scan() {
-    const StandardOutputGuard guard;
-    return scanDelegatePlugins();
-}
-
-Report listPlugins(Session& /*session*/) {
-    Json plugins = Json::array();
-    for (const PluginScanEntry& entry : scan()) {
-        plugins.push_back({{"identifier", entry.identifier ? Json(*entry.identifier) : Json()},
-                           {"file", entry.fileName},
-                           {"state", stateOf(entry)}});
-    }
+Report showPlugins(Session& session) {
+    InterruptionGuard guard;
     Report report;
-    report.document = {{"directory", kPluginDirectory}, {"plugins", plugins}};
-    if (plugins.empty()) {
-        return report.line(std::string("No plug-ins in ") + kPluginDirectory);
+    try {
+        const Json plugins = listPlugins(session.buildPlatform, session.options.root, guard);
+        report.document = {{"directory", kPluginDirectory}, {"plugins", plugins}};
+        const auto skipped =
+            std::ranges::count_if(plugins, [](const Json& plugin) { return plugin["state"] != kLoaded; });
+        if (skipped > 0) {
+            report.failure = skipped == 1 ? "one plug-in does not load"
+                                          : std::to_string(skipped) + " plug-ins do not load";
+        }
+        if (plugins.empty()) {
+            return report.line(std::string("No plug-ins in ") + kPluginDirectory);
+        }
+        return report.table(plugins, {{"IDENTIFIER", "identifier"}, {"FILE", "file"}, {"STATE", "state"}});
+    } catch (const Interrupted&) {
+        guard.release();
+        throw CommandFailure("interrupted");
     }
-    return report.table(plugins, {{"IDENTIFIER", "identifier"}, {"FILE", "file"}, {"STATE", "state"}});
 }
 
 struct TryArguments {
@@ -222,10 +221,11 @@ void addPluginsCommands(CommandLine& commandLine) {
     CommandLevel group = commandLine.addGroup("plugins", "The delegate plug-ins of this machine");
     commandLine.addCommand(
         group, "list",
-        "Load every plug-in and show its identifier, its file, and its state: loaded, or why "
-        "it was skipped",
-        listPlugins);
+        "Load every plug-in, in a process of their own, and show its identifier, its file, and its state: "
+        "loaded, or why it was skipped; exit status 0: all are loaded, 1: one is not",
+        showPlugins);
     addTry(commandLine, group);
+    addPluginsCheck(commandLine, group);
 }
 
 } // namespace welcomer::tool

@@ -1,0 +1,14 @@
+/* Makes no instance. */
+
+#include "plugin.h"
+
+static wl_delegate* make(const wl_host* given, wl_error_slot* slot);
+#define CREATE make
+
+#include "whole.h"
+
+static wl_delegate* make(const wl_host* given, wl_error_slot* slot) {
+    host = given;
+    UNUSED(slot);
+    return instance.size == 0 ? &instance : NULL;
+}

@@ -1,0 +1,15 @@
+/* Installs a handler of its own. */
+
+#include "plugin.h"
+
+static wl_delegate* make(const wl_host* given, wl_error_slot* slot);
+#define CREATE make
+
+#include "whole.h"
+
+static wl_delegate* make(const wl_host* given, wl_error_slot* slot) {
+    host = given;
+    UNUSED(slot);
+    signal(SIGTERM, SIG_IGN);
+    return &instance;
+}

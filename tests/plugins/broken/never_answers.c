@@ -1,0 +1,11 @@
+/* Never answers. */
+
+#include "plugin.h"
+
+COMPLETION(complete) {
+    UNUSED(self, response, slot);
+    UNUSED(&handler);
+}
+#define COMPLETE complete
+
+#include "whole.h"

@@ -1,0 +1,7 @@
+/* Lacks a required operation. */
+
+#include "plugin.h"
+
+#define COMPLETE NULL
+
+#include "whole.h"

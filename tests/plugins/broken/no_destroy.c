@@ -1,0 +1,7 @@
+/* Cannot give an instance back. */
+
+#include "plugin.h"
+
+#define DESTROY NULL
+
+#include "whole.h"

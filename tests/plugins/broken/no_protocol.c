@@ -1,0 +1,7 @@
+/* Names no protocol. */
+
+#include "plugin.h"
+
+#define PROTOCOL NULL
+
+#include "whole.h"

@@ -1,0 +1,7 @@
+/* Names another protocol. */
+
+#include "plugin.h"
+
+#define PROTOCOL "SomethingElse"
+
+#include "whole.h"

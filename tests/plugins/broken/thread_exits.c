@@ -1,0 +1,19 @@
+/* Exits on a thread of its own. */
+
+#include "plugin.h"
+
+static void* run(void* given) {
+    exit(3);
+    return given;
+}
+
+COMPLETION(complete) {
+    UNUSED(self, response, slot);
+    UNUSED(&handler);
+    pthread_t thread;
+    pthread_create(&thread, NULL, run, NULL);
+    pthread_detach(thread);
+}
+#define COMPLETE complete
+
+#include "whole.h"
