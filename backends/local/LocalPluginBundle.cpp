@@ -10,21 +10,14 @@
 
 #include <cerrno>
 #include <dlfcn.h>
-#include <fcntl.h>
 #include <optional>
-#include <sys/stat.h>
+#include <utility>
 
 namespace welcomer::local {
 
 namespace {
 
 constexpr std::size_t kMaximumInfoSize = std::size_t{1} << 20;
-
-bool isFolder(const posix::RootFolder& root, const std::string& path) {
-    const posix::FileDescriptor file = root.open(path, O_PATH);
-    struct stat status = {};
-    return file && ::fstat(file.get(), &status) == 0 && S_ISDIR(status.st_mode);
-}
 
 // The library of a folder as a path of the system, or none with the reason.
 std::optional<std::string> libraryOf(const posix::RootFolder& root, const std::string& path,
@@ -76,18 +69,21 @@ std::string lastLoaderError(const std::string& path) {
 platform::PluginSymbol LocalPluginBundle::load(const std::string& given, const char* symbol) {
     const std::string path = _pluginFolder.located(given);
     std::string library = path;
+    std::optional<LibraryFile> file(std::in_place, _root, path);
     std::string reason;
-    if (isFolder(_root, path)) {
+    if (file->isFolder()) {
         const std::optional<std::string> inner = libraryOf(_root, path, reason);
         if (!inner) {
             return {nullptr, reason};
         }
         library = *inner;
+        file.emplace(_root, library);
     }
-    reason = reasonNotToLoad(_root, library);
+    reason = file->reasonNotToLoad(_strangers);
     if (!reason.empty()) {
         return {nullptr, reason};
     }
+    file.reset(); // no descriptor of this one's is open while a library's own code runs
     // The loader knows libraries by their paths, so that a descriptor's in /proc, whose number is used again,
     // would be taken for another's. With the root "/" it follows links as the system does.
     const std::string located =

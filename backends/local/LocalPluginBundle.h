@@ -4,6 +4,7 @@
 
 #include "backends/local/PluginFolder.h"
 #include "backends/posix/RootFolder.h"
+#include "backends/posix/Strangers.h"
 #include "platform/PluginBundle.h"
 
 namespace welcomer::local {
@@ -18,13 +19,15 @@ class LocalPluginBundle final : public platform::PluginBundle {
     //  pluginFolder  what plug-ins are loaded from in the place of the system's directory of them
     LocalPluginBundle(posix::RootFolder root, PluginFolder pluginFolder)
         : _root(std::move(root)),
-          _pluginFolder(std::move(pluginFolder)) {}
+          _pluginFolder(std::move(pluginFolder)),
+          _strangers(_root) {}
 
     platform::PluginSymbol load(const std::string& path, const char* symbol) override;
 
   private:
     const posix::RootFolder _root;
     const PluginFolder _pluginFolder;
+    posix::FolderStrangers _strangers;
 };
 
 } // namespace welcomer::local

@@ -27,7 +27,15 @@ class StrangersTest : public testing::Test {
         return strangerWhoMayChange(RootFolder(root.path()), path, mayBeOwn);
     }
 
+    // As it is asked for each file of a folder in turn.
+    std::string strangerInTurn(const std::string& path) {
+        struct stat status = {};
+        EXPECT_EQ(::lstat(root.locate(path).c_str(), &status), 0);
+        return remembering.whoMayChange(path, S_ISLNK(status.st_mode) ? nullptr : &status);
+    }
+
     TemporaryRoot root;
+    FolderStrangers remembering{RootFolder(root.path())};
 };
 
 TEST_F(StrangersTest, WhatBelongsToTheRootFoldersOwnerIsRight) {
@@ -91,6 +99,49 @@ TEST_F(StrangersTest, WhatIsOnesOwnIsRightWhereNobodyElseLoadsIt) {
     ASSERT_EQ(::seteuid(0), 0);
     EXPECT_EQ(own, "");
     EXPECT_EQ(others, root.locate("/folder/file") + " belongs to user 12345");
+}
+
+TEST_F(StrangersTest, OneFileAfterTheOtherIsLookedAt) {
+    root.addFile("/folder/other", "");
+    setMode("/folder/other", 0646);
+    EXPECT_EQ(strangerInTurn("/folder/file"), "");
+    EXPECT_EQ(strangerInTurn("/folder/other"), "everybody may write " + root.locate("/folder/other"));
+    EXPECT_EQ(strangerInTurn("/folder/file"), "");
+    EXPECT_EQ(strangerInTurn("/folder"), "");
+}
+
+TEST_F(StrangersTest, AFolderThatChangesIsLookedAtAnew) {
+    EXPECT_EQ(strangerInTurn("/folder/file"), "");
+    setMode("/folder", 01777); // whoever may write there may add to it
+    EXPECT_EQ(strangerInTurn("/folder/file"), "everybody may write " + root.locate("/folder"));
+    setMode("/folder", 0755);
+    EXPECT_EQ(strangerInTurn("/folder/file"), "");
+}
+
+TEST_F(StrangersTest, AnotherFolderIsLookedAtForItself) {
+    root.addFile("/open/file", "");
+    setMode("/open", 0757);
+    EXPECT_EQ(strangerInTurn("/folder/file"), "");
+    EXPECT_EQ(strangerInTurn("/open/file"), "everybody may write " + root.locate("/open"));
+    EXPECT_EQ(strangerInTurn("/folder/file"), "");
+}
+
+TEST_F(StrangersTest, AFolderThatIsPutInThePlaceOfAnotherIsLookedAtAnew) {
+    root.addFile("/open/file", "");
+    setMode("/open", 0757);
+    std::filesystem::create_symlink("folder", root.locate("/link"));
+    EXPECT_EQ(strangerInTurn("/link/file"), "");
+    std::filesystem::remove(root.locate("/link"));
+    std::filesystem::create_symlink("open", root.locate("/link"));
+    EXPECT_EQ(strangerInTurn("/link/file"), "everybody may write " + root.locate("/open"));
+}
+
+TEST_F(StrangersTest, OfALinkInAFolderTheFileThatItLeadsToIsLookedAt) {
+    root.addFile("/open/file", "");
+    setMode("/open", 0757);
+    std::filesystem::create_symlink("../open/file", root.locate("/folder/link"));
+    EXPECT_EQ(strangerInTurn("/folder/file"), "");
+    EXPECT_EQ(strangerInTurn("/folder/link"), "everybody may write " + root.locate("/open"));
 }
 
 } // namespace
