@@ -2,6 +2,7 @@
 
 #include "tools/account-server/HttpExchange.h"
 
+#include <algorithm>
 #include <fcntl.h>
 #include <limits>
 #include <microhttpd.h>
@@ -17,6 +18,16 @@ constexpr std::size_t kConnectionMemory = std::size_t{16} * 1024;  // bytes: wha
 constexpr std::size_t kAllBodies = std::size_t{256} * 1024 * 1024; // bytes, of one listener
 constexpr std::size_t kReservedForBody = std::size_t{64} * 1024;   // bytes, before any of it has come
 constexpr char kTlsVersions[] = "NORMAL:-VERS-ALL:+VERS-TLS1.3:+VERS-TLS1.2";
+
+// Of the connections on a Unix socket one user has no more than this part of all, so that others can sign in, too.
+constexpr std::size_t kShareOfAUser = 16;
+constexpr std::size_t kLeastOfAUser = 8;
+
+bool isUnixSocket(int socket) {
+    int domain = 0;
+    socklen_t length = sizeof domain;
+    return ::getsockopt(socket, SOL_SOCKET, SO_DOMAIN, &domain, &length) == 0 && domain == AF_UNIX;
+}
 
 MHD_Result result(bool isSuccess) {
     return isSuccess ? MHD_YES : MHD_NO;
@@ -73,6 +84,7 @@ HttpListener::HttpListener(posix::FileDescriptor socket, const TlsIdentity* iden
                            const Settings& settings, RequestHandler& handler,
                            const HttpSurroundings& surroundings)
     : _socket(std::move(socket)),
+      _isForUsers(isUnixSocket(_socket.get())),
       _identity(identity ? std::make_unique<TlsIdentity>(*identity) : nullptr),
       _settings(settings),
       _handler(handler),
@@ -151,13 +163,22 @@ HttpListener::Connection* HttpListener::_connected(MHD_Connection* handle) {
     auto connection =
         std::make_unique<Connection>(socket, session, _peerOf.connected(socket), _surroundings.timers);
     ++_surroundings.metrics.connections;
-    if (connection->from.isAllowed) {
+    if (connection->from.isAllowed && !_hasEnough(connection->from)) {
         _limitArrival(*connection, _settings.headLimit);
     } else {
         connection->end();
     }
     _connections.push_back(std::move(connection));
     return _connections.back().get();
+}
+
+bool HttpListener::_hasEnough(const PeerOf::Connected& from) const {
+    if (!_isForUsers || from.isFront) {
+        return false;
+    }
+    const auto count = std::ranges::count_if(
+        _connections, [&](const auto& each) { return each->from.peer.counted == from.peer.counted; });
+    return static_cast<std::size_t>(count) >= std::max(_settings.connections / kShareOfAUser, kLeastOfAUser);
 }
 
 void HttpListener::_disconnected(const Connection* connection) {

@@ -90,10 +90,14 @@ class HttpListener {
     void _completed(const Exchange& exchange);
     void _disconnected(const Connection* connection);
 
+    // Whether somebody who connects holds as many connections as one user may.
+    bool _hasEnough(const PeerOf::Connected& from) const;
+
     // Has a request arrive in time: tells the client else, and ends the connection.
     void _limitArrival(Connection& connection, std::chrono::seconds limit);
 
     const posix::FileDescriptor _socket;
+    const bool _isForUsers; // of this machine, by a Unix socket
     const std::unique_ptr<TlsIdentity> _identity;
     const Settings& _settings;
     RequestHandler& _handler;

@@ -1,7 +1,5 @@
 #include "backends/desktop/accounts/OnlineAccountService.h"
 
-#include "propertylist/PropertyListReadings.h"
-
 #include <algorithm>
 #include <array>
 #include <atomic>
@@ -27,6 +25,10 @@ std::optional<OnlineFeature> featureOf(const std::string& service) {
                                     : std::optional(static_cast<OnlineFeature>(found - kServices.begin()));
 }
 
+const char* serviceOf(OnlineFeature feature) {
+    return kServices[static_cast<std::size_t>(feature)];
+}
+
 bool looksLikeMailAddress(const std::string& text) {
     const std::size_t at = text.find('@');
     return at != std::string::npos && at > 0 && at + 1 < text.size();
@@ -38,23 +40,90 @@ bool isText(const std::optional<PropertyList>& value) {
 
 } // namespace
 
-struct OnlineAccountService::Switches {
-    const std::function<OnlineAccounts*()> onlineAccounts;
-    const std::function<OnlineAccountServer()> server;
+class OnlineAccountService::Switches {
+  public:
+    Switches(const OnlineAccountSurroundings& surroundings, std::function<OnlineAccountServer()> server)
+        : _onlineAccounts(surroundings.onlineAccounts),
+          _server(std::move(server)),
+          _pending(surroundings.preferenceStore) {}
 
-    std::optional<std::vector<OnlineAccount>> list() const {
-        OnlineAccounts* const accounts = onlineAccounts();
-        return accounts ? accounts->list() : std::nullopt;
-    }
+    const PendingSwitches& pending() const { return _pending; }
 
     // The online account that has the switch of a cloud account's service.
     std::optional<OnlineAccount> find(const std::string& name, OnlineFeature feature) const {
+        return _findIn(_list(), name, feature);
+    }
+
+    // Sets the switch of a cloud account's service, where there is one. What cannot be set is in the account file all
+    // the same, and is remembered.
+    void set(const std::string& name, OnlineFeature feature, bool isOn) const {
+        const std::string service = serviceOf(feature);
+        const auto all = _list();
+        if (!all) {
+            if (_pending.isMade(name)) {
+                _pending.note(name, service);
+            }
+            return;
+        }
+        const auto account = _findIn(all, name, feature);
+        const bool isToBeSet = account && account->switchOf(feature).isOff == isOn;
+        if (isToBeSet) {
+            _pending.note(name, service); // before: this process may end meanwhile
+        }
+        OnlineAccounts* const accounts = _onlineAccounts();
+        if (!isToBeSet || (accounts && accounts->setFeature(*account, feature, isOn))) {
+            _pending.forget(name, service);
+        }
+    }
+
+    // Sets the switches that are still to be set.
+    //  embedded, account  say how, and whose
+    void bringInLine(platform::AccountService& embedded, platform::CloudAccount& account) const {
+        const std::string name = account.accountID();
+        for (std::size_t i = 0; i < kServices.size(); ++i) {
+            if (_pending.has(name, kServices[i])) {
+                set(name, static_cast<OnlineFeature>(i), embedded.isServiceEnabled(&account, kServices[i]));
+            }
+        }
+    }
+
+    // Whether the online accounts are served and the cloud account has none.
+    bool lack(const std::string& name) const {
+        const auto all = _list();
+        if (!all) {
+            return false;
+        }
+        const std::string provider = _server().providerType;
+        return std::none_of(all->begin(), all->end(), [&](const OnlineAccount& account) {
+            return account.identity == name && account.providerType == provider;
+        });
+    }
+
+    // On the cloud service's own server.
+    bool makeOnce(NewOnlineAccount account) const {
+        OnlineAccounts* const accounts = _onlineAccounts();
+        if (!accounts) {
+            return false;
+        }
+        OnlineAccountServer own = _server();
+        account.providerType = std::move(own.providerType);
+        account.serverAddress = std::move(own.address);
+        return accounts->makeOnce(account);
+    }
+
+  private:
+    std::optional<std::vector<OnlineAccount>> _list() const {
+        OnlineAccounts* const accounts = _onlineAccounts();
+        return accounts ? accounts->list() : std::nullopt;
+    }
+
+    std::optional<OnlineAccount> _findIn(std::optional<std::vector<OnlineAccount>> all,
+                                         const std::string& name, OnlineFeature feature) const {
         std::optional<OnlineAccount> found;
-        std::optional<std::vector<OnlineAccount>> all = list();
         if (!all || all->empty()) {
             return found;
         }
-        const std::string provider = feature == OnlineFeature::Mail ? kMailProvider : server().providerType;
+        const std::string provider = feature == OnlineFeature::Mail ? kMailProvider : _server().providerType;
         for (OnlineAccount& account : *all) {
             if (account.identity == name && account.switchOf(feature).isKnown() &&
                 (!found || (account.providerType == provider && found->providerType != provider))) {
@@ -64,36 +133,9 @@ struct OnlineAccountService::Switches {
         return found;
     }
 
-    // Whether the online accounts are served and the cloud account has none.
-    bool lack(const std::string& name) const {
-        const auto all = list();
-        if (!all) {
-            return false;
-        }
-        const std::string provider = server().providerType;
-        return std::none_of(all->begin(), all->end(), [&](const OnlineAccount& account) {
-            return account.identity == name && account.providerType == provider;
-        });
-    }
-
-    // What cannot be switched is in the account file all the same.
-    void set(const OnlineAccount& account, OnlineFeature feature, bool isOn) const {
-        if (OnlineAccounts* const accounts = onlineAccounts()) {
-            accounts->setFeature(account, feature, isOn);
-        }
-    }
-
-    // On the cloud service's own server.
-    bool makeOnce(NewOnlineAccount account) const {
-        OnlineAccounts* const accounts = onlineAccounts();
-        if (!accounts) {
-            return false;
-        }
-        OnlineAccountServer own = server();
-        account.providerType = std::move(own.providerType);
-        account.serverAddress = std::move(own.address);
-        return accounts->makeOnce(account);
-    }
+    const std::function<OnlineAccounts*()> _onlineAccounts;
+    const std::function<OnlineAccountServer()> _server;
+    const PendingSwitches _pending;
 };
 
 class OnlineAccountService::Service final : public platform::CloudService {
@@ -128,22 +170,15 @@ class OnlineAccountService::Service final : public platform::CloudService {
 
     void enableWithWindow(bool enabled, bool creating, platform::Window* window) override {
         _embedded->enableWithWindow(enabled, creating, window);
-        _switch(enabled);
+        _switches->set(_account, _feature, enabled);
     }
 
     void enableSilently(bool enabled) override {
         _embedded->enableSilently(enabled);
-        _switch(enabled);
+        _switches->set(_account, _feature, enabled);
     }
 
   private:
-    void _switch(bool enabled) {
-        const auto account = _switches->find(_account, _feature);
-        if (account && account->switchOf(_feature).isOff == enabled) {
-            _switches->set(*account, _feature, enabled);
-        }
-    }
-
     const std::shared_ptr<const Switches> _switches;
     const std::shared_ptr<platform::CloudService> _embedded;
     const std::string _account;
@@ -218,7 +253,9 @@ class OnlineAccountService::SignIn final : public platform::NotificationCenter,
             const bool isMade = switches->makeOnce(*std::exchange(made, std::nullopt));
             runLoop->perform([weak, port, notification, isMade] {
                 if (const auto self = weak.lock()) {
-                    self->_remember(isMade);
+                    if (isMade) {
+                        self->_isMade();
+                    }
                     self->_finish(notification);
                 }
             });
@@ -226,10 +263,11 @@ class OnlineAccountService::SignIn final : public platform::NotificationCenter,
     }
 
   private:
-    void _remember(bool isMade) {
-        if (isMade) {
-            _surroundings.preferenceStore.setValue(_identity, true, kOnlineAccountsDomain);
-            _surroundings.preferenceStore.synchronise(kOnlineAccountsDomain);
+    void _isMade() const {
+        _switches->pending().setMade(_identity);
+        // It may have been there before, and then begins with nothing.
+        if (const auto account = _embedded->sharedManager().accountForID(_identity, false)) {
+            _switches->bringInLine(*_embedded, *account);
         }
     }
 
@@ -250,7 +288,7 @@ class OnlineAccountService::SignIn final : public platform::NotificationCenter,
 OnlineAccountService::OnlineAccountService(OnlineAccountSurroundings surroundings,
                                            std::function<OnlineAccountServer()> server)
     : _surroundings(std::move(surroundings)),
-      _switches(std::make_shared<Switches>(Switches{_surroundings.onlineAccounts, std::move(server)})),
+      _switches(std::make_shared<Switches>(_surroundings, std::move(server))),
       _embedded(_surroundings.makeEmbedded(_surroundings.notificationCenter)) {}
 
 OnlineAccountService::~OnlineAccountService() = default;
@@ -261,8 +299,7 @@ std::shared_ptr<platform::CloudAccount> OnlineAccountService::loggedInAccount() 
         return nullptr;
     }
     const std::string name = account->accountID();
-    const bool wasMade = booleanReading(_surroundings.preferenceStore.copyValue(name, kOnlineAccountsDomain));
-    return wasMade && _switches->lack(name) ? nullptr : _wrap(std::move(account));
+    return _switches->pending().isMade(name) && _switches->lack(name) ? nullptr : _wrap(std::move(account));
 }
 
 bool OnlineAccountService::isServiceEnabled(platform::CloudAccount* account, const std::string& identifier) {
@@ -277,7 +314,11 @@ bool OnlineAccountService::isServiceEnabled(platform::CloudAccount* account, con
 
 std::shared_ptr<platform::CloudAccount>
 OnlineAccountService::accountForID(const std::optional<PropertyList>& identifier, bool createIfMissing) {
-    return _wrap(_embedded->sharedManager().accountForID(identifier, createIfMissing));
+    auto account = _embedded->sharedManager().accountForID(identifier, createIfMissing);
+    if (account && createIfMissing) { // it is to be set up
+        _switches->bringInLine(*_embedded, *account);
+    }
+    return _wrap(std::move(account));
 }
 
 void OnlineAccountService::authenticate(const std::string& username, const std::string& password,

@@ -3,6 +3,7 @@
 #pragma once
 
 #include "backends/desktop/accounts/OnlineAccounts.h"
+#include "backends/desktop/accounts/PendingSwitches.h"
 #include "platform/AccountService.h"
 #include "platform/DispatchQueue.h"
 #include "platform/NotificationCenter.h"
@@ -37,9 +38,6 @@ struct OnlineAccountServer {
     std::string address;      // a URL
 };
 
-// The domain that says for which account names an online account has been made.
-inline constexpr char kOnlineAccountsDomain[] = "com.corvid.welcomer.onlineaccounts";
-
 // The embedded account service, with these differences where the online accounts are served:
 //  - Contacts, calendars and documents are the switches of the online account whose identity is the cloud
 //    account's name, mail the switch of the mail account of that identity, which gives the mail address, too.
@@ -50,6 +48,9 @@ inline constexpr char kOnlineAccountsDomain[] = "com.corvid.welcomer.onlineaccou
 //  - A completed sign-in makes the online account, once per identity, with its password and with nothing
 //    switched on but what is enabled already; only then comes the notification. Where that fails, the account
 //    stays an embedded one.
+//  - A switch that could not be set, because nobody served the online accounts or they went meanwhile, is remembered,
+//    and set to what the embedded service says with the next sign-in, or when the account is next asked for to be
+//    set up.
 //  - An account whose online account has been made and is gone, because the user has removed it, is no longer
 //    logged in.
 // Where nobody serves them there are no differences. Nothing of this shows an interface.
@@ -72,7 +73,7 @@ class OnlineAccountService final : public platform::AccountService, public platf
     void markSetupFinished(const std::optional<PropertyList>& information) override;
 
   private:
-    struct Switches;
+    class Switches;
     class Account;
     class Service;
     class SignIn;

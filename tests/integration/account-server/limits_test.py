@@ -99,6 +99,37 @@ class Limits(unittest.TestCase):
             bare.sendall(b"\x16")
             self.assertEqual(bare.recv(100), b"")
 
+    def test_one_user_cannot_hold_all_the_connections(self):
+        server = self.serve("Connections=32\nHeadSeconds=600\nIdleSeconds=600\n")
+        # Every connection has had an answer, and so is the server's.
+        holding = """
+import signal, socket, sys
+held = []
+for number in range(64):
+    connection = socket.socket(socket.AF_UNIX)
+    held.append(connection)
+    try:
+        connection.connect(sys.argv[1])
+        connection.sendall(b"GET /v1/server HTTP/1.1\\r\\nHost: localhost\\r\\n\\r\\n")
+        connection.settimeout(5)
+        connection.recv(65536)
+    except OSError:
+        pass
+print("holds", flush=True)
+signal.pause()
+"""
+        path = "/" + str(server.path.relative_to(self.machine.root))
+        other = self.machine.start(["/usr/bin/python3", "-c", holding, path], user=31998, stdout=subprocess.PIPE, text=True)
+        try:
+            self.assertEqual(other.stdout.readline(), "holds\n")
+            for _ in range(3):
+                self.assertEqual(server.authenticate().status, 200)
+            self.assertEqual(server.figures()["connections"], 8 + 1)
+        finally:
+            other.kill()
+            other.wait()
+            other.stdout.close()
+
     def test_a_body_that_drips_is_broken_off(self):
         server = self.serve("BodySeconds=1\n")
         for use in WAYS:

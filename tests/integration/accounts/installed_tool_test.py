@@ -48,8 +48,19 @@ class InstalledTool(unittest.TestCase):
             folder.chmod(0o700)
             os.chown(folder, machine.UID, machine.UID)
         (self.machine.root / "etc/bus.conf").write_text(BUS, encoding="utf-8")
-        self.start("dbus-daemon", "--nofork", "--config-file=/etc/bus.conf")
-        self.machine.wait_for((self.machine.root / RUNTIME[1:] / "bus").exists, "the bus")
+        self.start_bus()
+
+    def start_bus(self):
+        socket = self.machine.root / RUNTIME[1:] / "bus"
+        socket.unlink(missing_ok=True)
+        self.daemons = [self.start("dbus-daemon", "--nofork", "--config-file=/etc/bus.conf")]
+        self.machine.wait_for(socket.exists, "the bus")
+
+    def kill_bus(self):
+        """The bus dies, and what is on it ends."""
+        for daemon in self.daemons:
+            daemon.kill()
+            daemon.wait()
 
     def start(self, *command, pass_fds=()):
         daemon = self.machine.start([*SESSION, *command], user=True, pass_fds=pass_fds)
@@ -61,10 +72,11 @@ class InstalledTool(unittest.TestCase):
         reading, writing = os.pipe()
         os.write(writing, b"keyring")
         os.close(writing)
-        self.start("sh", "-c", f"exec gnome-keyring-daemon --foreground --unlock --components=secrets <&{reading}",
-                   pass_fds=[reading])
+        self.daemons.append(self.start(
+            "sh", "-c", f"exec gnome-keyring-daemon --foreground --unlock --components=secrets <&{reading}",
+            pass_fds=[reading]))
         os.close(reading)
-        self.start("/usr/libexec/goa-daemon")
+        self.daemons.append(self.start("/usr/libexec/goa-daemon"))
         for name in ("org.freedesktop.secrets", NAME):
             self.machine.wait_for(lambda: "true" in self.call("org.freedesktop.DBus", "/", "org.freedesktop.DBus."
                                                               "NameHasOwner", name), name)
@@ -191,6 +203,33 @@ class InstalledTool(unittest.TestCase):
         self.assertIn("'anna'", self.call(NAME, path, "org.freedesktop.DBus.Properties.Get", f"{NAME}.Account",
                                           "Identity"))
         self.assertEqual(self.enabled(), {"documents"})
+
+    def enable_while_the_bus_is_dead(self):
+        """Documents: the account file has them, the online account does not."""
+        self.start_daemons()
+        self.tool("account", "add", "anna", password=PASSWORD)
+        self.tool("account", "sign-in", "anna", password=PASSWORD)
+        self.kill_bus()
+        self.tool("services", "enable", "--account", "anna", "--phase", "pre", "--select", "documents")
+        self.start_bus()
+        self.start_daemons()
+        self.assertEqual(self.online_account()[1], set())
+
+    def test_a_switch_that_a_dead_bus_kept_from_being_set_is_set_with_the_next_services(self):
+        self.enable_while_the_bus_is_dead()
+        self.tool("services", "enable", "--account", "anna", "--phase", "post", "--select", "contacts")
+        self.assertEqual(self.online_account()[1], {"Files", "Contacts"})
+        # What the user does with the switches from then on stands.
+        path = self.online_account()[0]
+        self.call(NAME, path, "org.freedesktop.DBus.Properties.Set", f"{NAME}.Account", "FilesDisabled", "<true>")
+        self.machine.wait_for(lambda: self.online_account()[1] == {"Contacts"}, "the switch")
+        self.tool("services", "enable", "--account", "anna", "--phase", "post", "--select", "contacts")
+        self.assertEqual(self.online_account()[1], {"Contacts"})
+
+    def test_so_is_it_with_the_next_sign_in(self):
+        self.enable_while_the_bus_is_dead()
+        self.tool("account", "sign-in", "anna", password=PASSWORD)
+        self.assertEqual(self.online_account()[1], {"Files"})
 
     def test_without_the_daemon_the_account_file_serves(self):
         self.tool("account", "add", "anna", password=PASSWORD)

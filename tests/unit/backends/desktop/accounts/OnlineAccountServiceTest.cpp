@@ -161,6 +161,42 @@ TEST_F(OnlineAccountServiceTest, TheEmbeddedServiceServesAloneWhereNobodyServesT
     EXPECT_EQ(online.writes, 0);
 }
 
+TEST_F(OnlineAccountServiceTest, ASwitchThatWasNotTakenIsSetWhenTheAccountIsNextSetUpAndThenIsTheUsers) {
+    online.add("owncloud", "bert", false);
+    online.canWrite = false;
+    enable(kSKServiceIDContacts);
+    online.canWrite = true;
+    EXPECT_FALSE(isOn(0, OnlineFeature::Contacts));
+
+    const auto next = backend.makeService();
+    next->accountForID("bert", false);
+    EXPECT_FALSE(isOn(0, OnlineFeature::Contacts)); // only looked at
+    next->accountForID("bert", true);
+    EXPECT_TRUE(isOn(0, OnlineFeature::Contacts));
+
+    online.accounts[0].switches[0] = {true, false};
+    next->accountForID("bert", true);
+    EXPECT_FALSE(isOn(0, OnlineFeature::Contacts));
+}
+
+TEST_F(OnlineAccountServiceTest, WhileNobodyServesOnlyTheSwitchesOfAnAccountThatWasMadeAreRemembered) {
+    backend.addUser("anna", "secret");
+    signIn("anna", "secret");
+    online.add("owncloud", "bert", false);
+    const auto anna = backend.service.accountForID("anna", true);
+    for (const bool isWanted : {true, false, true}) {
+        online.isServing = false;
+        enable(kSKServiceIDContacts, isWanted);
+        anna->serviceForID(kSKServiceIDContacts)->enableSilently(!isWanted);
+        anna->serviceForID(kSKServiceIDContacts)->enableSilently(isWanted); // the last word counts
+        online.isServing = true;
+        bert();
+        backend.service.accountForID("anna", true);
+        EXPECT_EQ(isOn(0, OnlineFeature::Contacts), isWanted);
+        EXPECT_FALSE(isOn(1, OnlineFeature::Contacts));
+    }
+}
+
 TEST_F(OnlineAccountServiceTest, TheMailAccountInEffectGivesTheAddress) {
     backend.addUser("bert", "secret"); // whose address in the directory is another
     online.add("imap_smtp", "bert", true).mailAddress = "bert@mail.example";
