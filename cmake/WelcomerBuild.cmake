@@ -58,7 +58,7 @@ function(welcomer_precompile target)
     target_compile_options(${target} PRIVATE ${WELCOMER_PRECOMPILED_OPTIONS})
     # g++ 12 takes the strings' own copying, once precompiled, for code that is to be warned about, and is wrong about it.
     target_compile_options(${target} PRIVATE
-        "$<$<COMPILE_LANG_AND_ID:CXX,GNU>:-Wno-array-bounds;-Wno-stringop-overflow>")
+        "$<$<COMPILE_LANG_AND_ID:CXX,GNU>:-Wno-array-bounds;-Wno-stringop-overflow;-Wno-stringop-overread>")
     target_precompile_headers(${target} PRIVATE
         <algorithm> <chrono> <cstdint> <filesystem> <functional> <map> <memory> <mutex> <optional> <span> <string>
         <string_view> <utility> <variant> <vector>)
