@@ -92,6 +92,18 @@ class Silence(SmallFleet):
         self.assertEqual(accounting.losses(self.sign_in(40)), {})
 
 
+class LostHost(SmallFleet):
+    def test_an_account_server_that_nobody_hears_from_costs_a_wait_and_nothing_else(self):
+        self.sign_in(20)  # the front keeps connections to each of them
+        lost = self.fleet.servers[0]
+        lost.host.cut_off()
+        before = len(accounting.sign_ins(lost.host.lines()))
+        tries = self.sign_in(40)
+        print(f"the longest took {max(each.took for each in tries):.1f} s; failed: {dict(accounting.failures(tries))}")
+        self.assertEqual(accounting.losses(tries), {})
+        self.assertEqual(len(accounting.sign_ins(lost.host.lines())), before)
+
+
 class Addresses(SmallFleet):
     def test_the_servers_know_who_asked_the_front(self):
         self.sign_in(20)
