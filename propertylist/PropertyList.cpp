@@ -11,7 +11,9 @@ PropertyList& PropertyList::operator=(const PropertyList& other) = default;
 PropertyList& PropertyList::operator=(PropertyList&& other) noexcept = default;
 PropertyList::~PropertyList() = default;
 
-bool operator==(const PropertyList& one, const PropertyList& other) = default;
+bool operator==(const PropertyList& one, const PropertyList& other) {
+    return one._value == other._value;
+}
 
 PropertyList::Type PropertyList::type() const {
     // In the order of the variant's alternatives.
