@@ -1,6 +1,7 @@
 #include "tools/welcomer/plugins/CheckProcess.h"
 
 #include "backends/posix/FileDescriptor.h"
+#include "platform/Platform.h"
 #include "plugins/PluginContext.h"
 #include "text/Describe.h"
 #include "tools/welcomer/cli/PropertyListOutput.h"
@@ -75,6 +76,9 @@ void shutIn(int output) {
     ::dup2(output, STDERR_FILENO);
     const rlimit none{0, 0};
     ::setrlimit(RLIMIT_CORE, &none);
+    // As the agent does: what the desktop's libraries do then changes nothing.
+    ::signal(SIGPIPE, SIG_IGN);
+    ::signal(SIGXFSZ, SIG_IGN);
     // A copy of this process has nothing to tell; it would say everything twice.
     ::pthread_atfork(nullptr, nullptr, [] { ::_exit(0); });
     setPluginAccount(kAccount);
@@ -147,7 +151,7 @@ CheckOutcome runCheck(const PlatformFactory& buildPlatform, const std::string& r
     std::optional<AgentEnd> end;
     try {
         end = runChildProcess(buildPlatform, root, TimeKind::Real, guard, listener,
-                              lifeOf(check, input, output.get()));
+                              lifeOf(check, input, output.get()), &platform::current().runLoops);
     } catch (const TooLong&) {
     }
     if (!told.isFinished) {

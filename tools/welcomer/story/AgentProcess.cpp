@@ -150,7 +150,8 @@ class RecordReader {
 
 // The child's whole life.
 [[noreturn]] void beChild(const PlatformFactory& buildPlatform, const std::string& root, TimeKind time,
-                          pid_t parent, int logDescriptor, const ChildLife& life) {
+                          pid_t parent, int logDescriptor, const ChildLife& life,
+                          platform::RunLoops* runLoops) {
     // Should the tool be killed, its child goes with it.
     prctl(PR_SET_PDEATHSIG, SIGKILL);
     if (getppid() != parent) {
@@ -158,7 +159,7 @@ class RecordReader {
     }
     dup2(STDERR_FILENO, STDOUT_FILENO); // a plug-in's own words are no result of the tool
     PipeLog log(logDescriptor);
-    const auto owner = buildPlatform({.root = root, .systemLog = &log}, time);
+    const auto owner = buildPlatform({.root = root, .systemLog = &log, .runLoops = runLoops}, time);
     log.setClock(owner->platform().clock);
     const platform::ScopedPlatform installed(owner->platform());
     setPluginRoot(root);
@@ -209,7 +210,8 @@ AgentEnd runAgentProcess(const PlatformFactory& buildPlatform, const std::string
 }
 
 AgentEnd runChildProcess(const PlatformFactory& buildPlatform, const std::string& root, TimeKind time,
-                         InterruptionGuard& guard, const AgentListener& listener, const ChildLife& life) {
+                         InterruptionGuard& guard, const AgentListener& listener, const ChildLife& life,
+                         platform::RunLoops* runLoops) {
     int ends[2];
     if (pipe2(ends, O_CLOEXEC) != 0) {
         failed("cannot make a pipe");
@@ -226,7 +228,7 @@ AgentEnd runChildProcess(const PlatformFactory& buildPlatform, const std::string
     }
     if (id == 0) {
         guard.release();
-        beChild(buildPlatform, root, time, parent, input.number(), life);
+        beChild(buildPlatform, root, time, parent, input.number(), life, runLoops);
     }
     Child child(id);
     input.close();

@@ -44,9 +44,12 @@ struct AgentEnd {
 // Runs a child process and waits for its end. The child's standard output goes to stderr.
 //  root  the folder below which the child looks up everything
 //  time  what the child runs on
+//  runLoops  in the place of those that a platform below that folder has, which know nothing of the desktop's; null for
+//            those
 // Main thread, no other thread running. Throws CommandFailure when no process can be made, and Interrupted.
 AgentEnd runChildProcess(const PlatformFactory& buildPlatform, const std::string& root, TimeKind time,
-                         InterruptionGuard& guard, const AgentListener& listener, const ChildLife& life);
+                         InterruptionGuard& guard, const AgentListener& listener, const ChildLife& life,
+                         platform::RunLoops* runLoops = nullptr);
 
 // The same, with the agent as it is at a login.
 AgentEnd runAgentProcess(const PlatformFactory& buildPlatform, const std::string& root, TimeKind time,
