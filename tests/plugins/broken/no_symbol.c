@@ -7,5 +7,5 @@
 #include "whole.h"
 
 /* So that it is used all the same. */
-__attribute__((visibility("hidden"))) const void* const nobody_sees_this[] = {&instance, (const void*)&CREATE,
-                                                                           (const void*)&DESTROY};
+__attribute__((visibility("hidden")))
+const void* const nobody_sees_this[] = {&instance, (const void*)&CREATE, (const void*)&DESTROY};

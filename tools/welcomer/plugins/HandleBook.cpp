@@ -1,5 +1,7 @@
 #include "tools/welcomer/plugins/HandleBook.h"
 
+#include "plugins/PropertyListHandles.h"
+
 #include <algorithm>
 #include <map>
 
@@ -10,6 +12,14 @@ namespace {
 constexpr std::size_t kMostRecords = 20; // of a loop that goes wrong, the first ones tell
 
 } // namespace
+
+HandleBook::~HandleBook() {
+    for (const Handle& handle : _handles) {
+        if (handle.value && (handle.state == State::Owned || handle.state == State::Released)) {
+            takeHandle(handle.value);
+        }
+    }
+}
 
 HandleBook& HandleBook::instance() {
     static auto* const book = new HandleBook; // plug-in threads may still use it while the process ends

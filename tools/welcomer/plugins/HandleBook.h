@@ -28,10 +28,15 @@ struct MisuseRecord {
 };
 
 // Gives out handles, each of them once in the life of the process, so that one that was given back is known for what it
-// is. The values behind them stay until the process ends, also those that were released: what a plug-in does with one is
+// is. The values behind them stay as long as the book, also those that were released: what a plug-in does with one is
 // reported, and does no harm. Any thread; a handle is never used by two at once.
 class HandleBook {
   public:
+    HandleBook() = default;
+    ~HandleBook(); // with what was owned and not passed on
+    HandleBook(const HandleBook&) = delete;
+    HandleBook& operator=(const HandleBook&) = delete;
+
     // The one that the checking host writes into. Lives until the process ends.
     static HandleBook& instance();
 
