@@ -69,8 +69,7 @@ void SystemLogConnection::send(int priority, std::string_view message) {
     const Deadline deadline = std::chrono::steady_clock::now() + kLongestLogCall;
     std::array<char, kLongestHead> bytes;
     const std::string_view head = writeHead(bytes, priority);
-    // Who waits behind another record has no more time for that.
-    if (const std::unique_lock lock(_mutex, deadline); lock) {
+    if (_beginRecord(deadline)) {
         // The daemon may have been started anew since the last record.
         for (int attempt = 0; attempt < 2; ++attempt) {
             if (!_socket && !_open(deadline)) {
@@ -80,8 +79,27 @@ void SystemLogConnection::send(int priority, std::string_view message) {
                 break;
             }
         }
+        _endRecord();
     }
     errno = errorBefore;
+}
+
+// Who waits behind another record has no more time for that.
+bool SystemLogConnection::_beginRecord(Deadline deadline) {
+    std::unique_lock lock(_mutex);
+    if (!_isFree.wait_until(lock, deadline, [this] { return !_isBusy; })) {
+        return false;
+    }
+    _isBusy = true;
+    return true;
+}
+
+void SystemLogConnection::_endRecord() {
+    {
+        const std::lock_guard lock(_mutex);
+        _isBusy = false;
+    }
+    _isFree.notify_one();
 }
 
 bool SystemLogConnection::_open(Deadline deadline) {

@@ -5,6 +5,7 @@
 #include "backends/posix/FileDescriptor.h"
 
 #include <chrono>
+#include <condition_variable>
 #include <mutex>
 #include <string_view>
 
@@ -27,12 +28,17 @@ class SystemLogConnection {
     using Deadline = std::chrono::steady_clock::time_point;
     enum class Sent { Whole, Lost, NoConnection };
 
+    bool _beginRecord(Deadline deadline);
+    void _endRecord();
     bool _open(Deadline deadline);
     Sent _send(std::string_view head, std::string_view message, Deadline deadline);
     Sent _failed(bool isTorn);
     void _close();
 
-    std::timed_mutex _mutex;
+    // Not a mutex with a time limit, which the thread sanitizer does not know.
+    std::mutex _mutex;
+    std::condition_variable _isFree;
+    bool _isBusy = false; // with a record, which has what follows to itself
     FileDescriptor _socket;
     bool _isStream = false;
 };

@@ -33,6 +33,8 @@ platform::Outcome failure(int number, const std::string& what) {
     return platform::Outcome::failure({number, what + ": " + std::generic_category().message(number)});
 }
 
+constexpr auto kLongestStart = 20s; // while the machine starts up, too; one that ends is not waited for
+
 // The name that it answers for itself, with its secret.
 constexpr const char* kOwnName = "forwarder.welcomer.invalid";
 // The question for its text: one label after the other, the end of the name, the type TXT and the class IN.
@@ -181,7 +183,7 @@ platform::Outcome Forwarder::waitUntilReady() {
     ::inet_pton(AF_INET, kAddress, &address.sin_addr);
     bool ready = false;
     if (socket >= 0 && ::connect(socket, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0) {
-        const auto end = std::chrono::steady_clock::now() + 5s;
+        const auto end = std::chrono::steady_clock::now() + kLongestStart;
         while (!(ready = answers(socket, _secret, 200ms)) && std::chrono::steady_clock::now() < end) {
             // Where nobody listens yet, the query comes back at once.
             std::this_thread::sleep_for(1ms);

@@ -56,9 +56,9 @@ std::string problemWith(const std::string& identifier) {
 // Asks on several threads at once, and finds what differs from what was said first.
 template <class Ask>
 void askOnThreads(const Ask& ask) {
-    std::vector<std::thread> threads;
-    for (int number = 0; number < kThreads; ++number) {
-        threads.emplace_back([&] {
+    std::vector<std::thread> threads(kThreads);
+    for (std::thread& thread : threads) {
+        thread = std::thread([&] {
             for (int time = 0; time < kTimes; ++time) {
                 ask();
             }

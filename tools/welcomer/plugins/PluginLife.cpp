@@ -94,7 +94,7 @@ CallEnd completeLife(CheckedPlugin& plugin, CheckReport& report, const Completio
     if (completion.callerEnds) {
         caller.waitForItsEnd();
     }
-    const CallEnd end = caller.end();
+    CallEnd end = caller.end();
     if (!end.raised && !end.thrown && !plugin.hasEndedThread()) {
         report.step("waiting for its answer");
         const auto patienceEnds = Clock::now() + completion.patience.value_or(24h);

@@ -104,7 +104,9 @@ void signalHandlers(CheckedPlugin& plugin, CheckReport& report, const CheckInput
     findChange(plugin, report, input, [&] {
         for (const auto& [signal, handler] : currentSignalHandlers()) {
             if (before.at(signal) != handler) {
-                return "the handler of " + signal + " was " + before.at(signal) + " and is " + handler;
+                std::string text = "the handler of " + signal;
+                text.append(" was ").append(before.at(signal)).append(" and is ").append(handler);
+                return text;
             }
         }
         return std::string();
