@@ -68,7 +68,7 @@ class PluginTry(unittest.TestCase):
         self.assertIn("setting up org.example.good", [line["message"] for line in login["log"]])
         shown = self.tool("plugins", "try", plugin, "--response", self.folder / "response.plist")
         self.assertEqual(shown.returncode, 0, shown)
-        for line in ("good.ncdplugin: org.example.good", "  response  \"called\"", "  outcome   completed",
+        for line in ("good.ncdplugin: org.example.good", "  response  \"called\"", "  outcome   completed", "  progress  -",
                      "  left running, threads: none", "  left running, processes: none"):
             self.assertIn(line + "\n", shown.stdout)
 

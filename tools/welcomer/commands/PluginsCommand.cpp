@@ -91,8 +91,9 @@ std::string shownOutcome(const Json& plugin) {
 }
 
 void showValue(Report& report, const char* label, const Json& plugin, const char* key) {
+    const Json value = plugin.value(key, Json());
     report.line(std::string("  ") + label +
-                plugin.value(key, Json()).dump(-1, ' ', false, Json::error_handler_t::replace));
+                (value.is_null() ? "-" : value.dump(-1, ' ', false, Json::error_handler_t::replace)));
 }
 
 void showRunning(Report& report, const Json& running) {
