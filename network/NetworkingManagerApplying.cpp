@@ -218,7 +218,8 @@ bool NetworkingManager::configureManual() {
                 service->setEnabled(true);
             }
         }
-    } catch (const std::exception&) { // NOLINT(bugprone-empty-catch): the result so far is the answer
+    } catch (const std::exception&) {
+        // The result so far is the answer.
     }
     return result;
 }

@@ -57,7 +57,8 @@ static void callHandler(std::uint64_t context, bool succeeded, std::int32_t erro
             }
             handler(succeeded, error);
         }
-    } catch (...) { // NOLINT(bugprone-empty-catch): the plug-in below has no use for what went wrong here
+    } catch (...) {
+        // The plug-in below has no use for what went wrong here.
     }
 }
 }

@@ -31,8 +31,8 @@ static void writeLine(wl_delegate* self, wl_log_level level, const char* text) {
     try {
         WL_LOG("plug-in %@ %s: %@", pluginNameOf(self).value_or("(unknown)"), nameOf(level),
                pluginText(text));
-    } catch (
-        ...) { // NOLINT(bugprone-empty-catch): no memory for the line, and no exception may reach a plug-in
+    } catch (...) {
+        // No memory for the line, and no exception may reach a plug-in.
     }
 }
 }

@@ -40,8 +40,8 @@ static void reportProgress(wl_delegate* self, double fraction, const char* text)
         if (!identifier.empty()) {
             WL_LOG("%@ progress: %@", pluginText(identifier), progress);
         }
-    } catch (
-        ...) { // NOLINT(bugprone-empty-catch): no memory for the line, and no exception may reach a plug-in
+    } catch (...) {
+        // No memory for the line, and no exception may reach a plug-in.
     }
 }
 }

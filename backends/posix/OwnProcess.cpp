@@ -22,7 +22,8 @@ constexpr char kSuccess = 1;
         if (work()) {
             static_cast<void>(::write(result, &kSuccess, 1) == 1); // who is not told takes it for a failure
         }
-    } catch (...) { // NOLINT(bugprone-empty-catch): nobody here could be told
+    } catch (...) {
+        // Nobody here could be told.
     }
     ::_exit(0);
 }
