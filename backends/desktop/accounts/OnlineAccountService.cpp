@@ -80,6 +80,7 @@ class OnlineAccountService::Switches {
     //  embedded, account  say how, and whose
     void bringInLine(platform::AccountService& embedded, platform::CloudAccount& account) const {
         const std::string name = account.accountID();
+        _pending.refresh();
         for (std::size_t i = 0; i < kServices.size(); ++i) {
             if (_pending.has(name, kServices[i])) {
                 set(name, static_cast<OnlineFeature>(i), embedded.isServiceEnabled(&account, kServices[i]));

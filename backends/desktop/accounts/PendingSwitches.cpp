@@ -23,6 +23,7 @@ bool PendingSwitches::isMade(const std::string& account) const {
 }
 
 void PendingSwitches::note(const std::string& account, const std::string& service) const {
+    refresh();
     if (!has(account, service)) {
         _store.setValue(keyOf(account, service), true, kPendingSwitchesDomain);
         _store.synchronise(kPendingSwitchesDomain);
@@ -30,14 +31,18 @@ void PendingSwitches::note(const std::string& account, const std::string& servic
 }
 
 void PendingSwitches::forget(const std::string& account, const std::string& service) const {
+    refresh();
     if (has(account, service)) {
         _store.removeValue(keyOf(account, service), kPendingSwitchesDomain);
         _store.synchronise(kPendingSwitchesDomain);
     }
 }
 
-bool PendingSwitches::has(const std::string& account, const std::string& service) const {
+void PendingSwitches::refresh() const {
     _store.synchronise(kPendingSwitchesDomain);
+}
+
+bool PendingSwitches::has(const std::string& account, const std::string& service) const {
     return booleanReading(_store.copyValue(keyOf(account, service), kPendingSwitchesDomain));
 }
 

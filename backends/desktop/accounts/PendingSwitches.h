@@ -29,7 +29,10 @@ class PendingSwitches {
     void note(const std::string& account, const std::string& service) const;
     void forget(const std::string& account, const std::string& service) const;
 
-    // Whether it is to be set, as all processes have stored it.
+    // Takes up what all processes have stored.
+    void refresh() const;
+
+    // Whether it is to be set, as far as that has been taken up.
     bool has(const std::string& account, const std::string& service) const;
 
   private:
