@@ -12,35 +12,20 @@ import re
 import shutil
 import subprocess
 import sys
-import tempfile
 import unittest
 from pathlib import Path
 
 HERE = Path(__file__).resolve().parent
 SOURCES = HERE.parents[1]
-sys.path.insert(0, str(HERE / "broken"))
+sys.path[:0] = [str(HERE / "broken"), str(HERE.parent / "support")]
+from installed_tool import InstalledToolCase  # noqa: E402
 from table import BROKEN  # noqa: E402
 
 PLUGIN_FOLDER = "System/Library/CoreServices/FirstRunPlugins"
-BUILD, CC, CXX, PART = None, None, None, None
+CC, CXX, PART = None, None, None
 
 
-class WithTool(unittest.TestCase):
-    maxDiff = None
-
-    @classmethod
-    def setUpClass(cls):
-        cls.folder = Path(tempfile.mkdtemp(prefix="plugin-check-"))
-        cls.addClassCleanup(shutil.rmtree, cls.folder)
-        cls.prefix = cls.folder / "prefix"
-        subprocess.run(["cmake", "--install", BUILD, "--prefix", cls.prefix], check=True, stdout=subprocess.DEVNULL,
-                       timeout=120)
-        cls.temporary = cls.folder / "tmp"
-        cls.temporary.mkdir()
-
-    def tearDown(self):
-        self.assertEqual(list(self.temporary.iterdir()), [], "every check takes its folder away")
-
+class WithTool(InstalledToolCase):
     def compile(self, source, name, *options):
         library = self.folder / f"{name}.ncdplugin"
         compiler = [CXX, "-std=c++17"] if source.suffix == ".cpp" else [CC, "-std=c11"]
@@ -49,10 +34,7 @@ class WithTool(unittest.TestCase):
         return library
 
     def tool(self, *arguments):
-        return subprocess.run([self.prefix / "bin/welcomer", *map(str, arguments)], capture_output=True, text=True,
-                              timeout=280, stdin=subprocess.DEVNULL, check=False,
-                              env={**os.environ, "TMPDIR": str(self.temporary),
-                                                                "DBUS_SESSION_BUS_ADDRESS": "unix:path=/nonexistent"})
+        return super().tool(*arguments, DBUS_SESSION_BUS_ADDRESS="unix:path=/nonexistent")
 
     def check(self, *arguments):
         """The exit status, and the records of the first plug-in."""
@@ -199,5 +181,5 @@ class Listing(WithTool):
 
 
 if __name__ == "__main__":
-    BUILD, CC, CXX, PART = sys.argv[1:5]
+    InstalledToolCase.build, CC, CXX, PART = sys.argv[1:5]
     unittest.main(argv=[sys.argv[0], *sys.argv[5:]])

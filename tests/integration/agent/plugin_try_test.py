@@ -5,34 +5,20 @@ usage: plugin_try_test.py BUILD_DIR PLUGIN_DIR
 """
 
 import json
-import os
 import plistlib
 import shutil
 import subprocess
 import sys
-import tempfile
 import unittest
 from pathlib import Path
+
+sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "support"))
+from installed_tool import InstalledToolCase  # noqa: E402
 
 BUILD, PLUGINS = None, None
 
 
-class PluginTry(unittest.TestCase):
-    maxDiff = None
-
-    @classmethod
-    def setUpClass(cls):
-        cls.folder = Path(tempfile.mkdtemp(prefix="plugin-try-"))
-        cls.addClassCleanup(shutil.rmtree, cls.folder)
-        cls.prefix = cls.folder / "prefix"
-        subprocess.run(["cmake", "--install", BUILD, "--prefix", cls.prefix], check=True, stdout=subprocess.DEVNULL,
-                       timeout=120)
-        cls.temporary = cls.folder / "tmp"
-        cls.temporary.mkdir()
-
-    def tearDown(self):
-        self.assertEqual(list(self.temporary.iterdir()), [], "every trial takes its folder away")
-
+class PluginTry(InstalledToolCase):
     def plugin(self, source, name):
         return Path(shutil.copy(PLUGINS / f"{source}.ncdplugin", self.folder / name))
 
@@ -40,11 +26,6 @@ class PluginTry(unittest.TestCase):
         path = self.folder / "response.plist"
         path.write_bytes(plistlib.dumps(value))
         return path
-
-    def tool(self, *arguments, **environment):
-        return subprocess.run([self.prefix / "bin/welcomer", *map(str, arguments)], capture_output=True, text=True,
-                              timeout=200, stdin=subprocess.DEVNULL, check=False,
-                              env={**os.environ, "TMPDIR": str(self.temporary), **environment})
 
     def logins(self, *arguments, status=0, **environment):
         done = self.tool("--json", "plugins", "try", *arguments, **environment)
@@ -155,4 +136,5 @@ class PluginTry(unittest.TestCase):
 
 if __name__ == "__main__":
     BUILD, PLUGINS = Path(sys.argv[1]), Path(sys.argv[2])
+    InstalledToolCase.build = BUILD
     unittest.main(argv=sys.argv[:1], verbosity=2)
